@@ -1,0 +1,45 @@
+// Color and RGBAColor: a named colour of four 8-bit components.
+#ifndef ZMC_COLOUR_COLOR_H
+#define ZMC_COLOUR_COLOR_H
+
+#include <cstdint>
+
+#include "core/Array.h"
+#include "core/Pointer.h"
+#include "core/String.h"
+
+namespace zelm {
+
+class Color {
+public:
+    String name;
+    std::uint8_t red;
+    std::uint8_t green;
+    std::uint8_t blue;
+    std::uint8_t alpha;   // 255 is opaque
+    std::uint8_t isNull;  // 1 for the null colour
+
+    Color();  // the null colour: name "null", all components 0
+    Color(const Color&) = default;
+    Color& operator=(const Color&) = delete;  // see Assign
+    virtual ~Color() = default;
+
+    // Takes name and components of `other`; assigning a colour to itself changes nothing.
+    void Assign(const Color& other);
+};
+
+class RGBAColor : public Color {
+public:
+    // Red, green, blue and alpha from the first four elements; missing ones count as 0. The name
+    // is "NoName".
+    explicit RGBAColor(const Array<unsigned char>& components);
+};
+
+class ColorPtr : public Pointer<Color> {
+public:
+    using Pointer::Pointer;
+};
+
+}  // namespace zelm
+
+#endif

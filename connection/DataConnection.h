@@ -1,0 +1,46 @@
+// DataConnection: the object through which a host reaches one dataset.
+//
+// Made empty, bound by Open, unbound by Close, and can be bound again. The order of the operations
+// is fixed. Nothing throws and no reason is given: failure is a false or empty result. One thread
+// at a time; the counts of the pointers alone are atomic.
+#ifndef ZMC_CONNECTION_DATACONNECTION_H
+#define ZMC_CONNECTION_DATACONNECTION_H
+
+#include <cstdint>
+
+#include "core/Array.h"
+#include "core/GeoRef.h"
+#include "core/String.h"
+#include "metadata/Metadata.h"
+
+namespace zelm {
+
+class DataConnection {
+public:
+    // Binds the connection to the dataset that `parameters`, one element, names. The pointers are
+    // released by the callee.
+    virtual bool Open(const Array<String>& parameters, GeoRefPtr geoRef, MetadataPtr metadata) = 0;
+    virtual void Close() = 0;
+    virtual bool IsOpen() = 0;
+    // The kind word and the parameter string of the last success.
+    virtual Array<String> GetParameters() = 0;
+    // "{MemoryRaster}@" or "{PyramidRaster}@" and the parameter string; empty before the first
+    // success. Nothing reads it back.
+    virtual String GetConnectionString() = 0;
+    virtual bool IsAvailable() = 0;
+    // Pixel type code, 0 if not open.
+    virtual std::uint32_t GetPixelType() = 0;
+    virtual bool IsReadable() = 0;
+    // A place of the interface that nobody asks: always false.
+    virtual bool ReservedConnectionQuery() = 0;
+    virtual ~DataConnection() = default;
+};
+
+class DataConnectionPtr : public Pointer<DataConnection> {
+public:
+    using Pointer::Pointer;
+};
+
+}  // namespace zelm
+
+#endif

@@ -1,0 +1,24 @@
+// Complex<T>: the element type of complex rasters. Two adjacent T, real part first, as they lie in
+// memory and in files.
+#ifndef ZMC_CORE_COMPLEX_H
+#define ZMC_CORE_COMPLEX_H
+
+namespace zelm {
+
+template <class T>
+struct Complex {
+    T re;
+    T im;
+
+    constexpr Complex() : re(0), im(0) {}
+    constexpr Complex(T real, T imaginary) : re(real), im(imaginary) {}
+
+    // IEEE comparison of both parts: a NaN equals nothing.
+    friend constexpr bool operator==(const Complex&, const Complex&) = default;
+};
+
+static_assert(sizeof(Complex<float>) == 8 && sizeof(Complex<double>) == 16);
+
+}  // namespace zelm
+
+#endif

@@ -1,0 +1,10 @@
+#include "core/ErrorState.h"
+
+#include "zmcg/zmcg.h"
+
+namespace zelm {
+
+const std::uint32_t ObjectErrorOutOfMemory::errorCode = GloballyUniqueObjectErrorCode();
+const std::uint32_t RasterReaderErrorInvalid::errorCode = GloballyUniqueObjectErrorCode();
+
+}  // namespace zelm

@@ -1,0 +1,65 @@
+// Errors of the object model: numbers stored in the object that failed.
+//
+// Nothing is thrown and no text is kept. Whoever fails builds an error value with its class's
+// code, and stores its record with SetError; whoever cares reads it (Object::IsValid). A record,
+// once stored, is never cleared.
+#ifndef ZMC_CORE_ERRORSTATE_H
+#define ZMC_CORE_ERRORSTATE_H
+
+#include <cstdint>
+
+namespace zelm {
+
+struct ErrorRecord {
+    std::uint32_t flags = 0;  // 0: nothing wrong; bit 2 (value 4): an error
+    std::uint32_t code = 0;   // code of the error's class; 0 in a fresh object
+};
+
+// The one bit of ErrorRecord::flags that is tested.
+inline constexpr std::uint32_t kErrorFlag = 4;
+
+class ObjectErrorState {
+public:
+    std::uint32_t code;
+
+    explicit ObjectErrorState(std::uint32_t errorCode) : code(errorCode) {}
+    virtual ~ObjectErrorState() = default;
+    virtual ErrorRecord GetState() const { return {0, code}; }
+};
+
+class ObjectError : public ObjectErrorState {
+public:
+    using ObjectErrorState::ObjectErrorState;
+    ErrorRecord GetState() const override { return {kErrorFlag, code}; }
+};
+
+// Raised by Array when element storage cannot be allocated.
+class ObjectErrorOutOfMemory : public ObjectError {
+public:
+    static const std::uint32_t errorCode;
+    ObjectErrorOutOfMemory() : ObjectError(errorCode) {}
+};
+
+// Raised by RasterReaderDispatch when it is built without a reader.
+class RasterReaderErrorInvalid : public ObjectError {
+public:
+    static const std::uint32_t errorCode;
+    RasterReaderErrorInvalid() : ObjectError(errorCode) {}
+};
+
+class ErrorState {
+public:
+    ErrorRecord error;
+
+    ErrorState() = default;
+    // A copy starts healthy, and assignment leaves the target's state: records are not copied.
+    ErrorState(const ErrorState&) : error() {}
+    ErrorState& operator=(const ErrorState&) { return *this; }
+    virtual ~ErrorState() = default;
+
+    void SetError(const ObjectErrorState& source) { error = source.GetState(); }
+};
+
+}  // namespace zelm
+
+#endif

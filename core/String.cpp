@@ -1,0 +1,221 @@
+#include "core/String.h"
+
+#include <algorithm>
+#include <cstring>
+#include <istream>
+#include <new>
+
+#include "platform/TextConversion.h"
+
+namespace zelm {
+namespace {
+
+template <class Unit>
+Unit* AllocateText(std::size_t units) {
+    Unit* text = new (std::nothrow) Unit[units + 1];
+    if (text) text[0] = Unit{0};
+    return text;
+}
+
+const char16_t* AsUtf16(const WideChar* text) { return reinterpret_cast<const char16_t*>(text); }
+char16_t* AsUtf16(WideChar* text) { return reinterpret_cast<char16_t*>(text); }
+
+std::size_t Units(const WideChar* text) { return std::char_traits<WideChar>::length(text); }
+
+using NarrowConversion = std::size_t (*)(const char16_t*, std::size_t, char*, std::size_t);
+
+// Makes a narrow copy of `text`; one byte is allocated where the size cannot be told, so that the
+// caller still gets a text.
+char* MakeNarrow(const WideChar* text, NarrowConversion convert) {
+    const std::size_t units = Units(text);
+    std::size_t bytes = convert(AsUtf16(text), units, nullptr, 0);
+    if (bytes == platform::kConversionFailed) bytes = 0;
+    char* narrow = AllocateText<char>(bytes);
+    if (!narrow) return nullptr;
+    if (bytes != 0) {
+        convert(AsUtf16(text), units, narrow, bytes);
+        narrow[bytes] = '\0';
+    }
+    return narrow;
+}
+
+}  // namespace
+
+String::String(const WideChar* text) {
+    if (text) CopyUnits(text, Units(text));
+}
+
+String::String(const char* utf8Text) {
+    if (utf8Text) ConvertFromUtf8(utf8Text, std::strlen(utf8Text));
+}
+
+String::String(const String& other) {
+    if (!other.wide) return;
+    CopyUnits(other.wide, Units(other.wide));
+    if (wide) length = other.length;
+}
+
+String::~String() { Free(); }
+
+String& String::operator=(const String& other) {
+    Free();
+    if (other.wide) {
+        CopyUnits(other.wide, Units(other.wide));
+        if (wide) length = other.length;
+    }
+    return *this;
+}
+
+String& String::operator=(const WideChar* text) {
+    String fresh(text);  // `text` may point into this string
+    return Take(fresh);
+}
+
+String& String::operator=(const char* utf8Text) {
+    String fresh(utf8Text);  // likewise
+    return Take(fresh);
+}
+
+String& String::operator=(const std::string& utf8Text) {
+    Free();
+    if (!utf8Text.empty()) ConvertFromUtf8(utf8Text.c_str(), std::strlen(utf8Text.c_str()));
+    return *this;
+}
+
+const char* String::GetUtf8() const {
+    if (!utf8 && wide) utf8 = MakeNarrow(wide, platform::Utf16ToUtf8);
+    return utf8;
+}
+
+const char* String::GetAnsi() const {
+    if (!ansi && wide) ansi = MakeNarrow(wide, platform::Utf16ToLocale);
+    return ansi;
+}
+
+String& String::Append(const String& other) {
+    FreeCaches();
+    if (!other.wide) return *this;
+    const std::size_t ownUnits = wide ? Units(wide) : 0;
+    const std::size_t otherUnits = Units(other.wide);
+    const std::uint32_t otherLength = other.length;
+    WideChar* joined = AllocateText<WideChar>(ownUnits + otherUnits);
+    if (joined) {
+        if (wide) std::copy_n(wide, ownUnits, joined);
+        std::copy_n(other.wide, otherUnits, joined + ownUnits);
+        joined[ownUnits + otherUnits] = 0;
+    }
+    delete[] wide;
+    wide = joined;
+    length = joined ? length + otherLength : 0;  // a failed append loses the text
+    return *this;
+}
+
+void String::Substring(std::uint32_t start, std::uint32_t count, String& out) const {
+    const std::uint64_t end = std::uint64_t{start} + count;
+    std::uint32_t units = (count == 0 || end > length) ? length - start : count;
+    // `length` can exceed the units of text that came from UTF-8; never read past the terminator.
+    const std::size_t available = wide ? Units(wide) : 0;
+    const std::size_t begin = std::min<std::size_t>(start, available);
+    const std::size_t copied = std::min<std::size_t>(units, available - begin);
+    out.Free();
+    WideChar* text = AllocateText<WideChar>(copied);
+    if (!text) return;
+    if (copied != 0) std::copy_n(wide + begin, copied, text);
+    text[copied] = 0;
+    out.wide = text;
+    out.length = units;
+}
+
+void String::ToLower() {
+    FreeCaches();
+    if (!wide) return;
+    for (WideChar* unit = wide; *unit; ++unit)
+        *unit = static_cast<WideChar>(platform::ToLowerUnit(static_cast<char16_t>(*unit)));
+}
+
+int String::Compare(const String& other) const {
+    if (!wide) return other.wide ? -1 : 0;
+    if (!other.wide) return 1;
+    const WideChar* a = wide;
+    const WideChar* b = other.wide;
+    while (*a && *a == *b) {
+        ++a;
+        ++b;
+    }
+    return static_cast<int>(static_cast<char16_t>(*a)) -
+           static_cast<int>(static_cast<char16_t>(*b));
+}
+
+std::uint32_t String::Find(const String& needle) const {
+    if (!wide || !needle.wide) return kNotFound;
+    const std::size_t at = View().find(needle.View());
+    return at == std::basic_string_view<WideChar>::npos ? kNotFound
+                                                        : static_cast<std::uint32_t>(at);
+}
+
+std::basic_string_view<WideChar> String::View() const {
+    if (!wide) return {};
+    return {wide, Units(wide)};
+}
+
+String& String::Take(String& other) {
+    std::swap(wide, other.wide);
+    std::swap(length, other.length);
+    FreeCaches();
+    return *this;
+}
+
+void String::Free() {
+    FreeCaches();
+    delete[] wide;
+    wide = nullptr;
+    length = 0;
+}
+
+void String::FreeCaches() const {
+    delete[] ansi;
+    delete[] utf8;
+    ansi = nullptr;
+    utf8 = nullptr;
+}
+
+void String::CopyUnits(const WideChar* text, std::size_t units) {
+    wide = AllocateText<WideChar>(units);
+    if (!wide) return;
+    std::copy_n(text, units + 1, wide);
+    length = static_cast<std::uint32_t>(units);
+}
+
+// The length becomes the byte count even where memory ran out and where the text has fewer units:
+// it is how the length of narrow text is defined throughout the object model.
+void String::ConvertFromUtf8(const char* text, std::size_t bytes) {
+    length = static_cast<std::uint32_t>(bytes);
+    wide = AllocateText<WideChar>(bytes);
+    if (!wide) return;
+    const std::size_t units = platform::Utf8ToUtf16(text, bytes, AsUtf16(wide), bytes);
+    wide[units == platform::kConversionFailed ? 0 : std::min(units, bytes)] = 0;
+}
+
+String operator+(const String& a, const String& b) {
+    String joined(a);
+    joined.Append(b);
+    return joined;
+}
+
+bool operator==(const String& a, const char* b) { return a.Compare(String(b)) == 0; }
+
+void ReadTrimmedToken(std::istream& stream, String& out) {
+    static constexpr const char* kBlanks = " \r\n\t";
+    std::string token;
+    stream >> token;
+    const std::size_t first = token.find_first_not_of(kBlanks);
+    if (first == std::string::npos) {
+        token.clear();
+    } else {
+        token.erase(token.find_last_not_of(kBlanks) + 1);
+        token.erase(0, first);
+    }
+    out = token;
+}
+
+}  // namespace zelm

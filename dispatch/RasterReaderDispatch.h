@@ -1,0 +1,79 @@
+// RasterReaderDispatch: a reader whose pixel type is known at run time alone.
+//
+// A tagged union of twelve reader pointers, of which the one of code `pixelType` holds the reader;
+// in an invalid dispatch all are empty and `pixelType` is 0. The state is fixed by the constructor,
+// so several threads may look at it.
+//
+// A host reaches the typed reader by Visit, whatever the type:
+//     dispatch->Visit([&](auto& reader) { reader.ReadTile(...); });
+// or, when it knows the type, by As<T>() or the member itself.
+#ifndef ZMC_DISPATCH_RASTERREADERDISPATCH_H
+#define ZMC_DISPATCH_RASTERREADERDISPATCH_H
+
+#include <cstdint>
+#include <utility>
+
+#include "core/ElementTypes.h"
+#include "core/ErrorState.h"
+#include "core/Pointer.h"
+#include "raster/RasterReader.h"
+
+namespace zelm {
+
+class RasterReaderDispatch : public ErrorState {
+public:
+    // readerByte, readerChar, ...: one pointer for each element type, in the order of the list.
+#define ZMC_X(type, name, code) RasterReaderPtr<type> reader##name;
+    ZMC_ELEMENT_TYPES(ZMC_X)
+#undef ZMC_X
+    std::uint32_t pixelType = 0;  // 0 until a reader is bound
+
+    RasterReaderDispatch();  // invalid
+    // Takes a reference of its own; a pointer without a reader gives an invalid dispatch.
+#define ZMC_X(type, name, code) explicit RasterReaderDispatch(RasterReaderPtr<type> reader);
+    ZMC_ELEMENT_TYPES(ZMC_X)
+#undef ZMC_X
+
+    // The answers of the bound reader; a default record and false from an invalid dispatch.
+    RasterProps GetRasterProps() const;
+    bool IsValidLevel() const;
+
+    // Calls visit(RasterReader<T>&) with the bound reader; false, without a call, if there is none.
+    template <class Visitor>
+    bool Visit(Visitor&& visit) const {
+        switch (pixelType) {
+#define ZMC_X(type, name, code)                      \
+    case code:                                       \
+        if (!reader##name) return false;             \
+        std::forward<Visitor>(visit)(*reader##name); \
+        return true;
+            ZMC_ELEMENT_TYPES(ZMC_X)
+#undef ZMC_X
+            default:
+                return false;
+        }
+    }
+
+    // The pointer of element type T, which is empty unless T is the pixel type.
+    template <class T>
+    const RasterReaderPtr<T>& As() const {
+#define ZMC_X(type, name, code) \
+    if constexpr (std::is_same_v<T, type>) return reader##name;
+        ZMC_ELEMENT_TYPES(ZMC_X)
+#undef ZMC_X
+    }
+
+private:
+    void ResetReaders();
+    template <class T>
+    void Bind(RasterReaderPtr<T>& member, RasterReaderPtr<T> reader);
+};
+
+class RasterReaderDispatchPtr : public Pointer<RasterReaderDispatch> {
+public:
+    using Pointer::Pointer;
+};
+
+}  // namespace zelm
+
+#endif

@@ -1,0 +1,36 @@
+#include "metadata/Metadata.h"
+
+#include <new>
+
+#include "zmcg/zmcg.h"
+
+namespace zelm {
+namespace {
+
+// Drawn for the vocabulary that all modules share; no class here answers to it.
+[[maybe_unused]] const std::uint32_t lockableMapTypeCode =
+    GloballyUniqueObjectTypeCode("LockableMap");
+
+}  // namespace
+
+const std::uint32_t Metadata::typeCode = GloballyUniqueObjectTypeCode("Metadata");
+
+Metadata::Metadata() {
+    auto* tree = new (std::nothrow) LockableMetadataImpl;
+    if (!tree) return;
+    InitializeCriticalSection(&tree->lock);
+    impl.Reset(tree);
+}
+
+Metadata::Metadata(const Metadata& other) : Object(), impl(other.impl) {}
+
+Metadata& Metadata::operator=(const Metadata& other) {
+    impl = other.impl;
+    return *this;
+}
+
+Metadata::~Metadata() = default;
+
+String Metadata::ToString() const { return MakeObjectUrl("Metadata", this); }
+
+}  // namespace zelm

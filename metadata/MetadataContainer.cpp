@@ -1,0 +1,26 @@
+#include "metadata/MetadataContainer.h"
+
+MetadataContainer::~MetadataContainer() {
+    for (const auto& [key, child] : children) delete child;
+}
+
+std::wstring MetadataContainer::GetValueText() const {
+    std::wstring names;
+    for (const auto& [key, child] : children) {
+        if (!names.empty()) names += L", ";
+        names += key;
+    }
+    return names;
+}
+
+const void* MetadataContainer::GetValueData(std::uint32_t& state) const {
+    state = 0;
+    return &children;
+}
+
+std::wstring MetadataContainer::Format(const std::wstring& name) const {
+    std::wstring lines;
+    for (const auto& [key, child] : children)
+        if (child) lines += child->Format(name + key + L'/');
+    return lines;
+}

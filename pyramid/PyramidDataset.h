@@ -1,0 +1,179 @@
+// PyramidDataset: one pyramid file, its tables and its stream.
+//
+// A pyramid file holds an image at several resolutions (levels), cut into square tiles, between a
+// header document in front and a metadata document behind. No tile offset is stored: the tables
+// are recomputed from the header at each open, so the formulas here are the format
+// (docs/format.md). Fields are public and stand in the order in which the system tells them.
+//
+// One stream and one work buffer: a dataset is for one thread at a time, reads included. No
+// operation throws. Tile transfers report nothing; what cannot be read is zeros.
+#ifndef ZMC_PYRAMID_PYRAMIDDATASET_H
+#define ZMC_PYRAMID_PYRAMIDDATASET_H
+
+#include <cstdint>
+#include <memory>
+
+#include "colour/Palette.h"
+#include "core/Array.h"
+#include "core/Pointer.h"
+#include "core/String.h"
+#include "platform/File.h"
+#include "pyramid/PyramidHeaderRecord.h"
+#include "pyramid/PyramidXMLDocument.h"
+#include "raster/RasterBandHistogram.h"
+#include "raster/RasterBandStats.h"
+#include "raster/RasterProps.h"
+
+namespace xercesc {
+class HandlerBase;
+class MemBufInputSource;
+class SAXParser;
+}  // namespace xercesc
+
+namespace zelm {
+
+class PyramidDataset {
+public:
+    // Results of ParseDocument.
+    static constexpr int kParsed = 0;
+    static constexpr int kParseError = 4;
+    static constexpr int kParseOutOfMemory = 5;
+
+    // Files with larger tiles open, and then refuse every tile operation.
+    static constexpr std::uint32_t kMaxTileSize = 2048;
+
+    std::unique_ptr<platform::File> File;  // the open file, or null
+    bool Writable = false;                 // `File` was opened for update
+    std::uint32_t VersionMajor = 0;
+    std::uint32_t VersionMinor = 0;
+    std::uint32_t BandCount = 0;
+    std::uint32_t Samples = 0;  // width of level 0
+    std::uint32_t Lines = 0;    // height of level 0
+    std::uint32_t TileSize = 0;
+    std::uint32_t LevelCount = 0;  // LevelMax - LevelMin + 1; wraps where no level is laid out
+    std::uint32_t LevelMin = 0;
+    std::uint32_t LevelMax = 0;
+    std::uint64_t TileDataEnd = 0;
+    bool HasPyramid = false;  // result of the last completeness test
+    std::uint32_t PixelType = 0;
+    std::int32_t Interleave = -1;    // only carried: no byte of the tile data depends on it
+    std::uint32_t TileOrdering = 0;  // TileOrder code
+    String FileName;                 // the path, exactly as the connection got it
+    std::uint64_t TileCursor = 0;    // running offset of BuildTileTable
+    // Absolute offset of every tile: (LevelMax + 1) x BandCount x tiles of level 0.
+    Array<std::uint64_t> TileOffsets;
+    std::unique_ptr<unsigned char[]> TileScratch;  // room for 2 x 2 tiles with all bands, or null
+    String SourceName;                             // name given to the open constructor
+    std::uint32_t BytesPerSample = 1;
+    std::unique_ptr<std::uint64_t[]> LevelOffsets;  // LevelMax + 1 entries
+    std::uint64_t TileDataStart = 0;
+    std::uint64_t MetaDocumentOffset = 0;
+    std::unique_ptr<PyramidXMLDocument> MetaDocument;    // tree of the metadata document
+    std::unique_ptr<PyramidXMLDocument> HeaderDocument;  // only while CreateFile runs
+    std::unique_ptr<xercesc::SAXParser> Parser;          // for both documents
+    std::unique_ptr<xercesc::MemBufInputSource> MetaSource;
+    std::unique_ptr<xercesc::MemBufInputSource> HeaderSource;
+    bool MetaLoaded = false;    // MetaSource reflects the file
+    bool HeaderLoaded = false;  // HeaderSource reflects the file
+    PalettePtr CurrentPalette;  // palette of the last GetPalette
+
+    // Describes a file that does not exist yet; nothing is opened.
+    PyramidDataset(String fileName, RasterProps props);
+    // Names an existing file; ReadHeader opens it.
+    explicit PyramidDataset(String fileName);
+    ~PyramidDataset();
+    PyramidDataset(const PyramidDataset&) = delete;
+    PyramidDataset& operator=(const PyramidDataset&) = delete;
+
+    // --- life of the file (PyramidDataset.cpp) ---
+    // Opens for update, or failing that for reading; `create` makes the file or empties it.
+    bool OpenFile(bool create);
+    // Opens the file and builds all tables. FALSE on success, TRUE on failure: callers are written
+    // to this sense.
+    bool ReadHeader();
+    // Makes the file, or empties it, writes the header and lays out the levels, both inclusive. On
+    // a file that cannot be made nothing but the version changes, and nothing is reported.
+    void CreateFile(std::uint32_t levelMin, std::uint32_t levelMax);
+    // Reopens the file and stores in HasPyramid whether it is complete; always true.
+    bool RefreshPyramidState();
+    // Reopens the file; true if its version is 1.1 or later and it reaches TileDataEnd.
+    bool CheckPyramidComplete();
+    // Closes and removes the file, whether that succeeds or not.
+    void DeleteFile();
+
+    // --- addresses (TileTable.cpp, with the arithmetic of LevelGeometry.h) ---
+    // Offset of a tile from LevelOffsets[level], in the orderings Scanline and Blocked.
+    std::uint64_t GetTileOffset(std::uint32_t tileX, std::uint32_t tileY,
+                                std::uint32_t level) const;
+    // Fills TileOffsets along the Morton curve from TileCursor on, and advances that.
+    void BuildTileTable(std::uint32_t width, std::uint32_t height, std::uint32_t tileWidth,
+                        std::uint32_t tileHeight, std::uint32_t bands,
+                        std::uint32_t bytesPerSample);
+
+    // --- tile transfer (TileTransfer.cpp) ---
+    // Reads a rectangle of one level, pixel-interleaved, with the listed bands in list order; an
+    // identity or (in the orderings 0 and 1) empty list means all bands. False, with nothing moved,
+    // for a rectangle, level or band outside what the dataset holds; a null File moves nothing and
+    // is true.
+    template <class T>
+    bool ReadTile(std::uint32_t x, std::uint32_t y, std::uint32_t width, std::uint32_t height,
+                  const Array<int>& bandList, std::int32_t level, T* buffer);
+    template <class T>
+    bool WriteTileInterleaved(std::uint32_t x, std::uint32_t y, std::uint32_t width,
+                              std::uint32_t height, const Array<int>& bandList, std::int32_t level,
+                              const T* buffer);
+    template <class T>
+    bool WriteTileMorton(std::uint32_t x, std::uint32_t y, std::uint32_t width,
+                         std::uint32_t height, const Array<int>& bandList, std::int32_t level,
+                         const T* buffer);
+
+    // --- documents (PyramidDocuments.cpp) ---
+    // FALSE when the document was loaded or File is null, TRUE when its region is empty.
+    bool LoadHeaderDocument();
+    bool ParseHeaderDocument(PyramidHeaderRecord& out);
+    // True when MetaSource was filled from the file.
+    bool LoadMetaDocument();
+    // Runs Parser over `source`, which may be null only after a failure; `handlers` may be null.
+    // kParsed, kParseError or kParseOutOfMemory. The source is one of the two members: after an
+    // exception it is dropped and its flag cleared.
+    int ParseDocument(xercesc::HandlerBase* handlers,
+                      std::unique_ptr<xercesc::MemBufInputSource>& source, bool& loaded);
+    // Builds the tree of MetaDocument from the file's text, if it has any.
+    void ReadMetaTree();
+
+    // --- archive of statistics, histograms and palettes (PyramidArchive.cpp) ---
+    // A record with that band number exists.
+    template <class T>
+    bool HasBandStats(std::uint32_t band);
+    // The record at POSITION `band` of the document, whatever band it names; a default record where
+    // there is none. Store all bands in one call, in band order, once, and the two agree.
+    template <class T>
+    RasterBandStats<T> GetBandStats(std::int32_t band);
+    template <class T>
+    bool SetBandStats(const Array<RasterBandStats<T>>& stats);
+    template <class T>
+    Array<RasterBandHistogram<T>> GetHistograms();
+    template <class T>
+    bool SetHistograms(const Array<RasterBandHistogram<T>>& histograms);
+    // Never null: a palette of no colours for a band without one. The last one stored wins.
+    template <class T>
+    PalettePtr GetPalette(std::uint32_t band);
+    bool SetPalette(std::uint32_t band, const Palette& palette);
+    // The parses under the fetches; they differ in their answer where the file has no document:
+    // false for statistics, true (and `out` untouched) for the other two.
+    template <class T>
+    bool LoadBandStats(Array<RasterBandStats<T>>& out);
+    template <class T>
+    bool LoadHistograms(Array<RasterBandHistogram<T>>& out);
+    template <class T>
+    bool LoadPalette(std::uint32_t band, Palette& out);
+};
+
+class PyramidDatasetPtr : public Pointer<PyramidDataset> {
+public:
+    using Pointer::Pointer;
+};
+
+}  // namespace zelm
+
+#endif

@@ -1,0 +1,63 @@
+// RasterReader<T>: the reader through which pixels of element type T move.
+//
+// A tile is a bare buffer of `width` x `height` pixels with the bands of `bandList`, in that order,
+// in the raster's interleave (slowest first):
+//   None  height, width           BIL   height, bands, width
+//   BIP   height, width, bands    BSQ   bands, height, width
+// A pyramid moves its tiles pixel-interleaved whatever its interleave says, while its masks still
+// go by the interleave.
+//
+// `mask` has the tile's shape with one byte per sample. Bit 0 marks a sample that holds no valid
+// data; bits 1 to 7 are the caller's and never change, so the caller initialises the mask.
+#ifndef ZMC_RASTER_RASTERREADER_H
+#define ZMC_RASTER_RASTERREADER_H
+
+#include <cstdint>
+
+#include "core/Array.h"
+#include "core/ElementTypes.h"
+#include "raster/BasicRasterReader.h"
+#include "raster/RasterBandHistogram.h"
+#include "raster/RasterBandStats.h"
+
+namespace zelm {
+
+class RasterDataConnection;
+
+template <class T>
+class RasterReader : public BasicRasterReader {
+public:
+    // The connection that built the reader: borrowed, not counted, and dangling once that has gone.
+    RasterDataConnection* connection = nullptr;
+
+    virtual RasterDataConnection* GetConnection() const = 0;
+    virtual RasterBandStats<T> GetBandStats(std::uint32_t band) const = 0;
+    virtual bool SetBandStats(const Array<RasterBandStats<T>>& stats) = 0;
+    virtual Array<RasterBandHistogram<T>> GetHistograms() const = 0;
+    virtual bool SetHistograms(const Array<RasterBandHistogram<T>>& histograms) = 0;
+    // The band's no-data value as a pixel, truncated and cut to T; zero for a band without one.
+    virtual T GetNoDataValue(std::uint32_t band) const = 0;
+
+    // Fills `buffer` with the tile whose first pixel is (x, y), measured at `level`, and then sets
+    // or clears bit 0 of each byte of `mask`, which may be null. The tile lies within the raster:
+    // nothing is clipped or padded.
+    virtual bool ReadTile(std::int32_t x, std::int32_t y, std::uint32_t width, std::uint32_t height,
+                          const Array<int>& bandList, std::int32_t level, T* buffer,
+                          unsigned char* mask) = 0;
+
+    // Stores the tile. Samples of `buffer` whose mask bit 0 is set are first overwritten with the
+    // band's no-data value, and stay so after the call. False for a null buffer or mask.
+    virtual bool WriteTile(std::int32_t x, std::int32_t y, std::uint32_t width,
+                           std::uint32_t height, const Array<int>& bandList, std::int32_t level,
+                           T* buffer, unsigned char* mask) = 0;
+};
+
+template <class T>
+class RasterReaderPtr : public Pointer<RasterReader<T>> {
+public:
+    using Pointer<RasterReader<T>>::Pointer;
+};
+
+}  // namespace zelm
+
+#endif

@@ -1,0 +1,60 @@
+// The contract between the module and its sibling `zmcg`: thirteen names, and nothing else.
+//
+// Any library that exports these names under this contract can stand in zmcg's place. The two
+// functions that draw codes, and the table of settings, must work from load-time initialisers of
+// any module in the process, whatever the order of loading; the data symbols are therefore
+// constant-initialised, and the functions keep their state in objects that arise on first use and
+// are never destroyed. The code functions are safe to call from any thread; the rest is not
+// synchronised.
+#ifndef ZMC_ZMCG_ZMCG_H
+#define ZMC_ZMCG_ZMCG_H
+
+#include <oneapi/tbb/mutex.h>
+
+#include <cstdint>
+
+#include "core/String.h"
+#include "zmcg/EnvironmentImpl.h"
+#include "zmcg/FormatRecord.h"
+
+class MetadataParseLog;
+
+namespace zelm {
+class CoordSysFactory;
+class CoordSysImpl;
+class CoordSysLog;
+}  // namespace zelm
+
+#if defined(_WIN32)
+#define ZMCG_SYMBOL extern "C" __declspec(dllimport)
+#else
+#define ZMCG_SYMBOL extern "C" __attribute__((visibility("default")))
+#endif
+
+// A number for a class word, never 0; equal for equal words, stable for the life of the process.
+ZMCG_SYMBOL unsigned GloballyUniqueObjectTypeCode(const zelm::String& name);
+// A number that no earlier call has returned, never 0.
+ZMCG_SYMBOL unsigned GloballyUniqueObjectErrorCode();
+
+// The formats that datasets can have; read-only for every user.
+ZMCG_SYMBOL FormatRecord gCdfFormatRecords[];
+ZMCG_SYMBOL std::int32_t gCdfFormatRecordCount;
+
+// The process-wide parse log, created by whoever builds the first Metadata.
+ZMCG_SYMBOL MetadataParseLog* gpMetadataParseLogInstance;
+
+// The one table of directory settings of the process.
+ZMCG_SYMBOL zelm::EnvironmentImpl& GetGlobalEnvironmentImpl();
+
+// The coordinate-system singletons and the entry points of the projection engine; all null until
+// the engine is asked for. The mutex is declared by its historical type and used as a critical
+// section throughout: see coordsys/CoordSysMutex.h.
+ZMCG_SYMBOL tbb::mutex* gpCoordSysMutex;
+ZMCG_SYMBOL zelm::CoordSysLog* gpCoordSysLogInstance;
+ZMCG_SYMBOL zelm::CoordSysFactory* gpCoordSysFactoryInstance;
+ZMCG_SYMBOL int (*fp_Esri_Pe_Initialize)(zelm::String&, zelm::String&);
+ZMCG_SYMBOL zelm::CoordSysImpl* (*fp_Esri_Pe_CreateFromString)(const zelm::String&);
+ZMCG_SYMBOL zelm::CoordSysImpl* (*fp_Esri_Pe_CreateFromCode)(int);
+ZMCG_SYMBOL int (*fp_Esri_Pe_Release)(zelm::CoordSysImpl*);
+
+#endif
