@@ -7,6 +7,7 @@
 
 #include "core/PixelVocabulary.h"
 #include "tests/dispatch/PropsReader.h"
+#include "tests/support/TileModel.h"
 
 namespace zelm::test {
 namespace {
