@@ -18,6 +18,11 @@ inline constexpr std::int32_t BIL = 1;    // lines, bands, samples
 inline constexpr std::int32_t BSQ = 2;    // bands, lines, samples
 }  // namespace Interleave
 
+// True for the four codes.
+constexpr bool IsInterleave(std::int32_t code) {
+    return code >= Interleave::None && code <= Interleave::BSQ;
+}
+
 // Order of the tiles in a pyramid file.
 namespace TileOrder {
 inline constexpr std::uint32_t Scanline = 0;

@@ -3,6 +3,7 @@
 #ifndef ZMC_DISPATCH_NODATARULE_H
 #define ZMC_DISPATCH_NODATARULE_H
 
+#include <limits>
 #include <type_traits>
 
 #include "core/ElementTypes.h"
@@ -16,11 +17,28 @@ struct NoDataRule {
 
     // The value matches by an ordered comparison, so a NaN matches nothing; a sample of floating or
     // complex type is marked as well when it is not finite, with or without a no-data value.
-    bool Marks(const T& x) const { return (hasValue && x == value) || NotFinite(x); }
+    // No branch in it, so that loops over samples become vector code.
+    bool Marks(const T& x) const {
+        return ((static_cast<unsigned>(hasValue) & static_cast<unsigned>(x == value)) |
+                static_cast<unsigned>(NotFinite(x))) != 0;
+    }
+
+    // A value that no sample equals, for the types that have one.
+    static constexpr T Unmatched() {
+        if constexpr (kIsComplex<T>) {
+            using Part = decltype(T::re);
+            constexpr Part nan = std::numeric_limits<Part>::quiet_NaN();
+            return T(nan, nan);
+        } else {
+            static_assert(std::is_floating_point_v<T>);
+            return std::numeric_limits<T>::quiet_NaN();
+        }
+    }
 
     static bool NotFinite(const T& x) {
         if constexpr (kIsComplex<T>)
-            return x.re * 0 != 0 || x.im * 0 != 0;
+            return (static_cast<unsigned>(x.re * 0 != 0) | static_cast<unsigned>(x.im * 0 != 0)) !=
+                   0;
         else if constexpr (std::is_floating_point_v<T>)
             return x * 0 != 0;
         else

@@ -1,0 +1,182 @@
+#include "connection/ConnectionStrings.h"
+
+#include <algorithm>
+#include <charconv>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <limits>
+#include <string_view>
+#include <system_error>
+
+#include "core/PixelVocabulary.h"
+#include "zmcg/zmcg.h"
+
+namespace zelm {
+namespace {
+
+using Text = std::basic_string_view<WideChar>;
+
+constexpr WideChar kPairEnd = ';';
+
+// The narrow form of a value; an empty text where memory ran out. Units outside ASCII become bytes
+// above 127, at which every conversion of a number stops.
+const char* NarrowText(const String& value) {
+    const char* text = value.GetUtf8();
+    return text ? text : "";
+}
+
+// Tells numbers below the range of a double from those above it: by the sign of the exponent, or by
+// the first digit where there is none.
+bool IsTiny(std::string_view number) {
+    const std::size_t exponent = number.find_first_of("eE");
+    if (exponent != std::string_view::npos) return number[exponent + 1] == '-';
+    const char first = number[number[0] == '-' ? 1 : 0];
+    return first == '0' || first == '.';
+}
+
+// Reads a double as far as it goes, whatever the locale says of decimal points.
+double ParseDouble(const char* text) {
+    text += std::strspn(text, " \t\n\v\f\r");
+    if (text[0] == '+' && text[1] != '-') ++text;
+    double value = 0;
+    const auto [end, error] = std::from_chars(text, text + std::strlen(text), value);
+    if (error != std::errc::result_out_of_range) return value;
+    const std::string_view number(text, static_cast<std::size_t>(end - text));
+    const double nearest = IsTiny(number) ? 0.0 : std::numeric_limits<double>::infinity();
+    return number[0] == '-' ? -nearest : nearest;
+}
+
+// Calls visit(start, count) for the stretches of `source` that are not empty.
+template <class Visit>
+void ForEachStretch(Text source, Text delimiter, Visit&& visit) {
+    for (std::size_t start = 0; start < source.size();) {
+        const std::size_t stop = std::min(source.find(delimiter[0], start), source.size());
+        if (stop != start) visit(start, stop - start);
+        start = stop + delimiter.size();
+    }
+}
+
+// Makes room for `count` elements at once: appending them one by one takes time that grows with
+// the square of their number. A view takes none.
+bool ReserveStrings(Array<String>& out, std::uint32_t count) {
+    out.Clear();
+    return out.owned && count != 0 && out.SetShape(ArrayShape(count));
+}
+
+bool IsSameText(const WideChar* a, const WideChar* b) {
+    if (!a || !b) return a == b;
+    return Text(a) == Text(b);
+}
+
+const FormatRecord* FindFormat(const String& word) {
+    for (std::int32_t i = 0; i < gCdfFormatRecordCount; ++i)
+        if (IsSameText(word.wide, gCdfFormatRecords[i].name)) return &gCdfFormatRecords[i];
+    return nullptr;
+}
+
+}  // namespace
+
+bool FindParameterValue(const String& source, const String& key, String& value) {
+    value = "";
+    if (source.IsEmpty()) return false;
+    const String needle = key + "=";
+    const Text text = source.View();
+    if (needle.View().size() < 2) return false;
+    const std::size_t found = text.find(needle.View());
+    if (found == Text::npos) return false;
+    const std::size_t start = found + needle.View().size();
+    const std::size_t end = std::min(text.find(kPairEnd, start), text.size());
+    if (end == start) return false;
+    source.Substring(static_cast<std::uint32_t>(start), static_cast<std::uint32_t>(end - start),
+                     value);
+    return !value.IsEmpty();
+}
+
+bool ReadUnsignedParameter(const String& source, const String& key, std::uint32_t& value) {
+    constexpr auto highest = std::numeric_limits<std::uint32_t>::max();
+    String text;
+    if (!FindParameterValue(source, key, text)) return false;
+    const long long number = std::strtoll(NarrowText(text), nullptr, 0);
+    const bool fits = number <= highest && number >= -static_cast<long long>(highest);
+    value = fits ? static_cast<std::uint32_t>(number) : highest;
+    return true;
+}
+
+bool ReadSignedParameter(const String& source, const String& key, std::int32_t& value) {
+    using Limits = std::numeric_limits<std::int32_t>;
+    String text;
+    if (!FindParameterValue(source, key, text)) return false;
+    const long long number = std::strtoll(NarrowText(text), nullptr, 0);
+    value = static_cast<std::int32_t>(std::clamp<long long>(number, Limits::min(), Limits::max()));
+    return true;
+}
+
+bool ReadPixelTypeParameter(const String& source, const String& key, std::uint32_t& code) {
+    std::int32_t number = 0;
+    if (!ReadSignedParameter(source, key, number)) return false;
+    const std::uint32_t checked = CheckedPixelType(static_cast<std::uint32_t>(number));
+    if (checked == 0) return false;
+    code = checked;
+    return true;
+}
+
+bool ReadDoublePairParameter(const String& source, const String& key, double& first,
+                             double& second) {
+    String text;
+    if (!FindParameterValue(source, key, text)) return false;
+    Array<String> tokens;
+    if (!SplitString(text, ",", tokens) || tokens.shape.elements != 2) return false;
+    if (tokens.data[0].IsEmpty() || tokens.data[1].IsEmpty()) return false;
+    first = ParseDouble(NarrowText(tokens.data[0]));
+    second = ParseDouble(NarrowText(tokens.data[1]));
+    return true;
+}
+
+bool ReadPointerParameter(const String& source, const String& key, void** pointer) {
+    if (!pointer) return false;
+    *pointer = nullptr;
+    String text;
+    if (!FindParameterValue(source, key, text)) return false;
+    void* address = nullptr;
+    if (std::sscanf(NarrowText(text), "%p", &address) == 1) *pointer = address;
+    return true;
+}
+
+bool SplitString(const String& source, const String& delimiter, Array<String>& out) {
+    out.Clear();
+    if (source.IsEmpty() || delimiter.View().empty()) return false;
+    std::uint32_t count = 0;
+    ForEachStretch(source.View(), delimiter.View(), [&](std::size_t, std::size_t) { ++count; });
+    if (!ReserveStrings(out, count)) return count == 0 || !out.owned;
+    std::uint32_t next = 0;
+    ForEachStretch(source.View(), delimiter.View(), [&](std::size_t start, std::size_t units) {
+        source.Substring(static_cast<std::uint32_t>(start), static_cast<std::uint32_t>(units),
+                         out.data[next++]);
+    });
+    return true;
+}
+
+String ExtractFormatName(const Array<String>& connection) {
+    for (std::uint32_t i = 0; i < connection.shape.elements; ++i)
+        if (const FormatRecord* record = FindFormat(connection.data[i])) return record->name;
+    return "";
+}
+
+bool ExtractConnectionParameters(const Array<String>& connection, Array<String>& out) {
+    std::uint32_t count = 0;
+    for (std::uint32_t i = 0; i < connection.shape.elements; ++i)
+        if (!FindFormat(connection.data[i])) ++count;
+    if (!ReserveStrings(out, count)) return true;
+    std::uint32_t next = 0;
+    for (std::uint32_t i = 0; i < connection.shape.elements; ++i)
+        if (!FindFormat(connection.data[i])) out.data[next++] = connection.data[i];
+    return true;
+}
+
+void SplitConnection(const Array<String>& connection, String& kind, Array<String>& parameters) {
+    kind = ExtractFormatName(connection);
+    ExtractConnectionParameters(connection, parameters);
+}
+
+}  // namespace zelm

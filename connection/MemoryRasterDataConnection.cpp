@@ -1,0 +1,134 @@
+#include "connection/MemoryRasterDataConnection.h"
+
+#include <new>
+
+#include "connection/ConnectionStrings.h"
+#include "core/ElementTypes.h"
+#include "core/PixelVocabulary.h"
+#include "raster/RasterPropsCopy.h"
+#include "raster/ReaderRasterMemory.h"
+
+namespace zelm {
+
+void* MemoryRasterPixels(RasterDataConnection* connection) {
+    const auto* memory = dynamic_cast<MemoryRasterDataConnection*>(connection);
+    return memory ? memory->pixelData : nullptr;
+}
+
+MemoryRasterDataConnection::~MemoryRasterDataConnection() { MemoryRasterDataConnection::Close(); }
+
+bool MemoryRasterDataConnection::Open(const Array<String>& openParameters, GeoRefPtr geoRef,
+                                      MetadataPtr) {
+    if (openParameters.shape.elements != 1) return false;
+    try {
+        const String source = openParameters.data[0];
+        if (!source.IsEmpty() && ParseMemoryParameters(source, geoRef) && TakeParameters(source))
+            return true;
+    } catch (...) {
+        // The host's georeference threw.
+    }
+    Close();
+    return false;
+}
+
+void MemoryRasterDataConnection::Close() {
+    try {
+        rasterProps = RasterProps();
+    } catch (...) {
+        // A georeference that throws from its destruction; the buffer goes all the same.
+    }
+    pixelData = nullptr;
+    parameters.Clear();
+}
+
+bool MemoryRasterDataConnection::IsOpen() { return pixelData && rasterProps.IsValid(); }
+
+Array<String> MemoryRasterDataConnection::GetParameters() { return parameters; }
+
+String MemoryRasterDataConnection::GetConnectionString() { return connectionString; }
+
+bool MemoryRasterDataConnection::IsAvailable() { return initialised && IsOpen(); }
+
+std::uint32_t MemoryRasterDataConnection::GetPixelType() {
+    return initialised && IsOpen() ? rasterProps.pixelType : 0;
+}
+
+bool MemoryRasterDataConnection::IsReadable() { return initialised && IsOpen(); }
+
+RasterReaderDispatchPtr MemoryRasterDataConnection::GetReader() {
+    try {
+        if (!reader) reader = MakeReader();
+    } catch (...) {
+        return RasterReaderDispatchPtr();
+    }
+    return reader;
+}
+
+RasterProps MemoryRasterDataConnection::GetRasterProps() {
+    const RasterReaderDispatchPtr dispatch = GetReader();
+    try {
+        if (dispatch) {
+            const RasterProps known = dispatch->GetRasterProps();
+            // The reader ran out of memory: what stands here is still the raster.
+            if (known.interleave == kNoLayout) return RasterProps();
+            rasterProps = known;
+        }
+        return rasterProps;
+    } catch (...) {
+        return RasterProps();
+    }
+}
+
+// The name and the address are stored as they are read, the rest once all nine keys are known.
+bool MemoryRasterDataConnection::ParseMemoryParameters(const String& source,
+                                                       const GeoRefPtr& geoRef) {
+    std::uint32_t samples = 0, lines = 0, bands = 0, pixelType = 0;
+    std::int32_t interleave = 0;
+    double unused[2];
+    const bool complete = ReadUnsignedParameter(source, "SAMPLES", samples) &&
+                          ReadUnsignedParameter(source, "LINES", lines) &&
+                          ReadUnsignedParameter(source, "BANDS", bands) &&
+                          ReadSignedParameter(source, "INTERLEAVE", interleave) &&
+                          IsInterleave(interleave) &&
+                          ReadPixelTypeParameter(source, "PIXELTYPE", pixelType) &&
+                          ReadDoublePairParameter(source, "PIXELSIZE", unused[0], unused[1]) &&
+                          ReadDoublePairParameter(source, "TIEPTMAP", unused[0], unused[1]) &&
+                          FindParameterValue(source, "NAME", name) &&
+                          ReadPointerParameter(source, "PIXELDATA", &pixelData);
+    if (!complete) return false;
+    rasterProps.SetSamples(samples);
+    rasterProps.SetLines(lines);
+    rasterProps.SetBands(bands);
+    rasterProps.interleave = interleave;
+    rasterProps.pixelType = pixelType;
+    rasterProps.formatName = "MemoryRaster";
+    rasterProps.SetGeoRef(geoRef);
+    // Entries are few, while a string may claim thousands of millions of bands.
+    auto& values = rasterProps.noDataValues;
+    values.erase(values.begin(), values.lower_bound(bands));
+    return true;
+}
+
+bool MemoryRasterDataConnection::TakeParameters(const String& source) {
+    parameters.Clear();
+    if (!parameters.Append("MemoryRaster") || !parameters.Append(source)) return false;
+    connectionString = String("{MemoryRaster}@") + source;
+    return true;
+}
+
+// A pixel type that is not known, that of a connection that is not open included, gives an invalid
+// dispatch. Memory that runs out gives a null pointer instead, which nobody keeps.
+RasterReaderDispatchPtr MemoryRasterDataConnection::MakeReader() {
+    const std::uint32_t pixelType = GetPixelType();
+    RasterReaderDispatchPtr dispatch;
+    const bool known = VisitElementType(pixelType, [this, &dispatch](auto type) {
+        using T = typename decltype(type)::type;
+        const RasterReaderPtr<T> typed(new (std::nothrow) ReaderRasterMemory<T>(this, rasterProps));
+        if (typed) dispatch.Reset(new (std::nothrow) RasterReaderDispatch(typed));
+    });
+    if (!known) dispatch.Reset(new (std::nothrow) RasterReaderDispatch);
+    if (dispatch && known && dispatch->pixelType != pixelType) dispatch.Reset();
+    return dispatch;
+}
+
+}  // namespace zelm
