@@ -30,7 +30,7 @@ function(zmc_configure_target target)
         CXX_VISIBILITY_PRESET hidden VISIBILITY_INLINES_HIDDEN ON)
 endfunction()
 
-# zmc_add_library(name STATIC|SHARED|MODULE): a library whose sources the folders add.
+# zmc_add_library(name STATIC|SHARED|MODULE|OBJECT): a library whose sources the folders add.
 # It carries what its users need: C++20, the include root, and a signed char everywhere, because
 # the element type of code 99 is plain char.
 function(zmc_add_library name kind)
@@ -41,7 +41,7 @@ function(zmc_add_library name kind)
     target_compile_options(${name} PUBLIC -fsigned-char)
     target_include_directories(${name} PUBLIC
         $<BUILD_INTERFACE:${ZMC_ROOT}> $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}/zmcraster>)
-    if(NOT ZMC_SANITIZE AND NOT kind STREQUAL "STATIC" AND CMAKE_SYSTEM_NAME STREQUAL "Linux")
+    if(NOT ZMC_SANITIZE AND kind MATCHES "SHARED|MODULE" AND CMAKE_SYSTEM_NAME STREQUAL "Linux")
         target_link_options(${name} PRIVATE LINKER:-z,defs)
     endif()
 endfunction()

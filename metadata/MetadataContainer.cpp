@@ -6,9 +6,10 @@ MetadataContainer::~MetadataContainer() {
 
 std::wstring MetadataContainer::GetValueText() const {
     std::wstring names;
+    const wchar_t* separator = L"";
     for (const auto& [key, child] : children) {
-        if (!names.empty()) names += L", ";
-        names += key;
+        names += separator + key;
+        separator = L", ";
     }
     return names;
 }

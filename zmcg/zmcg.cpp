@@ -1,34 +1,48 @@
 #include "zmcg/zmcg.h"
 
 #include <atomic>
+#include <cstddef>
 #include <map>
 #include <mutex>
+#include <new>
 
 using zelm::EnvironmentImpl;
 using zelm::String;
 
 namespace {
 
-struct TypeCodes {
-    std::mutex mutex;
-    std::map<String, unsigned> codes;
-};
-
-// Made on first use and never destroyed: initialisers of other modules draw codes before this
-// module's own have run, and their destructors may outlive it.
+// Objects that stand in static storage from their first use on, and are never destroyed:
+// initialisers of other modules draw codes before this module's own have run, and their destructors
+// may outlive it. Nothing is allocated for them, so first use cannot fail.
 template <class T>
 T& Immortal() {
-    static T* const instance = new T;
+    alignas(T) static std::byte storage[sizeof(T)];
+    static T* const instance = new (storage) T;
     return *instance;
 }
 
+struct TypeCodes {
+    std::mutex mutex;
+    std::map<String, unsigned> codes;
+    unsigned last = 0;
+};
+
 }  // namespace
 
+// Where memory is too short to remember the word, the answer is still a code that no other word
+// has; only a later call with the same word draws another.
 unsigned GloballyUniqueObjectTypeCode(const String& name) {
     TypeCodes& table = Immortal<TypeCodes>();
     const std::lock_guard<std::mutex> lock(table.mutex);
-    const auto next = static_cast<unsigned>(table.codes.size() + 1);
-    return table.codes.try_emplace(name, next).first->second;
+    if (const auto known = table.codes.find(name); known != table.codes.end()) return known->second;
+    const unsigned code = ++table.last;
+    try {
+        const auto entry = table.codes.try_emplace(name, code).first;
+        // A copy that ran out of memory is null, and must not stand for the null word.
+        if (!(entry->first == name)) table.codes.erase(entry);
+    } catch (...) {
+    }
+    return code;
 }
 
 unsigned GloballyUniqueObjectErrorCode() {

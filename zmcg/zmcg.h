@@ -32,6 +32,7 @@ class CoordSysLog;
 #endif
 
 // A number for a class word, never 0; equal for equal words, stable for the life of the process.
+// Where memory runs out the number is still one that no other word has, and goes unremembered.
 ZMCG_SYMBOL unsigned GloballyUniqueObjectTypeCode(const zelm::String& name);
 // A number that no earlier call has returned, never 0.
 ZMCG_SYMBOL unsigned GloballyUniqueObjectErrorCode();
