@@ -45,6 +45,7 @@ void* OrThrow(void* memory) {
 AllocationFaults::AllocationFaults(std::size_t n, FaultMode mode) { state = {true, n, mode, 0, 0}; }
 AllocationFaults::~AllocationFaults() { Disarm(); }
 void AllocationFaults::Disarm() { state.armed = false; }
+void AllocationFaults::Rearm() { state = {true, state.failAt, state.mode, 0, 0}; }
 std::size_t AllocationFaults::Count() const { return state.count; }
 std::size_t AllocationFaults::Failed() const { return state.failed; }
 

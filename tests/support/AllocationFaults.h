@@ -32,6 +32,8 @@ public:
     // Lets all further allocations succeed; the counts stand. Call it before an expectation, which
     // allocates itself.
     void Disarm();
+    // Starts again, with the counts at 0: for attempts that disarm to make what they need.
+    void Rearm();
     // Allocations asked for since construction, failed ones included.
     std::size_t Count() const;
     // How many of them failed.

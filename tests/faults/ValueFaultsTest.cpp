@@ -1,0 +1,181 @@
+// Palettes, metadata, raster properties and codes with each allocation failing in turn.
+#include <memory>
+#include <new>
+#include <string>
+
+#include "colour/Palette.h"
+#include "core/ElementTypes.h"
+#include "core/Object.h"
+#include "metadata/Metadata.h"
+#include "raster/RasterProps.h"
+#include "tests/support/AllocationFaults.h"
+#include "tests/support/CountingGeoRef.h"
+#include "zmcg/zmcg.h"
+
+namespace zelm {
+namespace {
+
+using testsupport::AllocationFaults;
+using testsupport::CountingGeoRef;
+using testsupport::FaultMode;
+using testsupport::ForEachAllocationFailing;
+
+RGBAColor Grey(unsigned char value) {
+    unsigned char bytes[4] = {value, value, value, 255};
+    return RGBAColor(Array<unsigned char>(bytes, ArrayShape(4)));
+}
+
+TEST(PaletteFaults, AColourThatCannotBeMadeLeavesItsEntryEmpty) {
+    Palette palette;
+    palette.colors[4];
+    AllocationFaults faults(1, FaultMode::FromThenOn);
+    const Color* const color = palette.GetColor(4);
+    faults.Disarm();
+    EXPECT_EQ(color, nullptr);
+    EXPECT_FALSE(palette.colors[4]);
+    EXPECT_NE(palette.GetColor(4), nullptr);
+}
+
+TEST(PaletteFaults, TheTableItselfThrows) {
+    Palette palette;
+    const RGBAColor grey = Grey(1);
+    bool thrown = false;
+    AllocationFaults faults(1, FaultMode::FromThenOn);
+    try {
+        palette.AddColor(grey);
+    } catch (const std::bad_alloc&) {
+        thrown = true;
+    }
+    faults.Disarm();
+    EXPECT_TRUE(thrown);
+    EXPECT_EQ(palette.nextIndex, 0u);
+    EXPECT_TRUE(palette.colors.empty());
+}
+
+TEST(PaletteFaults, EveryOperationSurvivesEveryFailure) {
+    const RGBAColor grey = Grey(3);
+    const std::size_t points = ForEachAllocationFailing([&grey](AllocationFaults&) {
+        Palette palette;
+        Palette target;
+        try {
+            palette.AddColor(grey);
+            palette.SetColor(0, Color());
+            palette.SetColor(9, grey);
+            palette.GetColor(5);
+            palette.CopyTo(target);
+            palette.Clear();
+            palette.AddColor(Grey(7));
+        } catch (const std::bad_alloc&) {
+        }
+        for (const auto& [index, color] : target.colors)
+            if (color) static_cast<void>(color->red);
+    });
+    EXPECT_GE(points, 12u);
+}
+
+TEST(MetadataFaults, WithoutATreeTheHandleHoldsNothing) {
+    AllocationFaults faults(2);  // the first is the record of the empty pointer
+    const Metadata metadata;
+    const Metadata copy(metadata);
+    faults.Disarm();
+    ASSERT_NE(metadata.impl.record, nullptr);
+    EXPECT_FALSE(metadata.impl);
+    EXPECT_FALSE(copy.impl);
+    EXPECT_TRUE(metadata.IsValid());
+}
+
+TEST(MetadataFaults, EveryOperationSurvivesEveryFailure) {
+    const std::size_t points = ForEachAllocationFailing([](AllocationFaults&) {
+        Metadata metadata;
+        const Metadata copy(metadata);
+        Metadata other;
+        other = copy;
+        metadata = Metadata();
+        metadata.ToString();
+        MetadataPtr held(new (std::nothrow) Metadata(other));
+    });
+    EXPECT_GE(points, 9u);
+}
+
+TEST(RasterPropsFaults, AGeoRefThatCannotBeClonedIsNone) {
+    RasterProps props;
+    const GeoRefPtr geoRef(new CountingGeoRef);
+    AllocationFaults faults(1, FaultMode::FromThenOn);
+    props.SetGeoRef(geoRef);
+    faults.Disarm();
+    EXPECT_FALSE(props.geoRef);
+    EXPECT_EQ(CountingGeoRef::living, 1);
+}
+
+TEST(RasterPropsFaults, EveryOperationSurvivesEveryFailure) {
+    const GeoRefPtr geoRef(new CountingGeoRef);
+    const std::size_t points = ForEachAllocationFailing([&geoRef](AllocationFaults&) {
+        try {
+            RasterProps props;
+            props.SetSamples(5);
+            props.SetBands(3);
+            props.SetNoDataValue(1, 2.0);
+            props.SetNoDataFlag(2, true);
+            props.GetNoDataValue(0) = 1.0;
+            props.SetGeoRef(geoRef);
+            const RasterProps copy(props);
+            RasterProps other;
+            other = copy;
+            other.TakeNoDataValues(props);
+            static_cast<void>(other.IsValid());
+        } catch (const std::bad_alloc&) {  // from the map alone
+        }
+    });
+    EXPECT_GE(points, 20u);
+    EXPECT_EQ(CountingGeoRef::living, 1);
+}
+
+TEST(RasterPropsFaults, AnAssignmentThatThrowsLeavesARecordThatCanBeUsed) {
+    const GeoRefPtr geoRef(new CountingGeoRef);
+    RasterProps source;
+    source.SetBands(2);
+    source.SetNoDataValue(0, 1.0);
+    source.SetGeoRef(geoRef);
+    ForEachAllocationFailing([&source](AllocationFaults& faults) {
+        faults.Disarm();
+        RasterProps target;
+        faults.Rearm();
+        try {
+            target = source;
+        } catch (const std::bad_alloc&) {
+        }
+        faults.Disarm();
+        EXPECT_TRUE(!target.geoRef || target.geoRef.Get() != source.geoRef.Get());
+        target = source;
+        EXPECT_EQ(target.noDataValues, source.noDataValues);
+        EXPECT_TRUE(target.geoRef);
+    });
+}
+
+TEST(CodeFaults, CodesAreDrawnWithoutMemory) {
+    int word = 0;
+    ForEachAllocationFailing([&word](AllocationFaults& faults) {
+        faults.Disarm();
+        const std::string first = "fault word " + std::to_string(++word);
+        const std::string second = "fault word " + std::to_string(++word);
+        const String a(first.c_str());
+        const String b(second.c_str());
+        const unsigned object = Object::typeCode;
+        faults.Rearm();
+        const unsigned codeOfA = GloballyUniqueObjectTypeCode(a);
+        const unsigned codeOfB = GloballyUniqueObjectTypeCode(b);
+        const unsigned error = GloballyUniqueObjectErrorCode();
+        faults.Disarm();
+        EXPECT_NE(codeOfA, 0u);
+        EXPECT_NE(codeOfA, codeOfB);
+        EXPECT_NE(error, 0u);
+        EXPECT_NE(codeOfA, GloballyUniqueObjectTypeCode(String()));
+        EXPECT_EQ(GloballyUniqueObjectTypeCode("Object"), object);
+        const unsigned later = GloballyUniqueObjectTypeCode(a);
+        EXPECT_EQ(GloballyUniqueObjectTypeCode(a), later);
+        EXPECT_NE(later, codeOfB);
+    });
+}
+
+}  // namespace
+}  // namespace zelm
