@@ -1,0 +1,81 @@
+# Installation: libraries, public headers, the CMake package `zmcraster` and zmcraster.pc.
+#
+# The module is a library that hosts load by path, so it has a folder of its own below the library
+# directory; it finds zmcg one floor up, by its own place. Hosts link the rest.
+
+option(ZMC_INSTALL "Make install rules" ${PROJECT_IS_TOP_LEVEL})
+if(NOT ZMC_INSTALL)
+    return()
+endif()
+include(CMakePackageConfigHelpers)
+
+set(ZMC_INSTALL_CMAKEDIR "${CMAKE_INSTALL_LIBDIR}/cmake/zmcraster")
+set(ZMC_INSTALL_MODULEDIR "${CMAKE_INSTALL_LIBDIR}/zmcraster")
+set(ZMC_INSTALL_HEADERDIR "${CMAKE_INSTALL_INCLUDEDIR}/zmcraster")
+
+# What hosts link, and the module itself. Libraries of the host's side are there when built.
+set(linked zmctext zmccore zmcg)
+foreach(target zmcplatform zmchost)
+    if(TARGET ${target})
+        list(APPEND linked ${target})
+    endif()
+endforeach()
+set(loaded zmcraster)
+if(TARGET zmcpe)
+    list(APPEND loaded zmcpe)
+endif()
+set_target_properties(${loaded} PROPERTIES INSTALL_RPATH "$ORIGIN;$ORIGIN/..")
+
+install(TARGETS ${linked} EXPORT zmcrasterTargets
+    ARCHIVE DESTINATION ${CMAKE_INSTALL_LIBDIR}
+    LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR}
+    RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR})
+install(TARGETS ${loaded} EXPORT zmcrasterTargets
+    LIBRARY DESTINATION ${ZMC_INSTALL_MODULEDIR}
+    RUNTIME DESTINATION ${ZMC_INSTALL_MODULEDIR})
+
+# Headers: floors that are public as a whole, and the interfaces of the others.
+install(DIRECTORY core metadata colour dispatch zmcg
+    DESTINATION ${ZMC_INSTALL_HEADERDIR} FILES_MATCHING PATTERN "*.h")
+set(interfaces
+    connection/DataConnection.h
+    connection/DataConnectionFactory.h
+    connection/RasterDataConnection.h
+    platform/CriticalSection.h
+    raster/BasicRasterReader.h
+    raster/RasterBandHistogram.h
+    raster/RasterBandStats.h
+    raster/RasterProps.h
+    raster/RasterReader.h)
+foreach(header ${interfaces})
+    get_filename_component(folder ${header} DIRECTORY)
+    install(FILES ${header} DESTINATION ${ZMC_INSTALL_HEADERDIR}/${folder})
+endforeach()
+if(TARGET zmchost)
+    install(DIRECTORY host DESTINATION ${ZMC_INSTALL_HEADERDIR} FILES_MATCHING PATTERN "*.h")
+endif()
+
+# The CMake package. A host library brings Xerces, which the module needs ready, along.
+set(ZMC_PACKAGE_NEEDS_XERCES OFF)
+if(TARGET zmchost)
+    set(ZMC_PACKAGE_NEEDS_XERCES ON)
+endif()
+install(EXPORT zmcrasterTargets NAMESPACE zmcraster:: DESTINATION ${ZMC_INSTALL_CMAKEDIR})
+configure_package_config_file(
+    ${CMAKE_CURRENT_LIST_DIR}/zmcraster-config.cmake.in
+    ${CMAKE_CURRENT_BINARY_DIR}/zmcraster-config.cmake
+    INSTALL_DESTINATION ${ZMC_INSTALL_CMAKEDIR}
+    PATH_VARS ZMC_INSTALL_MODULEDIR)
+write_basic_package_version_file(${CMAKE_CURRENT_BINARY_DIR}/zmcraster-config-version.cmake
+    COMPATIBILITY SameMajorVersion)
+install(FILES ${CMAKE_CURRENT_BINARY_DIR}/zmcraster-config.cmake
+              ${CMAKE_CURRENT_BINARY_DIR}/zmcraster-config-version.cmake
+    DESTINATION ${ZMC_INSTALL_CMAKEDIR})
+
+# The pkg-config file finds its prefix from its own place, so that an install can be moved.
+set(ZMC_PC_DIR "${CMAKE_INSTALL_LIBDIR}/pkgconfig")
+file(RELATIVE_PATH ZMC_PC_PREFIX "/${ZMC_PC_DIR}" "/")
+string(REGEX REPLACE "/$" "" ZMC_PC_PREFIX "${ZMC_PC_PREFIX}")
+configure_file(${CMAKE_CURRENT_LIST_DIR}/zmcraster.pc.in
+    ${CMAKE_CURRENT_BINARY_DIR}/zmcraster.pc @ONLY)
+install(FILES ${CMAKE_CURRENT_BINARY_DIR}/zmcraster.pc DESTINATION ${ZMC_PC_DIR})

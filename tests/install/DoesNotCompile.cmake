@@ -1,0 +1,28 @@
+# Compiles SOURCE with ZMC_MISUSE=0, which has to succeed, and with ZMC_MISUSE=CASE, which has to
+# fail in the very line that is marked "misuse CASE", and not for want of a header or a flag.
+set(command ${COMPILER} -std=c++20 -fsigned-char -fsyntax-only -I${INCLUDE})
+execute_process(COMMAND ${command} -DZMC_MISUSE=0 ${SOURCE} RESULT_VARIABLE result
+    ERROR_VARIABLE errors)
+if(NOT result EQUAL 0)
+    message(FATAL_ERROR "right use does not compile:\n${errors}")
+endif()
+file(STRINGS ${SOURCE} lines)
+set(number 0)
+set(marked 0)
+foreach(line IN LISTS lines)
+    math(EXPR number "${number} + 1")
+    if(line MATCHES "// misuse ${CASE}:")
+        set(marked ${number})
+    endif()
+endforeach()
+if(marked EQUAL 0)
+    message(FATAL_ERROR "no line is marked as misuse ${CASE}")
+endif()
+execute_process(COMMAND ${command} -DZMC_MISUSE=${CASE} ${SOURCE} RESULT_VARIABLE result
+    ERROR_VARIABLE errors)
+if(result EQUAL 0)
+    message(FATAL_ERROR "misuse ${CASE} compiles")
+endif()
+if(NOT errors MATCHES "Misuse.cpp:${marked}:[0-9]+: error")
+    message(FATAL_ERROR "misuse ${CASE} fails elsewhere:\n${errors}")
+endif()
