@@ -1,4 +1,5 @@
 # Installs the build at ZMC_BUILD into an empty ZMC_PREFIX and looks at what stands there.
+cmake_minimum_required(VERSION 3.25)
 file(REMOVE_RECURSE ${ZMC_PREFIX})
 execute_process(COMMAND ${CMAKE_COMMAND} --install ${ZMC_BUILD} --prefix ${ZMC_PREFIX}
     COMMAND_ERROR_IS_FATAL ANY OUTPUT_QUIET)
