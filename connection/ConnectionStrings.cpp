@@ -149,10 +149,13 @@ bool SplitString(const String& source, const String& delimiter, Array<String>& o
     std::uint32_t count = 0;
     ForEachStretch(source.View(), delimiter.View(), [&](std::size_t, std::size_t) { ++count; });
     if (!ReserveStrings(out, count)) return count == 0 || !out.owned;
+    // The tokens are cut off a copy in place: Substring measures the whole source for each.
+    String cut(source);
+    if (!cut.wide) return false;
     std::uint32_t next = 0;
     ForEachStretch(source.View(), delimiter.View(), [&](std::size_t start, std::size_t units) {
-        source.Substring(static_cast<std::uint32_t>(start), static_cast<std::uint32_t>(units),
-                         out.data[next++]);
+        cut.wide[start + units] = 0;
+        out.data[next++] = cut.wide + start;
     });
     return true;
 }

@@ -37,12 +37,77 @@ NoDataRule<T> RuleOf(const RasterReader<T>& reader, std::size_t band) {
     return {true, reader.GetNoDataValue(number)};
 }
 
+// Equality of integers of 64 bits, by halves: the vector units that every processor of this kind
+// has compare 32 bits at most.
 template <class T>
-void MarkRun(const NoDataRule<T> rule, const T* __restrict pixels, unsigned char* __restrict mask,
-             std::size_t count) {
-    for (std::size_t i = 0; i < count; ++i)
-        mask[i] = static_cast<unsigned char>((mask[i] & kOtherBits) |
-                                             static_cast<unsigned>(rule.Marks(pixels[i])));
+bool Matches(const T& x, const T& value) {
+    if constexpr (std::is_integral_v<T> && sizeof(T) == 8) {
+        const std::uint64_t difference =
+            static_cast<std::uint64_t>(x) ^ static_cast<std::uint64_t>(value);
+        return (static_cast<std::uint32_t>(difference) |
+                static_cast<std::uint32_t>(difference >> 32)) == 0;
+    } else if constexpr (kIsComplex<T>) {
+        return (static_cast<unsigned>(x.re == value.re) &
+                static_cast<unsigned>(x.im == value.im)) != 0;
+    } else {
+        return x == value;
+    }
+}
+
+// 64-bit floats are judged in two steps, for which see MarkWideFloats.
+template <class T>
+constexpr bool kIsWideFloat = std::is_same_v<T, double> || std::is_same_v<T, Complex<double>>;
+
+// The verdict on a sample, as a number of half the width: 1 or NaN for a marked one, else a zero of
+// either sign. x times 0 is such a zero for what is finite, and NaN otherwise.
+float VerdictOn(double x, double value) { return static_cast<float>(x == value ? 1.0 : x * 0); }
+
+float VerdictOn(const Complex<double>& x, const Complex<double>& value) {
+    const double finite = x.re * 0 + x.im * 0;
+    const double verdict = x.re == value.re ? 1.0 : finite;
+    return static_cast<float>(x.im == value.im ? verdict : finite);
+}
+
+void SetMark(unsigned char& byte, bool marked) {
+    byte = static_cast<unsigned char>((byte & kOtherBits) | static_cast<unsigned>(marked));
+}
+
+// Loops in which 64-bit comparisons decide on bytes do not become vector code; one that halves the
+// width and one that goes on from there both do.
+template <class T, class ValueAt>
+void MarkWideFloats(ValueAt valueAt, const T* __restrict samples, unsigned char* __restrict mask,
+                    std::size_t count) {
+    constexpr std::size_t kBlock = 64;
+    float verdicts[kBlock];
+    for (std::size_t start = 0; start < count; start += kBlock) {
+        const std::size_t length = std::min(kBlock, count - start);
+        for (std::size_t i = 0; i < length; ++i)
+            verdicts[i] = VerdictOn(samples[start + i], valueAt(start + i));
+        for (std::size_t i = 0; i < length; ++i) SetMark(mask[start + i], verdicts[i] != 0);
+    }
+}
+
+// Sets or clears bit 0 for each sample, against the value that valueAt(i) gives for it. Floating
+// bands without a value come with one that no sample equals.
+template <class T, class ValueAt>
+void MarkSamples(ValueAt valueAt, const T* __restrict samples, unsigned char* __restrict mask,
+                 std::size_t count) {
+    if constexpr (kIsWideFloat<T>) {
+        MarkWideFloats(valueAt, samples, mask, count);
+    } else {
+        for (std::size_t i = 0; i < count; ++i)
+            SetMark(mask[i], (static_cast<unsigned>(Matches(samples[i], valueAt(i))) |
+                              static_cast<unsigned>(NoDataRule<T>::NotFinite(samples[i]))) != 0);
+    }
+}
+
+// The value to compare with; a floating band without one has the value that no sample equals.
+template <class T>
+T ValueOf(const NoDataRule<T>& rule) {
+    if constexpr (!std::is_integral_v<T>)
+        return rule.hasValue ? rule.value : NoDataRule<T>::Unmatched();
+    else
+        return rule.value;
 }
 
 void ClearRun(unsigned char* mask, std::size_t count) {
@@ -57,7 +122,7 @@ void MarkOrClearRun(const NoDataRule<T>& rule, const T* pixels, unsigned char* m
     if (std::is_integral_v<T> && !rule.hasValue)
         ClearRun(mask, count);
     else
-        MarkRun(rule, pixels, mask, count);
+        MarkSamples([value = ValueOf(rule)](std::size_t) { return value; }, pixels, mask, count);
 }
 
 template <class T>
@@ -82,9 +147,11 @@ public:
             const NoDataRule<T> rule = RuleOf(reader, firstBand + band);
             uniform = uniform && IsSame(rule, first);
             anyValue = anyValue || rule.hasValue;
+            allValues = allValues && rule.hasValue;
             Put(band, rule);
         }
         anyValue = anyValue || first.hasValue;
+        allValues = allValues && first.hasValue;
         // Only a pattern of all bands may run on into the next pixel.
         if (bands == bandCount) Repeat();
     }
@@ -95,13 +162,11 @@ public:
     bool HasAnyValue() const { return anyValue; }
     NoDataRule<T> First() const { return {flags[0] != 0, values[0]}; }
 
-    void Mark(const T* __restrict samples, unsigned char* __restrict mask,
-              std::size_t count) const {
-        for (std::size_t i = 0; i < count; ++i) {
-            const NoDataRule<T> rule{kFlagless || flags[i] != 0, values[i]};
-            mask[i] = static_cast<unsigned char>((mask[i] & kOtherBits) |
-                                                 static_cast<unsigned>(rule.Marks(samples[i])));
-        }
+    void Mark(const T* samples, unsigned char* mask, std::size_t count) const {
+        if (std::is_integral_v<T> && !allValues)
+            MarkFlagged(samples, mask, count);
+        else
+            MarkSamples([this](std::size_t i) { return values[i]; }, samples, mask, count);
     }
 
     void Stamp(T* __restrict samples, const unsigned char* __restrict mask,
@@ -114,24 +179,25 @@ private:
     static constexpr std::size_t kSamples = 512;
     // A whole number of vectors of any sample size, so that no loop over a pattern has a rest.
     static constexpr std::size_t kAlignedPixels = 16;
-    // A floating band without a value has the pattern of one whose value is a NaN: it matches
-    // nothing, and not-finite samples are marked all the same.
-    static constexpr bool kFlagless = !std::is_integral_v<T>;
-
     T values[kSamples];
     unsigned char flags[kSamples];  // 1 where the band has a value
     std::size_t bands;
     std::size_t pixels = 1;
     bool uniform = false;
     bool anyValue = false;
+    bool allValues = true;
 
     static bool IsSame(const NoDataRule<T>& a, const NoDataRule<T>& b) {
         return a.hasValue == b.hasValue && (!a.hasValue || a.value == b.value);
     }
 
-    static T ValueOf(const NoDataRule<T>& rule) {
-        if constexpr (kFlagless) return rule.hasValue ? rule.value : NoDataRule<T>::Unmatched();
-        return rule.value;
+    // For integers of which some bands have a value: there is none that no sample equals.
+    void MarkFlagged(const T* __restrict samples, unsigned char* __restrict mask,
+                     std::size_t count) const {
+        for (std::size_t i = 0; i < count; ++i)
+            mask[i] = static_cast<unsigned char>(
+                (mask[i] & kOtherBits) |
+                (static_cast<unsigned>(Matches(samples[i], values[i])) & flags[i]));
     }
 
     void Put(std::size_t at, const NoDataRule<T>& rule) {

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <cassert>
 #include <cstring>
+#include <type_traits>
 
 #include "core/PixelVocabulary.h"
 
@@ -134,17 +135,23 @@ private:
     // that the passes over a line find it in the cache.
     static void CopyPixels(const TileWindow& window, TileBands bands, const Strides& in,
                            const Strides& out, Raster raster, Tile tile) {
-        for (std::uint32_t line = 0; line < window.height; ++line) {
+        std::size_t width = window.width;
+        std::size_t height = window.height;
+        // Whole lines that one pass can move are one long line.
+        if (bands.count <= kPassBands && in.line == width * in.sample) {
+            width *= height;
+            height = 1;
+        }
+        for (std::size_t line = 0; line < height; ++line) {
             for (std::uint32_t k = 0; k < bands.count;) {
                 const std::uint32_t together = NeighbouringBands(bands, k);
                 if (together * kSize >= kBlockBytes) {
-                    CopyBlocks(window.width, together, in.sample, out.sample,
+                    CopyBlocks(width, together, in.sample, out.sample,
                                raster + static_cast<std::size_t>(bands.numbers[k]) * kSize,
                                tile + k * kSize);
                     k += together;
                 } else {
-                    k += CopyPass(window.width, bands, k, in.sample, out.sample, raster,
-                                  tile + k * kSize);
+                    k += CopyPass(width, bands, k, in.sample, out.sample, raster, tile + k * kSize);
                 }
             }
             raster += in.line;
@@ -166,33 +173,49 @@ private:
         const std::uint32_t count = std::min(bands.count - first, kPassBands);
         switch (count) {
             case 1:
-                CopySamples<1>(width, numbers, rasterStep, tileStep, raster, tile);
+                CopyStrided<1>(width, numbers, rasterStep, tileStep, raster, tile);
                 break;
             case 2:
-                CopySamples<2>(width, numbers, rasterStep, tileStep, raster, tile);
+                CopyStrided<2>(width, numbers, rasterStep, tileStep, raster, tile);
                 break;
             case 3:
-                CopySamples<3>(width, numbers, rasterStep, tileStep, raster, tile);
+                CopyStrided<3>(width, numbers, rasterStep, tileStep, raster, tile);
                 break;
             default:
-                CopySamples<kPassBands>(width, numbers, rasterStep, tileStep, raster, tile);
+                CopyStrided<kPassBands>(width, numbers, rasterStep, tileStep, raster, tile);
                 break;
         }
         return count;
     }
 
+    // Rasters of few bands, of which a tile takes some, are frequent enough to have loops in which
+    // the compiler knows both steps.
     template <std::uint32_t kBands>
-    static void CopySamples(std::size_t width, const int* numbers, std::size_t rasterStep,
-                            std::size_t tileStep, Raster __restrict raster, Tile __restrict tile) {
+    static void CopyStrided(std::size_t width, const int* numbers, std::size_t rasterStep,
+                            std::size_t tileStep, Raster raster, Tile tile) {
+        constexpr std::size_t kTileStep = kBands * kSize;
+        if (tileStep == kTileStep && rasterStep == 3 * kSize)
+            CopySamples<kBands>(width, numbers, Step<3 * kSize>(), Step<kTileStep>(), raster, tile);
+        else if (tileStep == kTileStep && rasterStep == 4 * kSize)
+            CopySamples<kBands>(width, numbers, Step<4 * kSize>(), Step<kTileStep>(), raster, tile);
+        else if (tileStep == kTileStep && rasterStep == 2 * kSize)
+            CopySamples<kBands>(width, numbers, Step<2 * kSize>(), Step<kTileStep>(), raster, tile);
+        else
+            CopySamples<kBands>(width, numbers, rasterStep, tileStep, raster, tile);
+    }
+
+    template <std::size_t kBytes>
+    using Step = std::integral_constant<std::size_t, kBytes>;
+
+    template <std::uint32_t kBands, class RasterStep, class TileStep>
+    static void CopySamples(std::size_t width, const int* numbers, RasterStep rasterStep,
+                            TileStep tileStep, Raster __restrict raster, Tile __restrict tile) {
         std::size_t offsets[kBands];
         for (std::uint32_t k = 0; k < kBands; ++k)
             offsets[k] = static_cast<std::size_t>(numbers[k]) * kSize;
-        for (std::size_t s = 0; s < width; ++s) {
+        for (std::size_t s = 0; s < width; ++s)
             for (std::uint32_t k = 0; k < kBands; ++k)
-                Move(raster + offsets[k], tile + k * kSize, kSize);
-            raster += rasterStep;
-            tile += tileStep;
-        }
+                Move(raster + s * rasterStep + offsets[k], tile + s * tileStep + k * kSize, kSize);
     }
 
     static void Move(const unsigned char* raster, unsigned char* tile,
