@@ -210,12 +210,26 @@ private:
     template <std::uint32_t kBands, class RasterStep, class TileStep>
     static void CopySamples(std::size_t width, const int* numbers, RasterStep rasterStep,
                             TileStep tileStep, Raster __restrict raster, Tile __restrict tile) {
-        std::size_t offsets[kBands];
+        Raster from[kBands];
         for (std::uint32_t k = 0; k < kBands; ++k)
-            offsets[k] = static_cast<std::size_t>(numbers[k]) * kSize;
-        for (std::size_t s = 0; s < width; ++s)
-            for (std::uint32_t k = 0; k < kBands; ++k)
-                Move(raster + s * rasterStep + offsets[k], tile + s * tileStep + k * kSize, kSize);
+            from[k] = raster + static_cast<std::size_t>(numbers[k]) * kSize;
+        // Bytes have no vector code of this kind, and gain from fewer steps of the pointers.
+        constexpr std::size_t kPixels = kSize == 1 ? 4 : 1;
+        std::size_t s = 0;
+        for (; s + kPixels <= width; s += kPixels) {
+            for (std::size_t p = 0; p < kPixels; ++p)
+                for (std::uint32_t k = 0; k < kBands; ++k)
+                    Move(from[k] + p * rasterStep, tile + p * tileStep + k * kSize, kSize);
+            for (std::uint32_t k = 0; k < kBands; ++k) from[k] += kPixels * rasterStep;
+            tile += kPixels * tileStep;
+        }
+        for (; s < width; ++s) {
+            for (std::uint32_t k = 0; k < kBands; ++k) {
+                Move(from[k], tile + k * kSize, kSize);
+                from[k] += rasterStep;
+            }
+            tile += tileStep;
+        }
     }
 
     static void Move(const unsigned char* raster, unsigned char* tile,
