@@ -8,9 +8,9 @@
 #define ZMC_HOST_BANDSTATISTICS_H
 
 #include <cstdint>
-#include <vector>
 
 #include "core/ElementTypes.h"
+#include "dispatch/NoDataRule.h"
 #include "host/ExactSums.h"
 #include "raster/RasterBandStats.h"
 
