@@ -11,30 +11,26 @@
 namespace zmchost {
 namespace {
 
-enum class Validity { All, None, Some };
-
-// What the masks of some rows say about bytes [first, first + count). A null mask marks nothing.
-Validity ValidityOf(const unsigned char* const* masks, std::size_t rows, std::size_t first,
-                    std::size_t count) {
-    unsigned any = 0;
-    unsigned all = 1;
+// Whether the masks of some rows mark none, or all, of the bytes [first, first + count). A null
+// mask marks nothing.
+bool NoneMarked(const unsigned char* const* masks, std::size_t rows, std::size_t first,
+                std::size_t count) {
+    unsigned char any = 0;
     for (std::size_t r = 0; r < rows; ++r) {
-        const unsigned char* const mask = masks[r];
-        if (!mask) {
-            all = 0;
-            continue;
-        }
-        unsigned char rowAny = 0;
-        unsigned char rowAll = 1;
-        for (std::size_t i = first; i < first + count; ++i) {
-            rowAny |= mask[i];
-            rowAll &= mask[i];
-        }
-        any |= rowAny;
-        all &= rowAll;
+        if (!masks[r]) continue;
+        for (std::size_t i = first; i < first + count; ++i) any |= masks[r][i];
     }
-    if ((any & 1) == 0) return Validity::All;
-    return (all & 1) != 0 ? Validity::None : Validity::Some;
+    return (any & 1) == 0;
+}
+
+bool AllMarked(const unsigned char* const* masks, std::size_t rows, std::size_t first,
+               std::size_t count) {
+    unsigned char all = 1;
+    for (std::size_t r = 0; r < rows; ++r) {
+        if (!masks[r]) return false;
+        for (std::size_t i = first; i < first + count; ++i) all &= masks[r][i];
+    }
+    return all != 0;
 }
 
 template <class T>
@@ -54,7 +50,8 @@ template <class T>
 class RowReducer {
     using Part = typename PartOf<T>::Type;
     static constexpr std::size_t kParts = PartOf<T>::kCount;
-    static constexpr std::size_t kBlock = 64;  // cells that are judged together
+    static constexpr std::size_t kBlock = 512;      // cells that are judged together,
+    static constexpr std::size_t kShortBlock = 32;  // and if they differ, these
 
 public:
     RowReducer(std::uint32_t bands, std::uint32_t width, const ReductionRows<T>& source,
@@ -113,6 +110,19 @@ private:
         if (!source_.masks && runs) return ReduceRun(from, to - from, run, one);
         for (std::size_t x = from; x < to; x += kBlock) {
             const std::size_t n = std::min(kBlock, to - x);
+            if (runs && Full(x, n, rows, halo))
+                ReduceRun(x, n, run, one);
+            else
+                ReduceMixed(x, n, rows, halo, runs, run, one);
+        }
+    }
+
+    // A long run that is not wholly valid, in short ones.
+    template <class Run, class One>
+    void ReduceMixed(std::size_t from, std::size_t cells, std::size_t rows, std::size_t halo,
+                     bool runs, Run run, One one) {
+        for (std::size_t x = from; x < from + cells; x += kShortBlock) {
+            const std::size_t n = std::min(kShortBlock, from + cells - x);
             if (Empty(x, n))
                 FillInvalid(x, n);
             else if (runs && Full(x, n, rows, halo))
@@ -123,13 +133,13 @@ private:
     }
 
     bool Empty(std::size_t x, std::size_t n) const {
-        return source_.masks && ValidityOf(source_.masks + center_, 2, 2 * x * bands_,
-                                           2 * n * bands_) == Validity::None;
+        return source_.masks &&
+               AllMarked(source_.masks + center_, 2, 2 * x * bands_, 2 * n * bands_);
     }
 
     bool Full(std::size_t x, std::size_t n, std::size_t rows, std::size_t halo) const {
-        return !source_.masks || ValidityOf(source_.masks, rows, (2 * x - halo) * bands_,
-                                            2 * (n + halo) * bands_) == Validity::All;
+        return !source_.masks ||
+               NoneMarked(source_.masks, rows, (2 * x - halo) * bands_, 2 * (n + halo) * bands_);
     }
 
     template <class Run, class One>
@@ -181,7 +191,6 @@ private:
     // The cell's valid samples in reading order, without a branch per sample.
     Cell<T> ValidSamples(std::size_t x, std::uint32_t band) const {
         Cell<T> cell;
-        cell.count = 0;
         const std::size_t left = 2 * x * bands_ + band;
         for (std::size_t r = center_; r < center_ + 2; ++r) {
             const T* const row = source_.rows[r];

@@ -2,6 +2,7 @@
 #ifndef ZMC_HOST_REDUCTIONCELLS_H
 #define ZMC_HOST_REDUCTIONCELLS_H
 
+#include <algorithm>
 #include <cstdint>
 #include <type_traits>
 #include <utility>
@@ -16,8 +17,8 @@ namespace zmchost {
 // The valid samples of a cell in reading order; count is at least 1 where a method sees it.
 template <class T>
 struct Cell {
-    T values[4];
-    int count;
+    T values[4] = {};
+    int count = 0;
 };
 
 // What holds the sum of four samples: exactly, of integers, and with room for the last digits and
@@ -38,17 +39,26 @@ Sum SumOfFour(Sum a, Sum b, Sum c, Sum d) {
 
 template <class P>
 Rounded<P> MeanOf(SumOf<P> sum, int count) {
-    if constexpr (std::is_floating_point_v<P>)
+    if constexpr (std::is_floating_point_v<P>) {
         return RoundedFloat<P>(sum / static_cast<SumOf<P>>(count));
-    else
+    } else if constexpr (sizeof(P) <= 2) {
+        // A division by multiplication: exact, since the sum has no more than 19 bits.
+        constexpr std::uint64_t kReciprocals[5] = {0, 0x80000000, 0x40000000, 0x2AAAAAAB,
+                                                   0x20000000};
+        const auto doubled = static_cast<std::uint64_t>(2 * (sum < 0 ? -sum : sum) + count);
+        const auto magnitude = static_cast<std::int32_t>(doubled * kReciprocals[count] >> 32);
+        const std::int32_t mean = sum < 0 ? -magnitude : magnitude;
+        return {static_cast<P>(mean), SignOf(sum - mean * count)};
+    } else {
         return RoundedQuotient<P, SumOf<P>>(sum, count);
+    }
 }
 
 // The mean of one part of the samples: of themselves, or of the real or imaginary parts.
 template <class P, class T, class Part>
 Rounded<P> MeanOfPart(const Cell<T>& cell, Part part) {
-    SumOf<P> sums[4] = {};
-    for (int i = 0; i < cell.count; ++i) sums[i] = part(cell.values[i]);
+    SumOf<P> sums[4];
+    for (int i = 0; i < 4; ++i) sums[i] = i < cell.count ? part(cell.values[i]) : P{0};
     return MeanOf<P>(SumOfFour<SumOf<P>>(sums[0], sums[1], sums[2], sums[3]), cell.count);
 }
 
@@ -94,6 +104,12 @@ Rounded<T> CellMaximum(const Cell<T>& cell) {
 
 template <class T>
 Rounded<T> CellMedian(Cell<T> cell) {
+    if (cell.count == 4) {
+        const auto [a, b, c, d] = cell.values;
+        const T low = std::max(std::min(a, b), std::min(c, d));
+        const T high = std::min(std::max(a, b), std::max(c, d));
+        return {std::min(low, high)};
+    }
     for (int i = 1; i < cell.count; ++i) {
         for (int j = i; j > 0 && cell.values[j] < cell.values[j - 1]; --j)
             std::swap(cell.values[j], cell.values[j - 1]);

@@ -46,7 +46,9 @@ using WeightedSum = std::conditional_t<
     std::is_same_v<P, float>, double,
     std::conditional_t<
         std::is_same_v<P, double>, long double,
-        std::conditional_t<(8 * static_cast<int>(sizeof(P)) + bits <= 62), std::int64_t, Int128>>>;
+        std::conditional_t<(8 * static_cast<int>(sizeof(P)) + bits <= 30), std::int32_t,
+                           std::conditional_t<(8 * static_cast<int>(sizeof(P)) + bits <= 62),
+                                              std::int64_t, Int128>>>>;
 
 // The numbers of a raster's rows: samples, or the parts of complex samples. Column c of part p of a
 // row is row[c * stride + p].
