@@ -43,7 +43,8 @@ struct ChunkSums {
         const auto wide = static_cast<std::int64_t>(value);
         ++count;
         sum += wide;
-        squares += static_cast<std::uint64_t>(wide * wide);
+        const auto bits = static_cast<std::uint64_t>(wide);
+        squares += bits * bits;  // right modulo 2 to the 64, of negative values too
         minimum = std::min(minimum, value);
         maximum = std::max(maximum, value);
     }

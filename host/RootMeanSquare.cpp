@@ -11,12 +11,14 @@
 namespace zmchost {
 namespace {
 
-// n * a * b, a and b of 64 bits, for comparison with a sum of squares.
-WideSum Product(std::uint64_t a, std::uint64_t b, int n) {
+// n * term, for comparison with a sum of squares.
+WideSum Times(UInt128 term, int n) {
     WideSum product;
-    product.AddProduct(UInt128{a} * b, static_cast<std::uint64_t>(n));
+    product.AddProduct(term, static_cast<std::uint64_t>(n));
     return product;
 }
+
+UInt128 Square(std::uint64_t value) { return UInt128{value} * value; }
 
 bool Less(const WideSum& a, const WideSum& b) {
     return a.high != b.high ? a.high < b.high : a.low < b.low;
@@ -31,8 +33,7 @@ std::uint64_t Magnitude(T value) {
 template <class T>
 Rounded<T> IntegerRoot(const T* values, int count) {
     WideSum squares;
-    for (int i = 0; i < count; ++i)
-        squares.Add(UInt128{Magnitude(values[i])} * Magnitude(values[i]));
+    for (int i = 0; i < count; ++i) squares.Add(Square(Magnitude(values[i])));
     const long double mean = (std::ldexp(static_cast<long double>(squares.high), 128) +
                               static_cast<long double>(squares.low)) /
                              count;
@@ -40,10 +41,10 @@ Rounded<T> IntegerRoot(const T* values, int count) {
     auto root = static_cast<std::uint64_t>(std::min(std::sqrt(mean), limit));
     // The root rounds to the least k with squares / n <= (k + 1/2) squared, which for integers is
     // squares <= n * k * (k + 1).
-    while (root > 0 && !Less(Product(root - 1, root, count), squares)) --root;
-    while (Less(Product(root, root + 1, count), squares)) ++root;
+    while (root > 0 && !Less(Times(Square(root) - root, count), squares)) --root;
+    while (Less(Times(Square(root) + root, count), squares)) ++root;
     root = std::min(root, static_cast<std::uint64_t>(std::numeric_limits<T>::max()));
-    const WideSum whole = Product(root, root, count);
+    const WideSum whole = Times(Square(root), count);
     return {static_cast<T>(root), Less(whole, squares) ? 1 : Less(squares, whole) ? -1 : 0};
 }
 

@@ -11,7 +11,8 @@
 namespace zmchost {
 
 // direction: the sign of exact minus value, 0 where they agree; of complex results that of the real
-// parts, and of the imaginary ones beside it.
+// parts, and of the imaginary ones beside it. In floating types, as far as the wider type that was
+// computed in can tell.
 template <class T>
 struct Rounded {
     T value{};

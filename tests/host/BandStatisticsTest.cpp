@@ -180,8 +180,8 @@ TEST(BandStatistics, ExtremesOfSixtyFourBits) {
     EXPECT_EQ(stats.standardDeviation, 0x1p63);
     EXPECT_EQ(stats.sumOfSquares, 1000 * 0x1p126);
     BandAccumulator<std::uint64_t> many;
-    many.AddRepeated(~std::uint64_t{0}, ~std::uint64_t{0});
-    EXPECT_EQ(many.Stats(0).sumOfSquares, 0x1p192);
+    many.AddRepeated(~std::uint64_t{0}, std::uint64_t{1} << 62);
+    EXPECT_EQ(many.Stats(0).sumOfSquares, 0x1p190);
     EXPECT_EQ(many.Stats(0).standardDeviation, 0);
 }
 
