@@ -93,7 +93,7 @@ public:
         };
         // Cells whose taps all lie inside the level.
         const std::size_t from = std::min<std::size_t>(cells_, Kernel::kReach / 2);
-        const std::size_t beyond = width_ > Kernel::kReach ? (width_ - Kernel::kReach) / 2 + 1 : 0;
+        const std::size_t beyond = width_ > Kernel::kReach ? (width_ - Kernel::kReach + 1) / 2 : 0;
         const std::size_t to = std::clamp<std::size_t>(beyond, from, cells_);
         const bool allRows = std::all_of(parts, parts + rows, [](const Part* r) { return r; });
         Reduce(0, from, rows, 0, false, run, one);

@@ -55,7 +55,9 @@ void ExpectNearest(const T* values, int count) {
     };
     BigInteger twice = Exact(root.value);
     twice += twice;
-    if constexpr (std::is_integral_v<T>) EXPECT_EQ(Side(exact, twice), root.direction);
+    if constexpr (std::is_integral_v<T>) {
+        EXPECT_EQ(Side(exact, twice), root.direction);
+    }
     constexpr T top = std::numeric_limits<T>::max();
     if constexpr (std::is_integral_v<T>) {
         if (root.value != top) {
