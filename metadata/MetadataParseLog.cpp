@@ -1,6 +1,7 @@
 #include "metadata/MetadataParseLog.h"
 
 #include <atomic>
+#include <climits>
 #include <cstdarg>
 #include <cstdlib>
 #include <cwchar>
@@ -67,12 +68,46 @@ void UseUtf8(std::wofstream& stream) {
     }
 }
 
-// A text that the stream cannot encode must not silence the texts after it, nor the host's own.
+using Facet = std::codecvt<wchar_t, char, std::mbstate_t>;
+
+bool CanEncode(const Facet& facet, wchar_t unit) {
+    std::mbstate_t state{};
+    const wchar_t* unitEnd = nullptr;
+    char bytes[16];
+    char* bytesEnd = nullptr;
+    return facet.out(state, &unit, &unit + 1, unitEnd, bytes, bytes + sizeof bytes, bytesEnd) ==
+           std::codecvt_base::ok;
+}
+
+bool CLocaleCanEncode(wchar_t unit) {
+    std::mbstate_t state{};
+    char bytes[MB_LEN_MAX];
+    return std::wcrtomb(bytes, unit, &state) != static_cast<std::size_t>(-1);
+}
+
+// A character that a stream cannot encode stays in its buffer and fails every later write, ours
+// and the host's; so none gets there.
+template <class Test>
+void ReplaceUnless(Test canEncode, wchar_t* text) {
+    for (; *text; ++text)
+        if ((*text < 0 || *text > 0x7F) && !canEncode(*text)) *text = L'?';
+}
+
 void WriteTo(std::wostream& stream, const wchar_t* text) {
     const std::ios_base::iostate before = stream.rdstate();
     stream << text;
     stream.flush();
     if (stream.rdstate() != before) stream.clear(before);
+}
+
+// The console encodes by the C locale, or by the stream's own if the host has parted it from the C
+// streams; a character goes through where both can take it.
+void WriteToConsole(wchar_t* text) {
+    const std::locale locale = std::wcout.getloc();
+    const auto& facet = std::use_facet<Facet>(locale);
+    ReplaceUnless([&](wchar_t unit) { return CLocaleCanEncode(unit) && CanEncode(facet, unit); },
+                  text);
+    WriteTo(std::wcout, text);
 }
 
 }  // namespace
@@ -164,11 +199,16 @@ void MetadataParseLog::Log(std::uint32_t messageLevel, const wchar_t* format, ..
     log->Write(text);
 }
 
-void MetadataParseLog::Write(const wchar_t* text) {
+void MetadataParseLog::Write(wchar_t* text) {
     try {
         const std::lock_guard<std::mutex> lock(writing);
-        if (stream.is_open()) WriteTo(stream, text);
-        if (Load(toConsole) != 0) WriteTo(std::wcout, text);
+        if (stream.is_open()) {
+            const std::locale locale = stream.getloc();
+            const auto& facet = std::use_facet<Facet>(locale);
+            ReplaceUnless([&](wchar_t unit) { return CanEncode(facet, unit); }, text);
+            WriteTo(stream, text);
+        }
+        if (Load(toConsole) != 0) WriteToConsole(text);
     } catch (...) {
         // No failure of a log shows to its caller.
     }

@@ -37,7 +37,8 @@ public:
 
     // Writes a wide printf text, in which "%s" takes a wide text, if `messageLevel` is not above
     // the level of the log. Nothing is added to it, neither time nor newline, and what does not
-    // fit into 4095 characters is cut off. Each message is flushed.
+    // fit into 4095 characters is cut off. The file is UTF-8 where the system can do that; what a
+    // stream cannot encode becomes '?'. Each message is flushed.
     static void Log(std::uint32_t messageLevel, const wchar_t* format, ...);
 
 private:
@@ -45,7 +46,7 @@ private:
     void ReadSettings();
     bool Open();
     void WriteHeader();
-    void Write(const wchar_t* text);
+    void Write(wchar_t* text);
 
     std::mutex writing;  // keeps the texts of two threads apart
 };

@@ -42,16 +42,14 @@ private:
 
 class ProjUser {
 public:
+    ProjUser* previous = nullptr;  // neighbours in the context's list; the context's alone to touch
+    ProjUser* next = nullptr;
+
     // Destroys everything of PROJ that the user holds; called under the lock.
     virtual void DropProj() = 0;
 
 protected:
     ~ProjUser() = default;
-
-private:
-    friend class ProjContext;
-    ProjUser* previous = nullptr;
-    ProjUser* next = nullptr;
 };
 
 }  // namespace zelm
