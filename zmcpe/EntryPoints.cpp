@@ -1,6 +1,5 @@
 #include "zmcpe/EntryPoints.h"
 
-#include <algorithm>
 #include <string>
 #include <string_view>
 #include <vector>
