@@ -165,12 +165,16 @@ void CoordSysLog::ApplyControlLine(const char* line) {
 void CoordSysLog::LogMessage(std::uint32_t level, const WideChar* format, ...) {
     CoordSysLog* const log = gpCoordSysLogInstance;
     if (!log || (log->levelMask & level) == 0) return;
-    WideChar message[kTextCapacity];
     std::va_list arguments;
     va_start(arguments, format);
-    platform::FormatWideV(message, kTextCapacity, format, arguments);
+    log->Format(format, arguments);
     va_end(arguments);
-    log->Write(message);
+}
+
+void CoordSysLog::Format(const WideChar* format, std::va_list arguments) {
+    WideChar message[kTextCapacity];
+    platform::FormatWideV(message, kTextCapacity, format, arguments);
+    Write(message);
 }
 
 void CoordSysLog::Write(const WideChar* message) {

@@ -11,6 +11,7 @@
 #ifndef ZMC_COORDSYS_COORDSYSLOG_H
 #define ZMC_COORDSYS_COORDSYSLOG_H
 
+#include <cstdarg>
 #include <cstdint>
 #include <cstdio>
 #include <mutex>
@@ -59,6 +60,8 @@ private:
     bool MakeLogDirectory() const;
     String PathOf(const char* name) const;
     void CloseStream();
+    // Apart from LogMessage, whose frame stays small where nothing is logged.
+    [[gnu::noinline]] void Format(const WideChar* format, std::va_list arguments);
     void Write(const WideChar* message);
     void WriteLine(const WideChar* message);
     void RotateIfFull();

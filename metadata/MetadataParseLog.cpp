@@ -191,12 +191,16 @@ void MetadataParseLog::WriteHeader() {
 void MetadataParseLog::Log(std::uint32_t messageLevel, const wchar_t* format, ...) {
     MetadataParseLog* const log = Instance().load(std::memory_order_acquire);
     if (!log || messageLevel > Load(log->level)) return;
-    wchar_t text[kTextCapacity];
     std::va_list arguments;
     va_start(arguments, format);
-    platform::FormatWideV(text, kTextCapacity, format, arguments);
+    log->Format(format, arguments);
     va_end(arguments);
-    log->Write(text);
+}
+
+void MetadataParseLog::Format(const wchar_t* format, std::va_list arguments) {
+    wchar_t text[kTextCapacity];
+    platform::FormatWideV(text, kTextCapacity, format, arguments);
+    Write(text);
 }
 
 void MetadataParseLog::Write(wchar_t* text) {

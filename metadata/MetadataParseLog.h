@@ -12,6 +12,7 @@
 #ifndef ZMC_METADATA_METADATAPARSELOG_H
 #define ZMC_METADATA_METADATAPARSELOG_H
 
+#include <cstdarg>
 #include <cstdint>
 #include <fstream>
 #include <mutex>
@@ -46,6 +47,8 @@ private:
     void ReadSettings();
     bool Open();
     void WriteHeader();
+    // Apart from Log, whose frame stays small where nothing is logged.
+    [[gnu::noinline]] void Format(const wchar_t* format, std::va_list arguments);
     void Write(wchar_t* text);
 
     std::mutex writing;  // keeps the texts of two threads apart
