@@ -3,7 +3,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
-#include <regex>
+#include <sstream>
 
 #include "tests/coordsys/ProbeRun.h"
 
@@ -25,8 +25,12 @@ protected:
     std::string Pe() const { return scratch.String(); }
     // The messages of the log, without time and numbers, each in brackets.
     std::string Messages() const {
-        const std::string log = ReadText(scratch / "logs/zmcpe_pe_1.log");
-        return std::regex_replace(log, std::regex(".{24},     0, [ \\d]{5}, (.*) \n"), "[$1]");
+        std::istringstream log(ReadText(scratch / "logs/zmcpe_pe_1.log"));
+        constexpr std::size_t kFrame = 24 + 2 + 5 + 2 + 5 + 2;
+        std::string messages;
+        for (std::string line; std::getline(log, line);)
+            messages += "[" + line.substr(kFrame, line.size() - kFrame - 1) + "]";
+        return messages;
     }
     std::string Opening() const {
         return "[" + kRule + "][CoordSysFactory::Init - pedata directory (" + Pe() + ").]";

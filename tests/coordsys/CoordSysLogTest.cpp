@@ -3,7 +3,6 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
-#include <regex>
 #include <sstream>
 
 #include "tests/coordsys/ProbeRun.h"
@@ -20,6 +19,7 @@ using support::SmallDisk;
 using support::WriteText;
 using testing::EndsWith;
 using testing::HasSubstr;
+using testing::MatchesRegex;
 using testing::Not;
 
 const std::string kFirst = "logs/zmcpe_pe_1.log";
@@ -158,10 +158,10 @@ TEST_F(CoordSysLogRun, MissingDirectoryMeansNoLog) {
 
 TEST_F(CoordSysLogRun, LinesHaveTheirForm) {
     LogByLine("0110,0000,0000,0001", 2, 1, 5);
-    const std::string time = "\\w{3} \\w{3} [ \\d]\\d \\d\\d:\\d\\d:\\d\\d \\d{4}";
-    EXPECT_TRUE(std::regex_match(
-        First(), std::regex(time + ",     0,     1, xxxxx \n" + time + ",     0,     2, xxxxx \n")))
-        << First();
+    const std::string time =
+        "[A-Z][a-z]{2} [A-Z][a-z]{2} [ 0-9][0-9] [0-9]{2}:[0-9]{2}:[0-9]{2} [0-9]{4}";
+    EXPECT_THAT(First(), MatchesRegex(time + ",     0,     1, xxxxx \n" + time +
+                                      ",     0,     2, xxxxx \n"));
 }
 
 TEST_F(CoordSysLogRun, LevelsPassByMask) {
@@ -262,11 +262,10 @@ TEST_F(CoordSysLogRun, LinesOfTwoThreadsStayWholeOverRotations) {
     WriteControlLine(scratch, "0100,0000,0000,0001");
     const ChildResult result = RunProbe({"threads", scratch.String(), "4000"});
     EXPECT_THAT(result.err, HasSubstr("sequence=8000"));
-    const std::regex whole(".{24},     0, [ \\d]{5}, (a{200}|b{300}) ");
+    const auto whole = MatchesRegex(".{24},     0, [ 0-9]{5}, (a{200}|b{300}) ");
     for (const std::string& text : {First(), Second()}) {
         std::istringstream lines(text);
-        for (std::string line; std::getline(lines, line);)
-            ASSERT_TRUE(std::regex_match(line, whole)) << line;
+        for (std::string line; std::getline(lines, line);) ASSERT_THAT(line, whole);
     }
     EXPECT_GT(First().size() + Second().size(), 500000u);
 }

@@ -2,7 +2,6 @@
 #include <gtest/gtest.h>
 #include <sys/stat.h>
 
-#include <regex>
 #include <sstream>
 
 #include "tests/support/ChildProcess.h"
@@ -16,6 +15,7 @@ using support::RunChild;
 using support::ScratchDirectory;
 using testing::EndsWith;
 using testing::HasSubstr;
+using testing::MatchesRegex;
 using testing::Not;
 using testing::StartsWith;
 
@@ -50,9 +50,10 @@ TEST_F(ParseLog, ThreeVariablesMakeOneLogForManyMetadata) {
     const ChildResult result = Run(Here(), "1", "0", {"build", "20"});
     EXPECT_THAT(result.err, HasSubstr("level=1 console=0 open=1 path=" + Here() + "/" + kFile));
     EXPECT_THAT(result.err, Not(HasSubstr("another log")));
-    const std::regex header("\n\\w{3} \\w{3} [ \\d]\\d \\d\\d:\\d\\d:\\d\\d \\d{4}" + kHeaderText +
-                            "1\n\n");
-    EXPECT_TRUE(std::regex_match(Log(), header)) << Log();
+    EXPECT_THAT(
+        Log(), MatchesRegex(
+                   "\n[A-Z][a-z]{2} [A-Z][a-z]{2} [ 0-9][0-9] [0-9]{2}:[0-9]{2}:[0-9]{2} [0-9]{4}" +
+                   kHeaderText + "1\n\n"));
     EXPECT_EQ(result.out, "");
 }
 
@@ -189,10 +190,9 @@ TEST_F(ParseLog, LinesOfTwoThreadsStayWhole) {
     std::istringstream lines(Log());
     std::string line;
     for (int i = 0; i < 3; ++i) std::getline(lines, line);
-    const std::regex whole("thread [01] line \\d+ and no more");
+    const auto whole = MatchesRegex("thread [01] line [0-9]+ and no more");
     int count = 0;
-    for (; std::getline(lines, line); ++count)
-        ASSERT_TRUE(std::regex_match(line, whole)) << "line " << count << ": " << line;
+    for (; std::getline(lines, line); ++count) ASSERT_THAT(line, whole) << "line " << count;
     EXPECT_EQ(count, 6000);
 }
 

@@ -3,8 +3,6 @@
 #include <gtest/gtest.h>
 #include <unistd.h>
 
-#include <regex>
-
 #include "platform/DebugOutput.h"
 #include "platform/Directory.h"
 #include "platform/LoadableLibrary.h"
@@ -42,7 +40,7 @@ TEST(TextStream, OpensByWideNameAndIsNotInherited) {
     EXPECT_EQ(support::ReadText(scratch / "\xc3\xa4\xf0\x9f\x8c\x8d"), "text");
     const std::string link = "/proc/self/fdinfo/" + std::to_string(fileno(stream));
     // 02000000 is the flag that closes the descriptor when another program starts.
-    EXPECT_TRUE(std::regex_search(support::ReadText(link), std::regex("flags:\\s*02")));
+    EXPECT_THAT(support::ReadText(link), testing::ContainsRegex("flags:[[:space:]]*02"));
     std::fclose(stream);
 }
 
@@ -99,9 +97,9 @@ TEST(DebugOutput, UnpairedSurrogatesEndSomewhere) {
 TEST(LocalTime, HasTwentyFourCharacters) {
     char text[kLocalTimeLength + 1];
     LocalTimeText(text);
-    EXPECT_TRUE(std::regex_match(
-        text, std::regex("[A-Z][a-z]{2} [A-Z][a-z]{2} [ 0-9]\\d \\d\\d:\\d\\d:\\d\\d \\d{4}")))
-        << text;
+    EXPECT_THAT(std::string(text),
+                testing::MatchesRegex(
+                    "[A-Z][a-z]{2} [A-Z][a-z]{2} [ 0-9][0-9] [0-9]{2}:[0-9]{2}:[0-9]{2} [0-9]{4}"));
 }
 
 }  // namespace
