@@ -2,6 +2,7 @@
 
 #include <new>
 
+#include "metadata/MetadataParseLog.h"
 #include "zmcg/zmcg.h"
 
 namespace zelm {
@@ -18,6 +19,8 @@ const std::uint32_t Metadata::typeCode = GloballyUniqueObjectTypeCode("Metadata"
 Metadata::Metadata() {
     auto* tree = new (std::nothrow) LockableMetadataImpl;
     if (!tree) return;
+    // The first Metadata of a process is what makes the log read its settings.
+    MetadataParseLog::GetInstance();
     InitializeCriticalSection(&tree->lock);
     impl.Reset(tree);
 }

@@ -1,0 +1,21 @@
+// The keys of the table of directory settings. They are told apart by case.
+#ifndef ZMC_COORDSYS_ENVIRONMENTKEYS_H
+#define ZMC_COORDSYS_ENVIRONMENTKEYS_H
+
+#include "core/String.h"
+
+namespace zelm::EnvironmentKeys {
+
+// Directory that holds the library of the projection engine.
+inline const String kBinDirectory("ZELM::Environment::BinDirectory");
+inline const String kXmlDirectory("ZELM::Environment::XmlDirectory");  // for other modules
+// Data directory of the projection engine, where the projection log has its files too.
+inline const String kPeDirectory("ZELM::Environment::PeDirectory");
+// Second directory handed to the projection engine.
+inline const String kGdalDirectory("ZELM::Environment::GdalDirectory");
+inline const String kMdfDirectory("ZELM::Environment::MdfDirectory");  // for other modules
+inline const String kWorkingDirectory("ZELM::WorkingDirectory");       // for other modules
+
+}  // namespace zelm::EnvironmentKeys
+
+#endif

@@ -1,0 +1,30 @@
+// Runs the probe of this folder and finds the engines that it loads.
+#ifndef ZMC_TESTS_COORDSYS_PROBERUN_H
+#define ZMC_TESTS_COORDSYS_PROBERUN_H
+
+#include <gtest/gtest.h>
+
+#include "tests/support/ChildProcess.h"
+#include "tests/support/ScratchDirectory.h"
+
+namespace zelm {
+
+inline support::ChildResult RunProbe(std::vector<std::string> words) {
+    words.insert(words.begin(), ZMC_COORDSYS_PROBE);
+    support::ChildResult result = support::RunChild(words);
+    EXPECT_EQ(result.status, 0) << result.err;
+    return result;
+}
+
+// Directory of the stand-in engine that lacks that entry point, counted from 1; 0 lacks none.
+inline std::string StubDirectory(int lacks) {
+    return ZMC_STUB_DIRECTORY "/stub" + std::to_string(lacks);
+}
+
+inline void WriteControlLine(const support::ScratchDirectory& directory, const std::string& line) {
+    support::WriteText(directory / "pelog.txt", "# notes\n" + line + "\n");
+}
+
+}  // namespace zelm
+
+#endif

@@ -1,0 +1,77 @@
+// A directory of the test's own, gone when the test is over, and small disks mounted in it.
+#ifndef ZMC_TESTS_SUPPORT_SCRATCHDIRECTORY_H
+#define ZMC_TESTS_SUPPORT_SCRATCHDIRECTORY_H
+
+#include <sys/mount.h>
+#include <unistd.h>
+
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <iterator>
+#include <string>
+
+namespace support {
+
+class ScratchDirectory {
+public:
+    ScratchDirectory() {
+        std::string name = (std::filesystem::temp_directory_path() / "zmcXXXXXX").string();
+        if (mkdtemp(name.data())) path = name;
+    }
+    ScratchDirectory(const ScratchDirectory&) = delete;
+    ScratchDirectory& operator=(const ScratchDirectory&) = delete;
+    ~ScratchDirectory() {
+        std::error_code ignored;
+        if (!path.empty()) std::filesystem::remove_all(path, ignored);
+    }
+
+    std::string operator/(const std::string& name) const { return (path / name).string(); }
+    std::string String() const { return path.string(); }
+
+private:
+    std::filesystem::path path;
+};
+
+// A disk of its own at that directory. Mounting takes rights that not every test run has: then
+// IsMounted is false and the test is to be skipped.
+class SmallDisk {
+public:
+    SmallDisk(std::string directory, const std::string& options)
+        : path(std::move(directory)),
+          mounted(mount("tmpfs", path.c_str(), "tmpfs", 0, options.c_str()) == 0) {}
+    SmallDisk(const SmallDisk&) = delete;
+    SmallDisk& operator=(const SmallDisk&) = delete;
+    ~SmallDisk() {
+        if (mounted) umount2(path.c_str(), MNT_DETACH);
+    }
+
+    bool IsMounted() const { return mounted; }
+    bool MakeReadOnly() {
+        return mount(nullptr, path.c_str(), nullptr, MS_REMOUNT | MS_RDONLY, nullptr) == 0;
+    }
+    // Fills the disk to its last byte.
+    void Fill() {
+        std::ofstream filler(path + "/filler", std::ios::binary);
+        const std::string block(1024, 'x');
+        while (filler.write(block.data(), static_cast<std::streamsize>(block.size())).flush()) {
+        }
+    }
+
+private:
+    std::string path;
+    bool mounted;
+};
+
+inline std::string ReadText(const std::string& name) {
+    std::ifstream file(name, std::ios::binary);
+    return {std::istreambuf_iterator<char>(file), {}};
+}
+
+inline void WriteText(const std::string& name, const std::string& text) {
+    std::ofstream(name, std::ios::binary) << text;
+}
+
+}  // namespace support
+
+#endif

@@ -1,0 +1,48 @@
+#include "zmcpe/ProjContext.h"
+
+namespace zelm {
+namespace {
+
+// Trivially destroyed, all of them: handles may be released after this library's destructors ran.
+std::mutex projMutex;
+PJ_CONTEXT* context = nullptr;
+ProjUser* firstUser = nullptr;
+bool closed = false;
+
+struct Closer {
+    ~Closer() { ProjContext().CloseForGood(); }
+};
+const Closer closer;
+
+}  // namespace
+
+ProjContext::ProjContext() : lock(projMutex) {}
+
+PJ_CONTEXT* ProjContext::Get() {
+    if (context || closed) return context;
+    context = proj_context_create();
+    if (!context) return nullptr;
+    proj_log_level(context, PJ_LOG_NONE);  // refusals are answers, not news for the error stream
+    proj_context_set_enable_network(context, 0);
+    return context;
+}
+
+void ProjContext::Enlist(ProjUser* user) {
+    user->next = firstUser;
+    if (firstUser) firstUser->previous = user;
+    firstUser = user;
+}
+
+void ProjContext::Dismiss(ProjUser* user) {
+    (user->previous ? user->previous->next : firstUser) = user->next;
+    if (user->next) user->next->previous = user->previous;
+}
+
+void ProjContext::CloseForGood() {
+    for (ProjUser* user = firstUser; user; user = user->next) user->DropProj();
+    if (context) proj_context_destroy(context);
+    context = nullptr;
+    closed = true;
+}
+
+}  // namespace zelm

@@ -1,0 +1,27 @@
+// What PROJ says of a coordinate system, taken down once so that answering needs no lock.
+#ifndef ZMC_ZMCPE_PROJDESCRIPTION_H
+#define ZMC_ZMCPE_PROJDESCRIPTION_H
+
+#include <proj.h>
+
+#include "zmcpe/CoordSysImpl.h"
+
+namespace zelm {
+
+struct ProjDescription {
+    String name;
+    String datumName;
+    String unitName;
+    String wkt2;
+    double unitFactor = 1.0;
+    std::uint32_t unitKind = 0;
+    std::int32_t unitCode = 0;
+    CoordSysImpl::Kind kind = CoordSysImpl::Kind::Other;
+};
+
+// To be called under the lock of `context`.
+ProjDescription DescribeProj(PJ_CONTEXT* context, const PJ* crs);
+
+}  // namespace zelm
+
+#endif
