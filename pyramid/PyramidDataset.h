@@ -111,6 +111,10 @@ public:
                         std::uint32_t bytesPerSample);
 
     // --- tile transfer (TileTransfer.cpp) ---
+    // True if the transfers below take such a request: a rectangle, level and bands that the
+    // dataset holds, or one of no pixels. Looks at no file.
+    bool AcceptsTile(std::uint32_t x, std::uint32_t y, std::uint32_t width, std::uint32_t height,
+                     const Array<int>& bandList, std::int32_t level) const;
     // Reads a rectangle of one level, pixel-interleaved, with the listed bands in list order; an
     // identity or (in the orderings 0 and 1) empty list means all bands. False, with nothing moved,
     // for a rectangle, level or band outside what the dataset holds; a null File moves nothing and
