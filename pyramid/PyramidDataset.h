@@ -24,11 +24,11 @@
 #include "raster/RasterBandStats.h"
 #include "raster/RasterProps.h"
 
-namespace xercesc {
+namespace XERCES_CPP_NAMESPACE {
 class HandlerBase;
 class MemBufInputSource;
 class SAXParser;
-}  // namespace xercesc
+}  // namespace XERCES_CPP_NAMESPACE
 
 namespace zelm {
 

@@ -25,11 +25,11 @@
 #include "raster/RasterBandHistogram.h"
 #include "raster/RasterBandStats.h"
 
-namespace xercesc {
+namespace XERCES_CPP_NAMESPACE {
 class DOMDocument;
 class DOMElement;
 class InputSource;
-}  // namespace xercesc
+}  // namespace XERCES_CPP_NAMESPACE
 
 namespace zelm {
 
