@@ -198,7 +198,7 @@ TEST_F(DatasetFileTest, EveryTruncationIsAnsweredCleanly) {
     const std::uint64_t header = model.tileDataStart;
     model.StoreImage(2, model.Image(2));
     const Bytes whole = model.file;
-    for (std::size_t size = 0; size < header; ++size) {
+    for (std::size_t size = 0; size < header; size += size < 40 ? 1 : 5) {
         model.file.assign(whole.begin(), whole.begin() + static_cast<std::ptrdiff_t>(size));
         model.Save(path);
         EXPECT_FALSE(Open()) << size;

@@ -21,16 +21,18 @@ protected:
         model = std::make_unique<PyramidModel>(d);
         model->StoreAllImages();
         model->Save(path);
+        for (std::uint32_t level = 0; level < 3; ++level) images.push_back(model->Image(level));
         dataset = Open();
     }
 
     bool IsMorton() const { return GetParam() == 2; }
     Bytes Expected(std::uint32_t x, std::uint32_t y, std::uint32_t width, std::uint32_t height,
                    std::uint32_t level = 0) const {
-        return Crop(model->Image(level), 1000u >> level, 6, x, y, width, height);
+        return Crop(images[level], 1000u >> level, 6, x, y, width, height);
     }
 
     const BandList all{{0, 1, 2}};
+    std::vector<Bytes> images;
     std::unique_ptr<PyramidModel> model;
     std::unique_ptr<zelm::PyramidDataset> dataset;
 };
@@ -136,7 +138,7 @@ TEST_P(TileReadTest, ElementsOfAnotherSizeAndNoBufferAreRefused) {
 TEST_P(TileReadTest, RandomRectanglesAlsoAsSmallerOnes) {
     std::mt19937 random(GetParam() + 1);
     const auto below = [&](std::uint32_t n) { return static_cast<std::uint32_t>(random() % n); };
-    for (int round = 0; round < 300; ++round) {
+    for (int round = 0; round < 150; ++round) {
         const std::uint32_t level = below(3);
         const std::uint32_t levelWidth = 1000u >> level;
         const std::uint32_t levelHeight = 777u >> level;

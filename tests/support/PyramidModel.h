@@ -173,7 +173,7 @@ public:
     std::uint64_t tileDataStart = 0;
     std::uint64_t tileDataEnd = 0;
 
-    // A file that ends with its header.
+    // A file that ends with its header, as yet.
     explicit PyramidModel(const PyramidDescription& description) : d(description) {
         const std::string header = HeaderText();
         file.assign({'K', 'O', 'B', 'T'});
@@ -291,8 +291,8 @@ public:
     Bytes LoadImage(std::uint32_t level) const {
         Bytes image(std::size_t{Width(level)} * Height(level) * PixelBytes());
         MoveImage(level, [&](std::uint64_t at, std::size_t inImage, std::size_t size) {
-            const Bytes read = Read(at, size);
-            std::copy_n(read.data(), size, image.data() + inImage);
+            for (std::size_t i = 0; i < size; ++i)
+                image[inImage + i] = at + i < file.size() ? file[at + i] : 0;
         });
         return image;
     }
@@ -422,18 +422,21 @@ private:
     void MoveImage(std::uint32_t level, Move&& move) const {
         const std::size_t size = SampleBytes();
         const std::uint32_t planes = d.ordering == 2 ? d.bands : 1;
-        const std::size_t unit = d.ordering == 2 ? size : PixelBytes();
+        const std::uint32_t step = d.ordering == 2 ? 1 : d.tile;
         for (std::uint32_t plane = 0; plane < planes; ++plane)
             for (std::uint32_t ty = 0; ty < Down(level); ++ty)
                 for (std::uint32_t tx = 0; tx < Across(level); ++tx) {
                     std::uint64_t at = TileStart(level, tx, ty, plane);
                     for (std::uint32_t row = 0; row < TileHeight(level, ty); ++row)
-                        for (std::uint32_t column = 0; column < TileWidth(level, tx); ++column) {
+                        for (std::uint32_t column = 0; column < TileWidth(level, tx);
+                             column += step) {
                             const std::size_t pixel =
                                 (std::size_t{ty} * d.tile + row) * Width(level) +
                                 std::size_t{tx} * d.tile + column;
-                            move(at, pixel * PixelBytes() + plane * size, unit);
-                            at += unit;
+                            const std::size_t run =
+                                d.ordering == 2 ? size : TileWidth(level, tx) * PixelBytes();
+                            move(at, pixel * PixelBytes() + plane * size, run);
+                            at += run;
                         }
                 }
     }
