@@ -141,8 +141,7 @@ int PyramidDataset::ParseDocument(xercesc::HandlerBase* handlers,
 }
 
 void PyramidDataset::ReadMetaTree() {
-    if (MetaLoaded) return;
-    if (LoadMetaDocument()) {
+    if (MetaLoaded || LoadMetaDocument()) {
         MetaDocument = PyramidXMLDocument::Make();
         if (MetaDocument) MetaDocument->ParseTree(*MetaSource);
     } else if (File && File->Size() > MetaDocumentOffset && MetaDocument) {
