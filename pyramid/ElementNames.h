@@ -15,7 +15,8 @@
     X(BANDSTATISTICS)                                                                              \
     X(HISTOGRAMS)                                                                                  \
     X(PALETTE)                                                                                     \
-    X(HEADER) X(RSTC_LEVEL) X(RSTC_BAND) X(RSTC_MINIMUM) X(RSTC_MAXIMUM) X(RSTC_MEAN)              \
+    X(HEADER)                                                                                      \
+    X(RSTC_LEVEL) X(RSTC_BAND) X(RSTC_MINIMUM) X(RSTC_MAXIMUM) X(RSTC_MEAN)                        \
         X(RSTC_STANDARDDEVIATION) X(RSTC_SUM) X(RSTC_SUM2) X(RSTC_RMS) X(RSTC_SUMXY) X(RSTC_COV)   \
             X(HIST_LEVEL) X(HIST_BAND) X(HIST_SOURCE) X(HIST_BINCOUNT) X(HIST_BINSIZE) X(HIST_MIN) \
                 X(HIST_MAX) X(HIST_TYPE) X(HIST_COUNTS) X(HEADER_VERSION_MAJOR)                    \

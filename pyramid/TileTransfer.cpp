@@ -320,8 +320,8 @@ bool PyramidDataset::AcceptsTile(std::uint32_t x, std::uint32_t y, std::uint32_t
     if (!File || width == 0 || height == 0) return true;
     const auto at = static_cast<std::uint32_t>(level);
     const bool planar = TileOrdering >= TileOrder::Morton;
-    if (!LevelOffsets || BandCount == 0 || TileSize == 0 || TileSize > kMaxTileSize || level < 0 || at < LevelMin ||
-        at > LevelMax || at >= LevelGeometry::kLevelsWithPixels)
+    if (!LevelOffsets || BandCount == 0 || TileSize == 0 || TileSize > kMaxTileSize || level < 0 ||
+        at < LevelMin || at > LevelMax || at >= LevelGeometry::kLevelsWithPixels)
         return false;
     // In the ordering Morton tiles that shrink to nothing have no address.
     if (planar && (TileSize >> at == 0 || bandList.shape.elements == 0)) return false;
