@@ -134,6 +134,8 @@ int PyramidDataset::ParseDocument(xercesc::HandlerBase* handlers,
         // Nothing else is thrown on purpose; a message that found no memory ends here.
     }
     if (thrown) {
+        // Out of memory leaves a parser that takes itself to be at work for good.
+        Parser = MakeDocumentParser();
         source.reset();
         loaded = false;
     }

@@ -54,6 +54,24 @@ std::uint32_t ReadSource(std::string_view text) {
     return text == "ORVA" ? HistogramSource::ORVA : 0;
 }
 
+// A value that 64 bits do not hold gives 2 to the 63: no top bit is added to a rest that has it.
+std::uint64_t ToUint64(double value) {
+    constexpr std::uint64_t top = std::uint64_t{1} << 63;
+    constexpr auto limit = static_cast<double>(top);
+    if (!(value > limit)) return static_cast<std::uint64_t>(TruncateToSigned<std::int64_t>(value));
+    const double rest = value - limit;
+    const auto low = static_cast<std::uint64_t>(TruncateToSigned<std::int64_t>(rest));
+    return rest < limit ? low | top : low;
+}
+
+template <class T>
+T ToPixel(double value) {
+    if constexpr (std::is_same_v<T, std::uint64_t>)
+        return ToUint64(value);
+    else
+        return FromDouble<T>(value);
+}
+
 // Array::Append grows by one element, which takes time in the square of their number.
 template <class T>
 void AppendGrowing(Array<T>& array, const T& value) {
@@ -188,7 +206,7 @@ void PyramidXMLReaderCore::ReadCounts(std::string_view text, std::uint32_t binCo
     bool more = true;
     for (std::uint32_t i = 0; more && i < end; ++i) {
         more = TakeToken(text, token);
-        counts.data[i] = TruncateToUint64(ReadReal(token));
+        counts.data[i] = ToUint64(ReadReal(token));
     }
 }
 
@@ -234,7 +252,7 @@ void PyramidXMLReaderHandlers<T>::TakeStatsText(ElementName name, std::string_vi
     if (!pendingStats) return;
     RasterBandStats<T>& stats = *pendingStats;
     const auto take = [&](auto& field, std::uint32_t flag) {
-        field = FromDouble<std::remove_reference_t<decltype(field)>>(ReadReal(text));
+        field = ToPixel<std::remove_reference_t<decltype(field)>>(ReadReal(text));
         stats.flags |= flag;
     };
     switch (name) {
@@ -288,10 +306,10 @@ void PyramidXMLReaderHandlers<T>::TakeHistogramText(ElementName name, std::strin
             histogram.binSize = ReadReal(text);
             break;
         case HIST_MIN:
-            histogram.minimum = FromDouble<T>(ReadReal(text));
+            histogram.minimum = ToPixel<T>(ReadReal(text));
             break;
         case HIST_MAX:
-            histogram.maximum = FromDouble<T>(ReadReal(text));
+            histogram.maximum = ToPixel<T>(ReadReal(text));
             break;
         case HIST_COUNTS:
             ReadCounts(text, histogram.binCount, histogram.counts);
