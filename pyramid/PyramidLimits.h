@@ -15,8 +15,9 @@ inline constexpr std::uint32_t kMaxTileSize = 2048;
 inline constexpr std::uint32_t kMaxLevel = 1023;
 // The level table and the tile table together. Only the ordering Morton has a tile table.
 inline constexpr std::uint64_t kMaxTableBytes = std::uint64_t{4} << 30;
-// Tile tables up to this size are built when a file is opened, larger ones with the first tile.
-inline constexpr std::uint64_t kMaxEagerTableBytes = std::uint64_t{16} << 20;
+// Tile tables up to this size are built when a file is opened. Larger ones wait for the first tile:
+// touching their fresh memory would take longer than all the rest of an open.
+inline constexpr std::uint64_t kMaxEagerTableBytes = std::uint64_t{64} << 10;
 // The tile data, so that no sum of offsets leaves 64 bits.
 inline constexpr std::uint64_t kMaxTileDataBytes = std::uint64_t{1} << 62;
 // The Morton curve has 16 bits for each direction.
