@@ -49,7 +49,6 @@ PyramidDataset::PyramidDataset(String fileName, RasterProps props)
       TileOrdering(OrderingFor(props)),
       FileName(fileName),
       BytesPerSample(PixelSize(props.pixelType)) {
-    AllocateTileScratch();
     BuildDocumentTools();
 }
 
@@ -88,9 +87,7 @@ bool PyramidDataset::ReadHeader() {
     TakeHeaderRecord(header);
     // Not a failure, by the rules of the format: such a file opens, and refuses its tiles.
     if (TileSize > kMaxTileSize) return false;
-    if (!PyramidLimits::Allow(header)) return true;
-    AllocateTileScratch();
-    if (!LayOutLevels()) return true;
+    if (!PyramidLimits::Allow(header) || !LayOutLevels()) return true;
     HasPyramid = CheckPyramidComplete();
     ReadMetaTree();
     return false;
@@ -111,7 +108,8 @@ void PyramidDataset::CreateFile(std::uint32_t levelMin, std::uint32_t levelMax) 
     EncodeUint64(MetaDocumentOffset, offsets + 8);
     File->WriteAt(kOffsetsOffset, offsets, sizeof offsets);
     HasPyramid = CheckPyramidComplete();
-    AllocateTileScratch();
+    TileScratch.reset();
+    tileScratchBytes = 0;
 }
 
 // Writes everything in front of the tile data, with offsets that are not known yet; the file then
@@ -216,9 +214,7 @@ bool PyramidDataset::EnsureTileTable() {
 }
 
 void PyramidDataset::AllocateTileScratch() {
-    TileScratch.reset();
-    tileScratchBytes = 0;
-    if (TileOrdering >= TileOrder::Morton) return;
+    if (TileScratch || TileOrdering >= TileOrder::Morton) return;
     const auto bytes = CheckedProduct({BytesPerSample, TileSize, TileSize, BandCount, 4});
     if (!FitsWithin(bytes, PyramidLimits::kMaxScratchBytes)) return;
     TileScratch.reset(new (std::nothrow) unsigned char[*bytes]);
@@ -226,6 +222,7 @@ void PyramidDataset::AllocateTileScratch() {
 }
 
 unsigned char* PyramidDataset::WorkSpace(std::uint64_t bytes) {
+    AllocateTileScratch();
     if (bytes <= tileScratchBytes) return TileScratch.get();
     if (bytes > workBufferBytes) {
         workBuffer.reset(new (std::nothrow) unsigned char[bytes]);

@@ -67,8 +67,8 @@ public:
     // alone, since nothing addresses by it in the others, and a large one with the first tile that
     // moves.
     Array<std::uint64_t> TileOffsets;
-    // Room for 2 x 2 tiles with all bands in the orderings Scanline and Blocked, else null. Also
-    // null where it would be larger than PyramidLimits allow.
+    // Room for 2 x 2 tiles with all bands, in the orderings Scanline and Blocked. Null until a
+    // transfer needs it, and where it would be larger than PyramidLimits allow.
     std::unique_ptr<unsigned char[]> TileScratch;
     String SourceName;  // name given to the open constructor
     std::uint32_t BytesPerSample = 1;

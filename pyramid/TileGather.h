@@ -94,7 +94,8 @@ struct SampleBlock {
     }
     // Whole pixels of `count` samples, one after the other.
     bool IsPacked(std::uint32_t count, std::size_t sampleBytes) const {
-        return !bands && bandStep == sampleBytes && pixelStep == count * sampleBytes;
+        return !bands && (count == 1 || bandStep == sampleBytes) &&
+               pixelStep == count * sampleBytes;
     }
 };
 
