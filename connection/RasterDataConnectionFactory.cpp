@@ -4,6 +4,7 @@
 
 #include "connection/ConnectionStrings.h"
 #include "connection/MemoryRasterDataConnection.h"
+#include "pyramid/PyramidDataConnection.h"
 
 namespace zelm {
 namespace {
@@ -85,12 +86,15 @@ DataConnectionPtr RasterDataConnectionFactory::OpenMemoryRaster(const Array<Stri
     return OpenConnection<MemoryRasterDataConnection>(parameters, geoRef);
 }
 
-DataConnectionPtr RasterDataConnectionFactory::OpenPyramid(const Array<String>&, const GeoRefPtr&) {
-    return DataConnectionPtr();
+DataConnectionPtr RasterDataConnectionFactory::OpenPyramid(const Array<String>& parameters,
+                                                           const GeoRefPtr& geoRef) {
+    return OpenConnection<PyramidDataConnection>(parameters, geoRef);
 }
 
-DataConnectionPtr RasterDataConnectionFactory::CreatePyramid(const Array<String>&,
-                                                             const RasterProps&) {
+DataConnectionPtr RasterDataConnectionFactory::CreatePyramid(const Array<String>& parameters,
+                                                             const RasterProps& props) {
+    const RasterDataConnectionPtr connection(new (std::nothrow) PyramidDataConnection);
+    if (connection && connection->Create(parameters, props)) return DataConnectionPtr(connection);
     return DataConnectionPtr();
 }
 

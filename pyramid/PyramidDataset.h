@@ -10,6 +10,7 @@
 #ifndef ZMC_PYRAMID_PYRAMIDDATASET_H
 #define ZMC_PYRAMID_PYRAMIDDATASET_H
 
+#include <cstddef>
 #include <cstdint>
 #include <memory>
 
@@ -19,16 +20,17 @@
 #include "core/String.h"
 #include "platform/File.h"
 #include "pyramid/PyramidHeaderRecord.h"
+#include "pyramid/PyramidLimits.h"
 #include "pyramid/PyramidXMLDocument.h"
 #include "raster/RasterBandHistogram.h"
 #include "raster/RasterBandStats.h"
 #include "raster/RasterProps.h"
 
-namespace xercesc {
+namespace XERCES_CPP_NAMESPACE {
 class HandlerBase;
 class MemBufInputSource;
 class SAXParser;
-}  // namespace xercesc
+}  // namespace XERCES_CPP_NAMESPACE
 
 namespace zelm {
 
@@ -40,7 +42,7 @@ public:
     static constexpr int kParseOutOfMemory = 5;
 
     // Files with larger tiles open, and then refuse every tile operation.
-    static constexpr std::uint32_t kMaxTileSize = 2048;
+    static constexpr std::uint32_t kMaxTileSize = PyramidLimits::kMaxTileSize;
 
     std::unique_ptr<platform::File> File;  // the open file, or null
     bool Writable = false;                 // `File` was opened for update
@@ -60,10 +62,15 @@ public:
     std::uint32_t TileOrdering = 0;  // TileOrder code
     String FileName;                 // the path, exactly as the connection got it
     std::uint64_t TileCursor = 0;    // running offset of BuildTileTable
-    // Absolute offset of every tile: (LevelMax + 1) x BandCount x tiles of level 0.
+    // Absolute offset of every tile: (LevelMax + 1) x BandCount x tiles of level 0, of which a
+    // level uses the start of its row; what it does not use is 0. Filled in the ordering Morton
+    // alone, since nothing addresses by it in the others, and a large one with the first tile that
+    // moves.
     Array<std::uint64_t> TileOffsets;
-    std::unique_ptr<unsigned char[]> TileScratch;  // room for 2 x 2 tiles with all bands, or null
-    String SourceName;                             // name given to the open constructor
+    // Room for 2 x 2 tiles with all bands, in the orderings Scanline and Blocked. Null until a
+    // transfer needs it, and where it would be larger than PyramidLimits allow.
+    std::unique_ptr<unsigned char[]> TileScratch;
+    String SourceName;  // name given to the open constructor
     std::uint32_t BytesPerSample = 1;
     std::unique_ptr<std::uint64_t[]> LevelOffsets;  // LevelMax + 1 entries
     std::uint64_t TileDataStart = 0;
@@ -88,11 +95,13 @@ public:
     // --- life of the file (PyramidDataset.cpp) ---
     // Opens for update, or failing that for reading; `create` makes the file or empties it.
     bool OpenFile(bool create);
-    // Opens the file and builds all tables. FALSE on success, TRUE on failure: callers are written
-    // to this sense.
+    // Opens the file and lays out all levels. FALSE on success, TRUE on failure: callers are
+    // written to this sense. A header that claims more than PyramidLimits allow is a failure, one
+    // whose tiles are too large a success with no tables behind it.
     bool ReadHeader();
     // Makes the file, or empties it, writes the header and lays out the levels, both inclusive. On
-    // a file that cannot be made nothing but the version changes, and nothing is reported.
+    // a file that cannot be made, or levels beyond PyramidLimits, nothing but the version changes,
+    // and nothing is reported.
     void CreateFile(std::uint32_t levelMin, std::uint32_t levelMax);
     // Reopens the file and stores in HasPyramid whether it is complete; always true.
     bool RefreshPyramidState();
@@ -105,23 +114,38 @@ public:
     // Offset of a tile from LevelOffsets[level], in the orderings Scanline and Blocked.
     std::uint64_t GetTileOffset(std::uint32_t tileX, std::uint32_t tileY,
                                 std::uint32_t level) const;
-    // Fills TileOffsets along the Morton curve from TileCursor on, and advances that.
+    // Fills TileOffsets along the Morton curve from TileCursor on, and advances that. Tiles are
+    // square; a grid beyond PyramidLimits leaves the table empty.
     void BuildTileTable(std::uint32_t width, std::uint32_t height, std::uint32_t tileWidth,
                         std::uint32_t tileHeight, std::uint32_t bands,
                         std::uint32_t bytesPerSample);
 
     // --- tile transfer (TileTransfer.cpp) ---
-    // Reads a rectangle of one level, pixel-interleaved, with the listed bands in list order; an
-    // identity or (in the orderings 0 and 1) empty list means all bands. False, with nothing moved,
-    // for a rectangle, level or band outside what the dataset holds; a null File moves nothing and
-    // is true.
+    // Whether a transfer can be asked for: the rectangle inside the level, the level laid out and
+    // addressable, every band in the file, and less than 4 GiB in all. In the ordering Morton the
+    // list has to name its bands. Without a file, width or height there is nothing to refuse.
+    bool AcceptsTile(std::uint32_t x, std::uint32_t y, std::uint32_t width, std::uint32_t height,
+                     const Array<int>& bandList, std::int32_t level) const;
+
+    // The three transfers move a rectangle of one level, pixel-interleaved in `buffer`, with the
+    // listed bands in list order; an identity or (in the orderings 0 and 1) empty list means all
+    // bands. T has the size of the file's samples. False, with nothing moved, for what AcceptsTile
+    // refuses; a null File moves nothing and is true. Failures of the stream are not reported.
+
+    // What the file does not hold reads as zeros, except that one whole tile with all bands in
+    // order (orderings 0 and 1) leaves that part of `buffer` as it was.
     template <class T>
     bool ReadTile(std::uint32_t x, std::uint32_t y, std::uint32_t width, std::uint32_t height,
                   const Array<int>& bandList, std::int32_t level, T* buffer);
+    // For the orderings 0 and 1. Whole tiles and edge tiles of exact size, with all bands, are
+    // written as they are, other rectangles merged into their tiles. Three kinds of rectangles do
+    // not arrive where they belong (see TileTransfer.cpp): write whole tiles with all bands.
     template <class T>
     bool WriteTileInterleaved(std::uint32_t x, std::uint32_t y, std::uint32_t width,
                               std::uint32_t height, const Array<int>& bandList, std::int32_t level,
                               const T* buffer);
+    // For the other orderings. Whole tiles and edge tiles of exact size are written; any other
+    // rectangle is dropped without a word.
     template <class T>
     bool WriteTileMorton(std::uint32_t x, std::uint32_t y, std::uint32_t width,
                          std::uint32_t height, const Array<int>& bandList, std::int32_t level,
@@ -167,6 +191,29 @@ public:
     bool LoadHistograms(Array<RasterBandHistogram<T>>& out);
     template <class T>
     bool LoadPalette(std::uint32_t band, Palette& out);
+
+private:
+    friend class TileTransfer;
+
+    void BuildDocumentTools();
+    PyramidHeaderRecord MakeHeaderRecord() const;
+    void TakeHeaderRecord(const PyramidHeaderRecord& header);
+    bool ReadFixedFields();
+    bool LayOutLevels();
+    bool EnsureTileTable();
+    // Judges a transfer that has something to move, and makes sure of the tile table.
+    bool PrepareTransfer(std::uint32_t x, std::uint32_t y, std::uint32_t width,
+                         std::uint32_t height, const Array<int>& bandList, std::int32_t level,
+                         std::size_t elementBytes, const void* buffer);
+    void AllocateTileScratch();
+    bool WriteHeader();
+    // At least `bytes` of work space: TileScratch where it suffices, else a buffer that is kept.
+    // Null if memory ran out.
+    unsigned char* WorkSpace(std::uint64_t bytes);
+
+    std::uint64_t tileScratchBytes = 0;
+    std::unique_ptr<unsigned char[]> workBuffer;
+    std::uint64_t workBufferBytes = 0;
 };
 
 class PyramidDatasetPtr : public Pointer<PyramidDataset> {

@@ -2,34 +2,81 @@
 //
 // The header document is written once, when a file is laid out; the metadata document grows by one
 // element per record and is rewritten whole after every change, in place. Xerces-C++ must have been
-// initialised by the host. Failures are written to the standard error stream; nothing throws.
+// initialised by the host. Failures are written to the standard error stream; nothing throws. One
+// thread at a time.
+//
+// The object stands without a tree until CreateDocument or ParseTree succeeds, and then refuses
+// every record. So it does for records that would take the document beyond what readers accept
+// (DocumentLimits.h).
 #ifndef ZMC_PYRAMID_PYRAMIDXMLDOCUMENT_H
 #define ZMC_PYRAMID_PYRAMIDXMLDOCUMENT_H
 
 #include <cstdint>
+#include <memory>
+#include <string>
+
+#include <xercesc/parsers/XercesDOMParser.hpp>
 
 #include "colour/Palette.h"
 #include "platform/File.h"
+#include "pyramid/BoundedParser.h"
+#include "pyramid/ElementNames.h"
 #include "pyramid/PyramidHeaderRecord.h"
 #include "raster/RasterBandHistogram.h"
 #include "raster/RasterBandStats.h"
 
+namespace XERCES_CPP_NAMESPACE {
+class DOMDocument;
+class DOMElement;
+class InputSource;
+}  // namespace XERCES_CPP_NAMESPACE
+
 namespace zelm {
 
-// To be written with its sources: the interface below is fixed, the rest is open.
-class PyramidXMLDocument {
+class PyramidXMLDocument : public BoundedParser<xercesc::XercesDOMParser> {
 public:
+    xercesc::DOMDocument* document = nullptr;  // the tree, owned, or null
+
+    // A new object without a tree; null if memory ran out.
+    static std::unique_ptr<PyramidXMLDocument> Make();
+    PyramidXMLDocument();
+    ~PyramidXMLDocument() override;
+    PyramidXMLDocument(const PyramidXMLDocument&) = delete;
+    PyramidXMLDocument& operator=(const PyramidXMLDocument&) = delete;
+
     // Makes an empty document with the root DATASET, encoding UTF-8.
     bool CreateDocument();
-    // Each appends one element with its children, and is true; without a document, false.
+    // Takes the tree of the text; false, without a tree and in silence, if it is malformed.
+    bool ParseTree(const xercesc::InputSource& source);
+    void DropTree();
+
+    // Each appends one element with its children. False, with nothing appended, if there is no
+    // document, or it would grow beyond the limits, or memory ran out.
     bool WriteHeaderElement(const PyramidHeaderRecord& header);
     template <class T>
     bool WriteBandStatsElement(const RasterBandStats<T>& stats);
     template <class T>
     bool WriteHistogramElement(const RasterBandHistogram<T>& histogram);
     bool WritePaletteElement(std::uint32_t band, const Palette& palette);
-    // Writes the whole document at the offset; false if there is none or it cannot be written.
+
+    // Makes the element with one text node and appends it to `parent`. May throw what Xerces does.
+    void AppendValueElement(xercesc::DOMElement& parent, ElementName name, const std::string& text);
+
+    // Writes the whole document at the offset. False, with a message where Xerces gives one, if
+    // there is none, or it is beyond the limits (then the file keeps what it had), or it cannot be
+    // written. A file that reaches further is filled with line ends, so that the text behind the
+    // document, which a writer of longer lines may have left, does not spoil it.
     bool SerializeDocument(platform::File& file, std::uint64_t offset);
+
+    // Number of elements under the root; RemoveFrom takes back all from that position on.
+    std::uint32_t RecordCount() const;
+    void RemoveFrom(std::uint32_t position);
+
+private:
+    template <class Build>
+    bool AppendRecord(ElementName name, std::uint64_t children, Build build);
+
+    std::uint64_t elementCount = 0;  // elements of the tree, the root included
 };
 
 }  // namespace zelm

@@ -1,0 +1,73 @@
+// LevelGeometry: the size of one level, its tile grid, and where a tile lies in it.
+//
+// Pure arithmetic: no file, no table. Level 0 is the full image, and every level has half the
+// columns and rows of the one before, truncated. The formulas are the file format
+// (docs/format.md). Sizes are unsigned 32-bit and wrap as such; offsets and products of sizes are
+// 64-bit.
+#ifndef ZMC_PYRAMID_LEVELGEOMETRY_H
+#define ZMC_PYRAMID_LEVELGEOMETRY_H
+
+#include <cstdint>
+
+namespace zelm {
+
+struct LevelGeometry {
+    // Levels from here up count no bytes and hold no pixels.
+    static constexpr std::uint32_t kLevelsWithPixels = 32;
+
+    std::uint32_t tileSize = 0;     // side of a tile
+    std::uint32_t samples = 0;      // width of the level
+    std::uint32_t lines = 0;        // height of the level
+    std::uint32_t tilesAcross = 0;  // 0 for a tile size of 0
+    std::uint32_t tilesDown = 0;
+    std::uint32_t lastWidth = 0;   // width of the last tile column
+    std::uint32_t lastHeight = 0;  // height of the last tile row
+
+    // From the size of level 0. The shift takes its count modulo 32, so that level 32 looks like
+    // level 0: LevelPixels tells which levels hold anything.
+    constexpr LevelGeometry(std::uint32_t samples0, std::uint32_t lines0, std::uint32_t tileSide,
+                            std::uint32_t level)
+        : tileSize(tileSide),
+          samples(samples0 >> (level & 31u)),
+          lines(lines0 >> (level & 31u)),
+          tilesAcross(TilesOver(samples, tileSide)),
+          tilesDown(TilesOver(lines, tileSide)),
+          lastWidth(samples + (1u - tilesAcross) * tileSide),
+          lastHeight(lines + (1u - tilesDown) * tileSide) {}
+
+    constexpr std::uint32_t TileWidth(std::uint32_t tileX) const {
+        return tileX == tilesAcross - 1u ? lastWidth : tileSize;
+    }
+    constexpr std::uint32_t TileHeight(std::uint32_t tileY) const {
+        return tileY == tilesDown - 1u ? lastHeight : tileSize;
+    }
+    constexpr bool HasTile(std::uint32_t tileX, std::uint32_t tileY) const {
+        return tileX < tilesAcross && tileY < tilesDown;
+    }
+
+    // Offset of a tile from the start of its level, for tiles that hold all bands and lie row by
+    // row. `pixelBytes` is the size of a whole pixel.
+    constexpr std::uint64_t TileOffset(std::uint32_t tileX, std::uint32_t tileY,
+                                       std::uint64_t pixelBytes) const {
+        const std::uint64_t side = tileSize;
+        const std::uint64_t rowStart = samples * (tileY * side) * pixelBytes;
+        const std::uint64_t height = tileY < tilesDown - 1u ? tileSize : lastHeight;
+        return rowStart + tileX * side * height * pixelBytes;
+    }
+
+    // Pixels that a level occupies in a file.
+    static constexpr std::uint64_t LevelPixels(std::uint32_t samples0, std::uint32_t lines0,
+                                               std::uint32_t level) {
+        if (level >= kLevelsWithPixels) return 0;
+        return std::uint64_t{samples0 >> level} * (lines0 >> level);
+    }
+
+private:
+    static constexpr std::uint32_t TilesOver(std::uint32_t extent, std::uint32_t side) {
+        return side == 0 ? 0 : (extent + side - 1u) / side;
+    }
+};
+
+}  // namespace zelm
+
+#endif

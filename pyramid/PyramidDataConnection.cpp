@@ -1,0 +1,139 @@
+#include "pyramid/PyramidDataConnection.h"
+
+#include <memory>
+#include <utility>
+
+#include "core/ElementTypes.h"
+#include "pyramid/PyramidRasterReader.h"
+#include "raster/RasterPropsCopy.h"
+#include "zmcg/zmcg.h"
+
+namespace zelm {
+namespace {
+
+// Null if memory ran out; the parsers that a dataset owns throw then.
+template <class... Arguments>
+PyramidDatasetPtr MakeDataset(Arguments&&... arguments) {
+    try {
+        return PyramidDatasetPtr(
+            std::make_unique<PyramidDataset>(std::forward<Arguments>(arguments)...).release());
+    } catch (...) {
+        return PyramidDatasetPtr();
+    }
+}
+
+// Any format of the table will do; that it is ours is the factory's business.
+bool IsKnownFormat(const String& name) {
+    for (std::int32_t i = 0; i < gCdfFormatRecordCount; ++i)
+        if (name == String(gCdfFormatRecords[i].name)) return true;
+    return false;
+}
+
+}  // namespace
+
+PyramidDataConnection::~PyramidDataConnection() { PyramidDataConnection::Close(); }
+
+bool PyramidDataConnection::Open(const Array<String>& openParameters, GeoRefPtr newGeoRef,
+                                 MetadataPtr newMetadata) {
+    if (openParameters.shape.elements != 1) return false;
+    try {
+        const String fileName = openParameters.data[0];
+        if (!fileName.IsEmpty()) {
+            dataset = MakeDataset(fileName);
+            if (dataset) {
+                geoRef = newGeoRef;
+                metadata = newMetadata;
+                // ReadHeader is true for a failure.
+                if (!dataset->ReadHeader() && TakeName(fileName)) return true;
+            }
+        }
+    } catch (...) {
+        // The host's georeference threw.
+    }
+    Close();
+    return false;
+}
+
+void PyramidDataConnection::Close() {
+    try {
+        dataset.Reset();
+        geoRef.Reset();
+    } catch (...) {
+        // A georeference that throws from its destruction.
+    }
+    parameters.Clear();
+}
+
+bool PyramidDataConnection::IsReadable() {
+    // Hosts have never been told yes here, and some count on the reader that the question leaves.
+    if (IsOpen()) {
+        const RasterReaderDispatchPtr dispatch = GetReader();
+        if (dispatch) dispatch->IsValidLevel();
+    }
+    return false;
+}
+
+RasterReaderDispatchPtr PyramidDataConnection::GetReader() {
+    try {
+        if (!reader) reader = MakeReader();
+    } catch (...) {
+        return RasterReaderDispatchPtr();
+    }
+    return reader;
+}
+
+RasterProps PyramidDataConnection::GetRasterProps() {
+    const RasterReaderDispatchPtr dispatch = GetReader();
+    try {
+        if (dispatch) {
+            const RasterProps known = dispatch->GetRasterProps();
+            // The reader ran out of memory: what stands here is still the raster.
+            if (known.interleave == kNoLayout) return RasterProps();
+            rasterProps = known;
+        }
+        return rasterProps;
+    } catch (...) {
+        return RasterProps();
+    }
+}
+
+bool PyramidDataConnection::Create(const Array<String>& createParameters,
+                                   const RasterProps& props) {
+    if (createParameters.shape.elements == 0) return false;
+    try {
+        const String fileName = createParameters.data[0];
+        const char* narrow = fileName.GetUtf8();
+        if (!narrow || narrow[0] == '\0' || !IsKnownFormat(props.formatName)) return false;
+        dataset = MakeDataset(fileName, props);
+        if (dataset && TakeName(fileName)) return true;
+    } catch (...) {
+        // The host's georeference threw.
+    }
+    Close();
+    return false;
+}
+
+bool PyramidDataConnection::TakeName(const String& fileName) {
+    parameters.Clear();
+    if (!parameters.Append("Pyramid") || !parameters.Append(fileName)) return false;
+    connectionString = String("{PyramidRaster}@") + fileName;
+    return true;
+}
+
+// A pixel type without a reader, that of a connection that is not open included, gives an invalid
+// dispatch. Memory that runs out gives a null pointer instead, which nobody keeps.
+RasterReaderDispatchPtr PyramidDataConnection::MakeReader() {
+    const std::uint32_t pixelType = GetPixelType();
+    RasterReaderDispatchPtr dispatch;
+    const bool known = VisitElementType(pixelType, [this, &dispatch](auto type) {
+        using T = typename decltype(type)::type;
+        const RasterReaderPtr<T> typed(new (std::nothrow)
+                                           PyramidRasterReader<T>(this, geoRef, metadata));
+        if (typed) dispatch.Reset(new (std::nothrow) RasterReaderDispatch(typed));
+    });
+    if (!known) dispatch.Reset(new (std::nothrow) RasterReaderDispatch);
+    if (dispatch && known && dispatch->pixelType != pixelType) dispatch.Reset();
+    return dispatch;
+}
+
+}  // namespace zelm

@@ -1,0 +1,155 @@
+// The documents of a dataset: from the file into a source, and from there into records and a tree.
+#include <algorithm>
+#include <new>
+
+#include <xercesc/framework/MemBufInputSource.hpp>
+#include <xercesc/util/OutOfMemoryException.hpp>
+#include <xercesc/util/XMLException.hpp>
+
+#include "pyramid/BoundedParser.h"
+#include "pyramid/PyramidDataset.h"
+#include "pyramid/PyramidXMLReaderHandlers.h"
+#include "pyramid/XercesText.h"
+
+namespace zelm {
+namespace {
+
+constexpr std::uint64_t kHeaderOffset = 20;
+
+// A source over `size` bytes of the file at `offset`, or null: too long, past the end of the file,
+// or out of memory.
+std::unique_ptr<xercesc::MemBufInputSource> LoadText(platform::File& file, std::uint64_t offset,
+                                                     std::uint64_t size, const char* name) {
+    const std::uint64_t fileSize = file.Size();
+    if (size > kMaxDocumentBytes || offset > fileSize || size > fileSize - offset) return nullptr;
+    std::unique_ptr<XMLByte[]> text(new (std::nothrow) XMLByte[static_cast<std::size_t>(size)]);
+    if (!text) return nullptr;
+    const std::size_t read = file.ReadAt(offset, text.get(), static_cast<std::size_t>(size));
+    // The parser takes a NUL behind the root element for the end of the text and would believe the
+    // front part of a torn document; no parser accepts this character anywhere.
+    std::replace(text.get(), text.get() + read, XMLByte{0}, XMLByte{1});
+    try {
+        auto source = std::make_unique<xercesc::MemBufInputSource>(text.get(), read, name, true);
+        text.release();
+        return source;
+    } catch (...) {
+        return nullptr;
+    }
+}
+
+// Handlers live on the stack of their parse, so the parser forgets them with it.
+class HandlerScope {
+public:
+    HandlerScope(xercesc::SAXParser& saxParser, xercesc::HandlerBase* handlers)
+        : parser(saxParser) {
+        Set(handlers);
+    }
+    ~HandlerScope() { Set(nullptr); }
+    HandlerScope(const HandlerScope&) = delete;
+    HandlerScope& operator=(const HandlerScope&) = delete;
+
+private:
+    void Set(xercesc::HandlerBase* handlers) {
+        parser.setDocumentHandler(handlers);
+        parser.setErrorHandler(handlers);
+    }
+    xercesc::SAXParser& parser;
+};
+
+int PrintOutOfMemory() {
+    PrintError("OutOfMemoryException\n");
+    return PyramidDataset::kParseOutOfMemory;
+}
+
+// Answers as ParseDocument does, and tells whether the parse ended by an exception.
+int Parse(xercesc::SAXParser& parser, xercesc::HandlerBase* handlers,
+          const xercesc::InputSource& source, bool& thrown) {
+    thrown = true;
+    try {
+        const HandlerScope scope(parser, handlers);
+        parser.parse(source);
+        thrown = false;
+        return parser.getErrorCount() == 0 ? PyramidDataset::kParsed : PyramidDataset::kParseError;
+    } catch (const xercesc::OutOfMemoryException&) {
+        return PrintOutOfMemory();
+    } catch (const std::bad_alloc&) {
+        return PrintOutOfMemory();
+    } catch (const xercesc::XMLException& exception) {
+        PrintError("\nAn error occurred\n Error: " + ToNarrow(exception.getMessage()) + "\n\n");
+        return PyramidDataset::kParseError;
+    } catch (const DocumentRefused&) {
+        return PyramidDataset::kParseError;  // reported where it was found
+    }
+}
+
+}  // namespace
+
+std::unique_ptr<xercesc::SAXParser> MakeDocumentParser() {
+    try {
+        return std::make_unique<BoundedParser<xercesc::SAXParser>>();
+    } catch (...) {
+        return nullptr;
+    }
+}
+
+bool PyramidDataset::LoadHeaderDocument() {
+    if (!File) return false;
+    if (TileDataStart == kHeaderOffset) return true;
+    // A start before the document wraps to a size that no file has.
+    HeaderSource = LoadText(*File, kHeaderOffset, TileDataStart - kHeaderOffset, "ORVAPYRHEADER");
+    HeaderLoaded = HeaderSource != nullptr;
+    return false;
+}
+
+bool PyramidDataset::ParseHeaderDocument(PyramidHeaderRecord& out) {
+    if (!HeaderLoaded && LoadHeaderDocument()) return true;
+    try {
+        PyramidXMLReaderHandlers<char> handlers;
+        if (ParseDocument(&handlers, HeaderSource, HeaderLoaded) != kParsed) return false;
+        out = handlers.header;
+        return true;
+    } catch (...) {
+        return false;
+    }
+}
+
+bool PyramidDataset::LoadMetaDocument() {
+    if (!File) return false;
+    const std::uint64_t size = File->Size();
+    if (MetaDocumentOffset >= size) return false;
+    MetaSource = LoadText(*File, MetaDocumentOffset, size - MetaDocumentOffset, "ORVAPYRMETA");
+    MetaLoaded = MetaSource != nullptr;
+    return MetaLoaded;
+}
+
+int PyramidDataset::ParseDocument(xercesc::HandlerBase* handlers,
+                                  std::unique_ptr<xercesc::MemBufInputSource>& source,
+                                  bool& loaded) {
+    if (!source || !Parser) return kParseError;
+    bool thrown = false;
+    int result = kParseError;
+    try {
+        result = Parse(*Parser, handlers, *source, thrown);
+    } catch (...) {
+        // Nothing else is thrown on purpose; a message that found no memory ends here.
+    }
+    if (thrown) {
+        // Out of memory leaves a parser that takes itself to be at work for good.
+        Parser = MakeDocumentParser();
+        source.reset();
+        loaded = false;
+    }
+    return result;
+}
+
+void PyramidDataset::ReadMetaTree() {
+    if (MetaLoaded || LoadMetaDocument()) {
+        MetaDocument = PyramidXMLDocument::Make();
+        if (MetaDocument) MetaDocument->ParseTree(*MetaSource);
+    } else if (File && File->Size() > MetaDocumentOffset && MetaDocument) {
+        // There is a document, and it cannot be had: without a tree nothing will overwrite it.
+        MetaDocument->DropTree();
+    }
+}
+
+}  // namespace zelm

@@ -1,0 +1,326 @@
+#include "pyramid/PyramidXMLReaderHandlers.h"
+
+#include <algorithm>
+#include <locale>
+#include <new>
+#include <sstream>
+
+#include <xercesc/sax/SAXParseException.hpp>
+
+#include "core/NumericConversion.h"
+#include "core/PixelVocabulary.h"
+#include "pyramid/NumberText.h"
+#include "pyramid/XercesText.h"
+
+namespace zelm {
+namespace {
+
+using enum ElementName;
+
+std::u16string_view View(const XMLCh* text) { return text ? text : std::u16string_view(); }
+
+void PrintMessage(const char* heading, const xercesc::SAXParseException& exception) {
+    try {
+        PrintError(heading + ToNarrow(exception.getSystemId()) + ", line " +
+                   FormatDecimal(exception.getLineNumber()) + ", char " +
+                   FormatDecimal(exception.getColumnNumber()) +
+                   "\n Message: " + ToNarrow(exception.getMessage()) + "\n");
+    } catch (...) {
+        // No memory for a message.
+    }
+}
+
+// Takes the text up to the next bar, or to the end, off the front; false if that was the last.
+bool TakeToken(std::string_view& text, std::string_view& token) {
+    const std::size_t bar = text.find('|');
+    token = text.substr(0, bar);
+    if (bar == std::string_view::npos) return false;
+    text.remove_prefix(bar + 1);
+    return true;
+}
+
+template <class Code>
+Code ReadWord(void (*parse)(std::istream&, Code&), std::string_view text) {
+    std::istringstream stream{std::string(text)};
+    stream.imbue(std::locale::classic());
+    Code code{};
+    parse(stream, code);
+    return code;
+}
+
+std::uint32_t ReadSource(std::string_view text) {
+    if (text == "Native") return HistogramSource::Native;
+    if (text == "Dynamic") return HistogramSource::Dynamic;
+    return text == "ORVA" ? HistogramSource::ORVA : 0;
+}
+
+// A value that 64 bits do not hold gives 2 to the 63: no top bit is added to a rest that has it.
+std::uint64_t ToUint64(double value) {
+    constexpr std::uint64_t top = std::uint64_t{1} << 63;
+    constexpr auto limit = static_cast<double>(top);
+    if (!(value > limit)) return static_cast<std::uint64_t>(TruncateToSigned<std::int64_t>(value));
+    const double rest = value - limit;
+    const auto low = static_cast<std::uint64_t>(TruncateToSigned<std::int64_t>(rest));
+    return rest < limit ? low | top : low;
+}
+
+template <class T>
+T ToPixel(double value) {
+    if constexpr (std::is_same_v<T, std::uint64_t>)
+        return ToUint64(value);
+    else
+        return FromDouble<T>(value);
+}
+
+// Array::Append grows by one element, which takes time in the square of their number.
+template <class T>
+void AppendGrowing(Array<T>& array, const T& value) {
+    const std::uint32_t count = array.shape.elements;
+    if (count == array.capacity) {
+        const std::unique_ptr<T[]> old(array.data);
+        if (!array.Reserve(std::max(8u, count * 2))) throw std::bad_alloc();
+    }
+    if (!array.Append(value)) throw std::bad_alloc();
+}
+
+}  // namespace
+
+void PyramidXMLReaderCore::startElement(const XMLCh* const name, xercesc::AttributeList&) {
+    const std::int32_t state = StateOf(FindElementName(View(name)));
+    stateStack.push_back(state);
+    if (state == StateOf(BANDSTATISTICS)) {
+        BeginStats();
+    } else if (state == StateOf(HISTOGRAMS)) {
+        BeginHistogram();
+    } else if (state == StateOf(PALETTE)) {
+        currentPalette.Clear();
+        paletteBand = 0;
+        ++openPalettes;
+    }
+}
+
+void PyramidXMLReaderCore::endElement(const XMLCh* const) {
+    if (stateStack.empty()) return;
+    const std::int32_t state = stateStack.back();
+    stateStack.pop_back();
+    if (state == StateOf(BANDSTATISTICS)) {
+        EndStats();
+    } else if (state == StateOf(HISTOGRAMS)) {
+        EndHistogram();
+    } else if (state == StateOf(PALETTE)) {
+        currentPalette.CopyTo(palettes[paletteBand]);
+        --openPalettes;
+    }
+}
+
+void PyramidXMLReaderCore::characters(const XMLCh* const text, const XMLSize_t length) {
+    const std::int32_t state = stateStack.empty() ? 0 : stateStack.back();
+    // The elements that hold elements, and those that nobody knows, have no text of their own.
+    if (state < StateOf(RSTC_LEVEL)) return;
+    NarrowAscii({text, length}, narrow);
+    const auto name = static_cast<ElementName>(state - 1);
+    if (name < HIST_LEVEL)
+        TakeStatsText(name, narrow);
+    else if (name < HEADER_VERSION_MAJOR)
+        TakeHistogramText(name, narrow);
+    else if (name < PALETTE_BAND)
+        TakeHeaderText(name, narrow);
+    else if (openPalettes != 0)
+        TakePaletteText(name, narrow);
+}
+
+void PyramidXMLReaderCore::TakeHeaderText(ElementName name, std::string_view text) {
+    switch (name) {
+        case HEADER_VERSION_MAJOR:
+            header.versionMajor = ReadInteger(text);
+            break;
+        case HEADER_VERSION_MINOR:
+            header.versionMinor = ReadInteger(text);
+            break;
+        case HEADER_BANDS:
+            header.bandCount = ReadInteger(text);
+            break;
+        case HEADER_PIXEL_WIDTH:
+            header.width = ReadInteger(text);
+            break;
+        case HEADER_PIXEL_HEIGHT:
+            header.height = ReadInteger(text);
+            break;
+        case HEADER_TILESIZE:
+            header.tileSize = ReadInteger(text);
+            break;
+        case HEADER_LEVELMIN:
+            header.levelMin = ReadInteger(text);
+            break;
+        case HEADER_LEVELMAX:
+            header.levelMax = ReadInteger(text);
+            break;
+        case HEADER_INTERLEAVE:
+            header.interleave = ReadWord(ParseInterleave, text);
+            break;
+        case HEADER_BUILD_METHOD:
+            header.tileOrdering = ReadWord(ParseTileOrder, text);
+            break;
+        case HEADER_PIXEL_TYPE:
+            header.pixelType = ReadWord(ParsePixelType, text);
+            break;
+        default:
+            break;
+    }
+}
+
+void PyramidXMLReaderCore::TakePaletteText(ElementName name, std::string_view text) {
+    if (name == PALETTE_BAND) {
+        paletteBand = ReadInteger(text);
+    } else if (name == PALETTE_COUNT) {
+        // Sets no length: the colours are counted. The lookup leaves a null colour behind.
+        currentPalette.GetColor(ReadInteger(text));
+    } else if (name == PALETTE_RGBA) {
+        unsigned char channels[4] = {};
+        std::string_view token;
+        bool more = true;
+        for (int i = 0; more && i < 4; ++i) {
+            more = TakeToken(text, token);
+            channels[i] =
+                static_cast<unsigned char>(TruncateToSigned<std::int64_t>(ReadReal(token)));
+        }
+        currentPalette.AddColor(RGBAColor(Array<unsigned char>(channels, ArrayShape(4))));
+    }
+}
+
+void PyramidXMLReaderCore::ReadCounts(std::string_view text, std::uint32_t binCount,
+                                      Array<std::uint64_t>& counts) {
+    if (binCount == 0) return;
+    if (!counts.data) {
+        const auto tokens =
+            static_cast<std::uint64_t>(std::count(text.begin(), text.end(), '|')) + 1;
+        const std::uint64_t spare = binCount > tokens ? binCount - tokens : 0;
+        if (spare > spareBins) return;
+        spareBins -= spare;
+        if (!counts.SetShape(ArrayShape(binCount))) throw std::bad_alloc();
+        std::fill_n(counts.data, binCount, 0);
+    }
+    // A later piece may come under another number of bins.
+    const std::uint32_t end = std::min(binCount, counts.shape.elements);
+    std::string_view token;
+    bool more = true;
+    for (std::uint32_t i = 0; more && i < end; ++i) {
+        more = TakeToken(text, token);
+        counts.data[i] = ToUint64(ReadReal(token));
+    }
+}
+
+void PyramidXMLReaderCore::warning(const xercesc::SAXParseException& exception) {
+    PrintMessage("\nWarning at file ", exception);
+}
+
+void PyramidXMLReaderCore::error(const xercesc::SAXParseException& exception) {
+    PrintMessage("\nError at file ", exception);
+}
+
+void PyramidXMLReaderCore::fatalError(const xercesc::SAXParseException& exception) {
+    PrintMessage("\nFatal Error at file ", exception);
+}
+
+template <class T>
+void PyramidXMLReaderHandlers<T>::BeginStats() {
+    pendingStats = std::make_unique<RasterBandStats<T>>();
+    pendingStats->band = initialBand;
+}
+
+template <class T>
+void PyramidXMLReaderHandlers<T>::EndStats() {
+    // Nothing is pending behind a record within a record.
+    if (pendingStats) AppendGrowing(bandStats, *pendingStats);
+    pendingStats.reset();
+}
+
+template <class T>
+void PyramidXMLReaderHandlers<T>::BeginHistogram() {
+    pendingHistogram = std::make_unique<RasterBandHistogram<T>>();
+    pendingHistogram->band = initialBand;
+}
+
+template <class T>
+void PyramidXMLReaderHandlers<T>::EndHistogram() {
+    if (pendingHistogram) AppendGrowing(histograms, *pendingHistogram);
+    pendingHistogram.reset();
+}
+
+template <class T>
+void PyramidXMLReaderHandlers<T>::TakeStatsText(ElementName name, std::string_view text) {
+    if (!pendingStats) return;
+    RasterBandStats<T>& stats = *pendingStats;
+    const auto take = [&](auto& field, std::uint32_t flag) {
+        field = ToPixel<std::remove_reference_t<decltype(field)>>(ReadReal(text));
+        stats.flags |= flag;
+    };
+    switch (name) {
+        case RSTC_BAND:
+            stats.band = ReadInteger(text);
+            break;
+        case RSTC_MINIMUM:
+            take(stats.minimum, StatsFlag::Minimum);
+            break;
+        case RSTC_MAXIMUM:
+            take(stats.maximum, StatsFlag::Maximum);
+            break;
+        case RSTC_MEAN:
+            take(stats.mean, StatsFlag::Mean);
+            break;
+        case RSTC_STANDARDDEVIATION:
+            take(stats.standardDeviation, StatsFlag::StandardDeviation);
+            break;
+        case RSTC_SUM:
+            take(stats.sum, StatsFlag::Sum);
+            break;
+        case RSTC_SUM2:
+            take(stats.sumOfSquares, StatsFlag::SumOfSquares);
+            break;
+        case RSTC_RMS:
+            take(stats.rootMeanSquare, StatsFlag::RootMeanSquare);
+            break;
+        default:
+            break;
+    }
+}
+
+template <class T>
+void PyramidXMLReaderHandlers<T>::TakeHistogramText(ElementName name, std::string_view text) {
+    if (!pendingHistogram) return;
+    RasterBandHistogram<T>& histogram = *pendingHistogram;
+    switch (name) {
+        case HIST_LEVEL:
+            histogram.level = ReadInteger(text);
+            break;
+        case HIST_BAND:
+            histogram.band = ReadInteger(text);
+            break;
+        case HIST_SOURCE:
+            histogram.source = ReadSource(text);
+            break;
+        case HIST_BINCOUNT:
+            histogram.binCount = ReadInteger(text);
+            break;
+        case HIST_BINSIZE:
+            histogram.binSize = ReadReal(text);
+            break;
+        case HIST_MIN:
+            histogram.minimum = ToPixel<T>(ReadReal(text));
+            break;
+        case HIST_MAX:
+            histogram.maximum = ToPixel<T>(ReadReal(text));
+            break;
+        case HIST_COUNTS:
+            ReadCounts(text, histogram.binCount, histogram.counts);
+            break;
+        default:
+            break;
+    }
+}
+
+#define ZMC_X(type, name, code) template class PyramidXMLReaderHandlers<type>;
+ZMC_ELEMENT_TYPES(ZMC_X)
+#undef ZMC_X
+
+}  // namespace zelm

@@ -1,0 +1,106 @@
+// PyramidXMLReaderHandlers<T>: turns the two documents of a pyramid file back into records.
+//
+// SAX callbacks over a stack of element states: the state on top decides what a piece of text
+// means, and nothing checks that an element has the right parent. One object serves one parse. T is
+// the element type of the pixels and matters for minima and maxima alone; the header is read by the
+// instance for char, because the type is not known before.
+//
+// The parser may deliver a text in pieces. Each piece is taken for a whole value: of a number the
+// last piece counts, and in a list each piece starts again from the first entry.
+//
+// Nothing here allocates by a number from the file: see kSpareBins.
+#ifndef ZMC_PYRAMID_PYRAMIDXMLREADERHANDLERS_H
+#define ZMC_PYRAMID_PYRAMIDXMLREADERHANDLERS_H
+
+#include <cstdint>
+#include <deque>
+#include <map>
+#include <memory>
+#include <string>
+#include <string_view>
+
+#include <xercesc/sax/HandlerBase.hpp>
+
+#include "colour/Palette.h"
+#include "core/Array.h"
+#include "pyramid/ElementNames.h"
+#include "pyramid/PyramidHeaderRecord.h"
+#include "raster/RasterBandHistogram.h"
+#include "raster/RasterBandStats.h"
+
+namespace zelm {
+
+// State of an open element: 0 for a name that is not in the list, else its place there counted from
+// 1, except that HEADER and PALETTE have changed places.
+constexpr std::int32_t StateOf(int position) {
+    if (position == static_cast<int>(ElementName::PALETTE)) return 5;
+    if (position == static_cast<int>(ElementName::HEADER)) return 4;
+    return position + 1;
+}
+constexpr std::int32_t StateOf(ElementName name) { return StateOf(static_cast<int>(name)); }
+
+// Bins that the histograms of one document may have beyond the entries of their lists, all
+// together. A histogram that would take more keeps no counts: it claims what its text cannot hold.
+inline constexpr std::uint64_t kSpareBins = 1u << 20;
+
+// The part that does not depend on the element type.
+class PyramidXMLReaderCore : public xercesc::HandlerBase {
+public:
+    static constexpr auto& elementNames = kElementNames;
+    static constexpr std::int32_t initialBand = 0;  // band of a record that names none
+
+    PyramidHeaderRecord header;
+    Palette currentPalette;
+    std::map<std::uint32_t, Palette> palettes;  // finished palettes, by band
+    std::deque<std::int32_t> stateStack;
+    std::uint32_t paletteBand = 0;
+
+    void startElement(const XMLCh* const name, xercesc::AttributeList& attributes) override;
+    void endElement(const XMLCh* const name) override;
+    void characters(const XMLCh* const text, const XMLSize_t length) override;
+
+    // Each prints a message to the standard error stream; none throws.
+    void warning(const xercesc::SAXParseException& exception) override;
+    void error(const xercesc::SAXParseException& exception) override;
+    void fatalError(const xercesc::SAXParseException& exception) override;
+
+protected:
+    virtual void BeginStats() = 0;
+    virtual void EndStats() = 0;
+    virtual void BeginHistogram() = 0;
+    virtual void EndHistogram() = 0;
+    virtual void TakeStatsText(ElementName name, std::string_view text) = 0;
+    virtual void TakeHistogramText(ElementName name, std::string_view text) = 0;
+
+    // Reads a list of counts into `counts`, which takes the length `binCount` from the first piece.
+    void ReadCounts(std::string_view text, std::uint32_t binCount, Array<std::uint64_t>& counts);
+
+private:
+    void TakeHeaderText(ElementName name, std::string_view text);
+    void TakePaletteText(ElementName name, std::string_view text);
+
+    std::uint64_t spareBins = kSpareBins;
+    std::uint32_t openPalettes = 0;
+    std::string narrow;  // the piece of text in hand
+};
+
+template <class T>
+class PyramidXMLReaderHandlers : public PyramidXMLReaderCore {
+public:
+    Array<RasterBandStats<T>> bandStats;       // finished records, in document order
+    Array<RasterBandHistogram<T>> histograms;  // likewise
+    std::unique_ptr<RasterBandStats<T>> pendingStats;
+    std::unique_ptr<RasterBandHistogram<T>> pendingHistogram;
+
+protected:
+    void BeginStats() override;
+    void EndStats() override;
+    void BeginHistogram() override;
+    void EndHistogram() override;
+    void TakeStatsText(ElementName name, std::string_view text) override;
+    void TakeHistogramText(ElementName name, std::string_view text) override;
+};
+
+}  // namespace zelm
+
+#endif

@@ -1,0 +1,180 @@
+// Where tiles lie: by formula in the orderings Scanline and Blocked, and along the Morton curve.
+#include <algorithm>
+#include <array>
+#include <bit>
+
+#include "pyramid/LevelGeometry.h"
+#include "pyramid/PyramidDataset.h"
+#include "pyramid/PyramidLimits.h"
+
+namespace zelm {
+namespace {
+
+// Lays one band of tiles of all levels along the Morton curve over the tile grid of level 0.
+//
+// A block is the square of 2^L x 2^L tiles that one tile of level L covers, and on the curve it is
+// one run. Its reduced tile is placed when the curve has left it, and that is noticed one tile
+// late: the first tile of the next block comes before it. The quadtree is descended in curve
+// order and quadrants outside the grid are skipped, so each tile is visited once.
+class MortonWalk {
+public:
+    MortonWalk(const LevelGeometry& levelZero, std::uint32_t levelMin, std::uint32_t levelMax,
+               std::uint32_t sampleBytes, std::uint64_t* offsets, std::uint64_t rowStride,
+               std::uint64_t start)
+        : grid(levelZero),
+          firstLevel(levelMin),
+          endLevel(EndLevel(levelZero.tileSize, levelMax)),
+          bytes(sampleBytes),
+          table(offsets),
+          stride(rowStride),
+          cursor(start) {
+        for (std::uint32_t level = 1; level < endLevel; ++level)
+            acrossAt[level] = TilesAcross(level);
+    }
+
+    // Places all tiles; the answer is the offset behind the last.
+    std::uint64_t Run() {
+        const std::uint32_t side = std::max(grid.tilesAcross, grid.tilesDown);
+        Descend(0, 0, static_cast<std::uint32_t>(std::bit_width(side - 1u)));
+        return cursor;
+    }
+
+private:
+    static constexpr std::uint32_t kNoBlock = 0xFFFFFFFFu;
+    struct Block {
+        std::uint32_t x = kNoBlock;
+        std::uint32_t y = kNoBlock;
+    };
+
+    // Above the logarithm of the tile size every tile shrinks to nothing: no blocks.
+    static std::uint32_t EndLevel(std::uint32_t tileSize, std::uint32_t levelMax) {
+        return std::min(static_cast<std::uint32_t>(std::bit_width(tileSize)), levelMax + 1u);
+    }
+
+    std::uint32_t TilesAcross(std::uint32_t level) const {
+        return LevelGeometry(grid.samples, 0, grid.tileSize, level).tilesAcross;
+    }
+
+    void Descend(std::uint32_t x, std::uint32_t y, std::uint32_t level) {
+        if (level == 0) return Visit(x, y);
+        const std::uint32_t half = 1u << (level - 1u);
+        const bool right = x + half < grid.tilesAcross;
+        const bool below = y + half < grid.tilesDown;
+        Descend(x, y, level - 1u);
+        if (right) Descend(x + half, y, level - 1u);
+        if (below) Descend(x, y + half, level - 1u);
+        if (right && below) Descend(x + half, y + half, level - 1u);
+        if (level < endLevel && level >= firstLevel) {
+            leftBlocks[level] = {x, y};
+            leftLevels |= 1u << level;
+        }
+    }
+
+    void Visit(std::uint32_t x, std::uint32_t y) {
+        if (firstLevel == 0) {
+            table[std::uint64_t{grid.tilesAcross} * y + x] = cursor;
+            Advance(grid.TileWidth(x), grid.TileHeight(y));
+        }
+        if (x == grid.tilesAcross - 1u && y == grid.tilesDown - 1u) return Finish(x, y);
+        while (leftLevels != 0) EmitLeft(static_cast<std::uint32_t>(std::countr_zero(leftLevels)));
+    }
+
+    // The last tile of the grid ends its own blocks at once, level by level.
+    void Finish(std::uint32_t x, std::uint32_t y) {
+        for (std::uint32_t level = std::max(firstLevel, 1u); level < endLevel; ++level) {
+            if (leftLevels >> level & 1u) EmitLeft(level);
+            Emit({x >> level << level, y >> level << level}, level);
+        }
+    }
+
+    void EmitLeft(std::uint32_t level) {
+        leftLevels &= ~(1u << level);
+        Emit(leftBlocks[level], level);
+    }
+
+    // A block whose tiles all shrink to nothing in one direction takes no place.
+    void Emit(const Block& block, std::uint32_t level) {
+        const std::uint32_t width = Reduced(block.x, grid.tilesAcross, grid.lastWidth, level);
+        const std::uint32_t height = Reduced(block.y, grid.tilesDown, grid.lastHeight, level);
+        if (width == 0 || height == 0) return;
+        const std::uint64_t tile =
+            std::uint64_t{acrossAt[level]} * (block.y >> level) + (block.x >> level);
+        table[level * stride + tile] = cursor;
+        Advance(width, height);
+    }
+
+    // Extent of a block at its level. Each tile is shifted by itself, and the bits lost with it:
+    // that differs from the level's own geometry where 2^L does not divide the tile size.
+    std::uint32_t Reduced(std::uint32_t first, std::uint32_t tiles, std::uint32_t last,
+                          std::uint32_t level) const {
+        const std::uint32_t covered = std::min(tiles - first, 1u << level);
+        const std::uint32_t whole = first + covered == tiles ? covered - 1u : covered;
+        return whole * (grid.tileSize >> level) + (whole != covered ? last >> level : 0u);
+    }
+
+    void Advance(std::uint32_t width, std::uint32_t height) {
+        cursor += std::uint64_t{width} * height * bytes;
+    }
+
+    const LevelGeometry grid;  // of level 0
+    const std::uint32_t firstLevel;
+    const std::uint32_t endLevel;
+    const std::uint32_t bytes;
+    std::uint64_t* const table;
+    const std::uint64_t stride;  // entries from level to level
+    std::uint64_t cursor;
+    std::array<std::uint32_t, 32> acrossAt{};
+    std::array<Block, 32> leftBlocks{};  // blocks that the curve has left, until they are placed
+    std::uint32_t leftLevels = 0;        // bit L: leftBlocks[L] waits
+};
+
+// Tiles of a level that the walk has placed: all of its grid, or none where tiles shrink to
+// nothing.
+std::uint64_t PlacedTiles(const LevelGeometry& levelZero, std::uint32_t level) {
+    if (level >= LevelGeometry::kLevelsWithPixels || levelZero.tileSize >> level == 0) return 0;
+    const LevelGeometry grid(levelZero.samples, levelZero.lines, levelZero.tileSize, level);
+    return std::uint64_t{grid.tilesAcross} * grid.tilesDown;
+}
+
+}  // namespace
+
+std::uint64_t PyramidDataset::GetTileOffset(std::uint32_t tileX, std::uint32_t tileY,
+                                            std::uint32_t level) const {
+    const LevelGeometry geometry(Samples, Lines, TileSize, level);
+    return geometry.TileOffset(tileX, tileY, std::uint64_t{BytesPerSample} * BandCount);
+}
+
+void PyramidDataset::BuildTileTable(std::uint32_t width, std::uint32_t height,
+                                    std::uint32_t tileWidth, std::uint32_t tileHeight,
+                                    std::uint32_t bands, std::uint32_t bytesPerSample) {
+    const LevelGeometry grid(width, height, tileWidth, 0);
+    const std::uint64_t tiles = std::uint64_t{grid.tilesAcross} * grid.tilesDown;
+    if (tileWidth == 0 || tileWidth != tileHeight ||
+        std::max(grid.tilesAcross, grid.tilesDown) > PyramidLimits::kMaxMortonTiles ||
+        LevelMax > PyramidLimits::kMaxLevel ||
+        PyramidLimits::TileTableBytes(tiles, bands, LevelMax) > PyramidLimits::kMaxTableBytes ||
+        !TileOffsets.SetShape(
+            ArrayShape(LevelMax + 1u, bands, static_cast<std::uint32_t>(tiles)))) {
+        TileOffsets.Clear();
+        return;
+    }
+    std::uint64_t* const table = TileOffsets.data;
+    std::fill_n(table, TileOffsets.shape.elements, 0);
+    if (tiles == 0 || bands == 0 || LevelMin > LevelMax) return;
+
+    const std::uint64_t start = TileCursor;
+    const std::uint64_t stride = tiles * bands;
+    const std::uint64_t end =
+        MortonWalk(grid, LevelMin, LevelMax, bytesPerSample, table, stride, start).Run();
+    TileCursor = start + (end - start) * bands;
+    // A later band lies as the first one does, by a constant further on.
+    for (std::uint32_t level = LevelMin; level <= LevelMax; ++level) {
+        const std::uint64_t* const row = table + level * stride;
+        const std::uint64_t placed = PlacedTiles(grid, level);
+        for (std::uint64_t band = 1; band < bands; ++band)
+            std::transform(row, row + placed, table + level * stride + band * tiles,
+                           [&](std::uint64_t offset) { return offset + (end - start) * band; });
+    }
+}
+
+}  // namespace zelm

@@ -1,0 +1,138 @@
+#include "platform/File.h"
+
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <filesystem>
+#include <string>
+#include <vector>
+
+namespace platform {
+namespace {
+
+// A directory of its own for every test, removed afterwards.
+class FileTest : public testing::Test {
+protected:
+    FileTest() {
+        std::string pattern = (std::filesystem::temp_directory_path() / "zmcfileXXXXXX").string();
+        directory = mkdtemp(pattern.data());
+    }
+    ~FileTest() override { std::filesystem::remove_all(directory); }
+
+    std::u16string Name(const char* leaf) const { return (directory / leaf).u16string(); }
+
+    std::filesystem::path directory;
+};
+
+TEST_F(FileTest, CreatesWritesAndReadsBack) {
+    const auto name = Name("a.bin");
+    const auto file = File::Open(name.c_str(), File::Mode::Create);
+    ASSERT_TRUE(file);
+    EXPECT_EQ(file->Size(), 0u);
+    EXPECT_EQ(file->WriteAt(3, "hello", 5), 5u);
+    EXPECT_EQ(file->Size(), 8u);
+    char buffer[9] = "........";
+    EXPECT_EQ(file->ReadAt(0, buffer, 8), 8u);
+    EXPECT_EQ(std::string(buffer, 8), std::string("\0\0\0hello", 8));
+    EXPECT_TRUE(file->Sync());
+}
+
+TEST_F(FileTest, ShortReadLeavesTheRestOfTheBuffer) {
+    const auto name = Name("a.bin");
+    const auto file = File::Open(name.c_str(), File::Mode::Create);
+    ASSERT_TRUE(file);
+    file->WriteAt(0, "abc", 3);
+    char buffer[6] = "xxxxx";
+    EXPECT_EQ(file->ReadAt(1, buffer, 5), 2u);
+    EXPECT_STREQ(buffer, "bcxxx");
+    EXPECT_EQ(file->ReadAt(100, buffer, 5), 0u);
+    EXPECT_STREQ(buffer, "bcxxx");
+}
+
+TEST_F(FileTest, CreateEmptiesAndUpdateKeeps) {
+    const auto name = Name("a.bin");
+    File::Open(name.c_str(), File::Mode::Create)->WriteAt(0, "abc", 3);
+    EXPECT_EQ(File::Open(name.c_str(), File::Mode::Update)->Size(), 3u);
+    EXPECT_EQ(File::Open(name.c_str(), File::Mode::Create)->Size(), 0u);
+}
+
+TEST_F(FileTest, UpdateAndReadDoNotMakeFiles) {
+    const auto name = Name("missing");
+    EXPECT_FALSE(File::Open(name.c_str(), File::Mode::Update));
+    EXPECT_FALSE(File::Open(name.c_str(), File::Mode::Read));
+    EXPECT_FALSE(std::filesystem::exists(directory / "missing"));
+}
+
+TEST_F(FileTest, ReadModeDoesNotWrite) {
+    const auto name = Name("a.bin");
+    File::Open(name.c_str(), File::Mode::Create)->WriteAt(0, "abc", 3);
+    const auto file = File::Open(name.c_str(), File::Mode::Read);
+    ASSERT_TRUE(file);
+    EXPECT_EQ(file->WriteAt(0, "x", 1), 0u);
+    EXPECT_EQ(file->Size(), 3u);
+}
+
+TEST_F(FileTest, DirectoriesPipesAndDevicesAreRefusedAtOnce) {
+    const auto pipe = Name("pipe");
+    ASSERT_EQ(mkfifo((directory / "pipe").c_str(), 0600), 0);
+    for (const auto mode : {File::Mode::Create, File::Mode::Update, File::Mode::Read}) {
+        EXPECT_FALSE(File::Open(directory.u16string().c_str(), mode));
+        EXPECT_FALSE(File::Open(pipe.c_str(), mode));
+        EXPECT_FALSE(File::Open(u"/dev/null", mode));
+    }
+}
+
+TEST_F(FileTest, NoNameOpensNothing) {
+    EXPECT_FALSE(File::Open(nullptr, File::Mode::Read));
+    EXPECT_FALSE(File::Open(u"", File::Mode::Create));
+    EXPECT_FALSE(RemoveFile(nullptr));
+}
+
+TEST_F(FileTest, NamesOutsideAsciiAreUtf8) {
+    const std::u16string name = directory.u16string() + u"/Stra\u00dfe \u5730\u56fe \U0001F5FA.pyr";
+    ASSERT_TRUE(File::Open(name.c_str(), File::Mode::Create));
+    EXPECT_EQ(access((directory / u8"Stra\u00dfe \u5730\u56fe \U0001F5FA.pyr").c_str(), F_OK), 0);
+    EXPECT_TRUE(RemoveFile(name.c_str()));
+    EXPECT_FALSE(RemoveFile(name.c_str()));
+}
+
+TEST_F(FileTest, MovesBytesBeyondFourGigabytes) {
+    const auto name = Name("big.bin");
+    const auto file = File::Open(name.c_str(), File::Mode::Create);
+    ASSERT_TRUE(file);
+    const std::uint64_t far = (std::uint64_t{5} << 30) + 7;
+    EXPECT_EQ(file->WriteAt(far, "end", 3), 3u);
+    EXPECT_EQ(file->Size(), far + 3);
+    char buffer[4] = {};
+    EXPECT_EQ(file->ReadAt(far, buffer, 3), 3u);
+    EXPECT_STREQ(buffer, "end");
+}
+
+TEST_F(FileTest, OffsetsBeyondTheSystemsRangeMoveNothing) {
+    const auto name = Name("a.bin");
+    const auto file = File::Open(name.c_str(), File::Mode::Create);
+    ASSERT_TRUE(file);
+    char byte = 'x';
+    for (const std::uint64_t offset : {std::uint64_t{1} << 63, ~std::uint64_t{0}}) {
+        EXPECT_EQ(file->WriteAt(offset, &byte, 1), 0u);
+        EXPECT_EQ(file->ReadAt(offset, &byte, 1), 0u);
+    }
+    EXPECT_EQ(file->WriteAt((std::uint64_t{1} << 63) - 1, &byte, 1), 0u);
+    EXPECT_EQ(file->Size(), 0u);
+}
+
+TEST_F(FileTest, ChildrenDoNotInheritTheHandle) {
+    const int before = open("/dev/null", O_RDONLY | O_CLOEXEC);
+    close(before);  // the lowest free number, which the next open takes
+    const auto name = Name("a.bin");
+    const auto file = File::Open(name.c_str(), File::Mode::Create);
+    ASSERT_TRUE(file);
+    const int flags = fcntl(before, F_GETFD);
+    ASSERT_GE(flags, 0);
+    EXPECT_NE(flags & FD_CLOEXEC, 0);
+}
+
+}  // namespace
+}  // namespace platform

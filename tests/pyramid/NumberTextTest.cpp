@@ -1,0 +1,106 @@
+#include "pyramid/NumberText.h"
+
+#include <gtest/gtest.h>
+#include <rapidcheck/gtest.h>
+
+#include <clocale>
+#include <cmath>
+#include <cstdio>
+#include <cstdlib>
+#include <limits>
+#include <locale>
+
+namespace zelm {
+namespace {
+
+bool SameReal(double a, double b) { return a == b || (std::isnan(a) && std::isnan(b)); }
+
+RC_GTEST_PROP(NumberText, RealsAreWrittenAsPrintfDoes, (double value)) {
+    char text[64];
+    std::snprintf(text, sizeof text, "%.15g", value);
+    RC_ASSERT(FormatReal(value, 15) == text);
+    std::snprintf(text, sizeof text, "%.6g", value);
+    RC_ASSERT(FormatReal(value, 6) == text);
+}
+
+RC_GTEST_PROP(NumberText, RealsAreReadAsTheLibraryDoes, ()) {
+    const auto text = *rc::gen::container<std::string>(
+        rc::gen::elementOf(std::string(" \t+-..0011223789eExXinfaNp,")));
+    RC_ASSERT(SameReal(ReadReal(text), std::strtod(text.c_str(), nullptr)));
+}
+
+RC_GTEST_PROP(NumberText, WhatWasWrittenIsReadBack, (double value, std::int64_t integer)) {
+    RC_ASSERT(SameReal(ReadReal(FormatReal(value, 17)), value));
+    RC_ASSERT(ReadInteger(FormatDecimal(integer)) == static_cast<std::uint32_t>(integer));
+}
+
+RC_GTEST_PROP(NumberText, IntegersAreReadAsTheLibraryDoes, ()) {
+    const auto text =
+        *rc::gen::container<std::string>(rc::gen::elementOf(std::string(" \t+--0123456789ax.")));
+    errno = 0;
+    const long expected = std::strtol(text.c_str(), nullptr, 10);
+    RC_PRE(errno == 0);
+    RC_ASSERT(ReadInteger(text) == static_cast<std::uint32_t>(expected));
+}
+
+TEST(NumberText, EdgesOfReals) {
+    EXPECT_EQ(ReadReal(""), 0);
+    EXPECT_EQ(ReadReal("none"), 0);
+    EXPECT_EQ(ReadReal("--1"), 0);
+    EXPECT_EQ(ReadReal("+-1"), 0);
+    EXPECT_EQ(ReadReal("\n\t 12.5 7"), 12.5);
+    EXPECT_EQ(ReadReal("1,5"), 1);
+    EXPECT_EQ(ReadReal("1e999"), std::numeric_limits<double>::infinity());
+    EXPECT_EQ(ReadReal("-1e999"), -std::numeric_limits<double>::infinity());
+    EXPECT_EQ(ReadReal("1e-999"), 0);
+    EXPECT_EQ(ReadReal("0x10"), 16);
+    EXPECT_TRUE(std::isnan(ReadReal("-nan")));
+    EXPECT_EQ(ReadReal("inf"), std::numeric_limits<double>::infinity());
+}
+
+TEST(NumberText, EdgesOfIntegers) {
+    EXPECT_EQ(ReadInteger(""), 0u);
+    EXPECT_EQ(ReadInteger("abc"), 0u);
+    EXPECT_EQ(ReadInteger("12abc"), 12u);
+    EXPECT_EQ(ReadInteger("-1"), 4294967295u);
+    EXPECT_EQ(ReadInteger("4294967295"), 4294967295u);
+    EXPECT_EQ(ReadInteger("99999999999999999999999999"), 4294967295u);
+}
+
+TEST(NumberText, CharactersAreNumbers) {
+    EXPECT_EQ(FormatPixel(char{-3}), "-3");
+    EXPECT_EQ(FormatPixel(static_cast<unsigned char>(200)), "200");
+}
+
+TEST(NumberText, PixelsHaveTheDigitsOfTheirType) {
+    EXPECT_EQ(FormatPixel(1.0f / 3), "0.333333");
+    EXPECT_EQ(FormatPixel(1.0 / 3), "0.333333333333333");
+    EXPECT_EQ(FormatPixel(1e20), "1e+20");
+    EXPECT_EQ(FormatPixel(Complex<float>(1.5f, 2.5f)), "1.5 2.5");
+    EXPECT_EQ(FormatPixel(Complex<double>(1.0 / 3, -2e10)), "0.333333 -2e+10");
+    EXPECT_EQ(FormatPixel(std::numeric_limits<std::int64_t>::min()), "-9223372036854775808");
+    EXPECT_EQ(FormatPixel(std::numeric_limits<std::uint64_t>::max()), "18446744073709551615");
+}
+
+// A locale with a comma for the point and groups of thousands, for C and C++ alike.
+struct CommaPunctuation : std::numpunct<char> {
+    char do_decimal_point() const override { return ','; }
+    char do_thousands_sep() const override { return '.'; }
+    std::string do_grouping() const override { return "\3"; }
+};
+
+TEST(NumberText, DoesNotDependOnTheLocale) {
+    const std::string before = std::setlocale(LC_ALL, nullptr);
+    const std::locale old =
+        std::locale::global(std::locale(std::locale::classic(), new CommaPunctuation));
+    for (const char* name : {"de_DE.UTF-8", "fr_FR.UTF-8"}) std::setlocale(LC_ALL, name);
+    EXPECT_EQ(FormatReal(1234567.5, 15), "1234567.5");
+    EXPECT_EQ(FormatDecimal(1234567), "1234567");
+    EXPECT_EQ(ReadReal("1234.5"), 1234.5);
+    EXPECT_EQ(ReadReal("1.5e999"), std::numeric_limits<double>::infinity());
+    std::locale::global(old);
+    std::setlocale(LC_ALL, before.c_str());
+}
+
+}  // namespace
+}  // namespace zelm
