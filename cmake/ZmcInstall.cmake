@@ -13,17 +13,9 @@ set(ZMC_INSTALL_CMAKEDIR "${CMAKE_INSTALL_LIBDIR}/cmake/zmcraster")
 set(ZMC_INSTALL_MODULEDIR "${CMAKE_INSTALL_LIBDIR}/zmcraster")
 set(ZMC_INSTALL_HEADERDIR "${CMAKE_INSTALL_INCLUDEDIR}/zmcraster")
 
-# What hosts link, and the module itself. Libraries of the host's side are there when built.
-set(linked zmctext zmccore zmcg)
-foreach(target zmcplatform zmchost)
-    if(TARGET ${target})
-        list(APPEND linked ${target})
-    endif()
-endforeach()
-set(loaded zmcraster)
-if(TARGET zmcpe)
-    list(APPEND loaded zmcpe)
-endif()
+# What hosts link, and what is loaded: the module and the projection engine.
+set(linked zmctext zmcplatform zmccore zmccoordsys zmcg zmchost)
+set(loaded zmcraster zmcpe)
 set_target_properties(${loaded} PROPERTIES INSTALL_RPATH "$ORIGIN;$ORIGIN/..")
 
 install(TARGETS ${linked} EXPORT zmcrasterTargets
@@ -35,31 +27,24 @@ install(TARGETS ${loaded} EXPORT zmcrasterTargets
     RUNTIME DESTINATION ${ZMC_INSTALL_MODULEDIR})
 
 # Headers: floors that are public as a whole, and the interfaces of the others.
-install(DIRECTORY core metadata colour dispatch zmcg
+install(DIRECTORY platform core metadata colour dispatch zmcg coordsys host
     DESTINATION ${ZMC_INSTALL_HEADERDIR} FILES_MATCHING PATTERN "*.h")
 set(interfaces
     connection/DataConnection.h
     connection/DataConnectionFactory.h
     connection/RasterDataConnection.h
-    platform/CriticalSection.h
     raster/BasicRasterReader.h
     raster/RasterBandHistogram.h
     raster/RasterBandStats.h
     raster/RasterProps.h
-    raster/RasterReader.h)
+    raster/RasterReader.h
+    zmcpe/CoordSysImpl.h)
 foreach(header ${interfaces})
     get_filename_component(folder ${header} DIRECTORY)
     install(FILES ${header} DESTINATION ${ZMC_INSTALL_HEADERDIR}/${folder})
 endforeach()
-if(TARGET zmchost)
-    install(DIRECTORY host DESTINATION ${ZMC_INSTALL_HEADERDIR} FILES_MATCHING PATTERN "*.h")
-endif()
 
 # The CMake package. A host library brings Xerces, which the module needs ready, along.
-set(ZMC_PACKAGE_NEEDS_XERCES OFF)
-if(TARGET zmchost)
-    set(ZMC_PACKAGE_NEEDS_XERCES ON)
-endif()
 install(EXPORT zmcrasterTargets NAMESPACE zmcraster:: DESTINATION ${ZMC_INSTALL_CMAKEDIR})
 configure_package_config_file(
     ${CMAKE_CURRENT_LIST_DIR}/zmcraster-config.cmake.in
