@@ -13,9 +13,9 @@ set(ZMC_INSTALL_CMAKEDIR "${CMAKE_INSTALL_LIBDIR}/cmake/zmcraster")
 set(ZMC_INSTALL_MODULEDIR "${CMAKE_INSTALL_LIBDIR}/zmcraster")
 set(ZMC_INSTALL_HEADERDIR "${CMAKE_INSTALL_INCLUDEDIR}/zmcraster")
 
-# What hosts link, and the module itself. Libraries of the host's side are there when built.
-set(linked zmctext zmccore zmcg)
-foreach(target zmcplatform zmchost)
+# What hosts link, users before what they use, and the module itself.
+set(linked "")
+foreach(target zmchost zmccoordsys zmccore zmcplatform zmctext zmcg)
     if(TARGET ${target})
         list(APPEND linked ${target})
     endif()
@@ -35,13 +35,14 @@ install(TARGETS ${loaded} EXPORT zmcrasterTargets
     RUNTIME DESTINATION ${ZMC_INSTALL_MODULEDIR})
 
 # Headers: floors that are public as a whole, and the interfaces of the others.
-install(DIRECTORY core metadata colour dispatch zmcg
+install(DIRECTORY core metadata colour dispatch coordsys zmcg
     DESTINATION ${ZMC_INSTALL_HEADERDIR} FILES_MATCHING PATTERN "*.h")
 set(interfaces
     connection/DataConnection.h
     connection/DataConnectionFactory.h
     connection/RasterDataConnection.h
     platform/CriticalSection.h
+    platform/LoadableLibrary.h
     raster/BasicRasterReader.h
     raster/RasterBandHistogram.h
     raster/RasterBandStats.h
@@ -73,6 +74,8 @@ install(FILES ${CMAKE_CURRENT_BINARY_DIR}/zmcraster-config.cmake
     DESTINATION ${ZMC_INSTALL_CMAKEDIR})
 
 # The pkg-config file finds its prefix from its own place, so that an install can be moved.
+list(TRANSFORM linked PREPEND "-l" OUTPUT_VARIABLE ZMC_PC_LIBS)
+list(JOIN ZMC_PC_LIBS " " ZMC_PC_LIBS)
 set(ZMC_PC_DIR "${CMAKE_INSTALL_LIBDIR}/pkgconfig")
 file(RELATIVE_PATH ZMC_PC_PREFIX "/${ZMC_PC_DIR}" "/")
 string(REGEX REPLACE "/$" "" ZMC_PC_PREFIX "${ZMC_PC_PREFIX}")
