@@ -13,8 +13,8 @@ set(ZMC_INSTALL_CMAKEDIR "${CMAKE_INSTALL_LIBDIR}/cmake/zmcraster")
 set(ZMC_INSTALL_MODULEDIR "${CMAKE_INSTALL_LIBDIR}/zmcraster")
 set(ZMC_INSTALL_HEADERDIR "${CMAKE_INSTALL_INCLUDEDIR}/zmcraster")
 
-# What hosts link, and what is loaded: the module and the projection engine.
-set(linked zmctext zmcplatform zmccore zmccoordsys zmcg zmchost)
+# What hosts link, users before what they use, and the module itself.
+set(linked zmchost zmccoordsys zmccore zmcplatform zmctext zmcg)
 set(loaded zmcraster zmcpe)
 set_target_properties(${loaded} PROPERTIES INSTALL_RPATH "$ORIGIN;$ORIGIN/..")
 
@@ -27,7 +27,7 @@ install(TARGETS ${loaded} EXPORT zmcrasterTargets
     RUNTIME DESTINATION ${ZMC_INSTALL_MODULEDIR})
 
 # Headers: floors that are public as a whole, and the interfaces of the others.
-install(DIRECTORY platform core metadata colour dispatch zmcg coordsys host
+install(DIRECTORY platform core metadata colour dispatch coordsys zmcg host
     DESTINATION ${ZMC_INSTALL_HEADERDIR} FILES_MATCHING PATTERN "*.h")
 set(interfaces
     connection/DataConnection.h
@@ -44,7 +44,7 @@ foreach(header ${interfaces})
     install(FILES ${header} DESTINATION ${ZMC_INSTALL_HEADERDIR}/${folder})
 endforeach()
 
-# The CMake package. A host library brings Xerces, which the module needs ready, along.
+# The CMake package.
 install(EXPORT zmcrasterTargets NAMESPACE zmcraster:: DESTINATION ${ZMC_INSTALL_CMAKEDIR})
 configure_package_config_file(
     ${CMAKE_CURRENT_LIST_DIR}/zmcraster-config.cmake.in
@@ -58,6 +58,8 @@ install(FILES ${CMAKE_CURRENT_BINARY_DIR}/zmcraster-config.cmake
     DESTINATION ${ZMC_INSTALL_CMAKEDIR})
 
 # The pkg-config file finds its prefix from its own place, so that an install can be moved.
+list(TRANSFORM linked PREPEND "-l" OUTPUT_VARIABLE ZMC_PC_LIBS)
+list(JOIN ZMC_PC_LIBS " " ZMC_PC_LIBS)
 set(ZMC_PC_DIR "${CMAKE_INSTALL_LIBDIR}/pkgconfig")
 file(RELATIVE_PATH ZMC_PC_PREFIX "/${ZMC_PC_DIR}" "/")
 string(REGEX REPLACE "/$" "" ZMC_PC_PREFIX "${ZMC_PC_PREFIX}")

@@ -1,6 +1,11 @@
 # Installs the build at ZMC_BUILD into an empty ZMC_PREFIX and looks at what stands there.
 cmake_minimum_required(VERSION 3.25)
 file(REMOVE_RECURSE ${ZMC_PREFIX})
+# Hosts that an earlier run configured remember what they found then.
+get_filename_component(scratch ${ZMC_PREFIX} DIRECTORY)
+foreach(consume package pkgconfig subdirectory)
+    file(REMOVE ${scratch}/${consume}/CMakeCache.txt)
+endforeach()
 execute_process(COMMAND ${CMAKE_COMMAND} --install ${ZMC_BUILD} --prefix ${ZMC_PREFIX}
     COMMAND_ERROR_IS_FATAL ANY OUTPUT_QUIET)
 foreach(file
