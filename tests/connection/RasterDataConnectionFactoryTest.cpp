@@ -6,6 +6,7 @@
 
 #include "connection/RasterDataConnection.h"
 #include "tests/support/MemoryRaster.h"
+#include "tests/support/XercesEnvironment.h"
 
 namespace zelm::test {
 namespace {
