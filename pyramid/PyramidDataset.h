@@ -199,6 +199,7 @@ private:
     PyramidHeaderRecord MakeHeaderRecord() const;
     void TakeHeaderRecord(const PyramidHeaderRecord& header);
     bool ReadFixedFields();
+    bool CountsAsComplete(std::uint64_t fileSize) const;
     bool LayOutLevels();
     bool EnsureTileTable();
     // Judges a transfer that has something to move, and makes sure of the tile table.
