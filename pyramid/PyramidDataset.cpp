@@ -48,13 +48,11 @@ PyramidDataset::PyramidDataset(String fileName, RasterProps props)
       Interleave(props.interleave),
       TileOrdering(OrderingFor(props)),
       FileName(fileName),
-      BytesPerSample(PixelSize(props.pixelType)) {
-    BuildDocumentTools();
-}
+      BytesPerSample(PixelSize(props.pixelType)),
+      Parser(MakeDocumentParser()) {}
 
-PyramidDataset::PyramidDataset(String fileName) : FileName(fileName), SourceName(fileName) {
-    BuildDocumentTools();
-}
+PyramidDataset::PyramidDataset(String fileName)
+    : FileName(fileName), SourceName(fileName), Parser(MakeDocumentParser()) {}
 
 PyramidDataset::~PyramidDataset() = default;
 
@@ -149,12 +147,6 @@ void PyramidDataset::DeleteFile() {
     File.reset();
     platform::RemoveFile(FileName.wide);
     HasPyramid = false;
-}
-
-void PyramidDataset::BuildDocumentTools() {
-    MetaDocument = PyramidXMLDocument::Make();
-    if (MetaDocument) MetaDocument->CreateDocument();
-    Parser = MakeDocumentParser();
 }
 
 PyramidHeaderRecord PyramidDataset::MakeHeaderRecord() const {
