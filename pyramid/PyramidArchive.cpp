@@ -45,7 +45,7 @@ bool ParseMeta(PyramidDataset& dataset, bool withoutText, Take take) {
 template <class Append>
 bool Store(PyramidDataset& dataset, Append append) {
     if (!dataset.Writable || !dataset.File) return false;
-    PyramidXMLDocument* document = dataset.MetaDocument.get();
+    PyramidXMLDocument* document = dataset.EnsureMetaDocument();
     if (!document || !document->document) return false;
     const std::uint32_t before = document->RecordCount();
     if (!append(*document)) {

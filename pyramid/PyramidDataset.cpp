@@ -48,13 +48,11 @@ PyramidDataset::PyramidDataset(String fileName, RasterProps props)
       Interleave(props.interleave),
       TileOrdering(OrderingFor(props)),
       FileName(fileName),
-      BytesPerSample(PixelSize(props.pixelType)) {
-    BuildDocumentTools();
-}
+      BytesPerSample(PixelSize(props.pixelType)),
+      Parser(MakeDocumentParser()) {}
 
-PyramidDataset::PyramidDataset(String fileName) : FileName(fileName), SourceName(fileName) {
-    BuildDocumentTools();
-}
+PyramidDataset::PyramidDataset(String fileName)
+    : FileName(fileName), SourceName(fileName), Parser(MakeDocumentParser()) {}
 
 PyramidDataset::~PyramidDataset() = default;
 
@@ -70,13 +68,12 @@ bool PyramidDataset::OpenFile(bool create) {
 
 // False for a file of another kind, or one too short for the header that it announces.
 bool PyramidDataset::ReadFixedFields() {
-    unsigned char magic[sizeof kMagic] = {};
-    File->ReadAt(0, magic, sizeof magic);
-    if (!std::equal(std::begin(magic), std::end(magic), kMagic)) return false;
-    unsigned char offsets[kOffsetsSize] = {};
-    if (File->ReadAt(kOffsetsOffset, offsets, sizeof offsets) != sizeof offsets) return false;
-    TileDataStart = DecodeUint64(offsets);
-    MetaDocumentOffset = DecodeUint64(offsets + 8);
+    unsigned char fields[kHeaderOffset] = {};
+    const std::size_t read = File->ReadAt(0, fields, sizeof fields);
+    if (!std::equal(std::begin(kMagic), std::end(kMagic), fields) || read != sizeof fields)
+        return false;
+    TileDataStart = DecodeUint64(fields + kOffsetsOffset);
+    MetaDocumentOffset = DecodeUint64(fields + kOffsetsOffset + 8);
     return TileDataStart >= kHeaderOffset && TileDataStart <= File->Size();
 }
 
@@ -88,8 +85,10 @@ bool PyramidDataset::ReadHeader() {
     // Not a failure, by the rules of the format: such a file opens, and refuses its tiles.
     if (TileSize > kMaxTileSize) return false;
     if (!PyramidLimits::Allow(header) || !LayOutLevels()) return true;
-    HasPyramid = CheckPyramidComplete();
-    ReadMetaTree();
+    // The file was opened a moment ago: CheckPyramidComplete would open it once more.
+    const std::uint64_t size = File->Size();
+    HasPyramid = CountsAsComplete(size);
+    if (size > MetaDocumentOffset) ReadMetaTree();
     return false;
 }
 
@@ -135,21 +134,19 @@ bool PyramidDataset::RefreshPyramidState() {
 }
 
 bool PyramidDataset::CheckPyramidComplete() {
-    if (!OpenFile(false)) return false;
-    if (VersionMajor == 0 || (VersionMajor == 1 && VersionMinor == 0)) return false;
-    return File->Size() >= TileDataEnd;
+    return OpenFile(false) && CountsAsComplete(File->Size());
+}
+
+// Files of version 1.0 never do, however long they are.
+bool PyramidDataset::CountsAsComplete(std::uint64_t fileSize) const {
+    const bool outdated = VersionMajor == 0 || (VersionMajor == 1 && VersionMinor == 0);
+    return !outdated && fileSize >= TileDataEnd;
 }
 
 void PyramidDataset::DeleteFile() {
     File.reset();
     platform::RemoveFile(FileName.wide);
     HasPyramid = false;
-}
-
-void PyramidDataset::BuildDocumentTools() {
-    MetaDocument = PyramidXMLDocument::Make();
-    if (MetaDocument) MetaDocument->CreateDocument();
-    Parser = MakeDocumentParser();
 }
 
 PyramidHeaderRecord PyramidDataset::MakeHeaderRecord() const {

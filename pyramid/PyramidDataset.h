@@ -75,7 +75,9 @@ public:
     std::unique_ptr<std::uint64_t[]> LevelOffsets;  // LevelMax + 1 entries
     std::uint64_t TileDataStart = 0;
     std::uint64_t MetaDocumentOffset = 0;
-    std::unique_ptr<PyramidXMLDocument> MetaDocument;    // tree of the metadata document
+    // Tree of the metadata document; null until the file's text or a store calls for one, since
+    // making it would be a fifth of the time of an open.
+    std::unique_ptr<PyramidXMLDocument> MetaDocument;
     std::unique_ptr<PyramidXMLDocument> HeaderDocument;  // only while CreateFile runs
     std::unique_ptr<xercesc::SAXParser> Parser;          // for both documents
     std::unique_ptr<xercesc::MemBufInputSource> MetaSource;
@@ -164,6 +166,9 @@ public:
                       std::unique_ptr<xercesc::MemBufInputSource>& source, bool& loaded);
     // Builds the tree of MetaDocument from the file's text, if it has any.
     void ReadMetaTree();
+    // MetaDocument, made with an empty tree if there is none yet; null if memory ran out, now or
+    // when the file's own text was read.
+    PyramidXMLDocument* EnsureMetaDocument();
 
     // --- archive of statistics, histograms and palettes (PyramidArchive.cpp) ---
     // A record with that band number exists.
@@ -195,10 +200,10 @@ public:
 private:
     friend class TileTransfer;
 
-    void BuildDocumentTools();
     PyramidHeaderRecord MakeHeaderRecord() const;
     void TakeHeaderRecord(const PyramidHeaderRecord& header);
     bool ReadFixedFields();
+    bool CountsAsComplete(std::uint64_t fileSize) const;
     bool LayOutLevels();
     bool EnsureTileTable();
     // Judges a transfer that has something to move, and makes sure of the tile table.
@@ -211,6 +216,7 @@ private:
     // Null if memory ran out.
     unsigned char* WorkSpace(std::uint64_t bytes);
 
+    bool metaTreeLost = false;  // the file's text found no memory: nothing may replace it
     std::uint64_t tileScratchBytes = 0;
     std::unique_ptr<unsigned char[]> workBuffer;
     std::uint64_t workBufferBytes = 0;

@@ -146,10 +146,20 @@ void PyramidDataset::ReadMetaTree() {
     if (MetaLoaded || LoadMetaDocument()) {
         MetaDocument = PyramidXMLDocument::Make();
         if (MetaDocument) MetaDocument->ParseTree(*MetaSource);
-    } else if (File && File->Size() > MetaDocumentOffset && MetaDocument) {
+        metaTreeLost = !MetaDocument;
+    } else if (File && File->Size() > MetaDocumentOffset) {
         // There is a document, and it cannot be had: without a tree nothing will overwrite it.
-        MetaDocument->DropTree();
+        MetaDocument = PyramidXMLDocument::Make();
+        metaTreeLost = !MetaDocument;
     }
+}
+
+PyramidXMLDocument* PyramidDataset::EnsureMetaDocument() {
+    if (!MetaDocument && !metaTreeLost) {
+        MetaDocument = PyramidXMLDocument::Make();
+        if (MetaDocument) MetaDocument->CreateDocument();
+    }
+    return MetaDocument.get();
 }
 
 }  // namespace zelm

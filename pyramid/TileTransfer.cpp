@@ -18,7 +18,7 @@ namespace zelm {
 namespace {
 
 // Work space of one run of rows, small enough for the second-level cache.
-constexpr std::uint64_t kRunBytes = std::uint64_t{256} << 10;
+constexpr std::uint64_t kRunBytes = std::uint64_t{128} << 10;
 // Planes that are gathered together: more of them would make their runs too short to read.
 constexpr std::uint32_t kPlanesTogether = 16;
 constexpr std::uint64_t kTransferLimit = std::uint64_t{1} << 32;

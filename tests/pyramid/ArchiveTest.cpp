@@ -4,6 +4,7 @@
 #include <cmath>
 #include <filesystem>
 #include <limits>
+#include <random>
 
 #include "core/NumericConversion.h"
 #include "pyramid/NumberText.h"
@@ -515,6 +516,62 @@ TEST_F(ArchiveTest, HeaderLoadingAnswersInItsOwnSense) {
     EXPECT_TRUE(dataset.HeaderLoaded);
     EXPECT_TRUE(dataset.ParseHeaderDocument(record));
     EXPECT_EQ(record.width, 10u);
+}
+
+// Whatever is done to a file, opening it and asking for everything ends, and ends well.
+TEST_F(ArchiveTest, DamagedFilesAreOpenedOrRefused) {
+    {
+        const auto dataset = Make();
+        RasterBandHistogram<T> histogram;
+        histogram.binCount = 4;
+        Palette palette;
+        palette.AddColor(ColorOf(1, 2, 3, 4));
+        dataset->SetBandStats(ArrayOf({StatsOf<T>(0, 1)}));
+        dataset->SetHistograms(ArrayOf({histogram}));
+        dataset->SetPalette(0, palette);
+    }
+    const std::string whole = ReadWholeFile(name);
+    std::mt19937 random(7);
+    const auto below = [&](std::size_t n) { return random() % n; };
+    Stderr messages;
+    int opened = 0;
+    for (int round = 0; round < 2000; ++round) {
+        std::string bytes = whole;
+        for (std::size_t change = 0; change <= below(3); ++change) {
+            const std::size_t at = below(bytes.size()), length = below(12);
+            switch (below(5)) {
+                case 0:
+                    bytes[at] = static_cast<char>(random());
+                    break;
+                case 1:
+                    bytes[at] = "0123456789<>/|&"[below(15)];
+                    break;
+                case 2:
+                    bytes.erase(at, length);
+                    break;
+                case 3:
+                    bytes.insert(at, bytes.substr(below(bytes.size()), length));
+                    break;
+                default:
+                    bytes.resize(std::max<std::size_t>(at, 1));
+                    break;
+            }
+        }
+        WriteWholeFile(name, bytes);
+        PyramidDataset dataset{String(name.c_str())};
+        if (dataset.ReadHeader()) continue;
+        ++opened;
+        T pixels[64] = {};
+        if (dataset.BytesPerSample == 1 && dataset.BandCount < 64)
+            dataset.ReadTile<T>(0, 0, 1, 1, Array<int>(), 0, pixels);
+        dataset.HasBandStats<T>(0);
+        dataset.GetBandStats<T>(0);
+        dataset.GetHistograms<T>();
+        dataset.GetPalette<T>(0);
+        dataset.SetBandStats(ArrayOf({StatsOf<T>(0, 1)}));
+    }
+    EXPECT_GT(opened, 200) << "most damage is behind the header";
+    EXPECT_LT(opened, 2000);
 }
 
 }  // namespace

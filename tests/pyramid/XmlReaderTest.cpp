@@ -545,5 +545,28 @@ TEST_F(HostileDocumentTest, ManyRecordsTakeTimeInProportion) {
     EXPECT_LT(taken.count(), 20);
 }
 
+// One long text, many short pieces of text, and long names, read as a stream and as a tree.
+TEST_F(HostileDocumentTest, LongTextsTakeTimeInProportion) {
+    std::string references, names;
+    for (int i = 0; i < 1000000; ++i) references += "&#65;";
+    for (int i = 0; i < 16; ++i) names += "<" + std::string(1u << 20, 'N') + "/>";
+    const std::string documents[] = {
+        Histogram("<HIST_BINCOUNT>9</HIST_BINCOUNT><HIST_COUNTS>" + std::string(1u << 24, '|') +
+                  "</HIST_COUNTS>"),
+        Histogram("<HIST_BINCOUNT>4000000000</HIST_BINCOUNT><HIST_COUNTS>" + references +
+                  "</HIST_COUNTS>"),
+        names, "<!--" + std::string(1u << 24, 'c') + "-->"};
+    for (const std::string& document : documents) {
+        const std::string text = "<DATASET>" + document + "</DATASET>";
+        PyramidXMLReaderHandlers<int> handlers;
+        const auto start = std::chrono::steady_clock::now();
+        EXPECT_EQ(Parse(text, &handlers), 0);
+        PyramidXMLDocument tree;
+        EXPECT_TRUE(tree.ParseTree(*source));
+        const std::chrono::duration<double> taken = std::chrono::steady_clock::now() - start;
+        EXPECT_LT(taken.count(), 20) << text.substr(0, 100);
+    }
+}
+
 }  // namespace
 }  // namespace zelm::test
