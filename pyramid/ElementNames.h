@@ -10,21 +10,46 @@
 
 #include <xercesc/util/XercesDefs.hpp>
 
-#define ZMC_ELEMENT_NAMES(X)                                                                       \
-    X(DATASET)                                                                                     \
-    X(BANDSTATISTICS)                                                                              \
-    X(HISTOGRAMS)                                                                                  \
-    X(PALETTE)                                                                                     \
-    X(HEADER)                                                                                      \
-    X(RSTC_LEVEL) X(RSTC_BAND) X(RSTC_MINIMUM) X(RSTC_MAXIMUM) X(RSTC_MEAN)                        \
-        X(RSTC_STANDARDDEVIATION) X(RSTC_SUM) X(RSTC_SUM2) X(RSTC_RMS) X(RSTC_SUMXY) X(RSTC_COV)   \
-            X(HIST_LEVEL) X(HIST_BAND) X(HIST_SOURCE) X(HIST_BINCOUNT) X(HIST_BINSIZE) X(HIST_MIN) \
-                X(HIST_MAX) X(HIST_TYPE) X(HIST_COUNTS) X(HEADER_VERSION_MAJOR)                    \
-                    X(HEADER_VERSION_MINOR) X(HEADER_BANDS) X(HEADER_PIXEL_WIDTH)                  \
-                        X(HEADER_PIXEL_HEIGHT) X(HEADER_TILESIZE) X(HEADER_LEVELMIN)               \
-                            X(HEADER_LEVELMAX) X(HEADER_INTERLEAVE) X(HEADER_BUILD_METHOD)         \
-                                X(HEADER_PIXEL_TYPE) X(PALETTE_BAND) X(PALETTE_COUNT)              \
-                                    X(PALETTE_RGBA)
+#define ZMC_ELEMENT_NAMES(X)  \
+    X(DATASET)                \
+    X(BANDSTATISTICS)         \
+    X(HISTOGRAMS)             \
+    X(PALETTE)                \
+    X(HEADER)                 \
+    X(RSTC_LEVEL)             \
+    X(RSTC_BAND)              \
+    X(RSTC_MINIMUM)           \
+    X(RSTC_MAXIMUM)           \
+    X(RSTC_MEAN)              \
+    X(RSTC_STANDARDDEVIATION) \
+    X(RSTC_SUM)               \
+    X(RSTC_SUM2)              \
+    X(RSTC_RMS)               \
+    X(RSTC_SUMXY)             \
+    X(RSTC_COV)               \
+    X(HIST_LEVEL)             \
+    X(HIST_BAND)              \
+    X(HIST_SOURCE)            \
+    X(HIST_BINCOUNT)          \
+    X(HIST_BINSIZE)           \
+    X(HIST_MIN)               \
+    X(HIST_MAX)               \
+    X(HIST_TYPE)              \
+    X(HIST_COUNTS)            \
+    X(HEADER_VERSION_MAJOR)   \
+    X(HEADER_VERSION_MINOR)   \
+    X(HEADER_BANDS)           \
+    X(HEADER_PIXEL_WIDTH)     \
+    X(HEADER_PIXEL_HEIGHT)    \
+    X(HEADER_TILESIZE)        \
+    X(HEADER_LEVELMIN)        \
+    X(HEADER_LEVELMAX)        \
+    X(HEADER_INTERLEAVE)      \
+    X(HEADER_BUILD_METHOD)    \
+    X(HEADER_PIXEL_TYPE)      \
+    X(PALETTE_BAND)           \
+    X(PALETTE_COUNT)          \
+    X(PALETTE_RGBA)
 
 namespace zelm {
 
