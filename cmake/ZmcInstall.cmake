@@ -15,7 +15,7 @@ set(ZMC_INSTALL_HEADERDIR "${CMAKE_INSTALL_INCLUDEDIR}/zmcraster")
 
 # What hosts link, and the module itself. Libraries of the host's side are there when built.
 set(linked zmctext zmccore zmcg)
-foreach(target zmcplatform zmchost)
+foreach(target zmcplatform zmccoordsys zmchost)
     if(TARGET ${target})
         list(APPEND linked ${target})
     endif()
@@ -35,18 +35,21 @@ install(TARGETS ${loaded} EXPORT zmcrasterTargets
     RUNTIME DESTINATION ${ZMC_INSTALL_MODULEDIR})
 
 # Headers: floors that are public as a whole, and the interfaces of the others.
-install(DIRECTORY core metadata colour dispatch zmcg
+install(DIRECTORY core metadata colour coordsys dispatch zmcg
     DESTINATION ${ZMC_INSTALL_HEADERDIR} FILES_MATCHING PATTERN "*.h")
 set(interfaces
     connection/DataConnection.h
     connection/DataConnectionFactory.h
     connection/RasterDataConnection.h
     platform/CriticalSection.h
+    platform/LoadableLibrary.h
     raster/BasicRasterReader.h
     raster/RasterBandHistogram.h
     raster/RasterBandStats.h
     raster/RasterProps.h
-    raster/RasterReader.h)
+    raster/RasterReader.h
+    zmcpe/CoordSysImpl.h
+    zmcpe/EntryPoints.h)
 foreach(header ${interfaces})
     get_filename_component(folder ${header} DIRECTORY)
     install(FILES ${header} DESTINATION ${ZMC_INSTALL_HEADERDIR}/${folder})
