@@ -38,7 +38,8 @@ set(interfaces
     raster/RasterBandStats.h
     raster/RasterProps.h
     raster/RasterReader.h
-    zmcpe/CoordSysImpl.h)
+    zmcpe/CoordSysImpl.h
+    zmcpe/EntryPoints.h)
 foreach(header ${interfaces})
     get_filename_component(folder ${header} DIRECTORY)
     install(FILES ${header} DESTINATION ${ZMC_INSTALL_HEADERDIR}/${folder})

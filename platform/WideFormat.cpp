@@ -12,7 +12,7 @@ constexpr int kLongestNumber = 4095;
 
 enum class Length { None, Char, Short, Long, LongLong, Max, Size, Difference, LongDouble };
 
-struct Specification {
+struct Conversion {
     char flags[8] = {};
     bool left = false;
     int width = 0;
@@ -44,18 +44,18 @@ public:
     }
 
     template <class Source>
-    void PutText(const Source* text, const Specification& spec) {
+    void PutText(const Source* text, const Conversion& item) {
         constexpr Source nullText[] = {'(', 'n', 'u', 'l', 'l', ')', 0};
         if (!text) text = nullText;
         std::size_t count = 0;
-        while ((spec.precision < 0 || count < static_cast<std::size_t>(spec.precision)) &&
+        while ((item.precision < 0 || count < static_cast<std::size_t>(item.precision)) &&
                text[count] != 0)
             ++count;
-        const auto width = static_cast<std::size_t>(spec.width);
+        const auto width = static_cast<std::size_t>(item.width);
         const std::size_t padding = width > count ? width - count : 0;
-        if (!spec.left) Fill(padding);
+        if (!item.left) Fill(padding);
         for (std::size_t i = 0; i < count && room != 0; ++i) Put(Widen(text[i]));
-        if (spec.left) Fill(padding);
+        if (item.left) Fill(padding);
     }
 
     std::size_t Finish() {
@@ -89,13 +89,13 @@ int ParseNumberOrStar(const Unit*& at, Arguments& arguments) {
 }
 
 template <class Unit>
-void ParseFlags(const Unit*& at, Specification& spec) {
+void ParseFlags(const Unit*& at, Conversion& item) {
     std::size_t count = 0;
     for (; *at == Unit{'-'} || *at == Unit{'+'} || *at == Unit{' '} || *at == Unit{'#'} ||
            *at == Unit{'0'};
          ++at) {
-        if (*at == Unit{'-'}) spec.left = true;
-        if (count < sizeof spec.flags - 2) spec.flags[count++] = static_cast<char>(*at);
+        if (*at == Unit{'-'}) item.left = true;
+        if (count < sizeof item.flags - 2) item.flags[count++] = static_cast<char>(*at);
     }
 }
 
@@ -120,18 +120,18 @@ Length ParseLength(const Unit*& at) {
 }
 
 template <class Unit>
-Specification ParseSpecification(const Unit*& at, Arguments& arguments) {
-    Specification spec;
-    ParseFlags(at, spec);
-    spec.width = ParseNumberOrStar(at, arguments);
-    if (spec.width < 0) {  // a negative star stands for the flag '-' and the width without sign
-        spec.width = -spec.width;
-        spec.left = true;
+Conversion ParseConversion(const Unit*& at, Arguments& arguments) {
+    Conversion item;
+    ParseFlags(at, item);
+    item.width = ParseNumberOrStar(at, arguments);
+    if (item.width < 0) {  // a negative star stands for the flag '-' and the width without sign
+        item.width = -item.width;
+        item.left = true;
     }
-    if (Take(at, '.')) spec.precision = ParseNumberOrStar(at, arguments);
-    spec.length = ParseLength(at);
-    if (*at > 0 && *at < 0x80) spec.conversion = static_cast<char>(*at++);
-    return spec;
+    if (Take(at, '.')) item.precision = ParseNumberOrStar(at, arguments);
+    item.length = ParseLength(at);
+    if (*at > 0 && *at < 0x80) item.conversion = static_cast<char>(*at++);
+    return item;
 }
 
 std::intmax_t NextSigned(Length length, Arguments& arguments) {
@@ -179,77 +179,77 @@ std::uintmax_t NextUnsigned(Length length, Arguments& arguments) {
 #pragma GCC diagnostic push
 #pragma GCC diagnostic ignored "-Wformat-nonliteral"
 template <class Unit, class Number>
-void PutNumber(Output<Unit>& out, const Specification& spec, const char* length, Number number) {
+void PutNumber(Output<Unit>& out, const Conversion& item, const char* length, Number number) {
     char format[32];
-    std::snprintf(format, sizeof format, "%%%s%s*.*%s%c", spec.flags, spec.left ? "-" : "", length,
-                  spec.conversion);
+    std::snprintf(format, sizeof format, "%%%s%s*.*%s%c", item.flags, item.left ? "-" : "", length,
+                  item.conversion);
     char digits[kLongestNumber + 1];
-    if (std::snprintf(digits, sizeof digits, format, spec.width, spec.precision, number) < 0)
+    if (std::snprintf(digits, sizeof digits, format, item.width, item.precision, number) < 0)
         return;
-    out.PutText(static_cast<const char*>(digits), Specification{});
+    out.PutText(static_cast<const char*>(digits), Conversion{});
 }
 
 template <class Unit>
-void PutPointer(Output<Unit>& out, const Specification& spec, const void* pointer) {
+void PutPointer(Output<Unit>& out, const Conversion& item, const void* pointer) {
     char digits[32];
     std::snprintf(digits, sizeof digits, "%p", pointer);
-    Specification text = spec;
+    Conversion text = item;
     text.precision = -1;
     out.PutText(static_cast<const char*>(digits), text);
 }
 #pragma GCC diagnostic pop
 
 template <class Unit>
-void PutString(Output<Unit>& out, const Specification& spec, bool narrow, Arguments& arguments) {
+void PutString(Output<Unit>& out, const Conversion& item, bool narrow, Arguments& arguments) {
     if (narrow)
-        out.PutText(va_arg(arguments.list, const char*), spec);
+        out.PutText(va_arg(arguments.list, const char*), item);
     else
-        out.PutText(va_arg(arguments.list, const Unit*), spec);
+        out.PutText(va_arg(arguments.list, const Unit*), item);
 }
 
 template <class Unit>
-void PutUnit(Output<Unit>& out, Specification spec, bool narrow, Arguments& arguments) {
+void PutUnit(Output<Unit>& out, Conversion item, bool narrow, Arguments& arguments) {
     const unsigned value = va_arg(arguments.list, unsigned);
-    if (spec.width > 1 && !spec.left) out.Fill(static_cast<std::size_t>(spec.width - 1));
+    if (item.width > 1 && !item.left) out.Fill(static_cast<std::size_t>(item.width - 1));
     out.Put(narrow ? static_cast<Unit>(static_cast<unsigned char>(value))
                    : static_cast<Unit>(value));
-    if (spec.width > 1 && spec.left) out.Fill(static_cast<std::size_t>(spec.width - 1));
+    if (item.width > 1 && item.left) out.Fill(static_cast<std::size_t>(item.width - 1));
 }
 
 template <class Unit>
-void PutReal(Output<Unit>& out, const Specification& spec, Arguments& arguments) {
-    if (spec.length == Length::LongDouble)
-        PutNumber(out, spec, "L", va_arg(arguments.list, long double));
+void PutReal(Output<Unit>& out, const Conversion& item, Arguments& arguments) {
+    if (item.length == Length::LongDouble)
+        PutNumber(out, item, "L", va_arg(arguments.list, long double));
     else
-        PutNumber(out, spec, "", va_arg(arguments.list, double));
+        PutNumber(out, item, "", va_arg(arguments.list, double));
 }
 
 // False for a conversion that does not exist.
 template <class Unit>
-bool PutConversion(Output<Unit>& out, const Specification& spec, Arguments& arguments) {
-    const bool narrow = spec.length == Length::Short;
-    switch (spec.conversion) {
+bool PutConversion(Output<Unit>& out, const Conversion& item, Arguments& arguments) {
+    const bool narrow = item.length == Length::Short;
+    switch (item.conversion) {
         case 's':
-            PutString(out, spec, narrow, arguments);
+            PutString(out, item, narrow, arguments);
             return true;
         case 'S':
-            PutString(out, spec, spec.length != Length::Long, arguments);
+            PutString(out, item, item.length != Length::Long, arguments);
             return true;
         case 'c':
-            PutUnit(out, spec, narrow, arguments);
+            PutUnit(out, item, narrow, arguments);
             return true;
         case 'C':
-            PutUnit(out, spec, spec.length != Length::Long, arguments);
+            PutUnit(out, item, item.length != Length::Long, arguments);
             return true;
         case 'd':
         case 'i':
-            PutNumber(out, spec, "j", NextSigned(spec.length, arguments));
+            PutNumber(out, item, "j", NextSigned(item.length, arguments));
             return true;
         case 'u':
         case 'o':
         case 'x':
         case 'X':
-            PutNumber(out, spec, "j", NextUnsigned(spec.length, arguments));
+            PutNumber(out, item, "j", NextUnsigned(item.length, arguments));
             return true;
         case 'a':
         case 'A':
@@ -259,10 +259,10 @@ bool PutConversion(Output<Unit>& out, const Specification& spec, Arguments& argu
         case 'F':
         case 'g':
         case 'G':
-            PutReal(out, spec, arguments);
+            PutReal(out, item, arguments);
             return true;
         case 'p':
-            PutPointer(out, spec, va_arg(arguments.list, const void*));
+            PutPointer(out, item, va_arg(arguments.list, const void*));
             return true;
         case 'n':
             static_cast<void>(va_arg(arguments.list, void*));
@@ -284,8 +284,8 @@ std::size_t Format(Unit* buffer, std::size_t capacity, const Unit* format, Argum
             out.Put(*start);
             continue;
         }
-        const Specification spec = ParseSpecification(format, arguments);
-        if (PutConversion(out, spec, arguments)) continue;
+        const Conversion item = ParseConversion(format, arguments);
+        if (PutConversion(out, item, arguments)) continue;
         for (const Unit* at = start; at != format; ++at) out.Put(*at);
     }
     return out.Finish();

@@ -44,8 +44,16 @@ ZMCG_SYMBOL std::int32_t gCdfFormatRecordCount;
 // The process-wide parse log, created by whoever builds the first Metadata.
 ZMCG_SYMBOL MetadataParseLog* gpMetadataParseLogInstance;
 
-// The one table of directory settings of the process.
+// The one table of directory settings of the process. A C name with a C++ type is meant: symbols
+// are found by plain name.
+#if defined(__clang__)
+#pragma clang diagnostic push
+#pragma clang diagnostic ignored "-Wreturn-type-c-linkage"
+#endif
 ZMCG_SYMBOL zelm::EnvironmentImpl& GetGlobalEnvironmentImpl();
+#if defined(__clang__)
+#pragma clang diagnostic pop
+#endif
 
 // The coordinate-system singletons and the entry points of the projection engine; all null until
 // the engine is asked for. The mutex is declared by its historical type and used as a critical

@@ -29,7 +29,7 @@ protected:
         constexpr std::size_t kFrame = 24 + 2 + 5 + 2 + 5 + 2;
         std::string messages;
         for (std::string line; std::getline(log, line);)
-            messages += "[" + line.substr(kFrame, line.size() - kFrame - 1) + "]";
+            messages.append("[").append(line, kFrame, line.size() - kFrame - 1).append("]");
         return messages;
     }
     std::string Opening() const {
