@@ -7,6 +7,7 @@
 #include "host/Histogram.h"
 #include "host/NoData.h"
 #include "host/Raster.h"
+#include "host/ValueCounter.h"
 
 namespace zmchost {
 namespace {
@@ -153,6 +154,8 @@ public:
         for (std::uint32_t band = 0; band < bands; ++band)
             allBands.data[band] = static_cast<int>(band);
     }
+
+    bool NeedsMasks() const override { return anyValue || !std::is_integral_v<T>; }
 
     bool MarkRow(const std::byte* row, unsigned char* mask, std::uint32_t width) const override {
         const T* samples = Samples(row);

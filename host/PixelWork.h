@@ -29,6 +29,8 @@ class PixelWork {
 public:
     virtual ~PixelWork() = default;
 
+    // Whether samples can be invalid at all: a band has a no-data value, or values may be infinite.
+    virtual bool NeedsMasks() const = 0;
     // Sets every byte of a row's mask to 1 for a sample that is not valid, else 0; true if there
     // is one that is not.
     virtual bool MarkRow(const std::byte* row, unsigned char* mask, std::uint32_t width) const = 0;
