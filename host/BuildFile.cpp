@@ -79,8 +79,9 @@ void BuildFile::RemoveStale() const {
 void BuildFile::CheckSpace(std::uint64_t size) const {
     const auto space = platform::FreeSpace(platform::FolderOf(path));
     if (space && *space < size)
-        throw Error(given, "build it",
-                    "it needs " + Bytes(size) + " of disk space, and " + Bytes(*space) + " are free");
+        throw Error(
+            given, "build it",
+            "it needs " + Bytes(size) + " of disk space, and " + Bytes(*space) + " are free");
 }
 
 void BuildFile::Reserve(std::uint64_t size) const {

@@ -33,9 +33,9 @@ void CutColumns(Pass& pass, const PlanInput& input, std::uint64_t columnWidth) {
         const std::uint64_t end = std::min(begin + columnWidth, width);
         const std::uint64_t readBegin = begin - std::min(begin, margin);
         const std::uint64_t readEnd = std::min(end + margin, width);
-        pass.columns.push_back(
-            {static_cast<std::uint32_t>(begin), static_cast<std::uint32_t>(end),
-             static_cast<std::uint32_t>(readBegin), static_cast<std::uint32_t>(readEnd)});
+        pass.columns.push_back({static_cast<std::uint32_t>(begin), static_cast<std::uint32_t>(end),
+                                static_cast<std::uint32_t>(readBegin),
+                                static_cast<std::uint32_t>(readEnd)});
     }
 }
 

@@ -1,5 +1,5 @@
-// BuildPlan: the arithmetic of building a pyramid: levels, strips, columns, and the memory that they
-// take. Pure functions; no file is touched.
+// BuildPlan: the arithmetic of building a pyramid: levels, strips, columns, and the memory that
+// they take. Pure functions; no file is touched.
 //
 // A strip is one row of tiles of one level. While the strips of a base level pass from top to
 // bottom, those of the coarser levels are made from them, each half as wide, so all levels together

@@ -17,10 +17,9 @@ LevelCascade::LevelCascade(const CascadeSetup& cascadeSetup, const Column& colum
         levels[i].height = (setup.height >> setup.baseLevel) >> i;
         const bool keeps = setup.halo != 0 && i + 1 < levels.size();
         const std::uint32_t keptRows = keeps ? 2 * setup.halo + 2 : 0;
-        levels[i].kept =
-            std::make_unique<Strip>(meter, setup.baseLevel + i,
-                                    std::size_t{keptRows} * levels[i].width, setup.pixelBytes,
-                                    maskBytes, keptRows);
+        levels[i].kept = std::make_unique<Strip>(meter, setup.baseLevel + i,
+                                                 std::size_t{keptRows} * levels[i].width,
+                                                 setup.pixelBytes, maskBytes, keptRows);
     }
 }
 

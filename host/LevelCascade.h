@@ -40,13 +40,12 @@ private:
     struct Level {
         std::uint32_t width = 0;  // of the column, with its margins
         std::uint32_t height = 0;
-        std::uint32_t nextRow = 0;       // of the coarser level, to be made from this one
-        std::unique_ptr<Strip> kept;     // last rows of the strip before
-        StripStore::Loan filling;        // strip of this level that is being made
+        std::uint32_t nextRow = 0;    // of the coarser level, to be made from this one
+        std::unique_ptr<Strip> kept;  // last rows of the strip before
+        StripStore::Loan filling;     // strip of this level that is being made
     };
 
-    void MakeRows(std::uint32_t level, const Strip& strip,
-                  std::vector<StripStore::Loan>& finished);
+    void MakeRows(std::uint32_t level, const Strip& strip, std::vector<StripStore::Loan>& finished);
     void MakeRow(std::uint32_t level, const Strip& strip, Strip& target, std::uint32_t row) const;
     void TakeSourceRow(const Level& level, const Strip& strip, std::int64_t line,
                        std::uint32_t place, RowWindow& window) const;

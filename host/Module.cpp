@@ -52,7 +52,7 @@ std::string Module::DefaultPath() {
     const std::string name = ModuleFileName();
     const std::string here = platform::FolderOf(
         platform::FileOfCode(reinterpret_cast<const void*>(&Module::DefaultPath)));
-    for (const char* const folder : {"", "zmcraster", "../lib/zmcraster", "../lib", ZMC_MODULE_SUBFOLDER}) {
+    for (const char* const folder : {"", "zmcraster", "../lib/zmcraster", "../lib"}) {
         const std::string candidate =
             platform::JoinPath(*folder ? platform::JoinPath(here, folder) : here, name);
         if (platform::StatusOf(candidate).isRegular) return candidate;

@@ -101,8 +101,9 @@ private:
     };
 
     static constexpr std::uint64_t TableBytes() {
-        return kCountsEveryValue<T> ? (std::uint64_t{8} << (8 * std::min<std::size_t>(sizeof(T), 2)))
-                                    : 0;
+        return kCountsEveryValue<T>
+                   ? (std::uint64_t{8} << (8 * std::min<std::size_t>(sizeof(T), 2)))
+                   : 0;
     }
 
     std::size_t Place(std::uint32_t lane, std::uint32_t band) const {
@@ -180,7 +181,8 @@ public:
     void ReduceRow(const RowWindow& source, std::uint32_t sourceWidth, std::byte* row,
                    unsigned char* mask) const override {
         const T* rows[RowWindow::kMaxRows];
-        std::transform(std::begin(source.rows), std::end(source.rows), rows, Samples);
+        std::transform(std::begin(source.rows), std::end(source.rows), rows,
+                       [](const std::byte* from) { return Samples(from); });
         const ReductionRows<T> typed{rows, source.anyMask ? source.masks : nullptr};
         zmchost::ReduceRow(method, bands, sourceWidth, typed, anyValue ? rules.data() : nullptr,
                            Samples(row), mask);
@@ -198,18 +200,16 @@ public:
     }
 
     bool ReadTile(std::uint32_t level, const Window& tile, std::byte* pixels) override {
-        return Reader().ReadTile(static_cast<std::int32_t>(tile.x),
-                                 static_cast<std::int32_t>(tile.y), tile.width, tile.height,
-                                 allBands, static_cast<std::int32_t>(level), Samples(pixels),
-                                 nullptr);
+        return Reader().ReadTile(
+            static_cast<std::int32_t>(tile.x), static_cast<std::int32_t>(tile.y), tile.width,
+            tile.height, allBands, static_cast<std::int32_t>(level), Samples(pixels), nullptr);
     }
 
     bool WriteTile(std::uint32_t level, const Window& tile, std::byte* pixels,
                    unsigned char* cleanMask) override {
-        return Reader().WriteTile(static_cast<std::int32_t>(tile.x),
-                                  static_cast<std::int32_t>(tile.y), tile.width, tile.height,
-                                  allBands, static_cast<std::int32_t>(level), Samples(pixels),
-                                  cleanMask);
+        return Reader().WriteTile(
+            static_cast<std::int32_t>(tile.x), static_cast<std::int32_t>(tile.y), tile.width,
+            tile.height, allBands, static_cast<std::int32_t>(level), Samples(pixels), cleanMask);
     }
 
     void StoreStatistics() override { harvest.Store(target); }

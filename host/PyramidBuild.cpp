@@ -59,7 +59,8 @@ void PyramidBuild::SettleBands() {
     std::map<std::uint32_t, double> noData;
     for (std::uint32_t i = 0; i < bands.size(); ++i) {
         if (bands[i] >= props.bands)
-            throw Error(source.Name(), "take band " + std::to_string(bands[i]) + ", counted from 0,",
+            throw Error(source.Name(),
+                        "take band " + std::to_string(bands[i]) + ", counted from 0,",
                         "it has " + std::to_string(props.bands));
         if (props.HasNoDataValue(bands[i])) noData[i] = props.GetNoDataValue(bands[i]);
         palettes.push_back(source.BandPalette(bands[i]));
@@ -84,7 +85,7 @@ void PyramidBuild::SettleOrdering() {
                     "a file of " + std::to_string(props.bands) + " bands is " +
                         (morton ? "always in Morton order" : "never in Morton order"));
     props.tileLines = options.ordering == Ordering::Scanline ? 1 : kTileSide;
-    report.tileOrdering = morton ? zelm::TileOrder::Morton
+    report.tileOrdering = morton                ? zelm::TileOrder::Morton
                           : props.tileLines > 1 ? zelm::TileOrder::Blocked
                                                 : zelm::TileOrder::Scanline;
 }
@@ -117,13 +118,16 @@ TileStoreSetup PyramidBuild::StoreSetup() const {
 }
 
 PixelWorkSetup PyramidBuild::WorkSetup() const {
-    return {props, resampling, lanes, std::max(options.bins, 1u), options.statistics,
+    return {props,
+            resampling,
+            lanes,
+            std::max(options.bins, 1u),
+            options.statistics,
             options.memory / 8};
 }
 
 void PyramidBuild::Plan() {
-    const std::uint64_t besides =
-        TileStore::WorkMemory(StoreSetup()) + work->StatisticsMemory();
+    const std::uint64_t besides = TileStore::WorkMemory(StoreSetup()) + work->StatisticsMemory();
     PlanInput input{props.samples, props.lines, maxLevel, ReductionHalo(resampling), 0, 0};
     input.pixelBytes = pixelBytes + (work->NeedsMasks() ? props.bands : 0);
     input.budget = options.memory - std::min(options.memory, besides);
@@ -253,8 +257,8 @@ void PyramidBuild::LookAtStrip(const Pass& pass, const Column& column, Strip& st
             [&](std::uint32_t lane, std::uint32_t first, std::uint32_t last) {
                 for (std::uint32_t line = first; line < last; ++line) {
                     if (work->NeedsMasks())
-                        strip.SetMarked(line, work->MarkRow(strip.Row(line), strip.MaskRow(line),
-                                                            strip.width));
+                        strip.SetMarked(
+                            line, work->MarkRow(strip.Row(line), strip.MaskRow(line), strip.width));
                     const unsigned char* const mask = strip.MaskIfMarked(line);
                     if (counts)
                         work->TakeStatistics(lane, strip.Row(line) + skippedBytes,
@@ -284,21 +288,21 @@ void PyramidBuild::CountLevel0() {
                 chunk.push_back(tiles->Tile(0, column, row));
                 tiles->ReadTile(0, chunk.back(), pixels.Data() + (chunk.size() - 1) * tileBytes);
             }
-            InLanes(lanes, 0, chunk.front().height,
-                    [&](std::uint32_t lane, std::uint32_t first, std::uint32_t last) {
-                        auto* const mask = static_cast<unsigned char*>(
-                            static_cast<void*>(masks.Data() + lane * maskRow));
-                        for (std::size_t i = 0; i < chunk.size(); ++i)
-                            for (std::uint32_t line = first; line < last; ++line) {
-                                const std::byte* const samples =
-                                    pixels.Data() + i * tileBytes +
-                                    std::size_t{line} * chunk[i].width * pixelBytes;
-                                const bool any = work->NeedsMasks() &&
-                                                 work->MarkRow(samples, mask, chunk[i].width);
-                                work->TakeCounts(lane, samples, any ? mask : nullptr,
-                                                 chunk[i].width);
-                            }
-                    });
+            InLanes(
+                lanes, 0, chunk.front().height,
+                [&](std::uint32_t lane, std::uint32_t first, std::uint32_t last) {
+                    auto* const mask = static_cast<unsigned char*>(
+                        static_cast<void*>(masks.Data() + lane * maskRow));
+                    for (std::size_t i = 0; i < chunk.size(); ++i)
+                        for (std::uint32_t line = first; line < last; ++line) {
+                            const std::byte* const samples =
+                                pixels.Data() + i * tileBytes +
+                                std::size_t{line} * chunk[i].width * pixelBytes;
+                            const bool any =
+                                work->NeedsMasks() && work->MarkRow(samples, mask, chunk[i].width);
+                            work->TakeCounts(lane, samples, any ? mask : nullptr, chunk[i].width);
+                        }
+                });
             for (const Window& tile : chunk) Advance(std::uint64_t{tile.width} * tile.height);
         }
 }
@@ -313,8 +317,9 @@ void PyramidBuild::StoreRecords() {
 // Looks at the file as the next user will: from the disk, through a new connection.
 void PyramidBuild::Check() {
     if (!raster->IsComplete())
-        throw Error(name, "finish it",
-                    std::to_string(raster->Header().BytesMissing()) + " bytes did not reach the file");
+        throw Error(
+            name, "finish it",
+            std::to_string(raster->Header().BytesMissing()) + " bytes did not reach the file");
     file->Flush();
     const PyramidHeader header = raster->Header();
     const auto holes = platform::FindHoles(file->Path());

@@ -6,6 +6,7 @@
 #include <sstream>
 #include <vector>
 #include <xercesc/framework/MemBufInputSource.hpp>
+#include <xercesc/internal/XMLScanner.hpp>
 #include <xercesc/parsers/SAXParser.hpp>
 #include <xercesc/sax/HandlerBase.hpp>
 #include <xercesc/sax/SAXParseException.hpp>
@@ -96,8 +97,7 @@ std::vector<unsigned char> ReadDocument(const std::string& file, PyramidHeader& 
     if (stream->ReadAt(0, start, sizeof start) != sizeof start ||
         std::memcmp(start, kMagic, sizeof kMagic) != 0)
         Refuse(file, "it is no pyramid file");
-    for (unsigned i = 0; i < 8; ++i)
-        header.tileDataStart |= std::uint64_t{start[4 + i]} << (8 * i);
+    for (unsigned i = 0; i < 8; ++i) header.tileDataStart |= std::uint64_t{start[4 + i]} << (8 * i);
     header.fileSize = stream->Size();
     if (header.tileDataStart <= kDocumentOffset ||
         header.tileDataStart - kDocumentOffset > kMaxDocument ||

@@ -19,9 +19,9 @@ struct PyramidHeader {
     std::uint32_t tileSize = 0;
     std::uint32_t minLevel = 0;
     std::uint32_t maxLevel = 0;
-    std::uint32_t pixelType = 0;     // code
-    std::int32_t interleave = -1;    // code
-    std::uint32_t tileOrdering = 0;  // code
+    std::uint32_t pixelType = 0;      // code
+    std::int32_t interleave = -1;     // code
+    std::uint32_t tileOrdering = 0;   // code
     std::uint64_t tileDataStart = 0;  // bytes from the start of the file
     std::uint64_t tileDataEnd = 0;    // where the tiles of a complete file end
     std::uint64_t fileSize = 0;

@@ -220,15 +220,15 @@ std::vector<std::uint32_t> Raster::AllBands() const {
 void Raster::CheckType(std::uint32_t pixelType) const {
     if (pixelType != props.pixelType)
         throw Error(name, "move samples",
-                    std::string("they are ") + zelm::PixelTypeName(pixelType) + ", and those of the raster " +
-                        zelm::PixelTypeName(props.pixelType));
+                    std::string("they are ") + zelm::PixelTypeName(pixelType) +
+                        ", and those of the raster " + zelm::PixelTypeName(props.pixelType));
 }
 
 void Raster::CheckLevel(std::uint32_t level) const {
     if (level < minLevel || level > maxLevel)
-        throw Error(name, "use level " + std::to_string(level),
-                    "it has the levels " + std::to_string(minLevel) + " to " +
-                        std::to_string(maxLevel));
+        throw Error(
+            name, "use level " + std::to_string(level),
+            "it has the levels " + std::to_string(minLevel) + " to " + std::to_string(maxLevel));
 }
 
 void Raster::CheckWindow(const char* operation, std::uint32_t level, const Window& window,
@@ -254,10 +254,10 @@ void Raster::ReadTile(std::uint32_t level, const Window& window,
     const zelm::Array<int> list = BandList(bands);
     bool read = false;
     Visit([&]<class T>(zelm::RasterReader<T>& typed) {
-        read = typed.ReadTile(static_cast<std::int32_t>(window.x),
-                              static_cast<std::int32_t>(window.y), window.width, window.height,
-                              list, static_cast<std::int32_t>(level), static_cast<T*>(pixels),
-                              nullptr);
+        read =
+            typed.ReadTile(static_cast<std::int32_t>(window.x), static_cast<std::int32_t>(window.y),
+                           window.width, window.height, list, static_cast<std::int32_t>(level),
+                           static_cast<T*>(pixels), nullptr);
     });
     if (!read) throw Error(name, "read " + Describe(window), "the module refuses");
 }
@@ -268,7 +268,8 @@ void Raster::ReadTiles(std::uint32_t level, const Window& window,
     const std::size_t pixelBytes = bands.size() * SampleSize();
     const std::uint32_t side = TileSide();
     std::vector<unsigned char> part;
-    for (std::uint32_t row = window.y / side; row * std::uint64_t{side} < window.y + window.height; ++row)
+    for (std::uint32_t row = window.y / side; row * std::uint64_t{side} < window.y + window.height;
+         ++row)
         for (std::uint32_t column = window.x / side;
              column * std::uint64_t{side} < window.x + window.width; ++column) {
             const Window piece = Intersection(Tile(level, column, row), window);
@@ -278,7 +279,8 @@ void Raster::ReadTiles(std::uint32_t level, const Window& window,
             ReadTile(level, piece, bands, part.data());
             unsigned char* to = pixels + OffsetIn(window, piece, pixelBytes);
             for (std::uint32_t line = 0; line < piece.height; ++line)
-                std::memcpy(to + line * window.width * pixelBytes, part.data() + line * rowBytes, rowBytes);
+                std::memcpy(to + line * window.width * pixelBytes, part.data() + line * rowBytes,
+                            rowBytes);
         }
 }
 
@@ -317,10 +319,10 @@ void Raster::WriteTile(std::uint32_t level, const Window& window,
     std::vector<unsigned char> mask(pixels.size() / SampleSize());
     bool written = false;
     Visit([&]<class T>(zelm::RasterReader<T>& typed) {
-        written = typed.WriteTile(
-            static_cast<std::int32_t>(window.x), static_cast<std::int32_t>(window.y), window.width,
-            window.height, list, static_cast<std::int32_t>(level),
-            static_cast<T*>(static_cast<void*>(pixels.data())), mask.data());
+        written = typed.WriteTile(static_cast<std::int32_t>(window.x),
+                                  static_cast<std::int32_t>(window.y), window.width, window.height,
+                                  list, static_cast<std::int32_t>(level),
+                                  static_cast<T*>(static_cast<void*>(pixels.data())), mask.data());
     });
     std::vector<unsigned char> stored(pixels.size());
     if (written) ReadTile(level, window, AllBands(), stored.data());
@@ -368,13 +370,14 @@ void Raster::Write(std::uint32_t level, const Window& window, std::span<const st
         Visit([&]<class T>(zelm::RasterReader<T>& typed) {
             typed.WriteTile(static_cast<std::int32_t>(window.x),
                             static_cast<std::int32_t>(window.y), window.width, window.height,
-                            BandList(bands), 0,
-                            static_cast<T*>(static_cast<void*>(samples.data())), none.data());
+                            BandList(bands), 0, static_cast<T*>(static_cast<void*>(samples.data())),
+                            none.data());
         });
         return;
     }
     const std::uint32_t side = TileSide();
-    for (std::uint32_t row = window.y / side; row * std::uint64_t{side} < window.y + window.height; ++row)
+    for (std::uint32_t row = window.y / side; row * std::uint64_t{side} < window.y + window.height;
+         ++row)
         for (std::uint32_t column = window.x / side;
              column * std::uint64_t{side} < window.x + window.width; ++column)
             MergeTile(level, Tile(level, column, row), window, bands, samples.data());
@@ -456,10 +459,10 @@ void Raster::SetBandPalette(std::uint32_t band, const zelm::Palette& palette) {
         throw Error(name, "store a palette", "it did not reach the file (disk full?)");
 }
 
-#define ZMC_X(type, word, code)                                                             \
-    template zelm::RasterBandStats<type> Raster::Statistics(std::uint32_t) const;           \
-    template void Raster::SetStatistics(const std::vector<zelm::RasterBandStats<type>>&);   \
-    template std::vector<zelm::RasterBandHistogram<type>> Raster::Histograms() const;       \
+#define ZMC_X(type, word, code)                                                           \
+    template zelm::RasterBandStats<type> Raster::Statistics(std::uint32_t) const;         \
+    template void Raster::SetStatistics(const std::vector<zelm::RasterBandStats<type>>&); \
+    template std::vector<zelm::RasterBandHistogram<type>> Raster::Histograms() const;     \
     template void Raster::SetHistograms(const std::vector<zelm::RasterBandHistogram<type>>&);
 ZMC_ELEMENT_TYPES(ZMC_X)
 #undef ZMC_X

@@ -60,10 +60,8 @@ StripStore::Loan StripStore::Take(std::uint32_t level) {
             return loan;
         }
     }
-    const std::size_t capacity =
-        static_cast<std::size_t>(width >> (level - baseLevel)) * kTileSide;
-    auto strip =
-        std::make_unique<Strip>(meter, level, capacity, pixelBytes, maskBytes, kTileSide);
+    const std::size_t capacity = static_cast<std::size_t>(width >> (level - baseLevel)) * kTileSide;
+    auto strip = std::make_unique<Strip>(meter, level, capacity, pixelBytes, maskBytes, kTileSide);
     return Loan(strip.release(), Return{this});
 }
 
