@@ -86,8 +86,8 @@ void BM_Build(benchmark::State& state) {
 
 // The bound: the tiles of all levels, copied once and written once, and the file flushed.
 void BM_CopyAndWrite(benchmark::State& state) {
-    const std::size_t tiles = static_cast<std::size_t>(state.range(0)) *
-                              static_cast<std::size_t>(state.range(1)) / 65536;
+    const std::size_t tiles =
+        static_cast<std::size_t>(state.range(0)) * static_cast<std::size_t>(state.range(1)) / 65536;
     const std::string name = ScratchFile("builder_bound.tmp");
     std::vector<unsigned char> from(kTileBytes * 64, 7);
     std::vector<unsigned char> tile(kTileBytes);

@@ -92,7 +92,7 @@ void Raster::TakeReader() {
     reader = connection->GetReader();
     if (!reader || reader->pixelType == 0)
         throw Error(name, "open the raster", "the module gives no reader for it");
-    props = reader->GetRasterProps();
+    Visit([this](auto& typed) { props = typed.GetRasterProps(); });
 }
 
 Raster Raster::Open(ModulePtr module, const std::string& file) {
