@@ -1,0 +1,19 @@
+#include "host/Text.h"
+
+#include "host/Error.h"
+
+namespace zmchost {
+
+zelm::String WideFileName(const std::string& name) {
+    zelm::String wide(name.c_str());
+    if (name.empty()) throw Error("(no name)", "use a file", "its name is empty");
+    if (Narrow(wide) != name) throw Error(name, "use the file", "its name is not valid UTF-8");
+    return wide;
+}
+
+std::string Narrow(const zelm::String& text) {
+    const char* const narrow = text.GetUtf8();
+    return narrow ? narrow : "";
+}
+
+}  // namespace zmchost

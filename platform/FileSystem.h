@@ -1,0 +1,76 @@
+// What the file system offers beyond the transfers of platform/File.h: names, folders, replacing a
+// file in one step, space, and what is needed to tell a dead process's leavings.
+//
+// Paths are narrow UTF-8. Nothing throws. An operation that fails says so by its result, and
+// LastErrorText gives the system's reason to the thread that called it, until its next call.
+#ifndef ZMC_PLATFORM_FILESYSTEM_H
+#define ZMC_PLATFORM_FILESYSTEM_H
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <vector>
+
+namespace platform {
+
+struct FileStatus {
+    bool exists = false;
+    bool isFolder = false;
+    bool isRegular = false;
+    // This process may not write it, or nobody may: the second counts for the superuser too.
+    bool readOnly = false;
+    std::uint64_t size = 0;  // bytes, of a regular file
+};
+
+std::string LastErrorText();
+
+FileStatus StatusOf(const std::string& path);
+
+// The folder of a path ("." for a bare name), its last part, and the two put together.
+std::string FolderOf(const std::string& path);
+std::string NameOf(const std::string& path);
+std::string JoinPath(const std::string& folder, const std::string& name);
+
+// The file that a path leads to through links; it need not exist itself. The path as it is where
+// nothing can be told.
+std::string ResolveLinks(const std::string& path);
+
+// Names of the entries of a folder, in no order; none if it cannot be read.
+std::vector<std::string> ListFolder(const std::string& folder);
+
+// Makes an empty file; fails if anything of that name exists.
+bool CreateNewFile(const std::string& path);
+// Gives a file another name, replacing what bears it, in one step that others see whole.
+bool RenameFile(const std::string& from, const std::string& to);
+bool RemoveEntry(const std::string& path);
+
+// Waits until a file's bytes, or a folder's names, have reached the disk.
+bool SyncFile(const std::string& path);
+bool SyncFolder(const std::string& folder);
+
+// Bytes that this process can still write in a folder.
+std::optional<std::uint64_t> FreeSpace(const std::string& folder);
+// Takes `size` bytes of the disk for a file without changing its size. False only if the space is
+// not there: file systems without the service give true.
+bool ReserveSpace(const std::string& path, std::uint64_t size);
+// Gives back what was reserved and not used.
+bool ReleaseReserve(const std::string& path);
+
+// A stretch of a file that holds nothing: it reads as zeros and was never written.
+struct Hole {
+    std::uint64_t begin = 0;
+    std::uint64_t end = 0;
+};
+// The holes of a file; none where the file system does not tell, or when the file cannot be read.
+std::vector<Hole> FindHoles(const std::string& path);
+
+std::uint64_t CurrentProcess();
+bool ProcessAlive(std::uint64_t process);
+// Path of the program or library that the code at an address was loaded from; empty if not known.
+std::string FileOfCode(const void* code);
+// A number that another call, in this process or another, does not give.
+std::uint64_t RandomNumber();
+
+}  // namespace platform
+
+#endif

@@ -1,0 +1,175 @@
+#include "platform/FileSystem.h"
+
+#include <dirent.h>
+#include <dlfcn.h>
+#include <fcntl.h>
+#include <signal.h>
+#include <sys/stat.h>
+#include <sys/statvfs.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <climits>
+#include <cstdio>
+#include <cstdlib>
+#include <memory>
+#include <random>
+#include <system_error>
+
+namespace platform {
+namespace {
+
+class Descriptor {
+public:
+    Descriptor(const std::string& path, int flags)
+        : value(::open(path.c_str(), flags | O_CLOEXEC, 0666)) {}
+    ~Descriptor() {
+        const int kept = errno;
+        if (value >= 0) ::close(value);
+        errno = kept;
+    }
+    Descriptor(const Descriptor&) = delete;
+    Descriptor& operator=(const Descriptor&) = delete;
+    explicit operator bool() const { return value >= 0; }
+
+    const int value;
+};
+
+bool Sync(const std::string& path, int flags) {
+    const Descriptor file(path, flags);
+    return file && ::fsync(file.value) == 0;
+}
+
+}  // namespace
+
+std::string LastErrorText() { return std::generic_category().message(errno); }
+
+FileStatus StatusOf(const std::string& path) {
+    FileStatus status;
+    struct stat info {};
+    if (::stat(path.c_str(), &info) != 0) return status;
+    status.exists = true;
+    status.isFolder = S_ISDIR(info.st_mode);
+    status.isRegular = S_ISREG(info.st_mode);
+    const bool nobodyWrites = (info.st_mode & (S_IWUSR | S_IWGRP | S_IWOTH)) == 0;
+    status.readOnly = nobodyWrites || ::access(path.c_str(), W_OK) != 0;
+    if (status.isRegular) status.size = static_cast<std::uint64_t>(info.st_size);
+    return status;
+}
+
+std::string FolderOf(const std::string& path) {
+    const std::size_t slash = path.find_last_of('/');
+    if (slash == std::string::npos) return ".";
+    return slash == 0 ? "/" : path.substr(0, slash);
+}
+
+std::string NameOf(const std::string& path) {
+    const std::size_t slash = path.find_last_of('/');
+    return slash == std::string::npos ? path : path.substr(slash + 1);
+}
+
+std::string JoinPath(const std::string& folder, const std::string& name) {
+    if (folder == ".") return name;
+    return folder.ends_with('/') ? folder + name : folder + '/' + name;
+}
+
+std::string ResolveLinks(const std::string& path) {
+    constexpr int kMostLinks = 40;
+    std::string current = path;
+    for (int i = 0; i < kMostLinks; ++i) {
+        char target[PATH_MAX];
+        const ssize_t length = ::readlink(current.c_str(), target, sizeof target);
+        if (length < 0) return current;
+        const std::string next(target, static_cast<std::size_t>(length));
+        current = next.starts_with('/') ? next : JoinPath(FolderOf(current), next);
+    }
+    return path;
+}
+
+std::vector<std::string> ListFolder(const std::string& folder) {
+    std::vector<std::string> names;
+    const std::unique_ptr<DIR, int (*)(DIR*)> stream(::opendir(folder.c_str()), ::closedir);
+    if (!stream) return names;
+    while (const dirent* entry = ::readdir(stream.get())) names.emplace_back(entry->d_name);
+    return names;
+}
+
+bool CreateNewFile(const std::string& path) {
+    return static_cast<bool>(Descriptor(path, O_WRONLY | O_CREAT | O_EXCL));
+}
+
+bool RenameFile(const std::string& from, const std::string& to) {
+    return ::rename(from.c_str(), to.c_str()) == 0;
+}
+
+bool RemoveEntry(const std::string& path) { return ::unlink(path.c_str()) == 0; }
+
+bool SyncFile(const std::string& path) { return Sync(path, O_RDONLY); }
+
+bool SyncFolder(const std::string& folder) { return Sync(folder, O_RDONLY | O_DIRECTORY); }
+
+std::optional<std::uint64_t> FreeSpace(const std::string& folder) {
+    struct statvfs info {};
+    if (::statvfs(folder.c_str(), &info) != 0) return std::nullopt;
+    const std::uint64_t blocks = ::geteuid() == 0 ? info.f_bfree : info.f_bavail;
+    return blocks * info.f_frsize;
+}
+
+bool ReserveSpace(const std::string& path, std::uint64_t size) {
+    const Descriptor file(path, O_WRONLY);
+    if (!file) return false;
+#if defined(__linux__)
+    if (::fallocate(file.value, FALLOC_FL_KEEP_SIZE, 0, static_cast<off_t>(size)) == 0) return true;
+    return errno != ENOSPC && errno != EDQUOT && errno != EFBIG;
+#else
+    static_cast<void>(size);
+    return true;
+#endif
+}
+
+bool ReleaseReserve(const std::string& path) {
+    const Descriptor file(path, O_WRONLY);
+    struct stat info {};
+    return file && ::fstat(file.value, &info) == 0 && ::ftruncate(file.value, info.st_size) == 0;
+}
+
+std::vector<Hole> FindHoles(const std::string& path) {
+    std::vector<Hole> holes;
+#if defined(SEEK_HOLE) && defined(SEEK_DATA)
+    const Descriptor file(path, O_RDONLY);
+    struct stat info {};
+    if (!file || ::fstat(file.value, &info) != 0) return holes;
+    off_t position = 0;
+    while (position < info.st_size) {
+        const off_t begin = ::lseek(file.value, position, SEEK_HOLE);
+        if (begin < 0 || begin >= info.st_size) break;
+        const off_t data = ::lseek(file.value, begin, SEEK_DATA);
+        const off_t end = data < 0 ? info.st_size : data;
+        holes.push_back({static_cast<std::uint64_t>(begin), static_cast<std::uint64_t>(end)});
+        position = end;
+    }
+#else
+    static_cast<void>(path);
+#endif
+    return holes;
+}
+
+std::uint64_t CurrentProcess() { return static_cast<std::uint64_t>(::getpid()); }
+
+bool ProcessAlive(std::uint64_t process) {
+    if (process == 0 || process > INT_MAX) return false;
+    return ::kill(static_cast<pid_t>(process), 0) == 0 || errno != ESRCH;
+}
+
+std::string FileOfCode(const void* code) {
+    Dl_info info{};
+    if (::dladdr(code, &info) == 0 || !info.dli_fname) return {};
+    return info.dli_fname;
+}
+
+std::uint64_t RandomNumber() {
+    std::random_device device;
+    return (std::uint64_t{device()} << 32) ^ device();
+}
+
+}  // namespace platform

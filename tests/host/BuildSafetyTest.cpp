@@ -1,0 +1,276 @@
+// What a build leaves behind when it does not come to its end.
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+#include <rapidcheck.h>
+#include <signal.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <filesystem>
+#include <stdexcept>
+
+#include "host/BuildFile.h"
+#include "host/PyramidBuilder.h"
+#include "host/Raster.h"
+#include "host/TileStore.h"
+#include "tests/support/MemorySource.h"
+#include "tests/support/ScratchDirectory.h"
+
+namespace zmchost {
+namespace {
+
+using support::MemorySource;
+using support::ScratchDirectory;
+using support::TestModule;
+
+std::vector<std::string> NamesIn(const std::string& folder) {
+    std::vector<std::string> names;
+    for (const auto& entry : std::filesystem::directory_iterator(folder))
+        names.push_back(entry.path().filename().string());
+    std::sort(names.begin(), names.end());
+    return names;
+}
+
+std::size_t ThreadsOfProcess() {
+    const std::filesystem::directory_iterator tasks("/proc/self/task");
+    return static_cast<std::size_t>(std::distance(begin(tasks), end(tasks)));
+}
+
+BuildOptions Overwriting() {
+    BuildOptions options;
+    options.overwrite = true;
+    options.threads = 2;
+    return options;
+}
+
+class BuildSafety : public testing::Test {
+protected:
+    BuildSafety() : source(900, 1300, 2), target(folder / "old.zmc") {
+        source.FillWithNoise(3);
+        support::WriteText(target, "the old file");
+    }
+
+    void ExpectNothingChanged() {
+        EXPECT_EQ(support::ReadText(target), "the old file");
+        EXPECT_THAT(NamesIn(folder.String()), testing::ElementsAre("old.zmc"));
+    }
+
+    std::string FailureOf(const std::string& file, const BuildOptions& options) {
+        try {
+            builder.Build(source, file, options);
+            return "no failure";
+        } catch (const Error& error) {
+            return error.what();
+        }
+    }
+
+    ScratchDirectory folder;
+    PyramidBuilder builder{TestModule()};
+    MemorySource<unsigned short> source;
+    std::string target;
+};
+
+TEST_F(BuildSafety, CancellingAtAnyMomentLeavesTheOldFile) {
+    for (std::uint64_t moment = 0; moment < 6; ++moment) {
+        BuildOptions options = Overwriting();
+        options.progress = [moment, calls = std::uint64_t{0}](const BuildProgress&) mutable {
+            return calls++ < moment;
+        };
+        EXPECT_THROW(builder.Build(source, target, options), Cancelled) << moment;
+        ExpectNothingChanged();
+    }
+}
+
+TEST_F(BuildSafety, ProgressEndsAtItsTotal) {
+    BuildOptions options = Overwriting();
+    BuildProgress last;
+    options.progress = [&](const BuildProgress& now) {
+        EXPECT_GT(now.done, last.done);
+        last = now;
+        return true;
+    };
+    builder.Build(source, target, options);
+    EXPECT_EQ(last.done, last.total);
+}
+
+TEST_F(BuildSafety, SourceThatThrowsLeavesTheOldFile) {
+    for (const std::uint32_t line : {0u, 256u, 1280u}) {
+        source.beforeRead = [line](const Window& window) {
+            if (window.y == line) throw std::runtime_error("the tape is torn");
+        };
+        EXPECT_THROW(builder.Build(source, target, Overwriting()), std::runtime_error) << line;
+        ExpectNothingChanged();
+    }
+}
+
+TEST_F(BuildSafety, TargetThatExistsIsKeptUnlessToldOtherwise) {
+    EXPECT_THAT(FailureOf(target, {}), testing::HasSubstr("exists already"));
+    ExpectNothingChanged();
+    builder.Build(source, target, Overwriting());
+    EXPECT_TRUE(Raster::Open(TestModule(), target).IsComplete());
+}
+
+TEST_F(BuildSafety, TargetThatIsFolderIsRefused) {
+    EXPECT_THAT(FailureOf(folder.String(), Overwriting()), testing::HasSubstr("it is a folder"));
+    EXPECT_THAT(FailureOf(folder.String() + "/", Overwriting()), testing::HasSubstr("no file"));
+    ExpectNothingChanged();
+}
+
+TEST_F(BuildSafety, TargetThatIsReadOnlyIsRefused) {
+    chmod(target.c_str(), 0444);
+    EXPECT_THAT(FailureOf(target, Overwriting()), testing::HasSubstr("is read-only"));
+    ExpectNothingChanged();
+}
+
+TEST_F(BuildSafety, TargetInMissingFolderIsRefused) {
+    EXPECT_THAT(FailureOf(folder / "no/such.zmc", {}), testing::HasSubstr("No such file"));
+    ExpectNothingChanged();
+}
+
+TEST_F(BuildSafety, LinkKeepsLeadingToItsFile) {
+    std::filesystem::create_symlink("old.zmc", folder / "link");
+    builder.Build(source, folder / "link", Overwriting());
+    EXPECT_TRUE(std::filesystem::is_symlink(folder / "link"));
+    EXPECT_TRUE(Raster::Open(TestModule(), target).IsComplete());
+}
+
+TEST_F(BuildSafety, NameThatIsNotTextIsRefused) {
+    EXPECT_THAT(FailureOf(folder / "\xff\xfe.zmc", {}), testing::HasSubstr("not valid UTF-8"));
+    ExpectNothingChanged();
+}
+
+TEST_F(BuildSafety, LongNameIsBuiltAsWell) {
+    const std::string name(250, 'n');
+    builder.Build(source, folder / name, {});
+    EXPECT_THAT(NamesIn(folder.String()), testing::ElementsAre(name, "old.zmc"));
+}
+
+TEST_F(BuildSafety, NoThreadStaysBehind) {
+    const std::size_t before = ThreadsOfProcess();
+    BuildOptions options = Overwriting();
+    options.threads = 4;
+    builder.Build(source, target, options);
+    EXPECT_EQ(ThreadsOfProcess(), before);
+    options.progress = [](const BuildProgress&) { return false; };
+    EXPECT_THROW(builder.Build(source, target, options), Cancelled);
+    EXPECT_EQ(ThreadsOfProcess(), before);
+}
+
+TEST_F(BuildSafety, KilledBuildLeavesNameThatTheNextOneRemoves) {
+    const pid_t child = fork();
+    if (child == 0) {
+        BuildOptions options = Overwriting();
+        options.progress = [](const BuildProgress&) { return raise(SIGKILL) == 0; };
+        builder.Build(source, target, options);
+        _exit(0);
+    }
+    int status = 0;
+    waitpid(child, &status, 0);
+    ASSERT_TRUE(WIFSIGNALED(status));
+    EXPECT_EQ(support::ReadText(target), "the old file");
+    const auto names = NamesIn(folder.String());
+    ASSERT_EQ(names.size(), 2u);
+    EXPECT_THAT(names[0], testing::StartsWith(".old.zmc.zmcbuild-" + std::to_string(child) + "-"));
+    EXPECT_THAT(names[0], testing::EndsWith(".tmp"));
+    builder.Build(source, target, Overwriting());
+    EXPECT_THAT(NamesIn(folder.String()), testing::ElementsAre("old.zmc"));
+}
+
+TEST_F(BuildSafety, OnlyLeavingsOfDeadProcessesAreRemoved) {
+    const pid_t child = fork();
+    if (child == 0) _exit(0);
+    waitpid(child, nullptr, 0);
+    const std::string dead = std::to_string(child);
+    const std::string stale = ".old.zmc.zmcbuild-" + dead + "-1.tmp";
+    const std::vector<std::string> kept = {
+        ".old.zmc.zmcbuild-" + std::to_string(getppid()) + "-1.tmp",
+        ".old.zmc.zmcbuild-" + dead + ".tmp", ".old.zmc.zmcbuild-" + dead + "-1.txt",
+        ".other.zmc.zmcbuild-" + dead + "-1.tmp", "old.zmc.zmcbuild-" + dead + "-1.tmp"};
+    support::WriteText(folder / stale, "");
+    for (const std::string& name : kept) support::WriteText(folder / name, "");
+    builder.Build(source, target, Overwriting());
+    const auto names = NamesIn(folder.String());
+    EXPECT_THAT(names, testing::Not(testing::Contains(stale)));
+    for (const std::string& name : kept) EXPECT_THAT(names, testing::Contains(name));
+}
+
+TEST_F(BuildSafety, FullDiskIsSeenBeforeTheBuild) {
+    std::filesystem::create_directory(folder / "disk");
+    support::SmallDisk disk(folder / "disk", "size=2m");
+    if (!disk.IsMounted()) GTEST_SKIP() << "mounting a small disk takes the superuser";
+    support::WriteText(folder / "disk/old.zmc", "the old file");
+    EXPECT_THAT(FailureOf(folder / "disk/old.zmc", Overwriting()),
+                testing::HasSubstr("of disk space"));
+    EXPECT_EQ(support::ReadText(folder / "disk/old.zmc"), "the old file");
+    EXPECT_THAT(NamesIn(folder / "disk"), testing::ElementsAre("old.zmc"));
+}
+
+TEST_F(BuildSafety, DiskThatFillsUpMeanwhileDoesNotMatter) {
+    std::filesystem::create_directory(folder / "disk");
+    support::SmallDisk disk(folder / "disk", "size=9m");
+    if (!disk.IsMounted()) GTEST_SKIP() << "mounting a small disk takes the superuser";
+    source.beforeRead = [&](const Window& window) {
+        if (window.y == 256) disk.Fill();
+    };
+    builder.Build(source, folder / "disk/new.zmc", Overwriting());
+    Raster raster = Raster::Open(TestModule(), folder / "disk/new.zmc");
+    EXPECT_EQ(raster.Read<unsigned short>(0, {0, 0, 900, 1300}), source.pixels);
+}
+
+TEST_F(BuildSafety, ReadOnlyDiskIsRefused) {
+    std::filesystem::create_directory(folder / "disk");
+    support::SmallDisk disk(folder / "disk", "size=9m");
+    if (!disk.IsMounted()) GTEST_SKIP() << "mounting a small disk takes the superuser";
+    ASSERT_TRUE(disk.MakeReadOnly());
+    EXPECT_THAT(FailureOf(folder / "disk/new.zmc", {}), testing::HasSubstr("Read-only"));
+}
+
+// A module whose disk loses the end of every second tile without a word.
+class LosingWork : public PixelWork {
+public:
+    bool NeedsMasks() const override { return false; }
+    bool MarkRow(const std::byte*, unsigned char*, std::uint32_t) const override { return false; }
+    void ReduceRow(const RowWindow&, std::uint32_t, std::byte*, unsigned char*) const override {}
+    void TakeStatistics(std::uint32_t, const std::byte*, const unsigned char*,
+                        std::uint32_t) override {}
+    bool NeedsSecondWalk() const override { return false; }
+    void BeginSecondWalk() override {}
+    void TakeCounts(std::uint32_t, const std::byte*, const unsigned char*, std::uint32_t) override {
+    }
+    bool ReadTile(std::uint32_t, const Window& tile, std::byte* pixels) override {
+        std::copy_n(stored.begin(), std::size_t{tile.width} * tile.height, pixels);
+        return true;
+    }
+    bool WriteTile(std::uint32_t, const Window& tile, std::byte* pixels, unsigned char*) override {
+        const std::size_t size = std::size_t{tile.width} * tile.height;
+        stored.assign(pixels, pixels + size);
+        std::fill_n(stored.end() - static_cast<std::ptrdiff_t>(lost), lost, std::byte{0});
+        return true;
+    }
+    void StoreStatistics() override {}
+    std::uint64_t StatisticsMemory() const override { return 0; }
+
+    std::size_t lost = 0;
+    std::vector<std::byte> stored;
+};
+
+TEST(TileStore, SeesWhatTheDiskLost) {
+    for (const std::size_t lost : {0u, 1u, 4096u, 65000u}) {
+        LosingWork work;
+        work.lost = lost;
+        MemoryMeter meter;
+        TileStore store({"x", 256, 256, 0, 1, 1}, work, meter);
+        Strip strip(meter, 0, 65536, 1, 0, 256);
+        strip.Begin(0, 256, 256);
+        std::fill_n(strip.Row(0), 65536, std::byte{200});
+        store.Write(strip, 0, 0, 256);
+        if (lost == 0)
+            EXPECT_NO_THROW(store.CompareAll());
+        else
+            EXPECT_THROW(store.CompareAll(), Error);
+    }
+}
+
+}  // namespace
+}  // namespace zmchost

@@ -1,0 +1,345 @@
+// Pyramids as the builder makes them, held against levels made the simple way.
+#include "host/PyramidBuilder.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <cmath>
+#include <cstring>
+#include <limits>
+
+#include "core/PixelVocabulary.h"
+#include "host/BandStatistics.h"
+#include "host/Raster.h"
+#include "tests/host/NaivePyramid.h"
+#include "tests/support/MemorySource.h"
+#include "tests/support/ScratchDirectory.h"
+
+namespace zmchost {
+namespace {
+
+using support::MemorySource;
+using support::ScratchDirectory;
+using support::TestModule;
+
+constexpr Resampling kMethods[] = {Resampling::Nearest, Resampling::Average,  Resampling::Rms,
+                                   Resampling::Mode,    Resampling::Minimum,  Resampling::Maximum,
+                                   Resampling::Median,  Resampling::Bilinear, Resampling::Cubic,
+                                   Resampling::Lanczos};
+
+template <class T>
+bool SameBytes(const std::vector<T>& a, const std::vector<T>& b) {
+    return a.size() == b.size() && std::memcmp(a.data(), b.data(), a.size() * sizeof(T)) == 0;
+}
+
+// Every level of the file, against the source and against the level below.
+template <class T>
+void ExpectPyramidOf(const MemorySource<T>& source, const std::string& file, Resampling method) {
+    Raster raster = Raster::Open(TestModule(), file);
+    ASSERT_TRUE(raster.IsComplete());
+    std::vector<zelm::NoDataRule<T>> rules;
+    for (std::uint32_t band = 0; band < source.props.bands; ++band)
+        rules.push_back(RuleOfBand<T>(source.props, band));
+    std::vector<T> expected = source.pixels;
+    for (std::uint32_t level = 0; level <= raster.MaxLevel(); ++level) {
+        if (level > 0)
+            expected = support::NaiveReduce(expected, raster.Width(level - 1),
+                                            raster.Height(level - 1), method, rules);
+        const std::vector<T> stored =
+            raster.Read<T>(level, {0, 0, raster.Width(level), raster.Height(level)});
+        EXPECT_TRUE(SameBytes(stored, expected))
+            << zelm::ElementTraits<T>::word << " " << ResamplingName(method) << " level " << level;
+    }
+}
+
+template <class T>
+void ExpectAllMethods() {
+    const ScratchDirectory folder;
+    const PyramidBuilder builder(TestModule());
+    MemorySource<T> source(701, 523, 2);
+    source.FillWithNoise(5);
+    for (const Resampling method : kMethods) {
+        if (!SupportsElementType(method, source.props.pixelType)) continue;
+        BuildOptions options;
+        options.resampling = method;
+        options.overwrite = true;
+        options.threads = 2;
+        const BuildReport report = builder.Build(source, folder / "a.zmc", options);
+        EXPECT_EQ(report.maxLevel, 2u);
+        ExpectPyramidOf(source, folder / "a.zmc", method);
+    }
+}
+
+TEST(PyramidBuilder, BuildsEveryTypeByEveryMethod) {
+#define ZMC_X(type, name, code) ExpectAllMethods<type>();
+    ZMC_ELEMENT_TYPES(ZMC_X)
+#undef ZMC_X
+}
+
+TEST(PyramidBuilder, KeepsInvalidSamplesOutOfEveryLevel) {
+    const ScratchDirectory folder;
+    const PyramidBuilder builder(TestModule());
+    MemorySource<float> source(600, 530, 2);
+    source.FillWithNoise(9);
+    source.props.noDataValues[1] = -7777;
+    for (std::size_t i = 0; i < source.pixels.size(); i += 3)
+        source.pixels[i] = i % 2 ? -7777.0f : std::numeric_limits<float>::quiet_NaN();
+    for (std::size_t i = 0; i < 300 * 1200; ++i)
+        if (i % 1200 < 400) source.pixels[i] = i % 2 ? -7777.0f : INFINITY;
+    for (const Resampling method : kMethods) {
+        BuildOptions options;
+        options.resampling = method;
+        options.overwrite = true;
+        builder.Build(source, folder / "a.zmc", options);
+        ExpectPyramidOf(source, folder / "a.zmc", method);
+    }
+}
+
+TEST(PyramidBuilder, ReducesBytesWithNoDataValue) {
+    const ScratchDirectory folder;
+    MemorySource<unsigned char> source(515, 600, 3);
+    source.FillWithNoise(2);
+    for (const std::uint32_t band : {0u, 1u, 2u}) source.props.noDataValues[band] = 0;
+    for (std::size_t i = 0; i < source.pixels.size() / 2; ++i) source.pixels[i] &= 1;
+    PyramidBuilder(TestModule()).Build(source, folder / "a.zmc");
+    ExpectPyramidOf(source, folder / "a.zmc", Resampling::Average);
+}
+
+TEST(PyramidBuilder, TakesNoDataValueThatTheTypeCannotHoldForNone) {
+    const ScratchDirectory folder;
+    MemorySource<unsigned char> source(20, 20, 1);
+    std::fill(source.pixels.begin(), source.pixels.end(), static_cast<unsigned char>(241));
+    source.props.noDataValues[0] = -9999;  // 241 when it is cut to a byte
+    PyramidBuilder(TestModule()).Build(source, folder / "a.zmc");
+    Raster raster = Raster::Open(TestModule(), folder / "a.zmc");
+    EXPECT_EQ(raster.Statistics<unsigned char>(0).mean, 241);
+}
+
+TEST(PyramidBuilder, BuildsManyBandsInMortonOrder) {
+    const ScratchDirectory folder;
+    MemorySource<short> source(600, 300, 11);
+    source.FillWithNoise(3);
+    const BuildReport report = PyramidBuilder(TestModule()).Build(source, folder / "a.zmc");
+    EXPECT_EQ(report.tileOrdering, zelm::TileOrder::Morton);
+    ExpectPyramidOf(source, folder / "a.zmc", Resampling::Average);
+}
+
+TEST(PyramidBuilder, BuildsRastersOfEveryShape) {
+    const ScratchDirectory folder;
+    const PyramidBuilder builder(TestModule());
+    for (const auto& [width, height] : std::vector<std::pair<std::uint32_t, std::uint32_t>>{
+             {1, 1}, {1, 2000}, {2000, 1}, {2, 3}, {255, 257}, {256, 256}, {257, 512}, {1025, 3}}) {
+        MemorySource<unsigned short> source(width, height, 1);
+        source.FillWithNoise(width + height);
+        for (const Resampling method : {Resampling::Average, Resampling::Lanczos}) {
+            BuildOptions options;
+            options.overwrite = true;
+            options.resampling = method;
+            builder.Build(source, folder / "a.zmc", options);
+            ExpectPyramidOf(source, folder / "a.zmc", method);
+        }
+    }
+}
+
+TEST(PyramidBuilder, WalksInColumnsWhereTheBudgetIsSmall) {
+    const ScratchDirectory folder;
+    const PyramidBuilder builder(TestModule());
+    MemorySource<double> source(5003, 700, 1);
+    source.FillWithNoise(4);
+    source.pixels[5000] = std::numeric_limits<double>::quiet_NaN();
+    for (const Resampling method : kMethods) {
+        BuildOptions options;
+        options.resampling = method;
+        options.overwrite = true;
+        options.threads = 2;
+        options.memory = std::uint64_t{9} << 20;  // the whole width takes 45 MiB
+        source.read = 0;
+        const BuildReport report = builder.Build(source, folder / "a.zmc", options);
+        EXPECT_LE(report.peakMemory, options.memory) << ResamplingName(method);
+        EXPECT_LE(source.read, source.pixels.size() * 5 / 4) << ResamplingName(method);
+        ExpectPyramidOf(source, folder / "a.zmc", method);
+    }
+}
+
+TEST(PyramidBuilder, StaysWithinTheBudgetWhateverTheWidth) {
+    const ScratchDirectory folder;
+    const PyramidBuilder builder(TestModule());
+    for (const std::uint32_t width : {1000u, 8000u, 32000u}) {
+        MemorySource<unsigned char> source(width, 300, 3);
+        source.FillWithNoise(width);
+        BuildOptions options;
+        options.overwrite = true;
+        options.memory = std::uint64_t{16} << 20;
+        const BuildReport report = builder.Build(source, folder / "a.zmc", options);
+        EXPECT_LE(report.peakMemory, options.memory) << width;
+    }
+}
+
+TEST(PyramidBuilder, RefusesBudgetThatIsTooSmallAndTellsTheLeast) {
+    const ScratchDirectory folder;
+    MemorySource<double> source(3000, 300, 1);
+    BuildOptions options;
+    options.memory = 100000;
+    try {
+        PyramidBuilder(TestModule()).Build(source, folder / "a.zmc", options);
+        FAIL();
+    } catch (const Error& error) {
+        EXPECT_THAT(error.what(), testing::HasSubstr("it needs at least "));
+    }
+}
+
+TEST(PyramidBuilder, GivesTheSameFileOnAnyNumberOfThreads) {
+    const ScratchDirectory folder;
+    const PyramidBuilder builder(TestModule());
+    MemorySource<float> source(1500, 900, 2);
+    source.FillWithNoise(6);
+    std::string first;
+    for (const std::uint32_t threads : {1u, 2u, 4u}) {
+        BuildOptions options;
+        options.threads = threads;
+        options.overwrite = true;
+        options.resampling = Resampling::Cubic;
+        builder.Build(source, folder / "a.zmc", options);
+        const std::string bytes = support::ReadText(folder / "a.zmc");
+        if (first.empty()) first = bytes;
+        EXPECT_EQ(bytes == first, true) << threads;
+    }
+}
+
+TEST(PyramidBuilder, ReadsTheSourceOnceInWholeLines) {
+    const ScratchDirectory folder;
+    MemorySource<unsigned char> source(900, 700, 1);
+    std::uint32_t next = 0;
+    source.beforeRead = [&](const Window& window) {
+        EXPECT_EQ(window.x, 0u);
+        EXPECT_EQ(window.width, 900u);
+        EXPECT_EQ(window.y, next);
+        next = window.y + window.height;
+    };
+    PyramidBuilder(TestModule()).Build(source, folder / "a.zmc");
+    EXPECT_EQ(next, 700u);
+}
+
+template <class T>
+void ExpectStatistics() {
+    const ScratchDirectory folder;
+    MemorySource<T> source(300, 280, 2);
+    source.FillWithNoise(8);
+    PyramidBuilder(TestModule()).Build(source, folder / "a.zmc");
+    Raster raster = Raster::Open(TestModule(), folder / "a.zmc");
+    EXPECT_EQ(raster.HasStatistics(0), !zelm::kIsComplex<T>) << zelm::ElementTraits<T>::word;
+    if constexpr (!zelm::kIsComplex<T>) {
+        const auto histograms = raster.Histograms<T>();
+        ASSERT_EQ(histograms.size(), 2u);
+        for (std::uint32_t band = 0; band < 2; ++band) {
+            BandAccumulator<T> model;
+            model.AddRow(source.pixels.data(), nullptr, band, 2, 300 * 280);
+            const auto expected = model.Stats(band);
+            const auto stored = raster.Statistics<T>(band);
+            EXPECT_EQ(stored.flags, 127u);
+            EXPECT_NEAR(stored.mean, expected.mean, std::abs(expected.mean) * 1e-5);
+            EXPECT_NEAR(stored.standardDeviation, expected.standardDeviation,
+                        expected.standardDeviation * 1e-5);
+            EXPECT_EQ(histograms[band].binCount, 256u);
+            std::uint64_t total = 0;
+            for (std::uint32_t bin = 0; bin < 256; ++bin)
+                total += histograms[band].counts.data[bin];
+            EXPECT_EQ(total, 300u * 280u);
+        }
+    }
+}
+
+TEST(PyramidBuilder, StoresStatisticsAndHistogramsOfEveryType) {
+#define ZMC_X(type, name, code) ExpectStatistics<type>();
+    ZMC_ELEMENT_TYPES(ZMC_X)
+#undef ZMC_X
+}
+
+TEST(PyramidBuilder, StoresNoStatisticsWhenAskedSo) {
+    const ScratchDirectory folder;
+    MemorySource<float> source(30, 20, 1);
+    BuildOptions options;
+    options.statistics = false;
+    PyramidBuilder(TestModule()).Build(source, folder / "a.zmc", options);
+    EXPECT_FALSE(Raster::Open(TestModule(), folder / "a.zmc").HasStatistics(0));
+}
+
+TEST(PyramidBuilder, StoresPalettesAndThenReducesByMode) {
+    const ScratchDirectory folder;
+    MemorySource<unsigned char> source(600, 600, 1);
+    source.FillWithNoise(1);
+    zelm::PalettePtr palette(new zelm::Palette);
+    unsigned char components[] = {10, 20, 30, 255};
+    palette->AddColor(zelm::RGBAColor(zelm::Array<unsigned char>(components, zelm::ArrayShape(4))));
+    source.palettes.emplace(0, palette);
+    const BuildReport report = PyramidBuilder(TestModule()).Build(source, folder / "a.zmc");
+    EXPECT_EQ(report.resampling, Resampling::Mode);
+    ExpectPyramidOf(source, folder / "a.zmc", Resampling::Mode);
+    const zelm::PalettePtr stored = Raster::Open(TestModule(), folder / "a.zmc").BandPalette(0);
+    ASSERT_TRUE(stored);
+    EXPECT_EQ(stored->GetColor(0)->green, 20);
+}
+
+TEST(PyramidBuilder, TakesBandsInTheOrderAskedFor) {
+    const ScratchDirectory folder;
+    MemorySource<unsigned char> source(40, 30, 3);
+    source.FillWithNoise(1);
+    source.props.noDataValues[2] = 5;
+    BuildOptions options;
+    options.bands = {2, 0};
+    PyramidBuilder(TestModule()).Build(source, folder / "a.zmc", options);
+    Raster raster = Raster::Open(TestModule(), folder / "a.zmc");
+    const auto pixels = raster.Read<unsigned char>(0, {0, 0, 40, 30});
+    EXPECT_EQ(pixels[0], source.pixels[2]);
+    EXPECT_EQ(pixels[1], source.pixels[0]);
+    options.bands = {3};
+    options.overwrite = true;
+    EXPECT_THROW(PyramidBuilder(TestModule()).Build(source, folder / "a.zmc", options), Error);
+}
+
+TEST(PyramidBuilder, LevelsEndWhereTheRasterDoes) {
+    const ScratchDirectory folder;
+    const PyramidBuilder builder(TestModule());
+    MemorySource<unsigned char> source(1000, 777, 1);
+    BuildOptions options;
+    EXPECT_EQ(builder.Build(source, folder / "auto.zmc", options).maxLevel, 2u);
+    options.levels = 0;
+    EXPECT_EQ(builder.Build(source, folder / "none.zmc", options).maxLevel, 0u);
+    options.levels = 9;
+    EXPECT_EQ(builder.Build(source, folder / "most.zmc", options).maxLevel, 9u);
+    ExpectPyramidOf(source, folder / "most.zmc", Resampling::Average);
+    options.levels = 10;
+    EXPECT_THROW(builder.Build(source, folder / "more.zmc", options), Error);
+    MemorySource<unsigned char> many(600, 600, 9);
+    options.levels = 9;
+    EXPECT_THROW(builder.Build(many, folder / "morton.zmc", options), Error);
+}
+
+TEST(PyramidBuilder, OrderingIsWhatTheBandsAllow) {
+    const ScratchDirectory folder;
+    const PyramidBuilder builder(TestModule());
+    MemorySource<unsigned char> few(30, 30, 3);
+    MemorySource<unsigned char> many(30, 30, 9);
+    BuildOptions options;
+    options.ordering = Ordering::Scanline;
+    EXPECT_EQ(builder.Build(few, folder / "a.zmc", options).tileOrdering,
+              zelm::TileOrder::Scanline);
+    EXPECT_THROW(builder.Build(many, folder / "b.zmc", options), Error);
+    options.ordering = Ordering::Blocked;
+    EXPECT_EQ(builder.Build(few, folder / "c.zmc", options).tileOrdering, zelm::TileOrder::Blocked);
+    options.ordering = Ordering::Morton;
+    EXPECT_EQ(builder.Build(many, folder / "d.zmc", options).tileOrdering, zelm::TileOrder::Morton);
+    EXPECT_THROW(builder.Build(few, folder / "e.zmc", options), Error);
+}
+
+TEST(PyramidBuilder, RefusesMethodsThatTheTypeHasNot) {
+    const ScratchDirectory folder;
+    MemorySource<zelm::Complex<float>> source(30, 30, 1);
+    BuildOptions options;
+    options.resampling = Resampling::Median;
+    EXPECT_THROW(PyramidBuilder(TestModule()).Build(source, folder / "a.zmc", options), Error);
+}
+
+}  // namespace
+}  // namespace zmchost
