@@ -1,0 +1,221 @@
+#include "gdal/Archive.h"
+
+#include <algorithm>
+#include <cmath>
+#include <limits>
+
+#include "core/ElementTypes.h"
+
+namespace zmcgdal {
+namespace {
+
+constexpr std::uint32_t kMaxColors = 65536;
+
+template <class T>
+double ToDouble(const T& value) {
+    if constexpr (zelm::kIsComplex<T>)
+        return static_cast<double>(value.re);
+    else
+        return static_cast<double>(value);
+}
+
+// The nearest value of T; the double next to the largest 64-bit integer lies above it.
+template <class T>
+T FromDouble(double value) {
+    if constexpr (zelm::kIsComplex<T>) {
+        return T(static_cast<decltype(T::re)>(value), 0);
+    } else if constexpr (std::is_floating_point_v<T>) {
+        return static_cast<T>(value);
+    } else {
+        using Limits = std::numeric_limits<T>;
+        if (!(value > static_cast<double>(Limits::min()))) return Limits::min();
+        if (value >= static_cast<double>(Limits::max())) return Limits::max();
+        return static_cast<T>(std::round(value));
+    }
+}
+
+template <class T>
+inline constexpr bool kIsInteger = std::is_integral_v<T>;
+
+template <class T>
+StoredStatistics Convert(const zelm::RasterBandStats<T>& record) {
+    return {record.flags, ToDouble(record.minimum), ToDouble(record.maximum), record.mean,
+            record.standardDeviation};
+}
+
+// Bins of integers divide [minimum, maximum + 1) as a rule. Where their width is a whole number it
+// changes nothing to draw each value in the middle of its unit, as GDAL does.
+template <class T>
+StoredHistogram Convert(const zelm::RasterBandHistogram<T>& record) {
+    StoredHistogram histogram;
+    histogram.band = record.band;
+    histogram.level = record.level;
+    const auto count = std::min(record.binCount, record.counts.shape.elements);
+    if (record.counts.data)
+        histogram.counts.assign(record.counts.data, record.counts.data + count);
+    histogram.lower = ToDouble(record.minimum);
+    const double extent = ToDouble(record.maximum) - histogram.lower;
+    double width = record.binSize * record.binCount;
+    if (!(width > 0)) width = extent > 0 ? extent : 1;
+    if (kIsInteger<T> && width == extent + 1 && record.binSize == std::floor(record.binSize))
+        histogram.lower -= 0.5;
+    histogram.upper = histogram.lower + width;
+    return histogram;
+}
+
+template <class T>
+void Fill(zelm::RasterBandHistogram<T>& record, const StoredHistogram& histogram) {
+    const auto count = static_cast<std::uint32_t>(histogram.counts.size());
+    record.band = histogram.band;
+    record.level = histogram.level;
+    record.source = zelm::HistogramSource::ORVA;
+    record.binCount = count;
+    record.binSize = (histogram.upper - histogram.lower) / count;
+    // The first and the last integer inside.
+    const bool whole = kIsInteger<T>;
+    record.minimum = FromDouble<T>(whole ? std::ceil(histogram.lower) : histogram.lower);
+    record.maximum = FromDouble<T>(whole ? std::ceil(histogram.upper) - 1 : histogram.upper);
+    record.counts.SetShape(zelm::ArrayShape(count));
+    if (record.counts.data)
+        std::copy(histogram.counts.begin(), histogram.counts.end(), record.counts.data);
+}
+
+GDALColorEntry EntryOf(const zelm::Color& color) {
+    return {color.red, color.green, color.blue, color.alpha};
+}
+
+void AddEntry(zelm::Palette& palette, const GDALColorEntry& entry) {
+    unsigned char components[] = {
+        static_cast<unsigned char>(entry.c1), static_cast<unsigned char>(entry.c2),
+        static_cast<unsigned char>(entry.c3), static_cast<unsigned char>(entry.c4)};
+    palette.AddColor(zelm::RGBAColor(zelm::Array(components, zelm::ArrayShape(4))));
+}
+
+}  // namespace
+
+bool StoredStatistics::IsFull() const {
+    constexpr std::uint32_t kNeeded = zelm::StatsFlag::Minimum | zelm::StatsFlag::Maximum |
+                                      zelm::StatsFlag::Mean | zelm::StatsFlag::StandardDeviation;
+    return (flags & kNeeded) == kNeeded;
+}
+
+Archive::Archive(const zmchost::Raster& pyramid, bool hasDocument)
+    : raster(pyramid), documentExists(hasDocument) {}
+
+const StoredStatistics* Archive::Statistics(std::uint32_t band) {
+    if (!documentExists) return nullptr;
+    auto found = statistics_.find(band);
+    if (found == statistics_.end()) found = statistics_.emplace(band, FetchStatistics(band)).first;
+    return found->second ? &*found->second : nullptr;
+}
+
+// A reader fetches statistics by their place in the document. As a rule all bands were stored at
+// once and in order, so the band's record is at its own place and the place behind the last band is
+// empty; everything else takes a walk over all places.
+std::optional<StoredStatistics> Archive::FetchStatistics(std::uint32_t band) {
+    std::optional<StoredStatistics> newest;
+    raster.Visit([&]<class T>(zelm::RasterReader<T>& reader) {
+        if (!severalSets) severalSets = reader.GetBandStats(reader.GetBands()).flags != 0;
+        if (!*severalSets) {
+            const auto record = reader.GetBandStats(band);
+            if (record.band == band && record.flags != 0) newest = Convert(record);
+            if (newest || !reader.HasBandStats(band)) return;
+        }
+        for (std::uint32_t place = 0;; ++place) {
+            const auto record = reader.GetBandStats(place);
+            if (record.flags == 0) return;
+            if (record.band == band) newest = Convert(record);
+        }
+    });
+    return newest;
+}
+
+std::vector<StoredHistogram> Archive::FetchHistograms() const {
+    std::vector<StoredHistogram> found;
+    raster.Visit([&]<class T>(zelm::RasterReader<T>& reader) {
+        const auto records = reader.GetHistograms();
+        for (std::uint32_t i = 0; records.data && i < records.shape.elements; ++i)
+            found.push_back(Convert(records.data[i]));
+    });
+    return found;
+}
+
+const StoredHistogram* Archive::Histogram(std::uint32_t band, std::uint32_t level) {
+    if (!documentExists) return nullptr;
+    if (!histograms_) histograms_ = FetchHistograms();
+    const auto newest = std::find_if(histograms_->rbegin(), histograms_->rend(), [&](auto& each) {
+        return each.band == band && each.level == level && !each.counts.empty();
+    });
+    return newest == histograms_->rend() ? nullptr : &*newest;
+}
+
+GDALColorTable* Archive::ColorTable(std::uint32_t band) {
+    if (!documentExists) return nullptr;
+    auto found = colorTables.find(band);
+    if (found == colorTables.end())
+        found = colorTables.emplace(band, FetchColorTable(band)).first;
+    return found->second.get();
+}
+
+std::unique_ptr<GDALColorTable> Archive::FetchColorTable(std::uint32_t band) const {
+    std::unique_ptr<GDALColorTable> table;
+    raster.Visit([&](auto& reader) {
+        const zelm::PalettePtr palette = reader.GetPalette(band);
+        if (!palette || palette->nextIndex == 0) return;
+        table = std::make_unique<GDALColorTable>();
+        for (std::uint32_t i = 0; i < std::min(palette->nextIndex, kMaxColors); ++i)
+            if (const zelm::Color* const color = palette->GetColor(i)) {
+                const GDALColorEntry entry = EntryOf(*color);
+                table->SetColorEntry(static_cast<int>(i), &entry);
+            }
+    });
+    return table;
+}
+
+bool Archive::StoreStatistics(std::uint32_t band, const StoredStatistics& statistics) {
+    bool stored = false;
+    raster.Visit([&]<class T>(zelm::RasterReader<T>& reader) {
+        zelm::RasterBandStats<T> record;
+        record.band = band;
+        record.flags = statistics.flags;
+        record.minimum = FromDouble<T>(statistics.minimum);
+        record.maximum = FromDouble<T>(statistics.maximum);
+        record.mean = statistics.mean;
+        record.standardDeviation = statistics.standardDeviation;
+        zelm::Array<zelm::RasterBandStats<T>> records;
+        stored = records.Append(record) && reader.SetBandStats(records);
+    });
+    documentExists |= stored;
+    severalSets.reset();
+    statistics_.clear();
+    return stored;
+}
+
+bool Archive::StoreHistogram(const StoredHistogram& histogram) {
+    if (histogram.counts.empty()) return false;
+    bool stored = false;
+    raster.Visit([&]<class T>(zelm::RasterReader<T>& reader) {
+        zelm::RasterBandHistogram<T> record;
+        Fill(record, histogram);
+        zelm::Array<zelm::RasterBandHistogram<T>> records;
+        stored = record.counts.data && records.Append(record) && reader.SetHistograms(records);
+    });
+    documentExists |= stored;
+    histograms_.reset();
+    return stored;
+}
+
+bool Archive::StoreColorTable(std::uint32_t band, const GDALColorTable* table) {
+    bool stored = false;
+    raster.Visit([&](auto& reader) {
+        zelm::Palette palette;
+        for (int i = 0; table && i < table->GetColorEntryCount(); ++i)
+            AddEntry(palette, *table->GetColorEntry(i));
+        stored = reader.SetPalette(band, palette);
+    });
+    documentExists |= stored;
+    colorTables.erase(band);
+    return stored;
+}
+
+}  // namespace zmcgdal

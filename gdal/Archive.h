@@ -1,0 +1,73 @@
+// Archive: the statistics, histograms and palettes that a pyramid file keeps, in GDAL's terms.
+//
+// Everything is fetched when it is first asked for and then remembered, since each fetch parses the
+// whole document of the file. Bands count from 0. A file keeps every record ever stored; the newest
+// one of a band counts here.
+#ifndef ZMC_GDAL_ARCHIVE_H
+#define ZMC_GDAL_ARCHIVE_H
+
+#include <gdal_priv.h>
+
+#include <cstdint>
+#include <map>
+#include <memory>
+#include <optional>
+#include <vector>
+
+#include "host/Raster.h"
+
+namespace zmcgdal {
+
+struct StoredStatistics {
+    std::uint32_t flags = 0;  // StatsFlag values
+    double minimum = 0;
+    double maximum = 0;
+    double mean = 0;
+    double standardDeviation = 0;
+
+    // Minimum, maximum, mean and standard deviation are all there.
+    bool IsFull() const;
+};
+
+// Buckets of equal width over [lower, upper). For integers the bounds lie half a unit outside the
+// first and last value, as GDAL has them.
+struct StoredHistogram {
+    std::uint32_t band = 0;
+    std::uint32_t level = 0;
+    double lower = 0;
+    double upper = 0;
+    std::vector<GUIntBig> counts;
+};
+
+class Archive {
+public:
+    // `pyramid` outlives this object. Without a document in the file nothing is fetched.
+    Archive(const zmchost::Raster& pyramid, bool hasDocument);
+
+    // Null where the file has none.
+    const StoredStatistics* Statistics(std::uint32_t band);
+    const StoredHistogram* Histogram(std::uint32_t band, std::uint32_t level);
+    GDALColorTable* ColorTable(std::uint32_t band);
+
+    // Appends a record to the file; false if the module did not take it.
+    bool StoreStatistics(std::uint32_t band, const StoredStatistics& statistics);
+    bool StoreHistogram(const StoredHistogram& histogram);
+    // A null table hides the one that is there.
+    bool StoreColorTable(std::uint32_t band, const GDALColorTable* table);
+
+private:
+    const zmchost::Raster& raster;
+    bool documentExists;
+    std::map<std::uint32_t, std::optional<StoredStatistics>> statistics_;
+    std::optional<bool> severalSets;
+    std::optional<std::vector<StoredHistogram>> histograms_;
+    std::map<std::uint32_t, std::unique_ptr<GDALColorTable>> colorTables;
+
+    std::optional<StoredStatistics> FetchStatistics(std::uint32_t band);
+    std::vector<StoredHistogram> FetchHistograms() const;
+    std::unique_ptr<GDALColorTable> FetchColorTable(std::uint32_t band) const;
+};
+
+}  // namespace zmcgdal
+
+#endif

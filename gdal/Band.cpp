@@ -1,0 +1,438 @@
+#include "gdal/Band.h"
+
+#include <algorithm>
+#include <climits>
+#include <cstring>
+#include <exception>
+
+#include "core/PixelVocabulary.h"
+#include "gdal/Create.h"
+#include "gdal/MaskBand.h"
+#include "gdal/NoDataValues.h"
+#include "raster/RasterBandStats.h"
+
+namespace zmcgdal {
+namespace {
+
+constexpr const char* kStructureDomain = "IMAGE_STRUCTURE";
+
+bool IsDefaultDomain(const char* domain) { return !domain || *domain == '\0'; }
+
+// The shortest text that reads back as the same number.
+std::string NumberText(double value) {
+    for (int digits = 15; digits < 17; ++digits) {
+        const std::string text = CPLSPrintf("%.*g", digits, value);
+        if (CPLAtof(text.c_str()) == value) return text;
+    }
+    return CPLSPrintf("%.17g", value);
+}
+
+// Signed bytes that GDAL holds as 16 bits, back to bytes, in place.
+void NarrowSamples(std::vector<unsigned char>& samples) {
+    const std::size_t count = samples.size() / sizeof(std::int16_t);
+    for (std::size_t i = 0; i < count; ++i) {
+        std::int16_t value = 0;
+        std::memcpy(&value, samples.data() + i * sizeof value, sizeof value);
+        const int clamped = std::clamp<int>(value, SCHAR_MIN, SCHAR_MAX);
+        samples[i] = static_cast<unsigned char>(clamped);
+    }
+    samples.resize(count);
+}
+
+void ReportSuccess(int* success, bool value) {
+    if (success) *success = value ? TRUE : FALSE;
+}
+
+}  // namespace
+
+Band::Band(Dataset& dataset, int number)
+    : owner(dataset), index(static_cast<std::uint32_t>(number - 1)) {
+    poDS = &dataset;
+    nBand = number;
+    eDataType = owner.File().tiles.Type();
+    eAccess = owner.GetAccess();
+    nRasterXSize = owner.GetRasterXSize();
+    nRasterYSize = owner.GetRasterYSize();
+    nBlockXSize = nBlockYSize = static_cast<int>(owner.File().info.header.tileSize);
+    const bool signedByte = owner.File().info.header.pixelType == zelm::PixelTypeCode::Char;
+    if (signedByte && eDataType == GDT_Byte) structure.SetNameValue("PIXELTYPE", "SIGNEDBYTE");
+}
+
+Band::~Band() = default;
+
+Band* Band::MainBand() { return static_cast<Band*>(owner.Main().GetRasterBand(nBand)); }
+
+// Storing a document behind unfinished tiles would make the file look finished.
+bool Band::StoresInFile() const {
+    return eAccess == GA_Update && !owner.IsOverview() && owner.File().info.complete;
+}
+
+// --- pixels ---
+
+CPLErr Band::IReadBlock(int blockX, int blockY, void* data) {
+    const Creation* const creation = owner.UnderCreation();
+    if (creation && !creation->IsWritten(BlockNumber(blockX, blockY), index)) {
+        FillUnwritten(data, static_cast<std::size_t>(GDALGetDataTypeSizeBytes(eDataType)),
+                      static_cast<std::size_t>(nBlockXSize) *
+                          static_cast<std::size_t>(nBlockYSize));
+        return CE_None;
+    }
+    TileReader& tiles = owner.File().tiles;
+    const Window tile = tiles.TileAt(owner.Level(), blockX, blockY);
+    const auto size = static_cast<GSpacing>(GDALGetDataTypeSizeBytes(eDataType));
+    const int band = static_cast<int>(index);
+    // Blocks at the right and bottom edge are padded with zeros.
+    if (tile.width < nBlockXSize || tile.height < nBlockYSize)
+        std::memset(data, 0,
+                    static_cast<std::size_t>(nBlockXSize) * static_cast<std::size_t>(nBlockYSize) *
+                        static_cast<std::size_t>(size));
+    if (tiles.Read(tile, &band, 1, {data, eDataType, size, size * nBlockXSize, 0})) return CE_None;
+    ReportError(CE_Failure, CPLE_FileIO, "the raster module did not read tile %d, %d", blockX,
+                blockY);
+    return CE_Failure;
+}
+
+std::size_t Band::BlockNumber(int blockX, int blockY) const {
+    return static_cast<std::size_t>(blockY) * static_cast<std::size_t>(nBlocksPerRow) +
+           static_cast<std::size_t>(blockX);
+}
+
+// Blocks that nobody wrote hold the no-data value, or zeros.
+void Band::FillUnwritten(void* samples, std::size_t stride, std::size_t count) {
+    const double value = NoDataAsDouble(*this).value_or(0.0);
+    GDALCopyWords64(&value, GDT_Float64, 0, samples, eDataType, static_cast<int>(stride),
+                    static_cast<GPtrDiff_t>(count));
+}
+
+// Copies the part of a padded block that lies in the tile, at `stride` bytes per pixel.
+void Band::CopyFromBlock(const void* block, const Window& tile, unsigned char* samples,
+                         std::size_t stride) const {
+    const int size = GDALGetDataTypeSizeBytes(eDataType);
+    const auto* line = static_cast<const unsigned char*>(block);
+    for (int y = 0; y < tile.height; ++y, line += std::ptrdiff_t{size} * nBlockXSize) {
+        GDALCopyWords64(line, eDataType, size, samples, eDataType, static_cast<int>(stride),
+                        tile.width);
+        samples += stride * static_cast<std::size_t>(tile.width);
+    }
+}
+
+// Puts this band's samples of a tile where they belong in whole pixels: from a block that waits in
+// the cache, which is written by this, else from the file, else what an unwritten block holds.
+void Band::CompleteTile(int blockX, int blockY, const Window& tile, unsigned char* samples,
+                        std::size_t stride) {
+    if (GDALRasterBlock* const block = TryGetLockedBlockRef(blockX, blockY)) {
+        CopyFromBlock(block->GetDataRef(), tile, samples, stride);
+        block->MarkClean();
+        block->DropLock();
+        return;
+    }
+    const Creation* const creation = owner.UnderCreation();
+    if (creation && !creation->IsWritten(BlockNumber(blockX, blockY), index)) {
+        FillUnwritten(samples, stride,
+                      static_cast<std::size_t>(tile.width) * static_cast<std::size_t>(tile.height));
+        return;
+    }
+    const int band = static_cast<int>(index);
+    const auto pixelSpace = static_cast<GSpacing>(stride);
+    const Target target{samples, eDataType, pixelSpace, pixelSpace * tile.width, 0};
+    if (!owner.File().tiles.Read(tile, &band, 1, target))
+        throw zmchost::Error(owner.GetDescription(), "write a block",
+                             "the rest of its tile cannot be read");
+}
+
+// The tile as the file holds it, with all bands where they lie together; `bands` tells which.
+std::vector<unsigned char> Band::GatherTile(int blockX, int blockY, const Window& tile,
+                                            const void* data, std::vector<std::uint32_t>& bands) {
+    if (owner.File().tiles.IsPixelInterleaved())
+        bands = owner.File().raster.AllBands();
+    else
+        bands = {index};
+    const auto size = static_cast<std::size_t>(GDALGetDataTypeSizeBytes(eDataType));
+    const std::size_t stride = size * bands.size();
+    std::vector<unsigned char> samples(static_cast<std::size_t>(tile.width) *
+                                       static_cast<std::size_t>(tile.height) * stride);
+    unsigned char* first = samples.data();
+    for (const std::uint32_t band : bands) {
+        if (band == index)
+            CopyFromBlock(data, tile, first, stride);
+        else
+            static_cast<Band*>(owner.GetRasterBand(static_cast<int>(band) + 1))
+                ->CompleteTile(blockX, blockY, tile, first, stride);
+        first += size;
+    }
+    if (IsWidened(owner.File().raster.PixelType(), eDataType)) NarrowSamples(samples);
+    return samples;
+}
+
+CPLErr Band::IWriteBlock(int blockX, int blockY, void* data) {
+    TileReader& tiles = owner.File().tiles;
+    const Window tile = tiles.TileAt(owner.Level(), blockX, blockY);
+    const auto positive = [](int value) { return static_cast<std::uint32_t>(value); };
+    try {
+        std::vector<std::uint32_t> bands;
+        const auto samples = GatherTile(blockX, blockY, tile, data, bands);
+        owner.File().raster.Write(
+            owner.Level(),
+            {positive(tile.x), positive(tile.y), positive(tile.width), positive(tile.height)},
+            bands, samples.data());
+        tiles.Forget();
+        if (Creation* const creation = owner.UnderCreation())
+            for (const std::uint32_t band : bands)
+                creation->MarkWritten(BlockNumber(blockX, blockY), band);
+        return CE_None;
+    } catch (const std::exception& error) {
+        ReportError(CE_Failure, CPLE_FileIO, "%s", error.what());
+        return CE_Failure;
+    }
+}
+
+CPLErr Band::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, void* data,
+                       int bufferWidth, int bufferHeight, GDALDataType bufferType,
+                       GSpacing pixelSpace, GSpacing lineSpace, GDALRasterIOExtraArg* extra) {
+    if (mode == GF_Read && bufferWidth < width && bufferHeight < height) {
+        int tried = FALSE;
+        const CPLErr result =
+            TryOverviewRasterIO(mode, x, y, width, height, data, bufferWidth, bufferHeight,
+                                bufferType, pixelSpace, lineSpace, extra, &tried);
+        if (tried) return result;
+    }
+    if (mode == GF_Read && bufferWidth == width && bufferHeight == height &&
+        owner.ReadsDirectly(x, y, width, height)) {
+        const int band = static_cast<int>(index);
+        const Target target{data, bufferType, pixelSpace, lineSpace, 0};
+        if (owner.File().tiles.Read({owner.Level(), x, y, width, height}, &band, 1, target))
+            return CE_None;
+        ReportError(CE_Failure, CPLE_FileIO, "the raster module did not read level %u",
+                    owner.Level());
+        return CE_Failure;
+    }
+    return GDALPamRasterBand::IRasterIO(mode, x, y, width, height, data, bufferWidth, bufferHeight,
+                                        bufferType, pixelSpace, lineSpace, extra);
+}
+
+// --- no-data values and masks ---
+
+double Band::GetNoDataValue(int* success) {
+    if (owner.IsOverview()) return MainBand()->GetNoDataValue(success);
+    return GDALPamRasterBand::GetNoDataValue(success);
+}
+
+std::int64_t Band::GetNoDataValueAsInt64(int* success) {
+    if (owner.IsOverview()) return MainBand()->GetNoDataValueAsInt64(success);
+    return GDALPamRasterBand::GetNoDataValueAsInt64(success);
+}
+
+std::uint64_t Band::GetNoDataValueAsUInt64(int* success) {
+    if (owner.IsOverview()) return MainBand()->GetNoDataValueAsUInt64(success);
+    return GDALPamRasterBand::GetNoDataValueAsUInt64(success);
+}
+
+CPLErr Band::SetNoDataValue(double value) {
+    if (owner.IsOverview()) return MainBand()->SetNoDataValue(value);
+    InvalidateMaskBand();
+    return GDALPamRasterBand::SetNoDataValue(value);
+}
+
+CPLErr Band::SetNoDataValueAsInt64(std::int64_t value) {
+    if (owner.IsOverview()) return MainBand()->SetNoDataValueAsInt64(value);
+    InvalidateMaskBand();
+    return GDALPamRasterBand::SetNoDataValueAsInt64(value);
+}
+
+CPLErr Band::SetNoDataValueAsUInt64(std::uint64_t value) {
+    if (owner.IsOverview()) return MainBand()->SetNoDataValueAsUInt64(value);
+    InvalidateMaskBand();
+    return GDALPamRasterBand::SetNoDataValueAsUInt64(value);
+}
+
+CPLErr Band::DeleteNoDataValue() {
+    if (owner.IsOverview()) return MainBand()->DeleteNoDataValue();
+    InvalidateMaskBand();
+    return GDALPamRasterBand::DeleteNoDataValue();
+}
+
+// GDAL's own search comes first: a mask file, an alpha band or a set of values over all bands
+// override what the pixels of one band tell.
+bool Band::UsesOwnMask() {
+    GDALPamRasterBand::GetMaskBand();
+    const bool byValue = (nMaskFlags & GMF_NODATA) != 0 && (nMaskFlags & GMF_PER_DATASET) == 0;
+    const bool mayBeNotFinite =
+        GDALDataTypeIsFloating(eDataType) || GDALDataTypeIsComplex(eDataType);
+    return byValue || (nMaskFlags == GMF_ALL_VALID && mayBeNotFinite);
+}
+
+GDALRasterBand* Band::GetMaskBand() {
+    if (!UsesOwnMask()) return GDALPamRasterBand::GetMaskBand();
+    if (!ownMask) ownMask = std::make_unique<MaskBand>(*this);
+    return ownMask.get();
+}
+
+// A mask of samples that are not finite follows from the pixels as well as one by value does: told
+// as a mask of its own, it would be copied into a mask file with every translation.
+int Band::GetMaskFlags() {
+    return UsesOwnMask() ? GMF_NODATA : GDALPamRasterBand::GetMaskFlags();
+}
+
+// --- levels ---
+
+int Band::GetOverviewCount() {
+    const auto own = static_cast<int>(owner.Overviews().size());
+    return own > 0 || owner.IsOverview() ? own : GDALPamRasterBand::GetOverviewCount();
+}
+
+GDALRasterBand* Band::GetOverview(int overview) {
+    const auto& own = owner.Overviews();
+    if (own.empty() && !owner.IsOverview()) return GDALPamRasterBand::GetOverview(overview);
+    if (overview < 0 || overview >= static_cast<int>(own.size())) return nullptr;
+    return own[static_cast<std::size_t>(overview)]->GetRasterBand(nBand);
+}
+
+// --- colours ---
+
+GDALColorInterp Band::DefaultInterpretation() {
+    const int bands = owner.GetRasterCount();
+    const auto* const first = static_cast<Band*>(owner.GetRasterBand(1));
+    const bool told =
+        first->psPam && first->psPam->eColorInterp != GCI_Undefined;
+    const bool picture = !told && (bands == 3 || bands == 4) &&
+                         (eDataType == GDT_Byte || eDataType == GDT_UInt16);
+    if (picture && nBand <= 3) return static_cast<GDALColorInterp>(GCI_RedBand + nBand - 1);
+    return nBand == 1 ? GCI_GrayIndex : GCI_Undefined;
+}
+
+GDALColorInterp Band::GetColorInterpretation() {
+    if (owner.IsOverview()) return MainBand()->GetColorInterpretation();
+    const GDALColorInterp chosen = GDALPamRasterBand::GetColorInterpretation();
+    if (chosen != GCI_Undefined) return chosen;
+    return GetColorTable() ? GCI_PaletteIndex : DefaultInterpretation();
+}
+
+GDALColorTable* Band::GetColorTable() {
+    if (owner.IsOverview()) return MainBand()->GetColorTable();
+    GDALColorTable* const stored = owner.File().archive.ColorTable(index);
+    return stored ? stored : GDALPamRasterBand::GetColorTable();
+}
+
+CPLErr Band::SetColorTable(GDALColorTable* table) {
+    if (!StoresInFile()) return GDALPamRasterBand::SetColorTable(table);
+    if (owner.File().archive.StoreColorTable(index, table)) return CE_None;
+    ReportError(CE_Failure, CPLE_FileIO, "the color table was not stored");
+    return CE_Failure;
+}
+
+// --- statistics and metadata ---
+
+const StoredStatistics* Band::Stored() {
+    return owner.IsOverview() ? nullptr : owner.File().archive.Statistics(index);
+}
+
+const CPLStringList& Band::StatisticsItems() {
+    if (statisticsFetched) return statistics;
+    statisticsFetched = true;
+    statistics.Clear();
+    const StoredStatistics* const stored = Stored();
+    if (!stored) return statistics;
+    const auto set = [&](std::uint32_t flag, const char* name, double value) {
+        if (stored->flags & flag) statistics.SetNameValue(name, NumberText(value).c_str());
+    };
+    set(zelm::StatsFlag::Minimum, "STATISTICS_MINIMUM", stored->minimum);
+    set(zelm::StatsFlag::Maximum, "STATISTICS_MAXIMUM", stored->maximum);
+    set(zelm::StatsFlag::Mean, "STATISTICS_MEAN", stored->mean);
+    set(zelm::StatsFlag::StandardDeviation, "STATISTICS_STDDEV", stored->standardDeviation);
+    return statistics;
+}
+
+char** Band::GetMetadataDomainList() {
+    return BuildMetadataDomainList(GDALPamRasterBand::GetMetadataDomainList(), TRUE, "",
+                                   kStructureDomain, nullptr);
+}
+
+char** Band::GetMetadata(const char* domain) {
+    if (domain && EQUAL(domain, kStructureDomain) && structure.Count() > 0) return structure.List();
+    if (!IsDefaultDomain(domain) || StatisticsItems().Count() == 0)
+        return GDALPamRasterBand::GetMetadata(domain);
+    merged = CPLStringList(CSLDuplicate(GDALPamRasterBand::GetMetadata(domain)));
+    for (int i = 0; i < statistics.Count(); ++i) {
+        char* name = nullptr;
+        const char* const value = CPLParseNameValue(statistics[i], &name);
+        merged.SetNameValue(name, value);
+        CPLFree(name);
+    }
+    return merged.List();
+}
+
+const char* Band::GetMetadataItem(const char* name, const char* domain) {
+    if (domain && EQUAL(domain, kStructureDomain) && structure.Count() > 0)
+        return structure.FetchNameValue(name);
+    if (IsDefaultDomain(domain) && STARTS_WITH_CI(name, "STATISTICS_"))
+        if (const char* const value = StatisticsItems().FetchNameValue(name)) return value;
+    return GDALPamRasterBand::GetMetadataItem(name, domain);
+}
+
+double Band::GetMinimum(int* success) {
+    const StoredStatistics* const stored = Stored();
+    if (!stored || !(stored->flags & zelm::StatsFlag::Minimum))
+        return GDALPamRasterBand::GetMinimum(success);
+    ReportSuccess(success, true);
+    return stored->minimum;
+}
+
+double Band::GetMaximum(int* success) {
+    const StoredStatistics* const stored = Stored();
+    if (!stored || !(stored->flags & zelm::StatsFlag::Maximum))
+        return GDALPamRasterBand::GetMaximum(success);
+    ReportSuccess(success, true);
+    return stored->maximum;
+}
+
+CPLErr Band::GetStatistics(int approximate, int force, double* minimum, double* maximum,
+                           double* mean, double* deviation) {
+    const StoredStatistics* const stored = Stored();
+    if (!stored || !stored->IsFull())
+        return GDALPamRasterBand::GetStatistics(approximate, force, minimum, maximum, mean,
+                                                deviation);
+    if (minimum) *minimum = stored->minimum;
+    if (maximum) *maximum = stored->maximum;
+    if (mean) *mean = stored->mean;
+    if (deviation) *deviation = stored->standardDeviation;
+    return CE_None;
+}
+
+CPLErr Band::SetStatistics(double minimum, double maximum, double mean, double deviation) {
+    if (!StoresInFile())
+        return GDALPamRasterBand::SetStatistics(minimum, maximum, mean, deviation);
+    constexpr std::uint32_t kFlags = zelm::StatsFlag::Minimum | zelm::StatsFlag::Maximum |
+                                     zelm::StatsFlag::Mean | zelm::StatsFlag::StandardDeviation;
+    statisticsFetched = false;
+    if (owner.File().archive.StoreStatistics(index, {kFlags, minimum, maximum, mean, deviation}))
+        return CE_None;
+    ReportError(CE_Failure, CPLE_FileIO, "the statistics were not stored");
+    return CE_Failure;
+}
+
+CPLErr Band::GetDefaultHistogram(double* lower, double* upper, int* bucketCount, GUIntBig** counts,
+                                 int force, GDALProgressFunc progress, void* progressData) {
+    const StoredHistogram* const stored = owner.File().archive.Histogram(index, owner.Level());
+    if (!stored)
+        return GDALPamRasterBand::GetDefaultHistogram(lower, upper, bucketCount, counts, force,
+                                                      progress, progressData);
+    *lower = stored->lower;
+    *upper = stored->upper;
+    *bucketCount = static_cast<int>(stored->counts.size());
+    *counts = static_cast<GUIntBig*>(VSIMalloc2(stored->counts.size(), sizeof(GUIntBig)));
+    if (!*counts) return CE_Failure;
+    std::copy(stored->counts.begin(), stored->counts.end(), *counts);
+    return CE_None;
+}
+
+CPLErr Band::SetDefaultHistogram(double lower, double upper, int bucketCount, GUIntBig* counts) {
+    if (!StoresInFile() || bucketCount <= 0)
+        return GDALPamRasterBand::SetDefaultHistogram(lower, upper, bucketCount, counts);
+    StoredHistogram histogram{index, owner.Level(), lower, upper, {}};
+    histogram.counts.assign(counts, counts + bucketCount);
+    if (owner.File().archive.StoreHistogram(histogram)) return CE_None;
+    ReportError(CE_Failure, CPLE_FileIO, "the histogram was not stored");
+    return CE_Failure;
+}
+
+}  // namespace zmcgdal

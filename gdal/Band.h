@@ -1,0 +1,98 @@
+// Band: one band of one level.
+//
+// Statistics, histograms and palettes come from the file, without a scan; where the file has none,
+// from the sidecar. In update mode they are stored in the file.
+#ifndef ZMC_GDAL_BAND_H
+#define ZMC_GDAL_BAND_H
+
+#include <cpl_string.h>
+#include <gdal_pam.h>
+
+#include <memory>
+#include <vector>
+
+#include "gdal/Dataset.h"
+
+namespace zmcgdal {
+
+class Band final : public GDALPamRasterBand {
+public:
+    // `number` counts from 1, as GDAL does.
+    Band(Dataset& dataset, int number);
+    ~Band() override;
+
+    Dataset& Owner() { return owner; }
+
+    // The color table need not stand in the sidecar, because the file has it.
+    void DropSidecarColors() { GDALPamRasterBand::SetColorTable(nullptr); }
+
+    double GetNoDataValue(int* success = nullptr) override;
+    std::int64_t GetNoDataValueAsInt64(int* success = nullptr) override;
+    std::uint64_t GetNoDataValueAsUInt64(int* success = nullptr) override;
+    CPLErr SetNoDataValue(double value) override;
+    CPLErr SetNoDataValueAsInt64(std::int64_t value) override;
+    CPLErr SetNoDataValueAsUInt64(std::uint64_t value) override;
+    CPLErr DeleteNoDataValue() override;
+
+    GDALRasterBand* GetMaskBand() override;
+    int GetMaskFlags() override;
+
+    int GetOverviewCount() override;
+    GDALRasterBand* GetOverview(int index) override;
+
+    GDALColorInterp GetColorInterpretation() override;
+    GDALColorTable* GetColorTable() override;
+    CPLErr SetColorTable(GDALColorTable* table) override;
+
+    char** GetMetadataDomainList() override;
+    char** GetMetadata(const char* domain = "") override;
+    const char* GetMetadataItem(const char* name, const char* domain = "") override;
+
+    double GetMinimum(int* success = nullptr) override;
+    double GetMaximum(int* success = nullptr) override;
+    CPLErr GetStatistics(int approximate, int force, double* minimum, double* maximum, double* mean,
+                         double* deviation) override;
+    CPLErr SetStatistics(double minimum, double maximum, double mean, double deviation) override;
+    CPLErr GetDefaultHistogram(double* lower, double* upper, int* bucketCount,
+                               GUIntBig** counts, int force, GDALProgressFunc progress,
+                               void* progressData) override;
+    CPLErr SetDefaultHistogram(double lower, double upper, int bucketCount,
+                               GUIntBig* counts) override;
+
+protected:
+    CPLErr IReadBlock(int blockX, int blockY, void* data) override;
+    CPLErr IWriteBlock(int blockX, int blockY, void* data) override;
+    CPLErr IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, void* data,
+                     int bufferWidth, int bufferHeight, GDALDataType bufferType,
+                     GSpacing pixelSpace, GSpacing lineSpace,
+                     GDALRasterIOExtraArg* extra) override;
+
+private:
+    Dataset& owner;
+    std::uint32_t index;  // of the band, from 0
+    std::unique_ptr<GDALRasterBand> ownMask;
+    CPLStringList statistics;  // as metadata; filled when first asked for
+    bool statisticsFetched = false;
+    CPLStringList merged;  // statistics and the sidecar's metadata
+    CPLStringList structure;
+
+    std::size_t BlockNumber(int blockX, int blockY) const;
+    void FillUnwritten(void* samples, std::size_t stride, std::size_t count);
+    void CopyFromBlock(const void* block, const Window& tile, unsigned char* samples,
+                       std::size_t stride) const;
+    void CompleteTile(int blockX, int blockY, const Window& tile, unsigned char* samples,
+                      std::size_t stride);
+    std::vector<unsigned char> GatherTile(int blockX, int blockY, const Window& tile,
+                                          const void* data, std::vector<std::uint32_t>& bands);
+
+    Band* MainBand();
+    bool StoresInFile() const;
+    const CPLStringList& StatisticsItems();
+    const StoredStatistics* Stored();
+    GDALColorInterp DefaultInterpretation();
+    bool UsesOwnMask();
+};
+
+}  // namespace zmcgdal
+
+#endif

@@ -1,0 +1,163 @@
+#include "gdal/Create.h"
+
+#include <algorithm>
+#include <exception>
+#include <new>
+
+#include "core/PixelVocabulary.h"
+#include "gdal/Band.h"
+#include "gdal/Dataset.h"
+#include "gdal/GdalRasterSource.h"
+#include "gdal/Sidecar.h"
+#include "host/PyramidBuilder.h"
+
+namespace zmcgdal {
+namespace {
+
+// Calls `work` and reports what it throws to GDAL.
+template <class Work>
+auto Reporting(Work&& work) -> decltype(work()) {
+    try {
+        return work();
+    } catch (const zmchost::Cancelled& error) {
+        CPLError(CE_Failure, CPLE_UserInterrupt, "%s", error.what());
+    } catch (const std::bad_alloc&) {
+        CPLError(CE_Failure, CPLE_OutOfMemory, "out of memory");
+    } catch (const std::exception& error) {
+        CPLError(CE_Failure, CPLE_AppDefined, "%s", error.what());
+    }
+    return {};
+}
+
+// Names what cannot be kept; false if that is not acceptable.
+bool AcceptLosses(const GdalRasterSource& source, bool strict) {
+    for (const std::string& loss : source.Losses())
+        CPLError(strict ? CE_Failure : CE_Warning, CPLE_NotSupported,
+                 "a pyramid does not keep %s", loss.c_str());
+    return source.Losses().empty() || !strict;
+}
+
+void UseProgress(zmchost::BuildOptions& options, GDALProgressFunc progress, void* data) {
+    if (!progress) return;
+    options.progress = [progress, data](const zmchost::BuildProgress& state) {
+        const double total = static_cast<double>(std::max<std::uint64_t>(state.total, 1));
+        return progress(std::min(1.0, static_cast<double>(state.done) / total), "", data) != FALSE;
+    };
+}
+
+std::unique_ptr<Dataset> OpenForUpdate(const std::string& name) {
+    auto file = std::make_shared<OpenFile>(zmchost::Raster::Open(SharedModule(), name),
+                                           SignedByteAs::Int16);
+    auto dataset = Dataset::FromFile(std::move(file), GA_Update);
+    dataset->LoadSidecar(name.c_str(), nullptr);
+    return dataset;
+}
+
+GDALDataset* CopyTo(const std::string& target, GDALDataset& source, bool strict,
+                    CreationOptions options, GDALProgressFunc progress, void* progressData) {
+    GdalRasterSource pixels(source, options.signedByte);
+    if (!AcceptLosses(pixels, strict)) return nullptr;
+    UseProgress(options.build, progress, progressData);
+    zmchost::PyramidBuilder(SharedModule()).Build(pixels, target, options.build);
+    auto dataset = OpenForUpdate(target);
+    if (CopySidecar(source, *dataset, strict) != CE_None) return nullptr;
+    dataset->FlushCache(false);
+    return dataset.release();
+}
+
+zelm::RasterProps PropsOf(const char* target, int width, int height, int bands,
+                          std::uint32_t pixelType) {
+    if (bands < 1) throw zmchost::Error(target, "create the pyramid", "it would have no bands");
+    if (pixelType == 0)
+        throw zmchost::Error(target, "create the pyramid", "no pyramid holds this data type");
+    zelm::RasterProps props;
+    props.pixelType = pixelType;
+    props.SetSamples(static_cast<std::uint32_t>(width));
+    props.SetLines(static_cast<std::uint32_t>(height));
+    props.SetBands(static_cast<std::uint32_t>(bands));
+    return props;
+}
+
+GDALDataset* OpenSpool(const std::string& target, const zmchost::Raster& raster,
+                       CreationOptions options, std::unique_ptr<zmchost::BuildFile> spool) {
+    const auto how = options.signedByte ? SignedByteAs::FlaggedByte : SignedByteAs::Int16;
+    const std::size_t blocks = std::size_t{raster.TilesAcross()} * raster.TilesDown();
+    auto file = std::make_shared<OpenFile>(
+        zmchost::Raster::Open(SharedModule(), spool->Path()), how);
+    auto dataset = Dataset::FromFile(std::move(file), GA_Update);
+    dataset->SetDescription(target.c_str());
+    dataset->BeginCreation(
+        std::make_unique<Creation>(target, std::move(options), std::move(spool), blocks,
+                                   std::size_t{raster.Bands()}));
+    return dataset.release();
+}
+
+}  // namespace
+
+GDALDataset* CreateCopy(const char* target, GDALDataset* source, int strict, char** options,
+                        GDALProgressFunc progress, void* progressData) {
+    auto parsed = ParseCreationOptions(options);
+    if (!parsed) return nullptr;
+    return Reporting([&] {
+        return CopyTo(target, *source, strict != FALSE, std::move(*parsed), progress, progressData);
+    });
+}
+
+GDALDataset* CreateNew(const char* target, int width, int height, int bands, GDALDataType type,
+                       char** options) {
+    auto parsed = ParseCreationOptions(options);
+    if (!parsed) return nullptr;
+    return Reporting([&]() -> GDALDataset* {
+        const zelm::RasterProps props =
+            PropsOf(target, width, height, bands, PixelTypeFor(type, parsed->signedByte));
+        auto spool = std::make_unique<zmchost::BuildFile>(target, true);
+        const zmchost::Raster raster =
+            zmchost::Raster::Create(SharedModule(), spool->Path(), props, 0);
+        return OpenSpool(target, raster, std::move(*parsed), std::move(spool));
+    });
+}
+
+Creation::Creation(std::string targetName, CreationOptions creationOptions,
+                   std::unique_ptr<zmchost::BuildFile> spoolFile, std::size_t blockCount,
+                   std::size_t bandCount)
+    : target(std::move(targetName)),
+      options(std::move(creationOptions)),
+      spool(std::move(spoolFile)),
+      bands(bandCount),
+      written(blockCount * bandCount) {}
+
+CPLErr Creation::ChooseLevels(const char* resampling, int count, const int* factors) {
+    std::uint32_t coarsest = 0;
+    for (int i = 0; i < count; ++i) {
+        std::uint32_t level = 1;
+        while (level < 30 && 1 << level < factors[i]) ++level;
+        if (1 << level != factors[i]) {
+            CPLError(CE_Failure, CPLE_NotSupported, "a pyramid has no level reduced by %d",
+                     factors[i]);
+            return CE_Failure;
+        }
+        coarsest = std::max(coarsest, level);
+    }
+    const auto method = ResamplingFrom(resampling);
+    if (!method) {
+        CPLError(CE_Failure, CPLE_NotSupported, "resampling %s is not known", resampling);
+        return CE_Failure;
+    }
+    options.build.resampling = method;
+    options.build.levels = coarsest;
+    return CE_None;
+}
+
+void Creation::Finish(Dataset& dataset) {
+    sealed = std::find(written.begin(), written.end(), false) == written.end();
+    Reporting([&] {
+        GdalRasterSource source(dataset, options.signedByte);
+        zmchost::PyramidBuilder(SharedModule()).Build(source, target, options.build);
+        return true;
+    });
+    // The palettes are in the file now.
+    for (int number = 1; number <= dataset.GetRasterCount(); ++number)
+        static_cast<Band*>(dataset.GetRasterBand(number))->DropSidecarColors();
+}
+
+}  // namespace zmcgdal

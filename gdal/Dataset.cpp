@@ -1,0 +1,200 @@
+#include "gdal/Dataset.h"
+
+#include <algorithm>
+#include <climits>
+#include <utility>
+
+#include "core/PixelVocabulary.h"
+#include "gdal/Band.h"
+#include "gdal/Create.h"
+#include "gdal/LevelRefresh.h"
+
+namespace zmcgdal {
+namespace {
+
+constexpr const char* kStructureDomain = "IMAGE_STRUCTURE";
+constexpr const char* kOwnDomain = "ZMCPYRAMID";
+
+constexpr std::uint64_t kMaxTileBytes = INT_MAX;
+
+zmchost::PyramidFileInfo CheckedInfo(const zmchost::Raster& raster) {
+    const auto refuse = [&](const char* why) {
+        throw zmchost::Error(raster.Name(), "show it to GDAL", why);
+    };
+    zmchost::PyramidFileInfo info = zmchost::DescribePyramidFile(raster.Header());
+    const zmchost::PyramidHeader& header = info.header;
+    const auto* const base = info.FindLevel(header.minLevel);
+    if (!base || base->width == 0 || base->height == 0) refuse("it holds no pixels");
+    if (header.width > INT_MAX || header.height > INT_MAX) refuse("it is too large");
+    const auto bands = std::min<std::uint32_t>(header.bands, INT_MAX);
+    if (!GDALCheckBandCount(static_cast<int>(bands), FALSE)) refuse("of its number of bands");
+    const std::uint64_t tilePixels = std::uint64_t{header.tileSize} * header.tileSize;
+    if (tilePixels * zelm::PixelSize(header.pixelType) > kMaxTileBytes / bands)
+        refuse("its tiles are too large");
+    return info;
+}
+
+}  // namespace
+
+zmchost::ModulePtr SharedModule() {
+    static const zmchost::ModulePtr module = zmchost::Module::Load();
+    return module;
+}
+
+OpenFile::OpenFile(zmchost::Raster pyramid, SignedByteAs signedByteAs)
+    : raster(std::move(pyramid)),
+      info(CheckedInfo(raster)),
+      tiles(raster, info, GdalTypeOf(raster.PixelType(), signedByteAs)),
+      archive(raster, info.HasMetadataDocument()) {}
+
+Dataset::Dataset(std::shared_ptr<OpenFile> openFile, std::uint32_t levelShown, GDALAccess access,
+                 Dataset* mainDataset)
+    : file(std::move(openFile)), level(levelShown), main(mainDataset) {
+    const zmchost::PyramidLevelInfo& shown = *file->info.FindLevel(level);
+    nRasterXSize = static_cast<int>(shown.width);
+    nRasterYSize = static_cast<int>(shown.height);
+    eAccess = access;
+    // Only the main dataset has a sidecar.
+    if (main) nPamFlags |= GPF_DISABLED;
+    AddBands();
+    DescribeFile();
+}
+
+Dataset::~Dataset() {
+    GDALDataset::FlushCache(true);
+    if (creation) creation->Finish(*this);
+    GDALPamDataset::FlushCache(true);
+    CloseDependentDatasets();
+}
+
+std::unique_ptr<Dataset> Dataset::FromFile(std::shared_ptr<OpenFile> file, GDALAccess access) {
+    const std::uint32_t base = file->info.header.minLevel;
+    std::unique_ptr<Dataset> dataset(new Dataset(std::move(file), base, access, nullptr));
+    dataset->AddOverviews(access);
+    return dataset;
+}
+
+void Dataset::AddBands() {
+    const auto count = static_cast<int>(file->info.header.bands);
+    for (int number = 1; number <= count; ++number) SetBand(number, new Band(*this, number));
+}
+
+// What an incomplete file holds of its coarser levels is anyone's guess.
+void Dataset::AddOverviews(GDALAccess access) {
+    if (!file->info.complete) return;
+    for (const zmchost::PyramidLevelInfo& coarser : file->info.levels)
+        if (coarser.level > level && coarser.width > 0 && coarser.height > 0)
+            overviews.emplace_back(new Dataset(file, coarser.level, access, this));
+}
+
+void Dataset::DescribeFile() {
+    const zmchost::PyramidHeader& header = file->info.header;
+    structure.SetNameValue("INTERLEAVE", file->tiles.IsPixelInterleaved() ? "PIXEL" : "BAND");
+    const auto set = [&](const char* name, const std::string& value) {
+        description.SetNameValue(name, value.c_str());
+    };
+    set("ORDERING", zelm::TileOrderName(header.tileOrdering));
+    set("VERSION",
+        std::to_string(header.versionMajor) + "." + std::to_string(header.versionMinor));
+    set("PIXEL_TYPE", zelm::PixelTypeName(header.pixelType));
+    set("INTERLEAVE", zelm::InterleaveName(header.interleave));
+    set("TILE_SIZE", std::to_string(header.tileSize));
+    set("LEVEL", std::to_string(level));
+    set("LEVEL_MIN", std::to_string(header.minLevel));
+    set("LEVEL_MAX", std::to_string(header.maxLevel));
+    set("COMPLETE", file->info.complete ? "YES" : "NO");
+    if (file->info.bytesMissing > 0) set("BYTES_MISSING", std::to_string(file->info.bytesMissing));
+}
+
+void Dataset::BeginCreation(std::unique_ptr<Creation> state) { creation = std::move(state); }
+
+void Dataset::LoadSidecar(const char* fileName, char** siblings) {
+    SetDescription(fileName);
+    TryLoadXML(siblings);
+    oOvManager.Initialize(this, fileName, siblings);
+}
+
+bool Dataset::ReadsDirectly(int x, int y, int width, int height) const {
+    // Blocks may wait in the cache to be written.
+    const bool quiet = eAccess != GA_Update || (creation && creation->IsSealed());
+    if (!quiet || bForceCachedIO) return false;
+    const int side = static_cast<int>(file->info.header.tileSize);
+    const auto touched = [side](int start, int extent, int limit) {
+        const int end = std::min((start + extent - 1) / side * side + side, limit);
+        return static_cast<std::int64_t>(end - start / side * side);
+    };
+    constexpr int kLeastShare = 4;
+    return std::int64_t{width} * height * kLeastShare >=
+           touched(x, width, nRasterXSize) * touched(y, height, nRasterYSize);
+}
+
+const CPLStringList* Dataset::OwnDomain(const char* domain) const {
+    if (domain && EQUAL(domain, kStructureDomain)) return &structure;
+    if (domain && EQUAL(domain, kOwnDomain)) return &description;
+    return nullptr;
+}
+
+char** Dataset::GetMetadataDomainList() {
+    return BuildMetadataDomainList(GDALPamDataset::GetMetadataDomainList(), TRUE, kStructureDomain,
+                                   kOwnDomain, nullptr);
+}
+
+char** Dataset::GetMetadata(const char* domain) {
+    if (const CPLStringList* const own = OwnDomain(domain))
+        return const_cast<CPLStringList*>(own)->List();
+    return GDALPamDataset::GetMetadata(domain);
+}
+
+const char* Dataset::GetMetadataItem(const char* name, const char* domain) {
+    if (const CPLStringList* const own = OwnDomain(domain)) return own->FetchNameValue(name);
+    return GDALPamDataset::GetMetadataItem(name, domain);
+}
+
+CPLErr Dataset::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, void* data,
+                          int bufferWidth, int bufferHeight, GDALDataType bufferType, int bandCount,
+                          int* bandMap, GSpacing pixelSpace, GSpacing lineSpace, GSpacing bandSpace,
+                          GDALRasterIOExtraArg* extra) {
+    if (mode == GF_Read && bufferWidth < width && bufferHeight < height) {
+        int tried = FALSE;
+        const CPLErr result =
+            TryOverviewRasterIO(mode, x, y, width, height, data, bufferWidth, bufferHeight,
+                                bufferType, bandCount, bandMap, pixelSpace, lineSpace, bandSpace,
+                                extra, &tried);
+        if (tried) return result;
+    }
+    if (mode == GF_Read && bufferWidth == width && bufferHeight == height &&
+        ReadsDirectly(x, y, width, height)) {
+        std::vector<int> bands(bandMap, bandMap + bandCount);
+        for (int& band : bands) --band;
+        const Target target{data, bufferType, pixelSpace, lineSpace, bandSpace};
+        if (file->tiles.Read({level, x, y, width, height}, bands.data(), bandCount, target))
+            return CE_None;
+        ReportError(CE_Failure, CPLE_FileIO, "the raster module did not read level %u", level);
+        return CE_Failure;
+    }
+    return GDALPamDataset::IRasterIO(mode, x, y, width, height, data, bufferWidth, bufferHeight,
+                                     bufferType, bandCount, bandMap, pixelSpace, lineSpace,
+                                     bandSpace, extra);
+}
+
+CPLErr Dataset::IBuildOverviews(const char* resampling, int overviewCount, const int* factors,
+                                int bandCount, const int* bands, GDALProgressFunc progress,
+                                void* progressData, CSLConstList options) {
+    if (creation) return creation->ChooseLevels(resampling, overviewCount, factors);
+    if (overviews.empty())
+        return GDALPamDataset::IBuildOverviews(resampling, overviewCount, factors, bandCount, bands,
+                                               progress, progressData, options);
+    return RefreshLevels(*this, resampling, std::vector<int>(factors, factors + overviewCount),
+                         progress, progressData);
+}
+
+int Dataset::CloseDependentDatasets() {
+    int closed = GDALPamDataset::CloseDependentDatasets();
+    if (!overviews.empty()) {
+        overviews.clear();
+        closed = TRUE;
+    }
+    return closed;
+}
+
+}  // namespace zmcgdal

@@ -1,0 +1,98 @@
+// Dataset: one level of a pyramid file as a GDAL dataset.
+//
+// The main dataset is the finest level that the file holds; it owns the open file and one more
+// Dataset for each coarser level, which its bands show as overviews. Georeference, no-data values,
+// descriptions and the like live in the sidecar file (.aux.xml), which is written only after
+// something has been set.
+#ifndef ZMC_GDAL_DATASET_H
+#define ZMC_GDAL_DATASET_H
+
+#include <cpl_string.h>
+#include <gdal_pam.h>
+
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "gdal/Archive.h"
+#include "gdal/SampleType.h"
+#include "gdal/TileReader.h"
+#include "host/PyramidFileInfo.h"
+#include "host/Raster.h"
+
+namespace zmcgdal {
+
+class Creation;
+
+// What all levels of an open file share.
+class OpenFile {
+public:
+    // Throws zmchost::Error if GDAL cannot hold the raster.
+    OpenFile(zmchost::Raster pyramid, SignedByteAs signedByteAs);
+
+    zmchost::Raster raster;
+    const zmchost::PyramidFileInfo info;
+    TileReader tiles;
+    Archive archive;
+};
+
+// The module, loaded once per process.
+zmchost::ModulePtr SharedModule();
+
+class Dataset final : public GDALPamDataset {
+public:
+    static std::unique_ptr<Dataset> FromFile(std::shared_ptr<OpenFile> file, GDALAccess access);
+    ~Dataset() override;
+
+    OpenFile& File() { return *file; }
+    std::uint32_t Level() const { return level; }
+    bool IsOverview() const { return main != nullptr; }
+    Dataset& Main() { return main ? *main : *this; }
+    const std::vector<std::unique_ptr<Dataset>>& Overviews() const { return overviews; }
+
+    // Reads the sidecar, and looks for other companions.
+    void LoadSidecar(const char* fileName, char** siblings);
+
+    // True if pixels of this window are better read past GDAL's block cache: it is not a sliver of
+    // the tiles that it touches, and no block waits to be written.
+    bool ReadsDirectly(int x, int y, int width, int height) const;
+
+    // Makes this dataset the place where pixels of a new file are gathered; see gdal/Create.h.
+    void BeginCreation(std::unique_ptr<Creation> state);
+    Creation* UnderCreation() { return creation.get(); }
+
+    char** GetMetadataDomainList() override;
+    char** GetMetadata(const char* domain = "") override;
+    const char* GetMetadataItem(const char* name, const char* domain = "") override;
+
+    CPLErr IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, void* data,
+                     int bufferWidth, int bufferHeight, GDALDataType bufferType, int bandCount,
+                     int* bandMap, GSpacing pixelSpace, GSpacing lineSpace, GSpacing bandSpace,
+                     GDALRasterIOExtraArg* extra) override;
+    CPLErr IBuildOverviews(const char* resampling, int overviewCount, const int* factors,
+                           int bandCount, const int* bands, GDALProgressFunc progress,
+                           void* progressData, CSLConstList options) override;
+
+protected:
+    int CloseDependentDatasets() override;
+
+private:
+    Dataset(std::shared_ptr<OpenFile> openFile, std::uint32_t levelShown, GDALAccess access,
+            Dataset* mainDataset);
+    void AddBands();
+    void AddOverviews(GDALAccess access);
+    void DescribeFile();
+    const CPLStringList* OwnDomain(const char* domain) const;
+
+    std::shared_ptr<OpenFile> file;
+    std::uint32_t level;
+    Dataset* main;  // null in the main dataset
+    std::vector<std::unique_ptr<Dataset>> overviews;
+    CPLStringList structure;    // domain IMAGE_STRUCTURE
+    CPLStringList description;  // domain ZMCPYRAMID
+    std::unique_ptr<Creation> creation;
+};
+
+}  // namespace zmcgdal
+
+#endif

@@ -1,0 +1,90 @@
+#include "gdal/Driver.h"
+
+#include <gdal_priv.h>
+
+#include <exception>
+#include <memory>
+
+#include "gdal/Create.h"
+#include "gdal/Dataset.h"
+#include "gdal/Options.h"
+#include "host/PyramidFileInfo.h"
+#include "host/Xerces.h"
+
+namespace zmcgdal {
+namespace {
+
+constexpr const char* kName = "ZMCPyramid";
+
+int Identify(GDALOpenInfo* info) {
+    if (!info->pabyHeader || info->nHeaderBytes <= 0) return FALSE;
+    const std::string_view start(reinterpret_cast<const char*>(info->pabyHeader),
+                                 static_cast<std::size_t>(info->nHeaderBytes));
+    return zmchost::LooksLikePyramid(start) ? TRUE : FALSE;
+}
+
+void WarnIfIncomplete(const Dataset& dataset, const zmchost::PyramidFileInfo& info) {
+    if (info.complete) return;
+    CPLError(CE_Warning, CPLE_AppDefined,
+             "%s: the pyramid is incomplete, " CPL_FRMT_GUIB
+             " bytes are missing; only its finest level is shown",
+             dataset.GetDescription(), static_cast<GUIntBig>(info.bytesMissing));
+}
+
+std::unique_ptr<Dataset> OpenDataset(GDALOpenInfo* info) {
+    auto file = std::make_shared<OpenFile>(
+        zmchost::Raster::Open(SharedModule(), info->pszFilename),
+        SignedByteFrom(info->papszOpenOptions));
+    const zmchost::PyramidFileInfo layout = file->info;
+    auto dataset = Dataset::FromFile(std::move(file), info->eAccess);
+    dataset->LoadSidecar(info->pszFilename, info->GetSiblingFiles());
+    WarnIfIncomplete(*dataset, layout);
+    return dataset;
+}
+
+GDALDataset* Open(GDALOpenInfo* info) {
+    if (!Identify(info)) return nullptr;
+    try {
+        return OpenDataset(info).release();
+    } catch (const std::bad_alloc&) {
+        CPLError(CE_Failure, CPLE_OutOfMemory, "%s: out of memory", info->pszFilename);
+    } catch (const std::exception& error) {
+        CPLError(CE_Failure, CPLE_OpenFailed, "%s", error.what());
+    }
+    return nullptr;
+}
+
+void Describe(GDALDriver& driver) {
+    driver.SetDescription(kName);
+    driver.SetMetadataItem(GDAL_DCAP_RASTER, "YES");
+    driver.SetMetadataItem(GDAL_DMD_LONGNAME, "Pyramid raster");
+    driver.SetMetadataItem(GDAL_DMD_EXTENSION, "pyr");
+    driver.SetMetadataItem(GDAL_DMD_EXTENSIONS, "pyr");
+    driver.SetMetadataItem(GDAL_DMD_OPENOPTIONLIST, kOpenOptionsXml);
+    driver.SetMetadataItem(GDAL_DMD_CREATIONOPTIONLIST, kCreationOptionsXml);
+    driver.SetMetadataItem(GDAL_DMD_CREATIONDATATYPES,
+#if GDAL_VERSION_NUM >= GDAL_COMPUTE_VERSION(3, 7, 0)
+                           "Int8 "
+#endif
+                           "Byte Int16 UInt16 Int32 UInt32 Int64 UInt64 Float32 Float64 CInt16 "
+                           "CInt32 CFloat32 CFloat64");
+    driver.pfnIdentify = Identify;
+    driver.pfnOpen = Open;
+    driver.pfnCreateCopy = CreateCopy;
+    driver.pfnCreate = CreateNew;
+}
+
+}  // namespace
+}  // namespace zmcgdal
+
+void GDALRegister_ZMCPyramid(void) {
+    if (!GDAL_CHECK_VERSION("ZMCPyramid") || GDALGetDriverByName(zmcgdal::kName)) return;
+    try {
+        zmchost::InitialiseXerces();
+        auto driver = std::make_unique<GDALDriver>();
+        zmcgdal::Describe(*driver);
+        GetGDALDriverManager()->RegisterDriver(driver.release());
+    } catch (const std::exception& error) {
+        CPLError(CE_Failure, CPLE_AppDefined, "%s", error.what());
+    }
+}

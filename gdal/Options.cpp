@@ -1,0 +1,139 @@
+#include "gdal/Options.h"
+
+#include <cpl_error.h>
+
+#include <algorithm>
+#include <cctype>
+#include <cstdint>
+#include <cstdlib>
+
+namespace zmcgdal {
+
+const char* const kOpenOptionsXml = R"(<OpenOptionList>
+  <Option name='INT8_AS' type='string-select' default='INT16' description='How signed bytes are shown before GDAL 3.7'>
+    <Value>INT16</Value>
+    <Value>SIGNEDBYTE</Value>
+  </Option>
+</OpenOptionList>)";
+
+const char* const kCreationOptionsXml = R"(<CreationOptionList>
+  <Option name='RESAMPLING' type='string-select' description='How levels are reduced; MODE by default for a raster with a color table, else AVERAGE'>
+    <Value>NEAREST</Value>
+    <Value>AVERAGE</Value>
+    <Value>RMS</Value>
+    <Value>MODE</Value>
+    <Value>MINIMUM</Value>
+    <Value>MAXIMUM</Value>
+    <Value>MEDIAN</Value>
+    <Value>BILINEAR</Value>
+    <Value>CUBIC</Value>
+    <Value>LANCZOS</Value>
+  </Option>
+  <Option name='LEVELS' type='string' default='AUTO' description='Number of the coarsest level, 0 for no reduced level; AUTO goes on until a level fits one tile'/>
+  <Option name='ORDERING' type='string-select' default='AUTO' description='Order of the tiles in the file; MORTON for more than eight bands, and only then'>
+    <Value>AUTO</Value>
+    <Value>SCANLINE</Value>
+    <Value>BLOCKED</Value>
+    <Value>MORTON</Value>
+  </Option>
+  <Option name='STATISTICS' type='boolean' default='YES' description='Whether to store statistics and histograms'/>
+  <Option name='BINS' type='int' default='256' description='Bins of a histogram'/>
+  <Option name='NUM_THREADS' type='string' default='ALL_CPUS' description='Threads to build with: a number or ALL_CPUS'/>
+  <Option name='MEMORY' type='string' default='256M' description='Memory for pixels, in bytes or with K, M or G'/>
+  <Option name='PIXELTYPE' type='string-select' default='DEFAULT' description='SIGNEDBYTE takes Byte for signed'>
+    <Value>DEFAULT</Value>
+    <Value>SIGNEDBYTE</Value>
+  </Option>
+</CreationOptionList>)";
+
+namespace {
+
+std::optional<std::uint64_t> ParseCount(const std::string& text) {
+    if (text.empty() || !std::all_of(text.begin(), text.end(), [](unsigned char c) {
+            return std::isdigit(c) != 0;
+        }) || text.size() > 18)
+        return std::nullopt;
+    return std::strtoull(text.c_str(), nullptr, 10);
+}
+
+std::optional<std::uint64_t> ParseSize(std::string text) {
+    unsigned shift = 0;
+    if (!text.empty() && (text.back() == 'B' || text.back() == 'b')) text.pop_back();
+    if (!text.empty()) {
+        const auto unit = std::string("KMG").find(
+            static_cast<char>(std::toupper(static_cast<unsigned char>(text.back()))));
+        if (unit != std::string::npos) {
+            shift = 10 * (static_cast<unsigned>(unit) + 1);
+            text.pop_back();
+        }
+    }
+    const auto count = ParseCount(text);
+    if (!count || *count > (UINT64_MAX >> shift)) return std::nullopt;
+    return *count << shift;
+}
+
+std::optional<zmchost::Ordering> ParseOrdering(const char* word) {
+    using zmchost::Ordering;
+    if (EQUAL(word, "AUTO")) return Ordering::Auto;
+    if (EQUAL(word, "SCANLINE")) return Ordering::Scanline;
+    if (EQUAL(word, "BLOCKED")) return Ordering::Blocked;
+    if (EQUAL(word, "MORTON")) return Ordering::Morton;
+    return std::nullopt;
+}
+
+bool Report(const char* name, const char* value) {
+    CPLError(CE_Failure, CPLE_IllegalArg, "%s=%s is not understood", name, value);
+    return false;
+}
+
+// Whether a numeric option is absent or good; `out` is set only where it is given.
+template <class Number>
+bool TakeCount(CSLConstList options, const char* name, const char* automatic, Number& out) {
+    const char* const value = CSLFetchNameValue(options, name);
+    if (!value || (automatic && EQUAL(value, automatic))) return true;
+    const auto count = ParseCount(value);
+    if (!count || *count > INT32_MAX) return Report(name, value);
+    out = static_cast<std::uint32_t>(*count);
+    return true;
+}
+
+}  // namespace
+
+SignedByteAs SignedByteFrom(CSLConstList openOptions) {
+    const char* const word = CSLFetchNameValueDef(openOptions, "INT8_AS", "INT16");
+    return EQUAL(word, "SIGNEDBYTE") ? SignedByteAs::FlaggedByte : SignedByteAs::Int16;
+}
+
+std::optional<zmchost::Resampling> ResamplingFrom(const char* word) {
+    std::string lower(word);
+    for (char& c : lower) c = static_cast<char>(std::tolower(static_cast<unsigned char>(c)));
+    if (lower == "near") lower = "nearest";
+    return zmchost::ParseResampling(lower);
+}
+
+std::optional<CreationOptions> ParseCreationOptions(CSLConstList options) {
+    CreationOptions parsed;
+    parsed.build.overwrite = true;
+    if (const char* const word = CSLFetchNameValue(options, "RESAMPLING")) {
+        parsed.build.resampling = ResamplingFrom(word);
+        if (!parsed.build.resampling && !Report("RESAMPLING", word)) return std::nullopt;
+    }
+    const char* const ordering = CSLFetchNameValueDef(options, "ORDERING", "AUTO");
+    const auto order = ParseOrdering(ordering);
+    if (!order && !Report("ORDERING", ordering)) return std::nullopt;
+    parsed.build.ordering = *order;
+    const char* const memory = CSLFetchNameValueDef(options, "MEMORY", "256M");
+    const auto size = ParseSize(memory);
+    if (!size && !Report("MEMORY", memory)) return std::nullopt;
+    parsed.build.memory = *size;
+    parsed.build.statistics = CPLFetchBool(options, "STATISTICS", true);
+    parsed.signedByte =
+        EQUAL(CSLFetchNameValueDef(options, "PIXELTYPE", "DEFAULT"), "SIGNEDBYTE") != 0;
+    if (!TakeCount(options, "LEVELS", "AUTO", parsed.build.levels) ||
+        !TakeCount(options, "BINS", nullptr, parsed.build.bins) ||
+        !TakeCount(options, "NUM_THREADS", "ALL_CPUS", parsed.build.threads))
+        return std::nullopt;
+    return parsed;
+}
+
+}  // namespace zmcgdal

@@ -1,0 +1,34 @@
+// Options that users give this driver as texts.
+#ifndef ZMC_GDAL_OPTIONS_H
+#define ZMC_GDAL_OPTIONS_H
+
+#include <cpl_string.h>
+
+#include <optional>
+#include <string>
+
+#include "gdal/SampleType.h"
+#include "host/PyramidBuilder.h"
+
+namespace zmcgdal {
+
+// Described to users as XML: GDAL prints it and checks against it.
+extern const char* const kOpenOptionsXml;
+extern const char* const kCreationOptionsXml;
+
+SignedByteAs SignedByteFrom(CSLConstList openOptions);
+
+// Names of GDAL's overview methods and of this project's, in any case.
+std::optional<zmchost::Resampling> ResamplingFrom(const char* word);
+
+struct CreationOptions {
+    zmchost::BuildOptions build;
+    bool signedByte = false;  // PIXELTYPE=SIGNEDBYTE
+};
+
+// Reads the creation options; reports the first bad one to GDAL and gives nothing.
+std::optional<CreationOptions> ParseCreationOptions(CSLConstList options);
+
+}  // namespace zmcgdal
+
+#endif

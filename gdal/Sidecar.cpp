@@ -1,0 +1,66 @@
+#include "gdal/Sidecar.h"
+
+#include <cpl_string.h>
+
+#include <algorithm>
+#include <string>
+
+#include "gdal/Dataset.h"
+
+namespace zmcgdal {
+namespace {
+
+// Domains that describe the source's own file.
+bool DescribesTheFile(const char* domain) {
+    const char* const names[] = {"IMAGE_STRUCTURE", "SUBDATASETS", "DERIVED_SUBDATASETS",
+                                 "ZMCPYRAMID", "TIFF"};
+    return std::any_of(std::begin(names), std::end(names),
+                       [&](const char* name) { return EQUAL(domain, name); });
+}
+
+CPLStringList WithoutStatistics(CSLConstList items) {
+    CPLStringList kept;
+    for (; items && *items; ++items)
+        if (!STARTS_WITH_CI(*items, "STATISTICS_")) kept.AddString(*items);
+    return kept;
+}
+
+void CopyMetadata(GDALMajorObject& source, GDALMajorObject& target) {
+    CPLStringList domains(source.GetMetadataDomainList());
+    if (domains.FindString("") < 0) domains.AddString("");
+    for (int i = 0; i < domains.Count(); ++i) {
+        if (DescribesTheFile(domains[i])) continue;
+        CPLStringList items = WithoutStatistics(source.GetMetadata(domains[i]));
+        if (items.Count() > 0) target.SetMetadata(items.List(), domains[i]);
+    }
+}
+
+// A picture is taken for red, green and blue unless something else is written down.
+void CopyInterpretation(GDALDataset& source, Dataset& target) {
+    for (int number = 1; number <= target.GetRasterCount(); ++number) {
+        const GDALColorInterp wanted = source.GetRasterBand(number)->GetColorInterpretation();
+        GDALRasterBand& band = *target.GetRasterBand(number);
+        if (wanted != GCI_Undefined && wanted != GCI_PaletteIndex &&
+            band.GetColorInterpretation() != wanted)
+            band.SetColorInterpretation(wanted);
+    }
+}
+
+}  // namespace
+
+CPLErr CopySidecar(GDALDataset& source, Dataset& target, bool strict) {
+    constexpr int kByHand =
+        GCIF_METADATA | GCIF_BAND_METADATA | GCIF_COLORINTERP | GCIF_COLORTABLE | GCIF_MASK;
+    target.CloneInfo(&source, GCIF_PAM_DEFAULT & ~kByHand);
+    CopyMetadata(source, target);
+    for (int number = 1; number <= target.GetRasterCount(); ++number)
+        CopyMetadata(*source.GetRasterBand(number), *target.GetRasterBand(number));
+    CopyInterpretation(source, target);
+    const int maskFlags = source.GetRasterBand(1)->GetMaskFlags();
+    const bool maskFile = (maskFlags & GMF_PER_DATASET) != 0 &&
+                          (maskFlags & (GMF_ALPHA | GMF_NODATA | GMF_ALL_VALID)) == 0;
+    if (!maskFile) return CE_None;
+    return GDALDriver::DefaultCopyMasks(&source, &target, strict ? TRUE : FALSE);
+}
+
+}  // namespace zmcgdal
