@@ -93,6 +93,8 @@ void Raster::TakeReader() {
     if (!reader || reader->pixelType == 0)
         throw Error(name, "open the raster", "the module gives no reader for it");
     Visit([this](auto& typed) { props = typed.GetRasterProps(); });
+    // The tree is the module's, and copies of the record must be able to outlive it.
+    props.metadata = zelm::Metadata();
 }
 
 Raster Raster::Open(ModulePtr module, const std::string& file) {
@@ -442,10 +444,14 @@ void Raster::SetHistograms(const std::vector<zelm::RasterBandHistogram<T>>& hist
         throw Error(name, "store histograms", "they did not reach the file (disk full?)");
 }
 
+// A copy of this library's making: the module's own palette must not outlive the module.
 zelm::PalettePtr Raster::BandPalette(std::uint32_t band) const {
     zelm::PalettePtr palette;
     Visit([&](auto& typed) {
-        if (typed.HasPalette(band)) palette = typed.GetPalette(band);
+        if (!typed.HasPalette(band)) return;
+        const zelm::PalettePtr stored = typed.GetPalette(band);
+        palette.Reset(new zelm::Palette);
+        stored->CopyTo(*palette);
     });
     return palette;
 }

@@ -237,7 +237,7 @@ void ExpectStatistics() {
             model.AddRow(source.pixels.data(), nullptr, band, 2, 300 * 280);
             const auto expected = model.Stats(band);
             const auto stored = raster.Statistics<T>(band);
-            EXPECT_EQ(stored.flags, 127u);
+            EXPECT_EQ(stored.flags, 127u) << zelm::ElementTraits<T>::word << expected.flags;
             EXPECT_NEAR(stored.mean, expected.mean, std::abs(expected.mean) * 1e-5);
             EXPECT_NEAR(stored.standardDeviation, expected.standardDeviation,
                         expected.standardDeviation * 1e-5);
