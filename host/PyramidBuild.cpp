@@ -204,37 +204,40 @@ void PyramidBuild::WalkColumn(const Pass& pass, const Column& column, StripStore
                           ReductionHalo(resampling), lanes},
                          column, *work, store, meter);
     const std::uint32_t height = props.lines >> pass.baseLevel;
+    // The jobs are kept here, since a cancelled pipeline drops what is under way in it. Jobs end in
+    // order, so the place of a new one is free.
+    std::vector<Job> jobs(pass.stripsAhead);
     std::uint32_t nextLine = 0;
-    using JobPtr = std::shared_ptr<Job>;
-    const auto read = [&](tbb::flow_control& control) -> JobPtr {
+    const auto read = [&](tbb::flow_control& control) -> Job* {
         if (nextLine >= height) {
             control.stop();
             return nullptr;
         }
-        auto job = std::make_shared<Job>();
-        job->base = store.Take(pass.baseLevel);
-        job->base->Begin(nextLine, std::min(kTileSide, height - nextLine),
-                         column.readEnd - column.readBegin);
-        nextLine = job->base->End();
-        ReadStrip(pass, column, *job->base);
-        return job;
+        Job& job = jobs[nextLine / kTileSide % jobs.size()];
+        job.base = store.Take(pass.baseLevel);
+        job.base->Begin(nextLine, std::min(kTileSide, height - nextLine),
+                        column.readEnd - column.readBegin);
+        nextLine = job.base->End();
+        ReadStrip(pass, column, *job.base);
+        return &job;
     };
-    const auto reduce = [&](JobPtr job) {
+    const auto reduce = [&](Job* job) {
         LookAtStrip(pass, column, *job->base);
         cascade.Take(*job->base, job->finished);
         return job;
     };
-    const auto write = [&](const JobPtr& job) {
+    const auto write = [&](Job* job) {
         if (pass.baseLevel == 0) WriteStrip(pass, column, *job->base);
         for (const StripStore::Loan& strip : job->finished) WriteStrip(pass, column, *strip);
-        if (pass.baseLevel == 0)
-            Advance(std::uint64_t{job->base->lines} * (column.end - column.begin));
+        const std::uint32_t lines = job->base->lines;
+        *job = Job();
+        if (pass.baseLevel == 0) Advance(std::uint64_t{lines} * (column.end - column.begin));
     };
     tbb::parallel_pipeline(
         pass.stripsAhead,
-        tbb::make_filter<void, JobPtr>(tbb::filter_mode::serial_in_order, read) &
-            tbb::make_filter<JobPtr, JobPtr>(tbb::filter_mode::serial_in_order, reduce) &
-            tbb::make_filter<JobPtr, void>(tbb::filter_mode::serial_in_order, write));
+        tbb::make_filter<void, Job*>(tbb::filter_mode::serial_in_order, read) &
+            tbb::make_filter<Job*, Job*>(tbb::filter_mode::serial_in_order, reduce) &
+            tbb::make_filter<Job*, void>(tbb::filter_mode::serial_in_order, write));
 }
 
 void PyramidBuild::ReadStrip(const Pass& pass, const Column& column, Strip& strip) {

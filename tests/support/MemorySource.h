@@ -51,7 +51,8 @@ public:
     // Reproducible noise over a slope, so that neighbours differ and no value is special.
     void FillWithNoise(unsigned seed) {
         std::mt19937 random(seed);
-        for (std::size_t i = 0; i < pixels.size(); ++i) pixels[i] = Noise(static_cast<std::uint32_t>(random()), i);
+        for (std::size_t i = 0; i < pixels.size(); ++i)
+            pixels[i] = Noise(static_cast<std::uint32_t>(random()), i);
     }
 
     zelm::RasterProps props;
