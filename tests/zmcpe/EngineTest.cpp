@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "coordsys/BindCoordSys.h"
+#include "coordsys/CoordSysFactory.h"
 #include "coordsys/CoordSysUnit.h"
 #include "coordsys/Environment.h"
 #include "coordsys/EnvironmentKeys.h"
@@ -33,6 +34,8 @@ class Engine : public testing::Test {
 protected:
     static void SetUpTestSuite() {
         Environment().GetSetting(EnvironmentKeys::kBinDirectory) = ZMC_ENGINE_DIRECTORY;
+        ASSERT_NE(CoordSysFactory::GetInstance(), nullptr);
+        ASSERT_NE(fp_Esri_Pe_Initialize, nullptr) << "the engine is loaded before any test";
     }
 };
 
