@@ -51,8 +51,7 @@ StoredHistogram Convert(const zelm::RasterBandHistogram<T>& record) {
     histogram.band = record.band;
     histogram.level = record.level;
     const auto count = std::min(record.binCount, record.counts.shape.elements);
-    if (record.counts.data)
-        histogram.counts.assign(record.counts.data, record.counts.data + count);
+    if (record.counts.data) histogram.counts.assign(record.counts.data, record.counts.data + count);
     histogram.lower = ToDouble(record.minimum);
     const double extent = ToDouble(record.maximum) - histogram.lower;
     double width = record.binSize * record.binCount;
@@ -152,8 +151,7 @@ const StoredHistogram* Archive::Histogram(std::uint32_t band, std::uint32_t leve
 GDALColorTable* Archive::ColorTable(std::uint32_t band) {
     if (!documentExists) return nullptr;
     auto found = colorTables.find(band);
-    if (found == colorTables.end())
-        found = colorTables.emplace(band, FetchColorTable(band)).first;
+    if (found == colorTables.end()) found = colorTables.emplace(band, FetchColorTable(band)).first;
     return found->second.get();
 }
 

@@ -72,9 +72,9 @@ bool Band::StoresInFile() const {
 CPLErr Band::IReadBlock(int blockX, int blockY, void* data) {
     const Creation* const creation = owner.UnderCreation();
     if (creation && !creation->IsWritten(BlockNumber(blockX, blockY), index)) {
-        FillUnwritten(data, static_cast<std::size_t>(GDALGetDataTypeSizeBytes(eDataType)),
-                      static_cast<std::size_t>(nBlockXSize) *
-                          static_cast<std::size_t>(nBlockYSize));
+        FillUnwritten(
+            data, static_cast<std::size_t>(GDALGetDataTypeSizeBytes(eDataType)),
+            static_cast<std::size_t>(nBlockXSize) * static_cast<std::size_t>(nBlockYSize));
         return CE_None;
     }
     TileReader& tiles = owner.File().tiles;
@@ -269,9 +269,7 @@ GDALRasterBand* Band::GetMaskBand() {
 
 // A mask of samples that are not finite follows from the pixels as well as one by value does: told
 // as a mask of its own, it would be copied into a mask file with every translation.
-int Band::GetMaskFlags() {
-    return UsesOwnMask() ? GMF_NODATA : GDALPamRasterBand::GetMaskFlags();
-}
+int Band::GetMaskFlags() { return UsesOwnMask() ? GMF_NODATA : GDALPamRasterBand::GetMaskFlags(); }
 
 // --- levels ---
 
@@ -292,10 +290,9 @@ GDALRasterBand* Band::GetOverview(int overview) {
 GDALColorInterp Band::DefaultInterpretation() {
     const int bands = owner.GetRasterCount();
     const auto* const first = static_cast<Band*>(owner.GetRasterBand(1));
-    const bool told =
-        first->psPam && first->psPam->eColorInterp != GCI_Undefined;
-    const bool picture = !told && (bands == 3 || bands == 4) &&
-                         (eDataType == GDT_Byte || eDataType == GDT_UInt16);
+    const bool told = first->psPam && first->psPam->eColorInterp != GCI_Undefined;
+    const bool picture =
+        !told && (bands == 3 || bands == 4) && (eDataType == GDT_Byte || eDataType == GDT_UInt16);
     if (picture && nBand <= 3) return static_cast<GDALColorInterp>(GCI_RedBand + nBand - 1);
     return nBand == 1 ? GCI_GrayIndex : GCI_Undefined;
 }
@@ -399,8 +396,7 @@ CPLErr Band::GetStatistics(int approximate, int force, double* minimum, double* 
 }
 
 CPLErr Band::SetStatistics(double minimum, double maximum, double mean, double deviation) {
-    if (!StoresInFile())
-        return GDALPamRasterBand::SetStatistics(minimum, maximum, mean, deviation);
+    if (!StoresInFile()) return GDALPamRasterBand::SetStatistics(minimum, maximum, mean, deviation);
     constexpr std::uint32_t kFlags = zelm::StatsFlag::Minimum | zelm::StatsFlag::Maximum |
                                      zelm::StatsFlag::Mean | zelm::StatsFlag::StandardDeviation;
     statisticsFetched = false;

@@ -53,9 +53,8 @@ public:
     CPLErr GetStatistics(int approximate, int force, double* minimum, double* maximum, double* mean,
                          double* deviation) override;
     CPLErr SetStatistics(double minimum, double maximum, double mean, double deviation) override;
-    CPLErr GetDefaultHistogram(double* lower, double* upper, int* bucketCount,
-                               GUIntBig** counts, int force, GDALProgressFunc progress,
-                               void* progressData) override;
+    CPLErr GetDefaultHistogram(double* lower, double* upper, int* bucketCount, GUIntBig** counts,
+                               int force, GDALProgressFunc progress, void* progressData) override;
     CPLErr SetDefaultHistogram(double lower, double upper, int bucketCount,
                                GUIntBig* counts) override;
 
@@ -64,8 +63,7 @@ protected:
     CPLErr IWriteBlock(int blockX, int blockY, void* data) override;
     CPLErr IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, void* data,
                      int bufferWidth, int bufferHeight, GDALDataType bufferType,
-                     GSpacing pixelSpace, GSpacing lineSpace,
-                     GDALRasterIOExtraArg* extra) override;
+                     GSpacing pixelSpace, GSpacing lineSpace, GDALRasterIOExtraArg* extra) override;
 
 private:
     Dataset& owner;

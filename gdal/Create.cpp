@@ -32,8 +32,8 @@ auto Reporting(Work&& work) -> decltype(work()) {
 // Names what cannot be kept; false if that is not acceptable.
 bool AcceptLosses(const GdalRasterSource& source, bool strict) {
     for (const std::string& loss : source.Losses())
-        CPLError(strict ? CE_Failure : CE_Warning, CPLE_NotSupported,
-                 "a pyramid does not keep %s", loss.c_str());
+        CPLError(strict ? CE_Failure : CE_Warning, CPLE_NotSupported, "a pyramid does not keep %s",
+                 loss.c_str());
     return source.Losses().empty() || !strict;
 }
 
@@ -82,13 +82,12 @@ GDALDataset* OpenSpool(const std::string& target, const zmchost::Raster& raster,
                        CreationOptions options, std::unique_ptr<zmchost::BuildFile> spool) {
     const auto how = options.signedByte ? SignedByteAs::FlaggedByte : SignedByteAs::Int16;
     const std::size_t blocks = std::size_t{raster.TilesAcross()} * raster.TilesDown();
-    auto file = std::make_shared<OpenFile>(
-        zmchost::Raster::Open(SharedModule(), spool->Path()), how);
+    auto file =
+        std::make_shared<OpenFile>(zmchost::Raster::Open(SharedModule(), spool->Path()), how);
     auto dataset = Dataset::FromFile(std::move(file), GA_Update);
     dataset->SetDescription(target.c_str());
-    dataset->BeginCreation(
-        std::make_unique<Creation>(target, std::move(options), std::move(spool), blocks,
-                                   std::size_t{raster.Bands()}));
+    dataset->BeginCreation(std::make_unique<Creation>(target, std::move(options), std::move(spool),
+                                                      blocks, std::size_t{raster.Bands()}));
     return dataset.release();
 }
 

@@ -94,8 +94,7 @@ void Dataset::DescribeFile() {
         description.SetNameValue(name, value.c_str());
     };
     set("ORDERING", zelm::TileOrderName(header.tileOrdering));
-    set("VERSION",
-        std::to_string(header.versionMajor) + "." + std::to_string(header.versionMinor));
+    set("VERSION", std::to_string(header.versionMajor) + "." + std::to_string(header.versionMinor));
     set("PIXEL_TYPE", zelm::PixelTypeName(header.pixelType));
     set("INTERLEAVE", zelm::InterleaveName(header.interleave));
     set("TILE_SIZE", std::to_string(header.tileSize));
@@ -156,10 +155,9 @@ CPLErr Dataset::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, 
                           GDALRasterIOExtraArg* extra) {
     if (mode == GF_Read && bufferWidth < width && bufferHeight < height) {
         int tried = FALSE;
-        const CPLErr result =
-            TryOverviewRasterIO(mode, x, y, width, height, data, bufferWidth, bufferHeight,
-                                bufferType, bandCount, bandMap, pixelSpace, lineSpace, bandSpace,
-                                extra, &tried);
+        const CPLErr result = TryOverviewRasterIO(mode, x, y, width, height, data, bufferWidth,
+                                                  bufferHeight, bufferType, bandCount, bandMap,
+                                                  pixelSpace, lineSpace, bandSpace, extra, &tried);
         if (tried) return result;
     }
     if (mode == GF_Read && bufferWidth == width && bufferHeight == height &&

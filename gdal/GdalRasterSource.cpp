@@ -70,9 +70,9 @@ void GdalRasterSource::ChooseType(bool signedByte) {
     }
     pixelType = PixelTypeFor(type, isSigned);
     if (pixelType == 0)
-        throw zmchost::Error(Name(), kSource,
-                             std::string("no pyramid holds samples of type ") +
-                                 GDALGetDataTypeName(type));
+        throw zmchost::Error(
+            Name(), kSource,
+            std::string("no pyramid holds samples of type ") + GDALGetDataTypeName(type));
     bufferType = GdalTypeOf(pixelType, SignedByteAs::FlaggedByte);
 }
 
@@ -131,10 +131,10 @@ void GdalRasterSource::Read(const zmchost::Window& window, std::span<const std::
     GDALRasterIOExtraArg extra;
     INIT_RASTERIO_EXTRA_ARG(extra);
     ErrorCatcher errors;
-    const CPLErr result = dataset.RasterIO(
-        GF_Read, static_cast<int>(window.x), static_cast<int>(window.y), width, height, pixels,
-        width, height, bufferType, static_cast<int>(numbers.size()), numbers.data(), pixel,
-        pixel * width, size, &extra);
+    const CPLErr result = dataset.RasterIO(GF_Read, static_cast<int>(window.x),
+                                           static_cast<int>(window.y), width, height, pixels, width,
+                                           height, bufferType, static_cast<int>(numbers.size()),
+                                           numbers.data(), pixel, pixel * width, size, &extra);
     // Some drivers report a failure and answer that all went well.
     if (result == CE_None && errors.text.empty()) return;
     throw zmchost::Error(Name(), "read lines from " + std::to_string(window.y),

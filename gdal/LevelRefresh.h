@@ -1,4 +1,5 @@
-// RefreshLevels: makes stored levels anew from the level below each, by the reducers of the builder.
+// RefreshLevels: makes stored levels anew from the level below each, by the reducers of the
+// builder.
 //
 // A tile of the coarser level is made from the window of the finer one that its kernel reaches, so
 // the memory taken is that of two tiles' side whatever the raster's size, and the result is what

@@ -88,10 +88,9 @@ CPLErr MaskBand::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height,
     // In strips as high as a block, so that a large window needs no large copy of its pixels.
     for (int done = 0; done < height;) {
         const int lines = std::min(height - done, nBlockYSize - (y + done) % nBlockYSize);
-        const CPLErr result =
-            ReadMask(x, y + done, width, lines,
-                     static_cast<unsigned char*>(data) + done * lineSpace,
-                     static_cast<std::size_t>(lineSpace));
+        const CPLErr result = ReadMask(x, y + done, width, lines,
+                                       static_cast<unsigned char*>(data) + done * lineSpace,
+                                       static_cast<std::size_t>(lineSpace));
         if (result != CE_None) return result;
         done += lines;
     }

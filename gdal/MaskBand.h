@@ -31,8 +31,7 @@ protected:
     CPLErr IReadBlock(int blockX, int blockY, void* data) override;
     CPLErr IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, void* data,
                      int bufferWidth, int bufferHeight, GDALDataType bufferType,
-                     GSpacing pixelSpace, GSpacing lineSpace,
-                     GDALRasterIOExtraArg* extra) override;
+                     GSpacing pixelSpace, GSpacing lineSpace, GDALRasterIOExtraArg* extra) override;
 
 private:
     Band& band;

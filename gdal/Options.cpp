@@ -49,9 +49,10 @@ const char* const kCreationOptionsXml = R"(<CreationOptionList>
 namespace {
 
 std::optional<std::uint64_t> ParseCount(const std::string& text) {
-    if (text.empty() || !std::all_of(text.begin(), text.end(), [](unsigned char c) {
-            return std::isdigit(c) != 0;
-        }) || text.size() > 18)
+    if (text.empty() ||
+        !std::all_of(text.begin(), text.end(),
+                     [](unsigned char c) { return std::isdigit(c) != 0; }) ||
+        text.size() > 18)
         return std::nullopt;
     return std::strtoull(text.c_str(), nullptr, 10);
 }

@@ -6,9 +6,8 @@ GDALDataType GdalTypeOf(std::uint32_t pixelType, SignedByteAs signedByteAs) {
     if (pixelType == zelm::PixelTypeCode::Char && signedByteAs == SignedByteAs::FlaggedByte)
         return GDT_Byte;
     GDALDataType type = GDT_Unknown;
-    zelm::VisitElementType(pixelType, [&]<class T>(std::type_identity<T>) {
-        type = GdalTypeOf<T>();
-    });
+    zelm::VisitElementType(pixelType,
+                           [&]<class T>(std::type_identity<T>) { type = GdalTypeOf<T>(); });
     return type;
 }
 

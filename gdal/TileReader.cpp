@@ -79,8 +79,8 @@ bool TileReader::FitsTarget(const Window& window, const int* bands, int bandCoun
                             const Target& target) const {
     const auto size = static_cast<GSpacing>(sampleSize);
     const GSpacing pixel = size * bandCount;
-    return sampleSize == rawSampleSize && target.type == sampleType &&
-           target.pixelSpace == pixel && target.lineSpace == pixel * window.width &&
+    return sampleSize == rawSampleSize && target.type == sampleType && target.pixelSpace == pixel &&
+           target.lineSpace == pixel * window.width &&
            (bandCount == 1 || target.bandSpace == size) &&
            (!IsPixelInterleaved() ||
             std::equal(bands, bands + bandCount, allBands.begin(), allBands.end())) &&
@@ -109,8 +109,7 @@ const unsigned char* TileReader::LoadTile(const Window& tile, int band) {
     return scratch.data();
 }
 
-bool TileReader::Read(const Window& window, const int* bands, int bandCount,
-                      const Target& target) {
+bool TileReader::Read(const Window& window, const int* bands, int bandCount, const Target& target) {
     if (FitsTarget(window, bands, bandCount, target))
         return ReadRaw(window, bands, bandCount, target.data);
     const int lastX = (window.x + window.width - 1) / tileSize;
@@ -156,8 +155,8 @@ bool TileReader::CopyAllBandsApart(const Window& tile, const unsigned char* samp
                          (part.x - window.x) * target.pixelSpace;
         void* planes[4] = {};
         for (int i = 0; i < bandCount; ++i) planes[i] = to + i * target.bandSpace;
-        GDALDeinterleave(samples + fromPixel * pixelSize, sampleType, bandCount, planes,
-                         sampleType, static_cast<std::size_t>(part.width));
+        GDALDeinterleave(samples + fromPixel * pixelSize, sampleType, bandCount, planes, sampleType,
+                         static_cast<std::size_t>(part.width));
     }
     return true;
 #else

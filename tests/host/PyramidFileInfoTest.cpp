@@ -118,8 +118,8 @@ TEST_F(PyramidFileInfoTest, LevelsMayStartAboveZeroAndShrinkToNothing) {
 
 TEST_F(PyramidFileInfoTest, RefusesHeadersThatNobodyCanReadBy) {
     const std::pair<std::string Fields::*, const char*> cases[] = {
-        {&Fields::tileSize, "0"},   {&Fields::tileSize, "2049"}, {&Fields::levelMax, "64"},
-        {&Fields::levelMin, "3"},   {&Fields::height, "<a>1</b>"}, {&Fields::type, "Nibble"}};
+        {&Fields::tileSize, "0"}, {&Fields::tileSize, "2049"},   {&Fields::levelMax, "64"},
+        {&Fields::levelMin, "3"}, {&Fields::height, "<a>1</b>"}, {&Fields::type, "Nibble"}};
     for (const auto& [field, value] : cases) {
         Fields fields;
         fields.*field = value;
