@@ -3,9 +3,8 @@
 #include <new>
 
 #include "connection/ConnectionStrings.h"
-#include "core/ElementTypes.h"
 #include "core/PixelVocabulary.h"
-#include "raster/RasterPropsCopy.h"
+#include "dispatch/ConnectionReader.h"
 #include "raster/ReaderRasterMemory.h"
 
 namespace zelm {
@@ -56,27 +55,14 @@ std::uint32_t MemoryRasterDataConnection::GetPixelType() {
 bool MemoryRasterDataConnection::IsReadable() { return initialised && IsOpen(); }
 
 RasterReaderDispatchPtr MemoryRasterDataConnection::GetReader() {
-    try {
-        if (!reader) reader = MakeReader();
-    } catch (...) {
-        return RasterReaderDispatchPtr();
-    }
-    return reader;
+    return KeptDispatch(reader, GetPixelType(), [this](auto type) {
+        return new (std::nothrow)
+            ReaderRasterMemory<typename decltype(type)::type>(this, rasterProps);
+    });
 }
 
 RasterProps MemoryRasterDataConnection::GetRasterProps() {
-    const RasterReaderDispatchPtr dispatch = GetReader();
-    try {
-        if (dispatch) {
-            const RasterProps known = dispatch->GetRasterProps();
-            // The reader ran out of memory: what stands here is still the raster.
-            if (known.interleave == kNoLayout) return RasterProps();
-            rasterProps = known;
-        }
-        return rasterProps;
-    } catch (...) {
-        return RasterProps();
-    }
+    return RefreshedProps(GetReader(), rasterProps);
 }
 
 // The name and the address are stored as they are read, the rest once all nine keys are known.
@@ -114,21 +100,6 @@ bool MemoryRasterDataConnection::TakeParameters(const String& source) {
     if (!parameters.Append("MemoryRaster") || !parameters.Append(source)) return false;
     connectionString = String("{MemoryRaster}@") + source;
     return true;
-}
-
-// A pixel type that is not known, that of a connection that is not open included, gives an invalid
-// dispatch. Memory that runs out gives a null pointer instead, which nobody keeps.
-RasterReaderDispatchPtr MemoryRasterDataConnection::MakeReader() {
-    const std::uint32_t pixelType = GetPixelType();
-    RasterReaderDispatchPtr dispatch;
-    const bool known = VisitElementType(pixelType, [this, &dispatch](auto type) {
-        using T = typename decltype(type)::type;
-        const RasterReaderPtr<T> typed(new (std::nothrow) ReaderRasterMemory<T>(this, rasterProps));
-        if (typed) dispatch.Reset(new (std::nothrow) RasterReaderDispatch(typed));
-    });
-    if (!known) dispatch.Reset(new (std::nothrow) RasterReaderDispatch);
-    if (dispatch && known && dispatch->pixelType != pixelType) dispatch.Reset();
-    return dispatch;
 }
 
 }  // namespace zelm

@@ -57,7 +57,6 @@ public:
 private:
     bool ParseMemoryParameters(const String& source, const GeoRefPtr& geoRef);
     bool TakeParameters(const String& source);
-    RasterReaderDispatchPtr MakeReader();
 };
 
 }  // namespace zelm

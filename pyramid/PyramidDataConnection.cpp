@@ -3,9 +3,8 @@
 #include <memory>
 #include <utility>
 
-#include "core/ElementTypes.h"
+#include "dispatch/ConnectionReader.h"
 #include "pyramid/PyramidRasterReader.h"
-#include "raster/RasterPropsCopy.h"
 #include "zmcg/zmcg.h"
 
 namespace zelm {
@@ -74,27 +73,14 @@ bool PyramidDataConnection::IsReadable() {
 }
 
 RasterReaderDispatchPtr PyramidDataConnection::GetReader() {
-    try {
-        if (!reader) reader = MakeReader();
-    } catch (...) {
-        return RasterReaderDispatchPtr();
-    }
-    return reader;
+    return KeptDispatch(reader, GetPixelType(), [this](auto type) {
+        return new (std::nothrow)
+            PyramidRasterReader<typename decltype(type)::type>(this, geoRef, metadata);
+    });
 }
 
 RasterProps PyramidDataConnection::GetRasterProps() {
-    const RasterReaderDispatchPtr dispatch = GetReader();
-    try {
-        if (dispatch) {
-            const RasterProps known = dispatch->GetRasterProps();
-            // The reader ran out of memory: what stands here is still the raster.
-            if (known.interleave == kNoLayout) return RasterProps();
-            rasterProps = known;
-        }
-        return rasterProps;
-    } catch (...) {
-        return RasterProps();
-    }
+    return RefreshedProps(GetReader(), rasterProps);
 }
 
 bool PyramidDataConnection::Create(const Array<String>& createParameters,
@@ -118,22 +104,6 @@ bool PyramidDataConnection::TakeName(const String& fileName) {
     if (!parameters.Append("Pyramid") || !parameters.Append(fileName)) return false;
     connectionString = String("{PyramidRaster}@") + fileName;
     return true;
-}
-
-// A pixel type without a reader, that of a connection that is not open included, gives an invalid
-// dispatch. Memory that runs out gives a null pointer instead, which nobody keeps.
-RasterReaderDispatchPtr PyramidDataConnection::MakeReader() {
-    const std::uint32_t pixelType = GetPixelType();
-    RasterReaderDispatchPtr dispatch;
-    const bool known = VisitElementType(pixelType, [this, &dispatch](auto type) {
-        using T = typename decltype(type)::type;
-        const RasterReaderPtr<T> typed(new (std::nothrow)
-                                           PyramidRasterReader<T>(this, geoRef, metadata));
-        if (typed) dispatch.Reset(new (std::nothrow) RasterReaderDispatch(typed));
-    });
-    if (!known) dispatch.Reset(new (std::nothrow) RasterReaderDispatch);
-    if (dispatch && known && dispatch->pixelType != pixelType) dispatch.Reset();
-    return dispatch;
 }
 
 }  // namespace zelm

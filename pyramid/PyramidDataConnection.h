@@ -53,7 +53,6 @@ public:
 
 private:
     bool TakeName(const String& fileName);
-    RasterReaderDispatchPtr MakeReader();
 };
 
 }  // namespace zelm

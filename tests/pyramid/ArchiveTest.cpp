@@ -10,7 +10,7 @@
 #include "pyramid/NumberText.h"
 #include "pyramid/PyramidDataset.h"
 #include "tests/support/PyramidFiles.h"
-#include "tests/support/TempFolder.h"
+#include "tests/support/ScratchDirectory.h"
 #include "tests/support/XercesEnvironment.h"
 
 namespace zelm::test {
@@ -71,16 +71,16 @@ protected:
     }
     // A finished file with this metadata document.
     void WriteFile(const std::string& document) {
-        WriteWholeFile(name, HeaderText().File() + document);
+        support::WriteText(name, HeaderText().File() + document);
     }
     std::string DocumentText(const PyramidDataset& dataset) {
-        const std::string bytes = ReadWholeFile(name);
+        const std::string bytes = support::ReadText(name);
         return bytes.size() < dataset.MetaDocumentOffset ? std::string()
                                                          : bytes.substr(dataset.MetaDocumentOffset);
     }
 
-    TempFolder folder;
-    std::string name = folder.File("archive.pyr");
+    support::ScratchDirectory folder;
+    std::string name = (folder / "archive.pyr");
 };
 
 TEST_F(ArchiveTest, FileWithoutDocument) {
@@ -221,13 +221,13 @@ TEST_F(ArchiveTest, FetchesComeFromTheFileAndConsecutiveOnesFromTheSource) {
 
 TEST_F(ArchiveTest, ReadOnlyFileStoresNothing) {
     Make()->SetBandStats(ArrayOf({StatsOf<T>(0, 1)}));
-    const std::string before = ReadWholeFile(name);
+    const std::string before = support::ReadText(name);
     const auto dataset = Open();
     dataset->Writable = false;
     EXPECT_FALSE(dataset->SetBandStats(ArrayOf({StatsOf<T>(1, 1)})));
     EXPECT_FALSE(dataset->SetHistograms(Array<RasterBandHistogram<T>>()));
     EXPECT_FALSE(dataset->SetPalette(0, Palette()));
-    EXPECT_EQ(ReadWholeFile(name), before);
+    EXPECT_EQ(support::ReadText(name), before);
     EXPECT_TRUE(dataset->HasBandStats<T>(0));
     dataset->Writable = true;
     dataset->File.reset();
@@ -391,7 +391,7 @@ TEST_F(ArchiveTest, UnparsableDocumentLeavesThePixels) {
     for (const std::string& document : documents) {
         SCOPED_TRACE(document);
         WriteFile(document);
-        const std::string before = ReadWholeFile(name);
+        const std::string before = support::ReadText(name);
         const auto dataset = Open();
         EXPECT_TRUE(dataset->HasPyramid);
         unsigned char pixel = 0;
@@ -402,7 +402,7 @@ TEST_F(ArchiveTest, UnparsableDocumentLeavesThePixels) {
         EXPECT_FALSE(dataset->SetBandStats(ArrayOf({StatsOf<T>(0, 1)})));
         EXPECT_FALSE(dataset->SetHistograms(Array<RasterBandHistogram<T>>()));
         EXPECT_FALSE(dataset->SetPalette(0, Palette()));
-        EXPECT_EQ(ReadWholeFile(name), before);
+        EXPECT_EQ(support::ReadText(name), before);
         Stderr messages;
         EXPECT_FALSE(dataset->HasBandStats<T>(0));
         EXPECT_EQ(dataset->GetBandStats<T>(0).flags, 0u);
@@ -454,7 +454,7 @@ TEST_F(ArchiveTest, LongerDocumentOfAnotherWriterIsReplacedWhole) {
 TEST_F(ArchiveTest, TornDocumentIsNeverHalfBelieved) {
     const auto dataset = Make();
     dataset->SetBandStats(ArrayOf({StatsOf<T>(0, 1), StatsOf<T>(1, 1)}));
-    const std::string front = ReadWholeFile(name).substr(0, dataset->MetaDocumentOffset);
+    const std::string front = support::ReadText(name).substr(0, dataset->MetaDocumentOffset);
     const std::string before = DocumentText(*dataset);
     dataset->SetBandStats(ArrayOf({StatsOf<T>(0, 2), StatsOf<T>(1, 2)}));
     const std::string after = DocumentText(*dataset);
@@ -462,7 +462,7 @@ TEST_F(ArchiveTest, TornDocumentIsNeverHalfBelieved) {
     Stderr messages;
     for (std::size_t written = 0; written <= after.size(); ++written) {
         const std::string rest = written < before.size() ? before.substr(written) : "";
-        WriteWholeFile(name, front + after.substr(0, written) + rest);
+        support::WriteText(name, front + after.substr(0, written) + rest);
         PyramidDataset torn{String(name.c_str())};
         ASSERT_FALSE(torn.ReadHeader());
         Array<RasterBandStats<T>> stats;
@@ -481,7 +481,7 @@ TEST_F(ArchiveTest, HeaderDocumentsThatAreRefused) {
                                      good + std::string(1, '\0'), std::string(40, '\0')};
     for (const std::string& document : documents) {
         SCOPED_TRACE(document);
-        WriteWholeFile(name, FileWithHeader(document) + std::string(200, 'x'));
+        support::WriteText(name, FileWithHeader(document) + std::string(200, 'x'));
         Stderr messages;
         PyramidDataset dataset{String(name.c_str())};
         EXPECT_TRUE(dataset.ReadHeader()) << "true is failure";
@@ -493,14 +493,14 @@ TEST_F(ArchiveTest, HeaderDocumentsThatAreRefused) {
 TEST_F(ArchiveTest, HeaderRegionsThatAreRefused) {
     const std::uint64_t starts[] = {0, 19, 20, 1000, std::uint64_t{1} << 40, ~std::uint64_t{0}};
     for (const std::uint64_t start : starts) {
-        WriteWholeFile(name, "KOBT" + Bytes8(start) + Bytes8(0) + HeaderText().Text());
+        support::WriteText(name, "KOBT" + Bytes8(start) + Bytes8(0) + HeaderText().Text());
         PyramidDataset dataset{String(name.c_str())};
         EXPECT_TRUE(dataset.ReadHeader()) << start;
     }
 }
 
 TEST_F(ArchiveTest, HeaderLoadingAnswersInItsOwnSense) {
-    WriteWholeFile(name, HeaderText().File());
+    support::WriteText(name, HeaderText().File());
     PyramidDataset dataset{String(name.c_str())};
     PyramidHeaderRecord record;
     record.width = 77;
@@ -530,7 +530,7 @@ TEST_F(ArchiveTest, DamagedFilesAreOpenedOrRefused) {
         dataset->SetHistograms(ArrayOf({histogram}));
         dataset->SetPalette(0, palette);
     }
-    const std::string whole = ReadWholeFile(name);
+    const std::string whole = support::ReadText(name);
     std::mt19937 random(7);
     const auto below = [&](std::size_t n) { return random() % n; };
     Stderr messages;
@@ -557,7 +557,7 @@ TEST_F(ArchiveTest, DamagedFilesAreOpenedOrRefused) {
                     break;
             }
         }
-        WriteWholeFile(name, bytes);
+        support::WriteText(name, bytes);
         PyramidDataset dataset{String(name.c_str())};
         if (dataset.ReadHeader()) continue;
         ++opened;

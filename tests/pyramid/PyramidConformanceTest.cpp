@@ -2,7 +2,7 @@
 #include "tests/support/ElementTypeList.h"
 #include "tests/support/PyramidFiles.h"
 #include "tests/support/ReaderConformance.h"
-#include "tests/support/TempFolder.h"
+#include "tests/support/ScratchDirectory.h"
 #include "tests/support/XercesEnvironment.h"
 
 namespace zelm::test {
@@ -26,7 +26,7 @@ public:
         RasterProps props = PyramidProps(samples, lines, bands, ElementTraits<T>::code);
         props.interleave = interleave;
         Array<String> name;
-        name.Append(folder.File("conformance.pyr").c_str());
+        name.Append((folder / "conformance.pyr").c_str());
         connection.Create(name, props);
         dispatch = connection.GetReader();
         const std::int32_t pair[] = {2, 2};
@@ -47,7 +47,7 @@ public:
     }
 
 private:
-    TempFolder folder;
+    support::ScratchDirectory folder;
     PyramidDataConnection connection;
     RasterReaderDispatchPtr dispatch;
 };

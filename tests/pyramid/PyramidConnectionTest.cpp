@@ -8,7 +8,7 @@
 #include "connection/RasterDataConnectionFactory.h"
 #include "pyramid/PyramidRasterReader.h"
 #include "tests/support/PyramidFiles.h"
-#include "tests/support/TempFolder.h"
+#include "tests/support/ScratchDirectory.h"
 #include "tests/support/XercesEnvironment.h"
 
 namespace zelm::test {
@@ -34,15 +34,15 @@ public:
 
 class PyramidConnectionTest : public ::testing::Test {
 protected:
-    PyramidConnectionTest() { WriteWholeFile(name, HeaderText().File()); }
+    PyramidConnectionTest() { support::WriteText(name, HeaderText().File()); }
 
     bool Open(PyramidDataConnection& closed, GeoRefPtr geoRef = GeoRefPtr(),
               MetadataPtr metadata = MetadataPtr()) {
         return closed.Open(ArrayOf({name}), geoRef, metadata);
     }
 
-    TempFolder folder;
-    std::string name = folder.File("connection.pyr");
+    support::ScratchDirectory folder;
+    std::string name = (folder / "connection.pyr");
     PyramidDataConnection connection;
 };
 
@@ -93,13 +93,13 @@ TEST_F(PyramidConnectionTest, EmptyNameCloses) {
 }
 
 TEST_F(PyramidConnectionTest, FilesThatDoNotOpen) {
-    const std::string other = folder.File("other");
-    WriteWholeFile(other, "not a pyramid at all, though long enough to be one");
-    WriteWholeFile(folder.File("empty"), "");
-    WriteWholeFile(folder.File("short"), "KOBT\x15");
+    const std::string other = (folder / "other");
+    support::WriteText(other, "not a pyramid at all, though long enough to be one");
+    support::WriteText((folder / "empty"), "");
+    support::WriteText((folder / "short"), "KOBT\x15");
     for (const std::string& bad :
-         {folder.File("missing"), folder.path.string(), other, folder.File("empty"),
-          folder.File("short"), std::string("/dev/null"), " " + name, name + " "}) {
+         {(folder / "missing"), folder.String(), other, (folder / "empty"), (folder / "short"),
+          std::string("/dev/null"), " " + name, name + " "}) {
         ASSERT_TRUE(Open(connection));
         const String before = connection.GetConnectionString();
         EXPECT_FALSE(connection.Open(ArrayOf({bad}), GeoRefPtr(), MetadataPtr())) << bad;
@@ -116,7 +116,7 @@ TEST_F(PyramidConnectionTest, HeadersThatDoNotOpen) {
     huge.ordering = "Morton";
     huge.width = huge.height = huge.bands = 4000000000u;
     for (const HeaderText& header : {zeroTile, levels, huge}) {
-        WriteWholeFile(name, FileWithHeader(header.Text()));
+        support::WriteText(name, FileWithHeader(header.Text()));
         EXPECT_FALSE(Open(connection));
     }
 }
@@ -144,7 +144,7 @@ TEST_F(PyramidConnectionTest, CloseKeepsWhatIsTold) {
 
 TEST_F(PyramidConnectionTest, FailedOpenKeepsTheMetadata) {
     const MetadataPtr metadata(new Metadata);
-    EXPECT_FALSE(connection.Open(ArrayOf({folder.File("missing")}), GeoRefPtr(), metadata));
+    EXPECT_FALSE(connection.Open(ArrayOf({(folder / "missing")}), GeoRefPtr(), metadata));
     EXPECT_EQ(connection.metadata.Get(), metadata.Get());
 }
 
@@ -170,7 +170,7 @@ TEST_F(PyramidConnectionTest, ReaderOfEachPixelType) {
         using T = typename decltype(type)::type;
         HeaderText header;
         header.pixelType = ElementTraits<T>::word;
-        WriteWholeFile(name, header.File());
+        support::WriteText(name, header.File());
         PyramidDataConnection one;
         ASSERT_TRUE(Open(one));
         EXPECT_EQ(one.GetPixelType(), ElementTraits<T>::code);
@@ -183,7 +183,7 @@ TEST_F(PyramidConnectionTest, PixelTypesWithoutAReader) {
     for (const char* word : {"Bool", "Quad", "nonsense"}) {
         HeaderText header;
         header.pixelType = word;
-        WriteWholeFile(name, header.File());
+        support::WriteText(name, header.File());
         PyramidDataConnection one;
         ASSERT_TRUE(Open(one)) << word;
         EXPECT_EQ(one.GetReader()->pixelType, 0u);
@@ -214,7 +214,7 @@ TEST_F(PyramidConnectionTest, MetadataTreeIsShared) {
 }
 
 TEST_F(PyramidConnectionTest, CreateMakesNoFile) {
-    const std::string fresh = folder.File("fresh.pyr");
+    const std::string fresh = (folder / "fresh.pyr");
     ASSERT_TRUE(connection.Create(ArrayOf({fresh, "b", "c"}), PyramidProps(300, 200, 1, 2)));
     EXPECT_EQ(connection.GetParameters().shape.elements, 2u);
     EXPECT_TRUE(connection.GetConnectionString() == ("{PyramidRaster}@" + fresh).c_str());
@@ -259,7 +259,7 @@ TEST_F(PyramidConnectionTest, NewFileTakesNeitherGeoReferenceNorMetadataOfItsPro
     const auto sizes = std::make_shared<RecordingGeoRef::Sizes>();
     RasterProps props = PyramidProps(9, 9, 1, 1);
     props.geoRef = GeoRefPtr(new RecordingGeoRef(sizes));
-    ASSERT_TRUE(connection.Create(ArrayOf({folder.File("fresh")}), props));
+    ASSERT_TRUE(connection.Create(ArrayOf({(folder / "fresh")}), props));
     EXPECT_FALSE(connection.geoRef);
     EXPECT_FALSE(connection.GetRasterProps().geoRef);
 }
@@ -278,8 +278,8 @@ TEST_F(PyramidConnectionTest, FactoryOpensByWordAndWithout) {
             << "the host's metadata stays outside";
     }
     EXPECT_FALSE(factory.Open(ArrayOf({"MemoryRaster", name}), GeoRefPtr(), MetadataPtr()));
-    EXPECT_FALSE(factory.Open(ArrayOf({"Pyramid", folder.File("no")}), GeoRefPtr(), MetadataPtr()));
-    EXPECT_FALSE(factory.Open(ArrayOf({folder.File("no")}), GeoRefPtr(), MetadataPtr()));
+    EXPECT_FALSE(factory.Open(ArrayOf({"Pyramid", (folder / "no")}), GeoRefPtr(), MetadataPtr()));
+    EXPECT_FALSE(factory.Open(ArrayOf({(folder / "no")}), GeoRefPtr(), MetadataPtr()));
     EXPECT_FALSE(factory.Open({}, GeoRefPtr(), MetadataPtr()));
 }
 

@@ -8,7 +8,7 @@
 
 #include "pyramid/PyramidDataConnection.h"
 #include "tests/support/PyramidFiles.h"
-#include "tests/support/TempFolder.h"
+#include "tests/support/ScratchDirectory.h"
 #include "tests/support/XercesEnvironment.h"
 
 namespace zelm::test {
@@ -58,8 +58,8 @@ protected:
         EXPECT_TRUE(connection->dataset->RefreshPyramidState());
     }
 
-    TempFolder folder;
-    std::string name = folder.File("reader.pyr");
+    support::ScratchDirectory folder;
+    std::string name = (folder / "reader.pyr");
     Pointer<PyramidDataConnection> connection;
 };
 
@@ -148,14 +148,14 @@ TEST_F(PyramidReaderTest, BuildWantsAPairOfEqualValues) {
     EXPECT_EQ(reader.GetMinLevel(), 0);
     EXPECT_EQ(reader.GetMaxLevel(), 3);
     EXPECT_FALSE(reader.HasPyramid());
-    const std::string before = ReadWholeFile(name);
+    const std::string before = support::ReadText(name);
     EXPECT_FALSE(reader.BuildPyramid(0, 1, 0, different));
-    EXPECT_EQ(ReadWholeFile(name), before);
+    EXPECT_EQ(support::ReadText(name), before);
     EXPECT_EQ(reader.GetMaxLevel(), 3);
 }
 
 TEST_F(PyramidReaderTest, BuildIsTrueEvenWhereNoFileCanBeMade) {
-    name = folder.File("missing/folder.pyr");
+    name = (folder / "missing/folder.pyr");
     auto& reader = Describe();
     EXPECT_TRUE(reader.BuildPyramid(0, 1, 0, kPair));
     EXPECT_FALSE(std::filesystem::exists(name));
@@ -197,7 +197,7 @@ TEST_F(PyramidReaderTest, RefusalsLeaveBufferAndMask) {
     source.SetBands(3);
     source.SetNoDataValue(0, 5);
     reader.SetNoDataValues(source);
-    const std::string before = ReadWholeFile(name);
+    const std::string before = support::ReadText(name);
     struct Request {
         std::int32_t x, y;
         std::uint32_t width, height;
@@ -221,7 +221,7 @@ TEST_F(PyramidReaderTest, RefusalsLeaveBufferAndMask) {
         EXPECT_EQ(pixels, std::vector<Byte>(4096, 9)) << "not even stamped";
         EXPECT_EQ(mask, std::vector<Byte>(4096, 0xFF));
     }
-    EXPECT_EQ(ReadWholeFile(name), before);
+    EXPECT_EQ(support::ReadText(name), before);
 }
 
 TEST_F(PyramidReaderTest, EmptyTilesAndNullBuffers) {
@@ -254,7 +254,7 @@ TEST_F(PyramidReaderTest, EmptyBandListInMortonOrderIsRefused) {
 TEST_F(PyramidReaderTest, TooLargeTilesOpenAndAreRefused) {
     HeaderText header;
     header.tileSize = 2049;
-    WriteWholeFile(name, header.File());
+    support::WriteText(name, header.File());
     PyramidDataConnection opened;
     ASSERT_TRUE(opened.Open(Name(name), GeoRefPtr(), MetadataPtr()));
     auto& reader = ReaderOf<Byte>(opened);
@@ -283,13 +283,13 @@ TEST_F(PyramidReaderTest, WritingStampsTheBufferAndTheFile) {
     EXPECT_TRUE(reader.ReadTile(0, 0, 4, 1, Bands(list), 0, read, found));
     EXPECT_TRUE(std::equal(pixels, pixels + 4, read));
     EXPECT_EQ(std::vector<Byte>(found, found + 4), (std::vector<Byte>{0xFE, 0xFF, 2, 1}));
-    EXPECT_EQ(static_cast<Byte>(ReadWholeFile(name).back()), 200);
+    EXPECT_EQ(static_cast<Byte>(support::ReadText(name).back()), 200);
 }
 
 TEST_F(PyramidReaderTest, ReadOnlyFilesDropTheirWritesAndStillStamp) {
     auto& reader = Build(2, 1, 1, 0);
     FinishFile();
-    const std::string before = ReadWholeFile(name);
+    const std::string before = support::ReadText(name);
     connection->dataset->Writable = false;
     RasterProps source;
     source.SetBands(1);
@@ -311,7 +311,7 @@ TEST_F(PyramidReaderTest, ReadOnlyFilesDropTheirWritesAndStillStamp) {
     palette.nextIndex = 1;
     EXPECT_TRUE(reader.SetPalette(0, palette));
     EXPECT_FALSE(reader.HasPalette(0));
-    EXPECT_EQ(ReadWholeFile(name), before);
+    EXPECT_EQ(support::ReadText(name), before);
 }
 
 TEST_F(PyramidReaderTest, NoDataValuesLiveInTheReaderAlone) {

@@ -9,7 +9,7 @@
 #include "connection/DataConnectionFactory.h"
 #include "connection/RasterDataConnection.h"
 #include "tests/support/PyramidFiles.h"
-#include "tests/support/TempFolder.h"
+#include "tests/support/ScratchDirectory.h"
 #include "tests/support/XercesEnvironment.h"
 
 namespace zelm::test {
@@ -58,7 +58,7 @@ protected:
         return static_cast<RasterDataConnection*>(connection.Get())->GetReader();
     }
 
-    TempFolder folder;
+    support::ScratchDirectory folder;
     DataConnectionFactory* factory = nullptr;
     void (*destroy)(DataConnectionFactory*) = nullptr;
 };
@@ -124,8 +124,7 @@ TEST_F(PyramidSystemTest, EveryTypeAndOrderingThroughTheFactory) {
         using T = typename decltype(type)::type;
         for (const auto& [bands, tileLines] : {std::pair{2u, 0u}, {3u, 256u}, {9u, 256u}}) {
             SCOPED_TRACE(std::string(ElementTraits<T>::word) + ", bands " + std::to_string(bands));
-            const String name(
-                (folder.File(ElementTraits<T>::word) + std::to_string(bands)).c_str());
+            const String name(((folder / ElementTraits<T>::word) + std::to_string(bands)).c_str());
             const RasterProps props =
                 PyramidProps(300, 270, bands, ElementTraits<T>::code, tileLines);
             {
@@ -161,7 +160,7 @@ TEST_F(PyramidSystemTest, EveryTypeAndOrderingThroughTheFactory) {
 TEST_F(PyramidSystemTest, NamesOutsideAscii) {
     for (const char* leaf : {"b\xC3\xA4nder.pyr", "\xE5\x9C\xB0\xE5\x9B\xB3",
                              "\xF0\x9F\x97\xBA.pyr", "with space; and = signs"}) {
-        const String name(folder.File(leaf).c_str());
+        const String name((folder / leaf).c_str());
         {
             const DataConnectionPtr connection = Create(name, PyramidProps(5, 4, 1, 1));
             ASSERT_TRUE(connection);
@@ -169,19 +168,19 @@ TEST_F(PyramidSystemTest, NamesOutsideAscii) {
             const RasterReaderDispatchPtr dispatch = Reader(connection);
             ASSERT_TRUE(dispatch->readerByte->BuildPyramid(0, 0, 0, pair));
         }
-        EXPECT_TRUE(std::filesystem::exists(folder.File(leaf))) << leaf;
+        EXPECT_TRUE(std::filesystem::exists((folder / leaf))) << leaf;
         const DataConnectionPtr connection = Open(name);
         ASSERT_TRUE(connection) << leaf;
         EXPECT_TRUE(connection->GetParameters().data[1] == name);
         EXPECT_TRUE(connection->GetConnectionString() == String("{PyramidRaster}@") + name);
         const RasterReaderDispatchPtr dispatch = Reader(connection);
         EXPECT_TRUE(dispatch->readerByte->DeletePyramid());
-        EXPECT_FALSE(std::filesystem::exists(folder.File(leaf))) << leaf;
+        EXPECT_FALSE(std::filesystem::exists((folder / leaf))) << leaf;
     }
 }
 
 TEST_F(PyramidSystemTest, RecordsAndMasksThroughTheDispatch) {
-    const String name(folder.File("records").c_str());
+    const String name((folder / "records").c_str());
     const DataConnectionPtr connection = Create(name, PyramidProps(4, 1, 1, PixelTypeCode::Single));
     const RasterReaderDispatchPtr dispatch = Reader(connection);
     bool visited = false;
@@ -216,8 +215,8 @@ TEST_F(PyramidSystemTest, RecordsAndMasksThroughTheDispatch) {
 }
 
 TEST_F(PyramidSystemTest, FactoryMayGoBeforeItsConnections) {
-    WriteWholeFile(folder.File("file"), HeaderText().File());
-    const DataConnectionPtr connection = Open(folder.File("file").c_str());
+    support::WriteText((folder / "file"), HeaderText().File());
+    const DataConnectionPtr connection = Open((folder / "file").c_str());
     ASSERT_TRUE(connection);
     destroy(factory);
     factory = nullptr;
@@ -227,7 +226,7 @@ TEST_F(PyramidSystemTest, FactoryMayGoBeforeItsConnections) {
 }
 
 TEST_F(PyramidSystemTest, FileBeyondFourGigabytes) {
-    const String name(folder.File("large").c_str());
+    const String name((folder / "large").c_str());
     const DataConnectionPtr connection = Create(name, PyramidProps(70000, 70000, 1, 1));
     const RasterReaderDispatchPtr dispatch = Reader(connection);
     RasterReader<unsigned char>& reader = *dispatch->readerByte;
@@ -240,7 +239,7 @@ TEST_F(PyramidSystemTest, FileBeyondFourGigabytes) {
     EXPECT_TRUE(reader.WriteTile(69888, 69888, 112, 112, list, 0, last.data(), mask.data()));
     EXPECT_TRUE(reader.RefreshPyramidState());
     EXPECT_TRUE(reader.HasPyramid());
-    EXPECT_GT(std::filesystem::file_size(folder.File("large")), std::uint64_t{4} << 30);
+    EXPECT_GT(std::filesystem::file_size((folder / "large")), std::uint64_t{4} << 30);
     const DataConnectionPtr again = Open(name);
     const RasterReaderDispatchPtr second = Reader(again);
     unsigned char pixel = 0;

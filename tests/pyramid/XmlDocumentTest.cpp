@@ -8,7 +8,7 @@
 
 #include "core/PixelVocabulary.h"
 #include "tests/support/PyramidFiles.h"
-#include "tests/support/TempFolder.h"
+#include "tests/support/ScratchDirectory.h"
 #include "tests/support/XercesEnvironment.h"
 
 namespace zelm::test {
@@ -20,11 +20,11 @@ protected:
 
     // What SerializeDocument writes, at an offset that is not 0.
     std::string Raw() {
-        const std::string name = folder.File("document");
+        const std::string name = (folder / "document");
         const String wide(name.c_str());
         const auto file = platform::File::Open(wide.wide, platform::File::Mode::Create);
         EXPECT_TRUE(document.SerializeDocument(*file, 7));
-        return ReadWholeFile(name).substr(7);
+        return support::ReadText(name).substr(7);
     }
     std::string Text() { return Compact(Raw()); }
 
@@ -34,7 +34,7 @@ protected:
         return target.ParseTree(source);
     }
 
-    TempFolder folder;
+    support::ScratchDirectory folder;
     PyramidXMLDocument document;
 };
 
@@ -216,7 +216,7 @@ TEST_F(XmlDocumentTest, WithoutATreeEverythingIsRefused) {
     EXPECT_FALSE(document.WriteBandStatsElement(RasterBandStats<int>()));
     EXPECT_FALSE(document.WriteHistogramElement(RasterBandHistogram<int>()));
     EXPECT_FALSE(document.WritePaletteElement(0, Palette()));
-    const std::string name = folder.File("document");
+    const std::string name = (folder / "document");
     const auto file = platform::File::Open(String(name.c_str()).wide, platform::File::Mode::Create);
     EXPECT_FALSE(document.SerializeDocument(*file, 0));
     EXPECT_EQ(file->Size(), 0u);
@@ -245,19 +245,19 @@ TEST_F(XmlDocumentTest, RecordsAreTakenBackFromAPosition) {
 }
 
 TEST_F(XmlDocumentTest, ReadOnlyFileIsAFailure) {
-    const std::string name = folder.File("document");
-    WriteWholeFile(name, "old");
+    const std::string name = (folder / "document");
+    support::WriteText(name, "old");
     const auto file = platform::File::Open(String(name.c_str()).wide, platform::File::Mode::Read);
     EXPECT_FALSE(document.SerializeDocument(*file, 0));
-    EXPECT_EQ(ReadWholeFile(name), "old");
+    EXPECT_EQ(support::ReadText(name), "old");
 }
 
 TEST_F(XmlDocumentTest, OldTextBehindTheDocumentIsBlankedAndNothingIsCut) {
-    const std::string name = folder.File("document");
-    WriteWholeFile(name, std::string(10000, 'x'));
+    const std::string name = (folder / "document");
+    support::WriteText(name, std::string(10000, 'x'));
     const auto file = platform::File::Open(String(name.c_str()).wide, platform::File::Mode::Update);
     EXPECT_TRUE(document.SerializeDocument(*file, 5));
-    const std::string text = ReadWholeFile(name);
+    const std::string text = support::ReadText(name);
     EXPECT_EQ(text.size(), 10000u);
     EXPECT_EQ(text.substr(0, 5), "xxxxx");
     EXPECT_EQ(Compact(text.substr(5)), "<DATASET/>");
@@ -271,10 +271,10 @@ TEST_F(XmlDocumentTest, ParsedTreeGrows) {
                       "<FOREIGN a='1'>\xC3\xA9</FOREIGN>\n</DATASET>\n"));
     RasterBandStats<int> stats;
     EXPECT_TRUE(parsed.WriteBandStatsElement(stats));
-    const std::string name = folder.File("document");
+    const std::string name = (folder / "document");
     const auto file = platform::File::Open(String(name.c_str()).wide, platform::File::Mode::Create);
     ASSERT_TRUE(parsed.SerializeDocument(*file, 0));
-    const std::string text = Compact(ReadWholeFile(name));
+    const std::string text = Compact(support::ReadText(name));
     EXPECT_NE(text.find("<!-- kept -->"), std::string::npos);
     EXPECT_NE(text.find("<FOREIGN a=\"1\">\xC3\xA9</FOREIGN><BANDSTATISTICS>"), std::string::npos)
         << text;

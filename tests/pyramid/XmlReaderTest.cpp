@@ -14,7 +14,7 @@
 
 #include "pyramid/PyramidDataset.h"
 #include "tests/support/PyramidFiles.h"
-#include "tests/support/TempFolder.h"
+#include "tests/support/ScratchDirectory.h"
 #include "tests/support/XercesEnvironment.h"
 
 namespace zelm::test {
@@ -459,14 +459,14 @@ TEST_F(XmlReaderTest, XmlExceptionOutOfTheParse) {
 // --- documents made to harm ---
 
 TEST_F(XmlReaderTest, DocumentTypesAreRefused) {
-    TempFolder folder;
-    WriteWholeFile(folder.File("secret"), "1");
+    support::ScratchDirectory folder;
+    support::WriteText((folder / "secret"), "1");
     const std::string documents[] = {
         "<!DOCTYPE DATASET><DATASET/>",
-        "<!DOCTYPE DATASET SYSTEM \"file://" + folder.File("secret") + "\"><DATASET/>",
+        "<!DOCTYPE DATASET SYSTEM \"file://" + (folder / "secret") + "\"><DATASET/>",
         "<!DOCTYPE DATASET [<!ENTITY a \"1\">]><DATASET>&a;</DATASET>",
-        "<!DOCTYPE DATASET [<!ENTITY a SYSTEM \"file://" + folder.File("secret") +
-            "\">]><DATASET>" + Stats("<RSTC_BAND>&a;</RSTC_BAND>") + "</DATASET>",
+        "<!DOCTYPE DATASET [<!ENTITY a SYSTEM \"file://" + (folder / "secret") + "\">]><DATASET>" +
+            Stats("<RSTC_BAND>&a;</RSTC_BAND>") + "</DATASET>",
     };
     for (const std::string& text : documents) {
         PyramidXMLReaderHandlers<int> handlers;
