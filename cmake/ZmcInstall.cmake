@@ -37,6 +37,7 @@ set(interfaces
     raster/RasterBandHistogram.h
     raster/RasterBandStats.h
     raster/RasterProps.h
+    raster/RasterPropsCopy.h
     raster/RasterReader.h
     zmcpe/CoordSysImpl.h
     zmcpe/EntryPoints.h)
