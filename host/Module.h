@@ -26,7 +26,7 @@ public:
 
     // The environment variable ZMCRASTER_MODULE if it is set, else the module beside the program
     // or library that this code is part of, else the one in the library folder beside that, else
-    // its bare name, for the system to find.
+    // the installed one, else its bare name, for the system to find.
     static std::string DefaultPath();
 
     ~Module();
