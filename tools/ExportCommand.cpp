@@ -4,12 +4,11 @@
 #include <cstdio>
 #include <filesystem>
 
-#include "host/PyramidFileInfo.h"
 #include "tools/Arguments.h"
 #include "tools/Command.h"
 #include "tools/GdalWorld.h"
 #include "tools/Interrupt.h"
-#include "tools/TerminalProgress.h"
+#include "tools/RasterView.h"
 
 namespace zmctools {
 namespace {
@@ -62,7 +61,7 @@ void ExportCommand::Describe(CLI::App& app) {
 }
 
 DatasetPtr ExportCommand::OpenLevel(std::uint32_t wanted) const {
-    const zmchost::PyramidFileInfo info = zmchost::ReadPyramidFileInfo(file);
+    const zmchost::PyramidFileInfo info = ReadLayout(file);
     if (!info.complete)
         throw Failure(file, "the pyramid is incomplete, " + std::to_string(info.bytesMissing) +
                                 " bytes of tiles are missing; build it anew");

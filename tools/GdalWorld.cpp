@@ -1,5 +1,6 @@
 #include "tools/GdalWorld.h"
 
+#include <cpl_conv.h>
 #include <cpl_error.h>
 #include <cpl_string.h>
 
@@ -11,6 +12,9 @@
 
 namespace zmctools {
 namespace {
+
+// GDAL would take a twentieth of the machine for blocks of its own; a row of tiles is enough here.
+constexpr GIntBig kBlockCache = GIntBig{96} << 20;
 
 std::mutex mutex;
 std::string firstError;
@@ -34,6 +38,7 @@ void StartGdal() {
     CPLSetErrorHandler(&TakeError);
     GDALRegister_ZMCPyramid();
     GDALAllRegister();
+    if (!CPLGetConfigOption("GDAL_CACHEMAX", nullptr)) GDALSetCacheMax64(kBlockCache);
     if (GDALDriver* const memory = GetGDALDriverManager()->GetDriverByName("MEM")) {
         memory->pfnOpen = nullptr;
         memory->pfnIdentify = nullptr;
@@ -57,6 +62,7 @@ DatasetPtr OpenDataset(const std::string& name, const std::vector<std::string>& 
     if (dataset) return dataset;
     if (reason.find("not recognized as") != reason.npos)
         reason = "it is in no raster format that GDAL knows";
+    if (reason == "No such file or directory") reason = "there is no such file";
     if (reason.empty()) reason = "GDAL does not open it and gives no reason";
     throw Failure(name, reason);
 }

@@ -108,7 +108,7 @@ Json PalettesOf(const zmchost::Raster& raster) {
 }
 
 Json Describe(const std::string& file) {
-    const zmchost::PyramidFileInfo info = zmchost::ReadPyramidFileInfo(file);
+    const zmchost::PyramidFileInfo info = ReadLayout(file);
     const zmchost::PyramidHeader& header = info.header;
     Json document = {{"schema", kSchema},
                      {"file", file},

@@ -1,12 +1,12 @@
 #include "tools/RasterView.h"
 
 #include <algorithm>
+#include <filesystem>
 #include <fstream>
 
 #include "core/PixelVocabulary.h"
 #include "gdal/Dataset.h"
 #include "gdal/GdalRasterSource.h"
-#include "host/PyramidFileInfo.h"
 #include "tools/GdalWorld.h"
 #include "tools/Interrupt.h"
 #include "tools/Message.h"
@@ -76,6 +76,13 @@ bool IsPyramidFile(const std::string& name) {
     char start[64];
     file.read(start, sizeof start);
     return zmchost::LooksLikePyramid({start, static_cast<std::size_t>(file.gcount())});
+}
+
+zmchost::PyramidFileInfo ReadLayout(const std::string& name) {
+    std::error_code ignored;
+    if (!std::filesystem::exists(name, ignored)) throw Failure(name, "there is no such file");
+    if (std::filesystem::is_directory(name, ignored)) throw Failure(name, "it is a folder");
+    return zmchost::ReadPyramidFileInfo(name);
 }
 
 zmchost::Raster OpenPyramid(const std::string& name) {

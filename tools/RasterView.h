@@ -14,6 +14,7 @@
 #include <string>
 #include <vector>
 
+#include "host/PyramidFileInfo.h"
 #include "host/Raster.h"
 #include "tools/TerminalProgress.h"
 
@@ -38,6 +39,9 @@ public:
 
 // True if the file of that name begins like a pyramid.
 bool IsPyramidFile(const std::string& name);
+
+// The layout of a pyramid file. Throws Failure, or what its reader throws.
+zmchost::PyramidFileInfo ReadLayout(const std::string& name);
 
 // Opens a pyramid file, any other raster, or whichever of both the name tells.
 zmchost::Raster OpenPyramid(const std::string& name);

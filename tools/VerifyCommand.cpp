@@ -106,7 +106,7 @@ ExitStatus VerifyCommand::Report() const {
 }
 
 ExitStatus VerifyCommand::Run() {
-    const zmchost::PyramidFileInfo info = zmchost::ReadPyramidFileInfo(file);
+    const zmchost::PyramidFileInfo info = ReadLayout(file);
     if (zelm::CheckedPixelType(info.header.pixelType) == 0)
         throw Failure(file, std::string("no pixels of type ") +
                                 zelm::PixelTypeName(info.header.pixelType) + " can be read");

@@ -36,6 +36,7 @@ private:
 
     void Add(std::unique_ptr<Command> command);
     ExitStatus RunChosen();
+    void CheckCommand(const std::string& word) const;
 };
 
 Program::Program() {
@@ -97,7 +98,13 @@ std::vector<std::string> Reversed(int count, char** words) {
     return arguments;
 }
 
+void Program::CheckCommand(const std::string& word) const {
+    if (!word.empty() && word[0] != '-' && !app.get_subcommand_no_throw(word))
+        throw UsageError(word, "there is no such command; see zmcraster --help");
+}
+
 ExitStatus Program::Run(std::vector<std::string> arguments) {
+    if (!arguments.empty()) CheckCommand(arguments.back());
     try {
         app.parse(std::move(arguments));
     } catch (const CLI::ParseError& error) {
