@@ -1,4 +1,4 @@
-# Installation: libraries, public headers, the CMake package `zmcraster` and zmcraster.pc.
+# Installation: libraries, the command line, public headers, the CMake package `zmcraster` and zmcraster.pc.
 #
 # The module is a library that hosts load by path, so it has a folder of its own below the library
 # directory; it finds zmcg one floor up, by its own place. Hosts link the rest.
@@ -25,6 +25,18 @@ install(TARGETS ${linked} EXPORT zmcrasterTargets
 install(TARGETS ${loaded} EXPORT zmcrasterTargets
     LIBRARY DESTINATION ${ZMC_INSTALL_MODULEDIR}
     RUNTIME DESTINATION ${ZMC_INSTALL_MODULEDIR})
+
+# The command line with its man page and completion.
+if(TARGET zmcraster_cli)
+    set_target_properties(zmcraster_cli PROPERTIES
+        INSTALL_RPATH "$ORIGIN/../${CMAKE_INSTALL_LIBDIR}")
+    install(TARGETS zmcraster_cli RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR})
+    set(documents "${CMAKE_BINARY_DIR}/tools")
+    install(FILES ${documents}/zmcraster.man
+        DESTINATION ${CMAKE_INSTALL_MANDIR}/man1 RENAME zmcraster.1)
+    install(FILES ${documents}/zmcraster.completion
+        DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions RENAME zmcraster)
+endif()
 
 # Headers: floors that are public as a whole, and the interfaces of the others.
 install(DIRECTORY platform core metadata colour dispatch coordsys zmcg host

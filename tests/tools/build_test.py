@@ -1,0 +1,187 @@
+"""Building: every type, every option, and what is kept beside the pixels."""
+import numpy as np
+from osgeo import gdal, osr
+
+from frame import COUNT, REAL, TYPES, ToolTest, geotiff, samples
+from pyramid import Pyramid
+
+
+def halve(pixels):
+    """Averages of 2 x 2 cells, integers rounded half away from zero, computed in Python's own
+    numbers."""
+    height, width, bands = pixels.shape
+    cut = pixels[:height // 2 * 2, :width // 2 * 2]
+    cells = [cut[y::2, x::2].astype(object) for y in (0, 1) for x in (0, 1)]
+    total = cells[0] + cells[1] + cells[2] + cells[3]
+    rounded = np.vectorize(lambda v: (v + 2) // 4 if v >= 0 else -((-v + 2) // 4), otypes=[object])
+    return rounded(total).astype(pixels.dtype)
+
+
+class Types(ToolTest):
+    def test_every_type_is_stored_unchanged(self):
+        for name in TYPES:
+            with self.subTest(name):
+                pixels = samples(name, 270, 301, 2)
+                geotiff(self.path("source.tif"), pixels, name)
+                document = self.document("build", "source.tif", "made.pyr", "--overwrite")
+                self.assertEqual(document["pixelType"], name)
+                made = Pyramid(self.path("made.pyr"))
+                self.assertEqual(made.type_name, name)
+                np.testing.assert_array_equal(made.read(0), pixels)
+
+    def test_averages_of_integers_are_exact_in_every_width(self):
+        for name in ("Byte", "Char", "UInt16", "Int16", "UInt32", "Int32", "UInt64", "Int64"):
+            with self.subTest(name):
+                pixels = samples(name, 301, 270, 1)
+                geotiff(self.path("source.tif"), pixels, name)
+                self.good("build", "source.tif", "made.pyr", "--overwrite")
+                np.testing.assert_array_equal(Pyramid(self.path("made.pyr")).read(1), halve(pixels))
+
+    def test_the_source_read_through_gdal_is_the_same(self):
+        for name in TYPES:
+            if name == "Char":  # shown as Int16 here
+                continue
+            with self.subTest(name):
+                geotiff(self.path("source.tif"), samples(name, 100, 80, 3), name)
+                self.good("build", "source.tif", "made.pyr", "--overwrite")
+                source = gdal.Open(self.path("source.tif")).ReadAsArray()
+                made = np.moveaxis(Pyramid(self.path("made.pyr")).read(0), -1, 0)
+                np.testing.assert_array_equal(made, source)
+
+
+class Options(ToolTest):
+    def test_the_report(self):
+        self.picture()
+        report = self.document("build", "picture.tif", "made.pyr")
+        self.assertShape(report, {
+            "schema": int, "source": str, "file": str, "width": int, "height": int, "bands": int,
+            "pixelType": str, "tileOrdering": str, "levelMax": int, "resampling": str,
+            "bytes": COUNT, "seconds": REAL})
+        self.assertEqual((report["width"], report["height"], report["bands"]), (700, 300, 3))
+        self.assertEqual(report["bytes"], len(Pyramid(self.path("made.pyr")).data))
+
+    def test_levels(self):
+        self.picture()
+        for asked, expected in (("auto", 2), ("0", 0), ("1", 1), ("8", 8)):
+            report = self.document("build", "picture.tif", "made.pyr", "--levels", asked,
+                                   "--overwrite")
+            self.assertEqual(report["levelMax"], expected)
+            self.assertEqual(Pyramid(self.path("made.pyr")).level_max, expected)
+
+    def test_nearest_keeps_the_upper_left_sample(self):
+        pixels = self.pyramid("made.pyr", "--resampling", "nearest")
+        np.testing.assert_array_equal(Pyramid(self.path("made.pyr")).read(1), pixels[::2, ::2])
+
+    def test_minimum_and_maximum(self):
+        pixels = self.picture()
+        for method, function in (("minimum", np.minimum), ("maximum", np.maximum)):
+            self.good("build", "picture.tif", "made.pyr", "--resampling", method, "--overwrite")
+            pairs = function(pixels[::2], pixels[1::2])
+            np.testing.assert_array_equal(Pyramid(self.path("made.pyr")).read(1),
+                                          function(pairs[:, ::2], pairs[:, 1::2]))
+
+    def test_orderings(self):
+        pixels = self.picture()
+        for word, stored in (("auto", "Blocked"), ("scanline", "Scanline"), ("blocked", "Blocked")):
+            self.good("build", "picture.tif", "made.pyr", "--ordering", word, "--overwrite")
+            made = Pyramid(self.path("made.pyr"))
+            self.assertIn(made.ordering, (stored, "Blocked") if word == "auto" else (stored,))
+            np.testing.assert_array_equal(made.read(0), pixels)
+
+    def test_more_than_eight_bands_are_woven(self):
+        pixels = samples("UInt16", 600, 530, 9)
+        geotiff(self.path("source.tif"), pixels, "UInt16")
+        self.good("build", "source.tif", "made.pyr")
+        made = Pyramid(self.path("made.pyr"))
+        self.assertEqual(made.ordering, "Morton")
+        np.testing.assert_array_equal(made.read(0), pixels)
+        np.testing.assert_array_equal(made.read(1), halve(pixels))
+
+    def test_bands_are_chosen_and_ordered(self):
+        pixels = self.pyramid("made.pyr", "--bands", "3,1")
+        np.testing.assert_array_equal(Pyramid(self.path("made.pyr")).read(0), pixels[:, :, [2, 0]])
+
+    def test_samples_without_data_take_no_part(self):
+        pixels = np.full((4, 4, 1), 10, np.uint8)
+        pixels[0, 0] = pixels[2:, 2:] = 0
+        pixels[0, 1] = 40
+        geotiff(self.path("source.tif"), pixels)
+        self.good("build", "source.tif", "made.pyr", "--nodata", "0", "--levels", "1")
+        np.testing.assert_array_equal(Pyramid(self.path("made.pyr")).read(1)[:, :, 0],
+                                      [[20, 10], [10, 0]])
+        self.assertEqual(gdal.Open(self.path("source.tif")).GetRasterBand(1).GetNoDataValue(), None)
+        statistics = self.document("info", "made.pyr")["statistics"][0]
+        self.assertEqual(statistics["minimum"], 10)
+
+    def test_no_no_data_value(self):
+        geotiff(self.path("source.tif"), np.zeros((4, 4, 1), np.uint8), nodata=0)
+        self.good("build", "source.tif", "made.pyr", "--nodata", "none")
+        self.assertEqual(self.document("info", "made.pyr")["statistics"][0]["maximum"], 0)
+        self.assertEqual(self.files(), ["made.pyr", "source.tif"])
+
+    def test_bins_and_statistics(self):
+        geotiff(self.path("source.tif"), samples("Int16", 50, 60, 1), "Int16")
+        self.good("build", "source.tif", "made.pyr", "--bins", "16")
+        histogram = self.document("info", "made.pyr")["histograms"][0]
+        self.assertEqual((histogram["binCount"], sum(histogram["counts"])), (16, 3000))
+        self.good("build", "source.tif", "made.pyr", "--no-statistics", "--overwrite")
+        self.assertIsNone(Pyramid(self.path("made.pyr")).document())
+
+    def test_threads_and_memory_do_not_change_the_file(self):
+        self.picture(height=1100, width=1500)
+        made = set()
+        for threads, memory in ((1, "256M"), (2, "16M"), (4, "1G"), (2, "12MiB")):
+            self.good("build", "picture.tif", "made.pyr", "--threads", threads, "--memory", memory,
+                      "--overwrite")
+            with open(self.path("made.pyr"), "rb") as file:
+                made.add(file.read())
+        self.assertEqual(len(made), 1)
+
+    def test_quiet_says_nothing(self):
+        self.picture()
+        self.assertEqual(self.good("build", "picture.tif", "made.pyr", "--quiet"), "")
+
+
+class Beside(ToolTest):
+    def test_palettes_are_kept_and_levels_made_by_mode(self):
+        colors = [(0, 0, 0, 255), (255, 0, 0, 255), (0, 128, 0, 200)]
+        pixels = samples("Byte", 64, 64, 1) % 3
+        geotiff(self.path("source.tif"), pixels, colors=colors)
+        report = self.document("build", "source.tif", "made.pyr", "--levels", "1")
+        self.assertEqual(report["resampling"], "mode")
+        palette = self.document("info", "made.pyr")["palettes"][0]
+        # The format of the source keeps no alpha.
+        self.assertEqual([color[:3] for color in palette["colors"][:3]],
+                         [list(color[:3]) for color in colors])
+
+    def test_georeference_descriptions_and_no_data_follow_the_bands(self):
+        geotiff(self.path("source.tif"), samples("Int16", 30, 40, 2), "Int16", nodata=-5)
+        dataset = gdal.Open(self.path("source.tif"), gdal.GA_Update)
+        reference = osr.SpatialReference()
+        reference.ImportFromEPSG(32631)
+        dataset.SetSpatialRef(reference)
+        dataset.SetGeoTransform([500000, 30, 0, 4000000, 0, -30])
+        dataset.GetRasterBand(1).SetDescription("red")
+        dataset.GetRasterBand(2).SetDescription("infrared")
+        dataset = None
+        self.good("build", "source.tif", "made.pyr", "--bands", "2,1")
+        self.good("export", "made.pyr", "back.tif")
+        back = gdal.Open(self.path("back.tif"))
+        self.assertEqual(back.GetGeoTransform(), (500000, 30, 0, 4000000, 0, -30))
+        self.assertEqual(back.GetSpatialRef().GetAuthorityCode(None), "32631")
+        self.assertEqual(back.GetRasterBand(1).GetNoDataValue(), -5)
+        self.assertEqual([back.GetRasterBand(n).GetDescription() for n in (1, 2)],
+                         ["infrared", "red"])
+
+    def test_the_sidecar_of_the_file_before_does_not_stay(self):
+        geotiff(self.path("with.tif"), samples("Byte", 20, 20, 1), nodata=7)
+        self.picture("without.tif", 20, 20, 1)
+        self.good("build", "with.tif", "made.pyr")
+        self.assertIn("made.pyr.aux.xml", self.files())
+        self.good("build", "without.tif", "made.pyr", "--overwrite")
+        self.assertNotIn("made.pyr.aux.xml", self.files())
+
+    def test_a_pyramid_is_a_source_too(self):
+        pixels = self.pyramid("first.pyr")
+        self.good("build", "first.pyr", "second.pyr")
+        np.testing.assert_array_equal(Pyramid(self.path("second.pyr")).read(0), pixels)

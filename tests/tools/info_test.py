@@ -1,0 +1,83 @@
+"""What info tells, against the file itself."""
+import numpy as np
+
+from frame import COUNT, REAL, ToolTest, geotiff, samples
+from pyramid import Pyramid
+
+OPTIONAL = (int, float, str, None)
+SHAPE = {
+    "schema": int, "file": str, "width": int, "height": int, "bands": int, "pixelType": str,
+    "interleave": str, "tileOrdering": str, "tileSize": int, "version": str, "levelMin": int,
+    "levelMax": int, "complete": bool, "bytesMissing": COUNT,
+    "levels": [{"level": int, "width": int, "height": int, "tilesAcross": int, "tilesDown": int,
+                "offset": (int, str, None), "bytes": COUNT}],
+    "statistics": [{"band": int, "minimum": OPTIONAL, "maximum": OPTIONAL, "mean": OPTIONAL,
+                    "standardDeviation": OPTIONAL, "sum": OPTIONAL, "sumOfSquares": OPTIONAL,
+                    "rootMeanSquare": OPTIONAL}],
+    "histograms": [{"band": int, "level": int, "binCount": int, "binSize": REAL, "minimum": REAL,
+                    "maximum": REAL, "counts": [COUNT]}],
+    "palettes": [{"band": int, "colors": [[int]]}],
+}
+
+
+class Info(ToolTest):
+    def test_the_document(self):
+        pixels = self.pyramid()
+        info = self.document("info", "picture.pyr")
+        self.assertShape(info, SHAPE)
+        file = Pyramid(self.path("picture.pyr"))
+        self.assertEqual((info["width"], info["height"], info["bands"]), (700, 300, 3))
+        self.assertEqual((info["pixelType"], info["version"], info["tileSize"]), ("Byte", "1.1", 256))
+        self.assertEqual((info["complete"], info["bytesMissing"]), (True, 0))
+        for level in info["levels"]:
+            number = level["level"]
+            self.assertEqual((level["width"], level["height"]), file.size(number))
+            self.assertEqual((level["tilesAcross"], level["tilesDown"]), file.tiles(number))
+            self.assertEqual(level["offset"], file.offset(number))
+            self.assertEqual(level["bytes"], file.level_bytes(number))
+        for band, record in enumerate(info["statistics"]):
+            plane = pixels[:, :, band].astype(np.float64)
+            self.assertEqual(record["band"], band + 1)
+            self.assertEqual((record["minimum"], record["maximum"]), (plane.min(), plane.max()))
+            self.assertEqual(record["sum"], plane.sum())
+            self.assertAlmostEqual(record["mean"], plane.mean(), 10)
+            self.assertAlmostEqual(record["standardDeviation"], plane.std(), 9)
+        for band, record in enumerate(info["histograms"]):
+            counts = np.bincount(pixels[:, :, band].ravel(), minlength=256)
+            self.assertEqual(record["counts"], counts.tolist())
+
+    def test_the_ordering_morton_has_no_offsets(self):
+        geotiff(self.path("source.tif"), samples("Byte", 40, 50, 9))
+        self.good("build", "source.tif", "made.pyr")
+        info = self.document("info", "made.pyr")
+        self.assertShape(info, SHAPE)
+        self.assertEqual({level["offset"] for level in info["levels"]}, {None})
+
+    def test_numbers_that_json_does_not_carry_are_strings(self):
+        pixels = np.full((4, 4, 1), np.uint64(2**60), np.uint64)
+        geotiff(self.path("source.tif"), pixels, "UInt64")
+        self.good("build", "source.tif", "made.pyr")
+        record = self.document("info", "made.pyr")["statistics"][0]
+        self.assertEqual((record["minimum"], record["maximum"]), (str(2**60), str(2**60)))
+
+    def test_complex_bands_have_no_statistics(self):
+        geotiff(self.path("source.tif"), samples("ComplexSingle", 20, 20, 1), "ComplexSingle")
+        self.good("build", "source.tif", "made.pyr")
+        self.assertEqual(self.document("info", "made.pyr")["statistics"], [])
+
+    def test_what_is_missing_of_an_incomplete_file(self):
+        self.pyramid()
+        file = Pyramid(self.path("picture.pyr"))
+        with open(self.path("picture.pyr"), "r+b") as handle:
+            handle.truncate(file.end - 1000)
+        info = self.document("info", "picture.pyr")
+        self.assertEqual((info["complete"], info["bytesMissing"]), (False, 1000))
+        self.assertIn("not complete: 1000 bytes are missing", self.good("info", "picture.pyr"))
+
+    def test_text_for_people(self):
+        self.pyramid()
+        text = self.good("info", "picture.pyr")
+        self.assertIn("700 x 300 pixels, 3 bands of Byte", text)
+        self.assertIn("histogram of band 3, level 0: 256 bins of 1 from 0 to 255", text)
+        self.assertNotIn("\x1b", text)
+        self.assertNotIn("█", text)

@@ -1,0 +1,46 @@
+// Command: one of the things that zmcraster does. Help, man page and completion are all made from
+// what Describe tells CLI11.
+#ifndef ZMC_TOOLS_COMMAND_H
+#define ZMC_TOOLS_COMMAND_H
+
+#include <CLI/CLI.hpp>
+#include <memory>
+#include <vector>
+
+#include "tools/JsonNumbers.h"
+#include "tools/Message.h"
+
+namespace zmctools {
+
+inline constexpr int kSchema = 1;
+
+class Command {
+public:
+    virtual ~Command() = default;
+
+    // Adds the command's options to its part of the command line. The footer holds its examples.
+    virtual void Describe(CLI::App& app) = 0;
+    // Does it. Throws Failure, UsageError, Interruption or what the libraries throw.
+    virtual ExitStatus Run() = 0;
+
+    virtual const char* Name() const = 0;
+    virtual const char* Summary() const = 0;
+
+    bool json = false;
+    bool quiet = false;
+
+protected:
+    // Writes a document to stdout. Throws Failure if it cannot be written.
+    static void PrintDocument(const Json& document);
+};
+
+std::unique_ptr<Command> MakeBuildCommand();
+std::unique_ptr<Command> MakeInfoCommand();
+std::unique_ptr<Command> MakeExportCommand();
+std::unique_ptr<Command> MakeHashCommand();
+std::unique_ptr<Command> MakeVerifyCommand();
+std::unique_ptr<Command> MakeCompareCommand();
+
+}  // namespace zmctools
+
+#endif

@@ -1,0 +1,174 @@
+#include <cpl_string.h>
+#include <gdal_utils.h>
+
+#include <cstdio>
+#include <filesystem>
+
+#include "tools/Arguments.h"
+#include "tools/Command.h"
+#include "tools/GdalWorld.h"
+#include "tools/Interrupt.h"
+#include "tools/RasterView.h"
+
+namespace zmctools {
+namespace {
+
+namespace fs = std::filesystem;
+
+class ExportCommand final : public Command {
+public:
+    const char* Name() const override { return "export"; }
+    const char* Summary() const override { return "Write a level or a part of it in any format"; }
+    void Describe(CLI::App& app) override;
+    ExitStatus Run() override;
+
+private:
+    std::string file;
+    std::string target;
+    std::string level = "0";
+    std::string window;
+    std::string bands;
+    std::string format;
+    std::vector<std::string> creationOptions;
+
+    DatasetPtr OpenLevel(std::uint32_t wanted) const;
+    std::vector<std::string> Arguments(GDALDataset& raster, zmchost::Window& part) const;
+    void Translate(GDALDataset& dataset, const std::vector<std::string>& arguments) const;
+};
+
+void ExportCommand::Describe(CLI::App& app) {
+    app.add_option("FILE", file, "Pyramid to read")->required();
+    app.add_option("TARGET", target, "Raster to write; a file of that name is replaced")
+        ->required();
+    app.add_option("--level", level, "Level, counted from 0, the finest (default 0)")
+        ->type_name("N");
+    app.add_option("--window", window, "Part of the level, in its pixels (default all)")
+        ->type_name("X,Y,W,H");
+    app.add_option("--bands", bands, "Bands in the order wanted, counted from 1 (default all)")
+        ->type_name("3,2,1");
+    app.add_option("--format", format,
+                   "GDAL's short name of the format (default: what the ending of TARGET tells)")
+        ->type_name("NAME");
+    app.add_option("--co", creationOptions, "Creation option of the format, also written -co")
+        ->type_name("K=V")
+        ->type_size(1)
+        ->allow_extra_args(false);
+    app.footer(
+        "Examples:\n"
+        "  zmcraster export scene.pyr overview.png --level 3\n"
+        "  zmcraster export scene.pyr part.tif --window 1000,2000,512,512 -co COMPRESS=DEFLATE\n"
+        "  zmcraster export scene.pyr band4.img --bands 4 --format HFA");
+}
+
+DatasetPtr ExportCommand::OpenLevel(std::uint32_t wanted) const {
+    const zmchost::PyramidFileInfo info = ReadLayout(file);
+    if (!info.complete)
+        throw Failure(file, "the pyramid is incomplete, " + std::to_string(info.bytesMissing) +
+                                " bytes of tiles are missing; build it anew");
+    const std::uint32_t base = info.header.minLevel;
+    if (!info.FindLevel(wanted))
+        throw UsageError("--level", "there is no level " + std::to_string(wanted) + ": " + file +
+                                        " has the levels " + std::to_string(base) + " to " +
+                                        std::to_string(info.header.maxLevel));
+    std::vector<std::string> options;
+    if (wanted > base) options.push_back("OVERVIEW_LEVEL=" + std::to_string(wanted - base - 1));
+    return OpenDataset(file, options);
+}
+
+std::vector<std::string> ExportCommand::Arguments(GDALDataset& raster,
+                                                  zmchost::Window& part) const {
+    part = ParseWindow(window, static_cast<std::uint32_t>(raster.GetRasterXSize()),
+                       static_cast<std::uint32_t>(raster.GetRasterYSize()));
+    std::vector<std::string> arguments;
+    if (!window.empty()) {
+        arguments.push_back("-srcwin");
+        for (const std::uint32_t number : {part.x, part.y, part.width, part.height})
+            arguments.push_back(std::to_string(number));
+    }
+    if (!bands.empty())
+        for (const std::uint32_t band :
+             ParseBands(bands, static_cast<std::uint32_t>(raster.GetRasterCount())))
+            arguments.insert(arguments.end(), {"-b", std::to_string(band + 1)});
+    if (!format.empty()) {
+        if (!GetGDALDriverManager()->GetDriverByName(format.c_str()))
+            throw UsageError("--format",
+                             "GDAL has no format " + format + "; gdalinfo --formats lists them");
+        arguments.insert(arguments.end(), {"-of", format});
+    }
+    for (const std::string& option : creationOptions) {
+        if (option.find('=') == option.npos)
+            throw UsageError("-co", "\"" + option + "\" is not NAME=VALUE");
+        arguments.insert(arguments.end(), {"-co", option});
+    }
+    return arguments;
+}
+
+// When a file was last written; the least time for one that there is not.
+fs::file_time_type StampOf(const std::string& name) {
+    std::error_code missing;
+    const auto stamp = fs::last_write_time(name, missing);
+    return missing ? fs::file_time_type::min() : stamp;
+}
+
+// What was written of a raster that did not come to its end.
+void RemoveFiles(const std::string& target) {
+    std::error_code ignored;
+    for (const char* const ending : {"", ".aux.xml", ".msk"})
+        if (fs::is_regular_file(target + ending, ignored)) fs::remove(target + ending, ignored);
+}
+
+void ExportCommand::Translate(GDALDataset& dataset,
+                              const std::vector<std::string>& arguments) const {
+    CPLStringList list;
+    for (const std::string& word : arguments) list.AddString(word.c_str());
+    const std::unique_ptr<GDALTranslateOptions, decltype(&GDALTranslateOptionsFree)> translate(
+        GDALTranslateOptionsNew(list.List(), nullptr), &GDALTranslateOptionsFree);
+    if (!translate) throw Failure(target, TakeGdalError(target));
+    const auto before = StampOf(target);
+    TerminalProgress bar(fs::path(target).filename().string(), !quiet);
+    GDALTranslateOptionsSetProgress(
+        translate.get(),
+        [](double share, const char*, void* data) -> int {
+            return static_cast<TerminalProgress*>(data)->ShowShare(share) ? TRUE : FALSE;
+        },
+        &bar);
+    DatasetPtr written(GDALDataset::FromHandle(
+        GDALTranslate(target.c_str(), GDALDataset::ToHandle(&dataset), translate.get(), nullptr)));
+    const bool made = written != nullptr;
+    if (made) written->FlushCache(true);
+    written.reset();
+    const std::string reason = TakeGdalError(target);
+    if (made && reason.empty() && !IsInterrupted()) return;
+    if (StampOf(target) != before) RemoveFiles(target);
+    CheckInterrupt(target);
+    throw Failure(target, reason.empty() ? "GDAL does not write it and gives no reason" : reason);
+}
+
+ExitStatus ExportCommand::Run() {
+    const auto wanted = static_cast<std::uint32_t>(ParseCount("--level", level, 63));
+    const DatasetPtr dataset = OpenLevel(wanted);
+    zmchost::Window part;
+    const std::vector<std::string> arguments = Arguments(*dataset, part);
+    std::error_code ignored;
+    if (fs::is_directory(target, ignored))
+        throw Failure(target, "it is a folder; name a file in it");
+    if (fs::exists(target, ignored) && fs::equivalent(file, target, ignored))
+        throw Failure(target, "it is the pyramid itself; name another file");
+    Translate(*dataset, arguments);
+    if (json)
+        PrintDocument({{"schema", kSchema},
+                       {"file", file},
+                       {"target", target},
+                       {"level", wanted},
+                       {"window", {part.x, part.y, part.width, part.height}}});
+    else if (!quiet)
+        std::printf("%s: level %u of %s, %u x %u pixels from %u,%u\n", target.c_str(), wanted,
+                    file.c_str(), part.width, part.height, part.x, part.y);
+    return ExitStatus::Done;
+}
+
+}  // namespace
+
+std::unique_ptr<Command> MakeExportCommand() { return std::make_unique<ExportCommand>(); }
+
+}  // namespace zmctools

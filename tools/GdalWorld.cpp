@@ -1,0 +1,70 @@
+#include "tools/GdalWorld.h"
+
+#include <cpl_conv.h>
+#include <cpl_error.h>
+#include <cpl_string.h>
+
+#include <mutex>
+
+#include "gdal/Driver.h"
+#include "host/Xerces.h"
+#include "tools/Message.h"
+
+namespace zmctools {
+namespace {
+
+// GDAL would take a twentieth of the machine for blocks of its own; a row of tiles is enough here.
+constexpr GIntBig kBlockCache = GIntBig{96} << 20;
+
+std::mutex mutex;
+std::string firstError;
+
+// GDAL works on threads of its own too, so there is one place for all of them.
+void CPL_STDCALL TakeError(CPLErr kind, CPLErrorNum, const char* text) {
+    if (kind == CE_Warning) return Warn(std::string("warning: ") + text);
+    if (kind < CE_Failure) return;
+    const std::lock_guard lock(mutex);
+    if (firstError.empty()) firstError = text;
+}
+
+std::string WithoutPrefix(const std::string& text, const std::string& prefix) {
+    return text.compare(0, prefix.size(), prefix) == 0 ? text.substr(prefix.size()) : text;
+}
+
+}  // namespace
+
+void StartGdal() {
+    zmchost::InitialiseXerces();
+    CPLSetErrorHandler(&TakeError);
+    GDALRegister_ZMCPyramid();
+    GDALAllRegister();
+    if (!CPLGetConfigOption("GDAL_CACHEMAX", nullptr)) GDALSetCacheMax64(kBlockCache);
+    if (GDALDriver* const memory = GetGDALDriverManager()->GetDriverByName("MEM")) {
+        memory->pfnOpen = nullptr;
+        memory->pfnIdentify = nullptr;
+    }
+}
+
+std::string TakeGdalError(const std::string& file) {
+    const std::lock_guard lock(mutex);
+    std::string text = WithoutPrefix(firstError, file + ": ");
+    firstError.clear();
+    return text;
+}
+
+DatasetPtr OpenDataset(const std::string& name, const std::vector<std::string>& options) {
+    CPLStringList list;
+    for (const std::string& option : options) list.AddString(option.c_str());
+    TakeGdalError(name);
+    DatasetPtr dataset(GDALDataset::Open(name.c_str(), GDAL_OF_RASTER | GDAL_OF_VERBOSE_ERROR,
+                                         nullptr, list.List(), nullptr));
+    std::string reason = TakeGdalError(name);
+    if (dataset) return dataset;
+    if (reason.find("not recognized as") != reason.npos)
+        reason = "it is in no raster format that GDAL knows";
+    if (reason == "No such file or directory") reason = "there is no such file";
+    if (reason.empty()) reason = "GDAL does not open it and gives no reason";
+    throw Failure(name, reason);
+}
+
+}  // namespace zmctools

@@ -1,0 +1,32 @@
+// GDAL in this program: started in the right order, its errors as exceptions.
+#ifndef ZMC_TOOLS_GDALWORLD_H
+#define ZMC_TOOLS_GDALWORLD_H
+
+#include <gdal_priv.h>
+
+#include <memory>
+#include <string>
+#include <vector>
+
+namespace zmctools {
+
+struct CloseDataset {
+    void operator()(GDALDataset* dataset) const { GDALClose(dataset); }
+};
+using DatasetPtr = std::unique_ptr<GDALDataset, CloseDataset>;
+
+// Initialises Xerces-C++, then registers our driver, then GDAL's. Rasters in memory, which GDAL
+// opens by an address in their name, can then be made but no longer be opened by name: a name comes
+// from the command line or out of a file.
+void StartGdal();
+
+// Opens a raster for reading. Throws Failure with GDAL's reason.
+DatasetPtr OpenDataset(const std::string& name, const std::vector<std::string>& options = {});
+
+// What GDAL reported as a failure since the last call, without the name of `file` at its front;
+// empty if nothing. Warnings are said at once.
+std::string TakeGdalError(const std::string& file);
+
+}  // namespace zmctools
+
+#endif

@@ -1,0 +1,91 @@
+#include <bit>
+#include <cstdio>
+
+#include "core/PixelVocabulary.h"
+#include "tools/Arguments.h"
+#include "tools/Command.h"
+#include "tools/RasterView.h"
+#include "tools/Sha256.h"
+
+namespace zmctools {
+namespace {
+
+static_assert(std::endian::native == std::endian::little, "samples are hashed as they lie here");
+
+class HashCommand final : public Command {
+public:
+    const char* Name() const override { return "hash"; }
+    const char* Summary() const override { return "Compute the SHA-256 of a raster's samples"; }
+    void Describe(CLI::App& app) override;
+    ExitStatus Run() override;
+
+private:
+    std::string file;
+    std::string level = "0";
+    std::string window;
+    std::string bands;
+};
+
+void HashCommand::Describe(CLI::App& app) {
+    app.add_option("FILE", file, "Pyramid, or any other raster that GDAL reads")->required();
+    app.add_option("--level", level, "Level, counted from 0, the finest (default 0)")
+        ->type_name("N");
+    app.add_option("--window", window, "Part of the level, in its pixels (default all)")
+        ->type_name("X,Y,W,H");
+    app.add_option("--bands", bands, "Bands in the order wanted, counted from 1 (default all)")
+        ->type_name("3,2,1");
+    app.footer(
+        "Examples:\n"
+        "  zmcraster hash scene.pyr\n"
+        "  zmcraster hash scene.pyr --level 2 --window 0,0,256,256 --bands 1\n"
+        "\n"
+        "What is hashed: the samples as little-endian bytes, pixel-interleaved, rows from the "
+        "top.\n"
+        "A raster of another format with the same samples of the same type has the same hash.");
+}
+
+ExitStatus HashCommand::Run() {
+    const auto view = OpenView(file);
+    Selection selection;
+    selection.level = static_cast<std::uint32_t>(ParseCount("--level", level, 63));
+    view->CheckLevel(selection.level);
+    selection.window =
+        ParseWindow(window, view->Width(selection.level), view->Height(selection.level));
+    selection.bands = ParseBands(bands, view->Bands());
+
+    Sha256 sha;
+    std::uint64_t bytes = 0;
+    std::vector<unsigned char> samples;
+    {
+        TerminalProgress bar("hash", !quiet);
+        WalkStrips(*view, selection, bar, [&](const zmchost::Window& strip) {
+            samples.resize(StripBytes(*view, selection, strip));
+            view->Read(selection.level, strip, selection.bands, samples.data());
+            sha.Add(samples.data(), samples.size());
+            bytes += samples.size();
+        });
+    }
+    const std::string digest = sha.Finish();
+    if (json) {
+        Json numbers = Json::array();
+        for (const std::uint32_t band : selection.bands) numbers.push_back(band + 1);
+        const zmchost::Window& part = selection.window;
+        PrintDocument({{"schema", kSchema},
+                       {"file", file},
+                       {"level", selection.level},
+                       {"window", {part.x, part.y, part.width, part.height}},
+                       {"bands", numbers},
+                       {"pixelType", zelm::PixelTypeName(view->PixelType())},
+                       {"bytes", JsonNumber(bytes)},
+                       {"sha256", digest}});
+    } else {
+        std::printf("%s  %s\n", digest.c_str(), file.c_str());
+    }
+    return ExitStatus::Done;
+}
+
+}  // namespace
+
+std::unique_ptr<Command> MakeHashCommand() { return std::make_unique<HashCommand>(); }
+
+}  // namespace zmctools

@@ -1,0 +1,234 @@
+#include <unistd.h>
+
+#include <cstdio>
+
+#include "core/PixelVocabulary.h"
+#include "host/PyramidFileInfo.h"
+#include "tools/Command.h"
+#include "tools/HistogramBars.h"
+#include "tools/RasterView.h"
+
+namespace zmctools {
+namespace {
+
+class InfoCommand final : public Command {
+public:
+    const char* Name() const override { return "info"; }
+    const char* Summary() const override { return "Show what is in a pyramid file"; }
+    void Describe(CLI::App& app) override;
+    ExitStatus Run() override;
+
+private:
+    std::string file;
+};
+
+void InfoCommand::Describe(CLI::App& app) {
+    app.add_option("FILE", file, "Pyramid to look at")->required();
+    app.footer(
+        "Examples:\n"
+        "  zmcraster info scene.pyr\n"
+        "  zmcraster info scene.pyr --json\n"
+        "\n"
+        "Offsets are bytes from the start of the file. In the Morton ordering the levels are "
+        "woven\n"
+        "into each other, and have no offset. Histograms are drawn on a terminal.");
+}
+
+Json LevelsOf(const zmchost::PyramidFileInfo& info) {
+    Json levels = Json::array();
+    const bool woven = info.header.tileOrdering == zelm::TileOrder::Morton;
+    for (const zmchost::PyramidLevelInfo& level : info.levels)
+        levels.push_back({{"level", level.level},
+                          {"width", level.width},
+                          {"height", level.height},
+                          {"tilesAcross", level.tilesAcross},
+                          {"tilesDown", level.tilesDown},
+                          {"offset", woven ? Json() : JsonNumber(level.offset)},
+                          {"bytes", JsonNumber(level.bytes)}});
+    return levels;
+}
+
+template <class T>
+Json StatisticsOf(const zmchost::Raster& raster) {
+    Json list = Json::array();
+    for (std::uint32_t band = 0; band < raster.Bands(); ++band) {
+        if (!raster.HasStatistics(band)) continue;
+        const auto record = raster.Statistics<T>(band);
+        const auto value = [&](std::uint32_t flag, const auto& field) {
+            return (record.flags & flag) != 0 ? JsonNumber(field) : Json();
+        };
+        namespace Flag = zelm::StatsFlag;
+        list.push_back(
+            {{"band", band + 1},
+             {"minimum", value(Flag::Minimum, record.minimum)},
+             {"maximum", value(Flag::Maximum, record.maximum)},
+             {"mean", value(Flag::Mean, record.mean)},
+             {"standardDeviation", value(Flag::StandardDeviation, record.standardDeviation)},
+             {"sum", value(Flag::Sum, record.sum)},
+             {"sumOfSquares", value(Flag::SumOfSquares, record.sumOfSquares)},
+             {"rootMeanSquare", value(Flag::RootMeanSquare, record.rootMeanSquare)}});
+    }
+    return list;
+}
+
+template <class T>
+Json HistogramsOf(const zmchost::Raster& raster) {
+    Json list = Json::array();
+    for (const auto& record : raster.Histograms<T>()) {
+        Json counts = Json::array();
+        for (std::uint32_t i = 0; record.counts.data && i < record.counts.shape.elements; ++i)
+            counts.push_back(JsonNumber(record.counts.data[i]));
+        list.push_back({{"band", record.band + 1},
+                        {"level", record.level},
+                        {"binCount", record.binCount},
+                        {"binSize", JsonNumber(record.binSize)},
+                        {"minimum", JsonNumber(record.minimum)},
+                        {"maximum", JsonNumber(record.maximum)},
+                        {"counts", counts}});
+    }
+    return list;
+}
+
+Json PalettesOf(const zmchost::Raster& raster) {
+    Json list = Json::array();
+    for (std::uint32_t band = 0; band < raster.Bands(); ++band) {
+        const zelm::PalettePtr palette = raster.BandPalette(band);
+        if (!palette) continue;
+        Json colors = Json::array();
+        for (std::uint32_t i = 0; i < palette->nextIndex; ++i) {
+            const auto found = palette->colors.find(i);
+            const zelm::Color* const color =
+                found == palette->colors.end() ? nullptr : found->second.operator->();
+            colors.push_back(color ? Json{color->red, color->green, color->blue, color->alpha}
+                                   : Json{0, 0, 0, 0});
+        }
+        list.push_back({{"band", band + 1}, {"colors", colors}});
+    }
+    return list;
+}
+
+Json Describe(const std::string& file) {
+    const zmchost::PyramidFileInfo info = ReadLayout(file);
+    const zmchost::PyramidHeader& header = info.header;
+    Json document = {{"schema", kSchema},
+                     {"file", file},
+                     {"width", header.width},
+                     {"height", header.height},
+                     {"bands", header.bands},
+                     {"pixelType", zelm::PixelTypeName(header.pixelType)},
+                     {"interleave", zelm::InterleaveName(header.interleave)},
+                     {"tileOrdering", zelm::TileOrderName(header.tileOrdering)},
+                     {"tileSize", header.tileSize},
+                     {"version", std::to_string(header.versionMajor) + '.' +
+                                     std::to_string(header.versionMinor)},
+                     {"levelMin", header.minLevel},
+                     {"levelMax", header.maxLevel},
+                     {"complete", info.complete},
+                     {"bytesMissing", JsonNumber(info.bytesMissing)},
+                     {"levels", LevelsOf(info)},
+                     {"statistics", Json::array()},
+                     {"histograms", Json::array()},
+                     {"palettes", Json::array()}};
+    // Of a type without a reader the header is all that can be told.
+    if (zelm::CheckedPixelType(header.pixelType) == 0 || !info.HasMetadataDocument())
+        return document;
+    const zmchost::Raster raster = OpenPyramid(file);
+    zelm::VisitElementType(raster.PixelType(), [&]<class T>(std::type_identity<T>) {
+        document["statistics"] = StatisticsOf<T>(raster);
+        document["histograms"] = HistogramsOf<T>(raster);
+    });
+    document["palettes"] = PalettesOf(raster);
+    return document;
+}
+
+// A number as people read it: strings of a document without their quotes.
+std::string Text(const Json& value) {
+    if (value.is_null()) return "-";
+    if (value.is_string()) return value.get<std::string>();
+    if (!value.is_number_float()) return value.dump();
+    char text[40];
+    std::snprintf(text, sizeof text, "%.10g", value.get<double>());
+    return text;
+}
+
+void PrintLevels(const Json& document) {
+    std::printf("%-6s %12s %12s %15s %15s\n", "level", "pixels", "tiles", "offset", "bytes");
+    for (const Json& level : document["levels"]) {
+        const std::string pixels = Text(level["width"]) + " x " + Text(level["height"]);
+        const std::string tiles = Text(level["tilesAcross"]) + " x " + Text(level["tilesDown"]);
+        std::printf("%-6s %12s %12s %15s %15s\n", Text(level["level"]).c_str(), pixels.c_str(),
+                    tiles.c_str(), Text(level["offset"]).c_str(), Text(level["bytes"]).c_str());
+    }
+}
+
+void PrintStatistics(const Json& document) {
+    if (document["statistics"].empty()) return;
+    std::printf("%-6s %15s %15s %15s %15s\n", "band", "minimum", "maximum", "mean", "deviation");
+    for (const Json& band : document["statistics"])
+        std::printf("%-6s %15s %15s %15s %15s\n", Text(band["band"]).c_str(),
+                    Text(band["minimum"]).c_str(), Text(band["maximum"]).c_str(),
+                    Text(band["mean"]).c_str(), Text(band["standardDeviation"]).c_str());
+}
+
+void PrintHistograms(const Json& document) {
+    for (const Json& histogram : document["histograms"]) {
+        std::printf("histogram of band %s, level %s: %s bins of %s from %s to %s\n",
+                    Text(histogram["band"]).c_str(), Text(histogram["level"]).c_str(),
+                    Text(histogram["binCount"]).c_str(), Text(histogram["binSize"]).c_str(),
+                    Text(histogram["minimum"]).c_str(), Text(histogram["maximum"]).c_str());
+        if (isatty(STDOUT_FILENO) != 1) continue;
+        std::vector<double> counts;
+        for (const Json& count : histogram["counts"])
+            counts.push_back(count.is_string() ? std::stod(count.get<std::string>())
+                                               : count.get<double>());
+        for (const std::string& row : DrawBars(counts)) std::printf("  %s\n", row.c_str());
+    }
+}
+
+void PrintPalettes(const Json& document) {
+    for (const Json& palette : document["palettes"]) {
+        std::printf("palette of band %s: %zu colors\n", Text(palette["band"]).c_str(),
+                    palette["colors"].size());
+        if (isatty(STDOUT_FILENO) != 1) continue;
+        std::printf("  ");
+        for (std::size_t i = 0; i < palette["colors"].size() && i < 64; ++i) {
+            const Json& color = palette["colors"][i];
+            std::printf("\x1b[48;2;%d;%d;%dm ", color[0].get<int>(), color[1].get<int>(),
+                        color[2].get<int>());
+        }
+        std::printf("\x1b[0m\n");
+    }
+}
+
+void Print(const Json& document) {
+    std::printf("%s\n", Text(document["file"]).c_str());
+    std::printf("%s x %s pixels, %s bands of %s\n", Text(document["width"]).c_str(),
+                Text(document["height"]).c_str(), Text(document["bands"]).c_str(),
+                Text(document["pixelType"]).c_str());
+    std::printf("interleave %s, ordering %s, tiles of %s, version %s\n",
+                Text(document["interleave"]).c_str(), Text(document["tileOrdering"]).c_str(),
+                Text(document["tileSize"]).c_str(), Text(document["version"]).c_str());
+    if (document["complete"].get<bool>())
+        std::printf("complete\n");
+    else
+        std::printf("not complete: %s bytes are missing\n", Text(document["bytesMissing"]).c_str());
+    PrintLevels(document);
+    PrintStatistics(document);
+    PrintHistograms(document);
+    PrintPalettes(document);
+}
+
+ExitStatus InfoCommand::Run() {
+    const Json document = zmctools::Describe(file);
+    if (json)
+        PrintDocument(document);
+    else
+        Print(document);
+    return ExitStatus::Done;
+}
+
+}  // namespace
+
+std::unique_ptr<Command> MakeInfoCommand() { return std::make_unique<InfoCommand>(); }
+
+}  // namespace zmctools

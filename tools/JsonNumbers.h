@@ -1,0 +1,39 @@
+// Numbers in JSON documents, exact: what a reader that knows doubles only would change stands as a
+// string: integers beyond 2^53, "NaN", "Infinity" and "-Infinity". Complex numbers are a pair.
+#ifndef ZMC_TOOLS_JSONNUMBERS_H
+#define ZMC_TOOLS_JSONNUMBERS_H
+
+#include <cmath>
+#include <nlohmann/json.hpp>
+#include <string>
+#include <type_traits>
+
+#include "core/ElementTypes.h"
+
+namespace zmctools {
+
+using Json = nlohmann::ordered_json;
+
+template <class T>
+Json JsonNumber(const T& value) {
+    if constexpr (zelm::kIsComplex<T>) {
+        return Json::array({JsonNumber(value.re), JsonNumber(value.im)});
+    } else if constexpr (std::is_floating_point_v<T>) {
+        if (std::isnan(value)) return "NaN";
+        if (std::isinf(value)) return value > 0 ? "Infinity" : "-Infinity";
+        return static_cast<double>(value);
+    } else if constexpr (std::is_signed_v<T>) {
+        const long long wide = value;
+        constexpr long long kExact = 1LL << 53;
+        if (wide > kExact || wide < -kExact) return std::to_string(wide);
+        return wide;
+    } else {
+        const unsigned long long wide = value;
+        if (wide > 1ULL << 53) return std::to_string(wide);
+        return wide;
+    }
+}
+
+}  // namespace zmctools
+
+#endif

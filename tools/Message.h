@@ -1,0 +1,45 @@
+// What the command tells people apart from its results, and how it ends.
+//
+// Every message is one line on stderr: "zmcraster: FILE: what is wrong". A command that cannot go
+// on throws; main turns what was thrown into a message and an exit status.
+#ifndef ZMC_TOOLS_MESSAGE_H
+#define ZMC_TOOLS_MESSAGE_H
+
+#include <stdexcept>
+#include <string>
+
+namespace zmctools {
+
+enum class ExitStatus { Done = 0, Failed = 1, Usage = 2, Differences = 3, Interrupted = 130 };
+
+// The operation failed; the text is what follows the file's name.
+class Failure : public std::runtime_error {
+public:
+    Failure(const std::string& file, const std::string& what)
+        : std::runtime_error(file + ": " + what) {}
+};
+
+// The command line asks for something that does not exist.
+class UsageError : public std::runtime_error {
+public:
+    // `option` is the option or argument as it was written.
+    UsageError(const std::string& option, const std::string& what)
+        : std::runtime_error(option + ": " + what) {}
+};
+
+// Somebody asked for an end while the command worked on `file`.
+class Interruption : public std::runtime_error {
+public:
+    explicit Interruption(const std::string& file) : std::runtime_error(file + ": interrupted") {}
+};
+
+// Writes a message, on one line whatever `text` holds.
+void Say(const std::string& text);
+
+// The same for what does not keep a command from going on; silent after SetQuiet(true).
+void Warn(const std::string& text);
+void SetQuiet(bool quiet);
+
+}  // namespace zmctools
+
+#endif

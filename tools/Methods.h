@@ -1,0 +1,21 @@
+// The methods of reduction as the command line names them.
+#ifndef ZMC_TOOLS_METHODS_H
+#define ZMC_TOOLS_METHODS_H
+
+#include <string>
+#include <vector>
+
+#include "host/Reduction.h"
+
+namespace zmctools {
+
+inline std::vector<std::string> MethodNames() {
+    std::vector<std::string> names;
+    for (int method = 0; method <= static_cast<int>(zmchost::Resampling::Lanczos); ++method)
+        names.emplace_back(zmchost::ResamplingName(static_cast<zmchost::Resampling>(method)));
+    return names;
+}
+
+}  // namespace zmctools
+
+#endif

@@ -1,0 +1,68 @@
+// RasterView: the samples of a pyramid, or of any raster that GDAL opens, in one shape.
+//
+// Samples are pixel-interleaved, lines from the top, in the raster's own type; bands and levels
+// count from 0. A pyramid is read through the module, so that its types come unchanged; other
+// rasters have level 0 only.
+#ifndef ZMC_TOOLS_RASTERVIEW_H
+#define ZMC_TOOLS_RASTERVIEW_H
+
+#include <cstddef>
+#include <cstdint>
+#include <functional>
+#include <memory>
+#include <span>
+#include <string>
+#include <vector>
+
+#include "host/PyramidFileInfo.h"
+#include "host/Raster.h"
+#include "tools/TerminalProgress.h"
+
+namespace zmctools {
+
+class RasterView {
+public:
+    virtual ~RasterView() = default;
+    virtual std::string Name() const = 0;
+    virtual std::uint32_t PixelType() const = 0;
+    virtual std::uint32_t Bands() const = 0;
+    virtual std::uint32_t MinLevel() const = 0;
+    virtual std::uint32_t MaxLevel() const = 0;
+    virtual std::uint32_t Width(std::uint32_t level) const = 0;
+    virtual std::uint32_t Height(std::uint32_t level) const = 0;
+    virtual void Read(std::uint32_t level, const zmchost::Window& window,
+                      std::span<const std::uint32_t> bands, void* pixels) = 0;
+
+    // Throws UsageError for a level that there is not.
+    void CheckLevel(std::uint32_t level) const;
+};
+
+// True if the file of that name begins like a pyramid.
+bool IsPyramidFile(const std::string& name);
+
+// The layout of a pyramid file. Throws Failure, or what its reader throws.
+zmchost::PyramidFileInfo ReadLayout(const std::string& name);
+
+// Opens a pyramid file, any other raster, or whichever of both the name tells.
+zmchost::Raster OpenPyramid(const std::string& name);
+std::unique_ptr<RasterView> OpenView(const std::string& name);
+
+// The part of a raster that a command works on.
+struct Selection {
+    std::uint32_t level = 0;
+    zmchost::Window window;
+    std::vector<std::uint32_t> bands;
+};
+
+// Calls take(strip) for strips of the window from the top to the bottom. A strip is whole rows of
+// tiles as long as these fit some 32 MiB for each view, and single lines at the least. Throws
+// Interruption.
+void WalkStrips(const RasterView& view, const Selection& selection, TerminalProgress& progress,
+                const std::function<void(const zmchost::Window& strip)>& take);
+
+std::size_t StripBytes(const RasterView& view, const Selection& selection,
+                       const zmchost::Window& strip);
+
+}  // namespace zmctools
+
+#endif

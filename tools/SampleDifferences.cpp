@@ -1,0 +1,84 @@
+#include "tools/SampleDifferences.h"
+
+#include <cmath>
+#include <cstring>
+#include <limits>
+#include <numeric>
+
+#include "core/ElementTypes.h"
+#include "core/PixelVocabulary.h"
+
+namespace zmctools {
+namespace {
+
+long double Part(long double a, long double b) {
+    if (std::isnan(a) && std::isnan(b)) return 0;
+    if (std::isnan(a) || std::isnan(b)) return std::numeric_limits<long double>::infinity();
+    return a == b ? 0 : std::fabs(a - b);
+}
+
+}  // namespace
+
+SampleDifferences::SampleDifferences(std::uint32_t firstType, std::uint32_t secondType,
+                                     std::uint32_t bandCount, double allowed)
+    : types{firstType, secondType},
+      sizes{zelm::PixelSize(firstType), zelm::PixelSize(secondType)},
+      tolerance(allowed),
+      bands(bandCount) {}
+
+std::uint64_t SampleDifferences::Samples() const {
+    return std::accumulate(
+        bands.begin(), bands.end(), std::uint64_t{0},
+        [](std::uint64_t sum, const BandDifference& band) { return sum + band.samples; });
+}
+
+void SampleDifferences::Take(const zmchost::Window& window, const void* first, const void* second) {
+    const std::size_t samples = std::size_t{window.width} * bands.size();
+    for (std::uint32_t line = 0; line < window.height; ++line)
+        TakeLine(window.x, window.y + line, samples,
+                 static_cast<const unsigned char*>(first) + line * samples * sizes[0],
+                 static_cast<const unsigned char*>(second) + line * samples * sizes[1]);
+}
+
+// Equal bytes of one type are equal numbers, and as a rule all lines are equal.
+void SampleDifferences::TakeLine(std::uint32_t x, std::uint32_t y, std::size_t samples,
+                                 const unsigned char* first, const unsigned char* second) {
+    if (types[0] == types[1] && std::memcmp(first, second, samples * sizes[0]) == 0) return;
+    values[0].resize(samples);
+    values[1].resize(samples);
+    Widen(types[0], first, values[0]);
+    Widen(types[1], second, values[1]);
+    for (std::size_t i = 0; i < samples; ++i) {
+        const long double distance = Distance(values[0][i], values[1][i]);
+        if (distance == 0) continue;
+        BandDifference& band = bands[i % bands.size()];
+        band.greatest = std::max(band.greatest, distance);
+        if (distance <= static_cast<long double>(tolerance)) continue;
+        if (band.samples++ == 0) {
+            band.x = x + static_cast<std::uint32_t>(i / bands.size());
+            band.y = y;
+        }
+    }
+}
+
+void SampleDifferences::Widen(std::uint32_t type, const unsigned char* samples,
+                              std::vector<Value>& out) {
+    zelm::VisitElementType(type, [&]<class T>(std::type_identity<T>) {
+        for (std::size_t i = 0; i < out.size(); ++i) {
+            T sample;
+            std::memcpy(&sample, samples + i * sizeof(T), sizeof(T));
+            if constexpr (zelm::kIsComplex<T>)
+                out[i] = {static_cast<long double>(sample.re), static_cast<long double>(sample.im)};
+            else
+                out[i] = {static_cast<long double>(sample), 0};
+        }
+    });
+}
+
+long double SampleDifferences::Distance(const Value& a, const Value& b) {
+    const long double re = Part(a.re, b.re);
+    const long double im = Part(a.im, b.im);
+    return im == 0 ? re : std::hypot(re, im);
+}
+
+}  // namespace zmctools

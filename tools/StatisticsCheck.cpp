@@ -1,0 +1,173 @@
+#include <algorithm>
+#include <cmath>
+#include <limits>
+
+#include "host/BandStatistics.h"
+#include "host/Histogram.h"
+#include "tools/Interrupt.h"
+#include "tools/Message.h"
+#include "tools/Verification.h"
+
+namespace zmctools {
+namespace {
+
+// Reals stand in files with 15 significant digits, samples of type Single with 6.
+constexpr double kRealError = 1e-14;
+constexpr double kSingleError = 1e-5;
+
+std::string Digits(double value) {
+    char text[40];
+    std::snprintf(text, sizeof text, "%.15g", value);
+    return text;
+}
+
+bool Near(double stored, double computed, double error) {
+    if (stored == computed || (std::isnan(stored) && std::isnan(computed))) return true;
+    return std::fabs(stored - computed) <=
+           error * std::max(std::fabs(stored), std::fabs(computed)) +
+               std::numeric_limits<double>::denorm_min();
+}
+
+// Calls take(row, mask, width) for every line of level 0.
+template <class T, class Take>
+void WalkLines(zmchost::Raster& raster, const char* label, bool quiet, Take&& take) {
+    const std::uint64_t lineBytes =
+        std::uint64_t{raster.Width()} * raster.Bands() * (sizeof(T) + 1);
+    std::uint64_t lines = std::max<std::uint64_t>((std::uint64_t{48} << 20) / lineBytes, 1);
+    if (lines >= raster.TileSide()) lines -= lines % raster.TileSide();
+    TerminalProgress bar(label, !quiet);
+    std::vector<T> pixels;
+    std::vector<unsigned char> mask;
+    const std::size_t stride = std::size_t{raster.Width()} * raster.Bands();
+    for (std::uint32_t line = 0; line < raster.Height();) {
+        const auto height =
+            static_cast<std::uint32_t>(std::min<std::uint64_t>(lines, raster.Height() - line));
+        pixels.resize(stride * height);
+        mask.assign(stride * height, 0);
+        raster.Read(0, {0, line, raster.Width(), height}, raster.AllBands(), pixels.data(),
+                    mask.data());
+        for (std::uint32_t row = 0; row < height; ++row)
+            take(pixels.data() + row * stride, mask.data() + row * stride);
+        line += height;
+        if (!bar.Show(std::uint64_t{line} * raster.Width(),
+                      std::uint64_t{raster.Height()} * raster.Width()))
+            throw Interruption(raster.Name());
+    }
+}
+
+template <class T>
+class StatisticsChecker {
+public:
+    StatisticsChecker(zmchost::Raster& pyramid, bool beQuiet, CheckResult& into)
+        : raster(pyramid), quiet(beQuiet), result(into) {}
+
+    void Run() {
+        const auto histograms = raster.Histograms<T>();
+        bool any = !histograms.empty();
+        for (std::uint32_t band = 0; band < raster.Bands(); ++band)
+            any = any || raster.HasStatistics(band);
+        if (!any) {
+            result.skipped = "the file has no statistics";
+            return;
+        }
+        CheckRecords();
+        if constexpr (!zelm::kIsComplex<T>) CheckHistograms(histograms);
+    }
+
+private:
+    zmchost::Raster& raster;
+    bool quiet;
+    CheckResult& result;
+
+    void CheckRecords() {
+        std::vector<zmchost::BandAccumulator<T>> sums(raster.Bands());
+        WalkLines<T>(raster, "statistics", quiet, [&](const T* row, const unsigned char* mask) {
+            for (std::uint32_t band = 0; band < raster.Bands(); ++band)
+                sums[band].AddRow(row, mask, band, raster.Bands(), raster.Width());
+        });
+        for (std::uint32_t band = 0; band < raster.Bands(); ++band)
+            if (raster.HasStatistics(band))
+                Compare(raster.Statistics<T>(band), sums[band].Stats(band));
+    }
+
+    void Compare(const zelm::RasterBandStats<T>& stored, const zelm::RasterBandStats<T>& computed) {
+        namespace Flag = zelm::StatsFlag;
+        const auto expect = [&](std::uint32_t flag, const char* what, double a, double b,
+                                double error) {
+            if ((stored.flags & flag) == 0) return;
+            if ((computed.flags & flag) != 0 && Near(a, b, error)) return;
+            const bool has = (computed.flags & flag) != 0;
+            result.problems.push_back("band " + std::to_string(stored.band + 1) + ": " + what +
+                                      " is " + Digits(a) + " in the file, and " +
+                                      (has ? Digits(b) : std::string("none")) + " in the pixels");
+        };
+        if constexpr (!zelm::kIsComplex<T>) {
+            const double error = std::is_same_v<T, float> ? kSingleError : kRealError;
+            expect(Flag::Minimum, "minimum", static_cast<double>(stored.minimum),
+                   static_cast<double>(computed.minimum), error);
+            expect(Flag::Maximum, "maximum", static_cast<double>(stored.maximum),
+                   static_cast<double>(computed.maximum), error);
+        }
+        expect(Flag::Mean, "mean", stored.mean, computed.mean, kRealError);
+        expect(Flag::StandardDeviation, "standard deviation", stored.standardDeviation,
+               computed.standardDeviation, kRealError);
+        expect(Flag::Sum, "sum", stored.sum, computed.sum, kRealError);
+        expect(Flag::SumOfSquares, "sum of squares", stored.sumOfSquares, computed.sumOfSquares,
+               kRealError);
+        expect(Flag::RootMeanSquare, "root mean square", stored.rootMeanSquare,
+               computed.rootMeanSquare, kRealError);
+    }
+
+    // Ends of the range that lost digits on storing move samples from bin to bin, so only types
+    // whose values a file keeps exactly are counted anew.
+    static constexpr bool kExactEnds = std::is_integral_v<T> && sizeof(T) <= 4;
+
+    void CheckHistograms(const std::vector<zelm::RasterBandHistogram<T>>& stored) {
+        if constexpr (kExactEnds) {
+            std::vector<const zelm::RasterBandHistogram<T>*> records;
+            std::vector<zmchost::HistogramAccumulator<T>> counters;
+            for (const auto& record : stored) {
+                const zmchost::HistogramBins<T> bins(record.minimum, record.maximum,
+                                                     record.binCount);
+                const bool usual = record.level == 0 && record.band < raster.Bands() &&
+                                   record.minimum <= record.maximum && record.binCount > 0 &&
+                                   Near(bins.Size(), record.binSize, kRealError);
+                if (!usual) continue;
+                records.push_back(&record);
+                counters.emplace_back(bins);
+            }
+            if (records.empty()) return;
+            WalkLines<T>(raster, "histograms", quiet, [&](const T* row, const unsigned char* mask) {
+                for (std::size_t i = 0; i < records.size(); ++i)
+                    counters[i].AddRow(row, mask, records[i]->band, raster.Bands(), raster.Width());
+            });
+            for (std::size_t i = 0; i < records.size(); ++i) Compare(*records[i], counters[i]);
+        } else {
+            static_cast<void>(stored);
+        }
+    }
+
+    void Compare(const zelm::RasterBandHistogram<T>& stored,
+                 const zmchost::HistogramAccumulator<T>& computed) {
+        const auto& counts = computed.Counts();
+        std::size_t wrong = 0;
+        for (std::size_t i = 0; i < counts.size(); ++i)
+            if (i >= stored.counts.shape.elements || stored.counts.data[i] != counts[i]) ++wrong;
+        if (wrong != 0)
+            result.problems.push_back("band " + std::to_string(stored.band + 1) + ": " +
+                                      std::to_string(wrong) +
+                                      " bins of the histogram differ from the pixels");
+    }
+};
+
+}  // namespace
+
+CheckResult CheckStatistics(zmchost::Raster& raster, bool quiet) {
+    CheckResult result{"statistics", {}, {}};
+    zelm::VisitElementType(raster.PixelType(), [&]<class T>(std::type_identity<T>) {
+        StatisticsChecker<T>(raster, quiet, result).Run();
+    });
+    return result;
+}
+
+}  // namespace zmctools

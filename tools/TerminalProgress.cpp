@@ -1,0 +1,81 @@
+#include "tools/TerminalProgress.h"
+
+#include <sys/ioctl.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cmath>
+#include <cstdio>
+
+#include "tools/Interrupt.h"
+
+namespace zmctools {
+namespace {
+
+std::size_t TerminalWidth() {
+    winsize size = {};
+    if (ioctl(STDERR_FILENO, TIOCGWINSZ, &size) != 0 || size.ws_col == 0) return 80;
+    return size.ws_col;
+}
+
+std::string Clock(double seconds) {
+    const auto whole = static_cast<unsigned long>(std::clamp(seconds, 0.0, 3.5e6) + 0.5);
+    char text[32];
+    if (whole >= 3600)
+        std::snprintf(text, sizeof text, "%lu:%02lu:%02lu", whole / 3600, whole / 60 % 60,
+                      whole % 60);
+    else
+        std::snprintf(text, sizeof text, "%lu:%02lu", whole / 60, whole % 60);
+    return text;
+}
+
+void Write(const std::string& text) {
+    [[maybe_unused]] const auto written = write(STDERR_FILENO, text.data(), text.size());
+}
+
+}  // namespace
+
+TerminalProgress::TerminalProgress(std::string labelText, bool wanted)
+    : label(std::move(labelText)), enabled(wanted && isatty(STDERR_FILENO) == 1) {}
+
+TerminalProgress::~TerminalProgress() {
+    if (drawn) Write("\r\x1b[K");
+}
+
+bool TerminalProgress::Show(std::uint64_t done, std::uint64_t total) {
+    const double all = static_cast<double>(std::max<std::uint64_t>(total, 1));
+    Draw(static_cast<double>(done) / all, static_cast<double>(done));
+    return !IsInterrupted();
+}
+
+bool TerminalProgress::ShowShare(double share) {
+    Draw(share, 0);
+    return !IsInterrupted();
+}
+
+void TerminalProgress::Draw(double share, double pixels) {
+    const Clock::time_point now = Clock::now();
+    share = std::clamp(share, 0.0, 1.0);
+    if (!enabled || (now < next && share < 1)) return;
+    next = now + std::chrono::milliseconds(100);
+    const double seconds = std::chrono::duration<double>(now - start).count();
+    char tail[96];
+    int length = std::snprintf(tail, sizeof tail, "] %3.0f %%", std::floor(share * 100));
+    std::string after(tail, static_cast<std::size_t>(length));
+    if (pixels > 0 && seconds > 0) {
+        std::snprintf(tail, sizeof tail, "  %.1f Mpixel/s", pixels / seconds / 1e6);
+        after += tail;
+    }
+    if (share > 0) after += "  " + zmctools::Clock(seconds / share - seconds) + " left";
+    std::string before = label.size() > 30 ? label.substr(0, 27) + "..." : label;
+    before += " [";
+    const std::size_t width = TerminalWidth();
+    const std::size_t taken = before.size() + after.size() + 1;
+    const std::size_t room = width > taken + 10 ? width - taken : 10;
+    const auto full = static_cast<std::size_t>(share * static_cast<double>(room));
+    Write("\r" + before + std::string(full, '#') + std::string(room - full, '.') + after +
+          "\x1b[K");
+    drawn = true;
+}
+
+}  // namespace zmctools

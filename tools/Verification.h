@@ -1,0 +1,42 @@
+// The checks of a pyramid file, one by one, each with the list of what is wrong.
+//
+// Every check reads what it needs anew and changes nothing. A problem is a text for people, with
+// the band (from 1), the level (from 0) and the place of the first difference. A file whose
+// contents cannot be read at all throws. Memory stays some 100 MiB whatever the raster's size.
+#ifndef ZMC_TOOLS_VERIFICATION_H
+#define ZMC_TOOLS_VERIFICATION_H
+
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "host/PyramidFileInfo.h"
+#include "host/Raster.h"
+#include "host/Reduction.h"
+#include "tools/RasterView.h"
+
+namespace zmctools {
+
+struct CheckResult {
+    std::string check;
+    std::string skipped;  // why it was not made; empty if it was
+    std::vector<std::string> problems;
+};
+
+// Header against the module's reading of it, and the file's length.
+CheckResult CheckStructure(const zmchost::PyramidFileInfo& info, const zmchost::Raster& raster);
+CheckResult CheckCompleteness(const zmchost::PyramidFileInfo& info);
+// The metadata document is well-formed, and its records are of bands and levels that there are.
+CheckResult CheckDocuments(const std::string& file, const zmchost::PyramidFileInfo& info,
+                           const zmchost::Raster& raster);
+// Stored statistics and histograms against those of level 0, as exact as a file keeps them.
+CheckResult CheckStatistics(zmchost::Raster& raster, bool quiet);
+// Every coarser level against what the method makes of the level below it.
+CheckResult CheckLevels(zmchost::Raster& raster, zmchost::Resampling method, bool quiet);
+// Level 0 against bands of another raster.
+CheckResult CheckSource(zmchost::Raster& raster, RasterView& source,
+                        const std::vector<std::uint32_t>& sourceBands, bool quiet);
+
+}  // namespace zmctools
+
+#endif

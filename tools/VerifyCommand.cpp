@@ -1,0 +1,129 @@
+#include <cstdio>
+#include <map>
+
+#include "core/PixelVocabulary.h"
+#include "gdal/NoDataValues.h"
+#include "tools/Arguments.h"
+#include "tools/Command.h"
+#include "tools/GdalWorld.h"
+#include "tools/Methods.h"
+#include "tools/Verification.h"
+
+namespace zmctools {
+namespace {
+
+class VerifyCommand final : public Command {
+public:
+    const char* Name() const override { return "verify"; }
+    const char* Summary() const override {
+        return "Check a pyramid file against itself and a source";
+    }
+    void Describe(CLI::App& app) override;
+    ExitStatus Run() override;
+
+private:
+    std::string file;
+    std::string resampling;
+    std::string source;
+    std::string bands;
+    std::vector<CheckResult> results;
+
+    void CheckPixels(zmchost::Raster& raster);
+    ExitStatus Report() const;
+};
+
+void VerifyCommand::Describe(CLI::App& app) {
+    app.add_option("FILE", file, "Pyramid to check")->required();
+    app.add_option("--resampling", resampling,
+                   "Method that the levels were made by (default average, and mode for rasters "
+                   "with a palette)")
+        ->type_name("METHOD")
+        ->check(CLI::IsMember(MethodNames()));
+    app.add_option("--against", source, "Raster that level 0 must be equal to")
+        ->type_name("SOURCE");
+    app.add_option("--bands", bands,
+                   "Bands of SOURCE that the file was built from, counted from 1 (default all)")
+        ->type_name("3,2,1");
+    app.footer(
+        "Examples:\n"
+        "  zmcraster verify scene.pyr\n"
+        "  zmcraster verify scene.pyr --against scene.tif\n"
+        "  zmcraster verify classes.pyr --resampling mode --json\n"
+        "\n"
+        "Checked are structure, completeness, documents, statistics and levels, and level 0 where "
+        "a\n"
+        "source is named. No-data values are those of FILE.aux.xml. Exit status 3, and a list, if\n"
+        "something differs.");
+}
+
+// The file has no place for no-data values; masks go by those of the sidecar.
+void TakeNoDataValues(zmchost::Raster& raster) {
+    const DatasetPtr dataset = OpenDataset(raster.Name());
+    std::map<std::uint32_t, double> values;
+    for (int number = 1; number <= dataset->GetRasterCount(); ++number)
+        if (const auto value = zmcgdal::NoDataAsDouble(*dataset->GetRasterBand(number)))
+            values[static_cast<std::uint32_t>(number - 1)] = *value;
+    raster.SetNoDataValues(values);
+}
+
+bool HasPalette(const zmchost::Raster& raster) {
+    for (std::uint32_t band = 0; band < raster.Bands(); ++band)
+        if (raster.BandPalette(band)) return true;
+    return false;
+}
+
+void VerifyCommand::CheckPixels(zmchost::Raster& raster) {
+    TakeNoDataValues(raster);
+    results.push_back(CheckStatistics(raster, quiet));
+    const auto usual =
+        HasPalette(raster) ? zmchost::Resampling::Mode : zmchost::Resampling::Average;
+    results.push_back(
+        CheckLevels(raster, zmchost::ParseResampling(resampling).value_or(usual), quiet));
+    if (source.empty()) return;
+    const auto view = OpenView(source);
+    results.push_back(CheckSource(raster, *view, ParseBands(bands, view->Bands()), quiet));
+}
+
+ExitStatus VerifyCommand::Report() const {
+    bool equal = true;
+    Json checks = Json::array();
+    for (const CheckResult& result : results) {
+        equal = equal && result.problems.empty();
+        const char* const verdict = !result.problems.empty()  ? "differs"
+                                    : !result.skipped.empty() ? "skipped"
+                                                              : "good";
+        Json entry = {{"check", result.check}, {"result", verdict}, {"problems", result.problems}};
+        if (!result.skipped.empty()) entry["reason"] = result.skipped;
+        checks.push_back(entry);
+        if (json || (quiet && result.problems.empty())) continue;
+        std::printf("%-13s %s%s\n", result.check.c_str(), verdict,
+                    result.skipped.empty() ? "" : (": " + result.skipped).c_str());
+        for (const std::string& problem : result.problems) std::printf("  %s\n", problem.c_str());
+    }
+    if (json)
+        PrintDocument({{"schema", kSchema}, {"file", file}, {"good", equal}, {"checks", checks}});
+    return equal ? ExitStatus::Done : ExitStatus::Differences;
+}
+
+ExitStatus VerifyCommand::Run() {
+    const zmchost::PyramidFileInfo info = ReadLayout(file);
+    if (zelm::CheckedPixelType(info.header.pixelType) == 0)
+        throw Failure(file, std::string("no pixels of type ") +
+                                zelm::PixelTypeName(info.header.pixelType) + " can be read");
+    zmchost::Raster raster = OpenPyramid(file);
+    results.push_back(CheckStructure(info, raster));
+    results.push_back(CheckCompleteness(info));
+    results.push_back(CheckDocuments(file, info, raster));
+    if (info.complete)
+        CheckPixels(raster);
+    else
+        for (const char* const check : {"statistics", "levels"})
+            results.push_back({check, "the file is not complete", {}});
+    return Report();
+}
+
+}  // namespace
+
+std::unique_ptr<Command> MakeVerifyCommand() { return std::make_unique<VerifyCommand>(); }
+
+}  // namespace zmctools

@@ -1,0 +1,141 @@
+// zmcraster: build pyramids, look inside, compare. One command per source file; this one is the
+// table of them and turns what they throw into messages and exit statuses.
+#include <cstdio>
+#include <cstring>
+#include <new>
+#include <xercesc/util/XercesVersion.hpp>
+
+#include "host/Error.h"
+#include "tools/Command.h"
+#include "tools/GdalWorld.h"
+#include "tools/Generate.h"
+#include "tools/Interrupt.h"
+
+namespace zmctools {
+namespace {
+
+// The version of the format that builds write.
+constexpr const char* kFormatVersion = "1.1";
+
+std::string Version() {
+    return std::string("zmcraster " ZMC_VERSION "\npyramid format ") + kFormatVersion +
+           "\nXerces-C++ " XERCES_FULLVERSIONDOT "\nGDAL " + GDALVersionInfo("RELEASE_NAME");
+}
+
+class Program {
+public:
+    Program();
+    ExitStatus Run(std::vector<std::string> arguments);
+
+private:
+    CLI::App app{"build and inspect pyramid raster files", "zmcraster"};
+    std::vector<std::unique_ptr<Command>> commands;
+    std::vector<CLI::App*> parts;
+    CLI::App* generate = nullptr;
+    std::string generated;
+
+    void Add(std::unique_ptr<Command> command);
+    ExitStatus RunChosen();
+    void CheckCommand(const std::string& word) const;
+};
+
+Program::Program() {
+    app.set_version_flag("--version", Version(),
+                         "Print the versions of this program, of the file "
+                         "format and of the libraries");
+    app.set_help_flag("--help,-h", "Print this help");
+    app.require_subcommand(1);
+    Add(MakeBuildCommand());
+    Add(MakeInfoCommand());
+    Add(MakeExportCommand());
+    Add(MakeHashCommand());
+    Add(MakeVerifyCommand());
+    Add(MakeCompareCommand());
+    app.footer(
+        std::string("zmcraster COMMAND --help tells more, with examples. Bands count from 1, "
+                    "levels from 0, the finest.\nExit status: ") +
+        kExitStatusText + ".\n");
+    generate = app.add_subcommand("generate", "Print the man page or the bash completion");
+    generate->group("");
+    generate->add_option("WHAT", generated)
+        ->required()
+        ->check(CLI::IsMember(std::vector<std::string>{"man", "completion"}));
+}
+
+void Program::Add(std::unique_ptr<Command> command) {
+    CLI::App* const part = app.add_subcommand(command->Name(), command->Summary());
+    command->Describe(*part);
+    part->add_flag("--json", command->json, "Print one JSON document instead of text");
+    part->add_flag("--quiet,-q", command->quiet, "No progress bar, no warnings, errors only");
+    parts.push_back(part);
+    commands.push_back(std::move(command));
+}
+
+ExitStatus Program::RunChosen() {
+    if (generate->parsed()) {
+        const std::string text = generated == "man" ? MakeManPage(app) : MakeCompletion(app);
+        return std::fputs(text.c_str(), stdout) >= 0 && std::fflush(stdout) == 0
+                   ? ExitStatus::Done
+                   : ExitStatus::Failed;
+    }
+    for (std::size_t i = 0; i < parts.size(); ++i) {
+        if (!parts[i]->parsed()) continue;
+        SetQuiet(commands[i]->quiet);
+        CatchInterrupts();
+        StartGdal();
+        const ExitStatus status = commands[i]->Run();
+        if (std::fflush(stdout) != 0) throw Failure("standard output", "it cannot be written");
+        return status;
+    }
+    return ExitStatus::Usage;
+}
+
+// "-co K=V", as GDAL's own programs have it, is one dash with two letters.
+std::vector<std::string> Reversed(int count, char** words) {
+    std::vector<std::string> arguments;
+    for (int i = count - 1; i > 0; --i)
+        arguments.emplace_back(std::strcmp(words[i], "-co") == 0 ? "--co" : words[i]);
+    return arguments;
+}
+
+void Program::CheckCommand(const std::string& word) const {
+    if (!word.empty() && word[0] != '-' && !app.get_subcommand_no_throw(word))
+        throw UsageError(word, "there is no such command; see zmcraster --help");
+}
+
+ExitStatus Program::Run(std::vector<std::string> arguments) {
+    if (!arguments.empty()) CheckCommand(arguments.back());
+    try {
+        app.parse(std::move(arguments));
+    } catch (const CLI::ParseError& error) {
+        // Help and version come as errors with the status 0.
+        if (error.get_exit_code() == 0) return app.exit(error), ExitStatus::Done;
+        std::string command;
+        for (const CLI::App* part : app.get_subcommands()) command = ' ' + part->get_name();
+        Say(std::string(error.what()) + "; see zmcraster" + command + " --help");
+        return ExitStatus::Usage;
+    }
+    return RunChosen();
+}
+
+ExitStatus Guarded(int count, char** words) {
+    try {
+        return Program().Run(Reversed(count, words));
+    } catch (const UsageError& error) {
+        Say(error.what());
+        return ExitStatus::Usage;
+    } catch (const Interruption& error) {
+        Say(error.what());
+        return ExitStatus::Interrupted;
+    } catch (const std::bad_alloc&) {
+        Say("out of memory");
+    } catch (const std::exception& error) {
+        Say(error.what());
+    }
+    return ExitStatus::Failed;
+}
+
+}  // namespace
+}  // namespace zmctools
+
+int main(int count, char** words) { return static_cast<int>(zmctools::Guarded(count, words)); }
