@@ -17,11 +17,11 @@ constexpr const char* kOwnDomain = "ZMCPYRAMID";
 
 constexpr std::uint64_t kMaxTileBytes = INT_MAX;
 
-zmchost::PyramidFileInfo CheckedInfo(const zmchost::Raster& raster) {
+zmchost::PyramidFileInfo CheckedInfo(const std::string& fileName) {
     const auto refuse = [&](const char* why) {
-        throw zmchost::Error(raster.Name(), "show it to GDAL", why);
+        throw zmchost::Error(fileName, "show it to GDAL", why);
     };
-    zmchost::PyramidFileInfo info = zmchost::DescribePyramidFile(raster.Header());
+    zmchost::PyramidFileInfo info = zmchost::ReadPyramidFileInfo(fileName);
     const zmchost::PyramidHeader& header = info.header;
     const auto* const base = info.FindLevel(header.minLevel);
     if (!base || base->width == 0 || base->height == 0) refuse("it holds no pixels");
@@ -36,15 +36,10 @@ zmchost::PyramidFileInfo CheckedInfo(const zmchost::Raster& raster) {
 
 }  // namespace
 
-zmchost::ModulePtr SharedModule() {
-    static const zmchost::ModulePtr module = zmchost::Module::Load();
-    return module;
-}
-
-OpenFile::OpenFile(zmchost::Raster pyramid, SignedByteAs signedByteAs)
-    : raster(std::move(pyramid)),
-      info(CheckedInfo(raster)),
-      tiles(raster, info, GdalTypeOf(raster.PixelType(), signedByteAs)),
+OpenFile::OpenFile(const std::string& fileName, SignedByteAs signedByteAs)
+    : raster(fileName),
+      info(CheckedInfo(fileName)),
+      tiles(raster, info, GdalTypeOf(info.header.pixelType, signedByteAs)),
       archive(raster, info.HasMetadataDocument()) {}
 
 Dataset::Dataset(std::shared_ptr<OpenFile> openFile, std::uint32_t levelShown, GDALAccess access,

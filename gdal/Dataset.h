@@ -15,10 +15,10 @@
 #include <vector>
 
 #include "gdal/Archive.h"
+#include "gdal/LazyRaster.h"
 #include "gdal/SampleType.h"
 #include "gdal/TileReader.h"
 #include "host/PyramidFileInfo.h"
-#include "host/Raster.h"
 
 namespace zmcgdal {
 
@@ -27,17 +27,14 @@ class Creation;
 // What all levels of an open file share.
 class OpenFile {
 public:
-    // Throws zmchost::Error if GDAL cannot hold the raster.
-    OpenFile(zmchost::Raster pyramid, SignedByteAs signedByteAs);
+    // Throws zmchost::Error if the file is no pyramid, or one that GDAL cannot hold.
+    OpenFile(const std::string& fileName, SignedByteAs signedByteAs);
 
-    zmchost::Raster raster;
+    LazyRaster raster;
     const zmchost::PyramidFileInfo info;
     TileReader tiles;
     Archive archive;
 };
-
-// The module, loaded once per process.
-zmchost::ModulePtr SharedModule();
 
 class Dataset final : public GDALPamDataset {
 public:
