@@ -32,7 +32,8 @@ void WarnIfIncomplete(const Dataset& dataset, const zmchost::PyramidFileInfo& in
 }
 
 std::unique_ptr<Dataset> OpenDataset(GDALOpenInfo* info) {
-    auto file = std::make_shared<OpenFile>(info->pszFilename, SignedByteFrom(info->papszOpenOptions));
+    auto file =
+        std::make_shared<OpenFile>(info->pszFilename, SignedByteFrom(info->papszOpenOptions));
     const zmchost::PyramidFileInfo layout = file->info;
     auto dataset = Dataset::FromFile(std::move(file), info->eAccess);
     dataset->LoadSidecar(info->pszFilename, info->GetSiblingFiles());

@@ -32,8 +32,8 @@ public:
         return *raster;
     }
 
-    // Calls visit(zelm::RasterReader<T>&) with the module's reader. What is thrown goes to GDAL as a
-    // failure, and the answer is false.
+    // Calls visit(zelm::RasterReader<T>&) with the module's reader. What is thrown goes to GDAL as
+    // a failure, and the answer is false.
     template <class Visitor>
     bool Visit(Visitor&& visit) {
         try {

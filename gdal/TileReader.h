@@ -38,8 +38,7 @@ struct Target {
 class TileReader {
 public:
     // Both outlive this object. `type` is what the samples are shown as.
-    TileReader(LazyRaster& pyramid, const zmchost::PyramidFileInfo& info,
-               GDALDataType type);
+    TileReader(LazyRaster& pyramid, const zmchost::PyramidFileInfo& info, GDALDataType type);
 
     GDALDataType Type() const { return sampleType; }
     // The samples of all bands of a pixel lie together in the file.
