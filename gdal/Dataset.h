@@ -45,7 +45,8 @@ public:
     std::uint32_t Level() const { return level; }
     bool IsOverview() const { return main != nullptr; }
     Dataset& Main() { return main ? *main : *this; }
-    const std::vector<std::unique_ptr<Dataset>>& Overviews() const { return overviews; }
+    // From fine to coarse; made when first asked for.
+    const std::vector<std::unique_ptr<Dataset>>& Overviews();
 
     // Reads the sidecar, and looks for other companions.
     void LoadSidecar(const char* fileName, char** siblings);
@@ -77,16 +78,17 @@ private:
     Dataset(std::shared_ptr<OpenFile> openFile, std::uint32_t levelShown, GDALAccess access,
             Dataset* mainDataset);
     void AddBands();
-    void AddOverviews(GDALAccess access);
+    void AddOverviews();
     void DescribeFile();
-    const CPLStringList* OwnDomain(const char* domain) const;
+    CPLStringList* OwnDomain(const char* domain);
 
     std::shared_ptr<OpenFile> file;
     std::uint32_t level;
     Dataset* main;  // null in the main dataset
     std::vector<std::unique_ptr<Dataset>> overviews;
-    CPLStringList structure;    // domain IMAGE_STRUCTURE
-    CPLStringList description;  // domain ZMCPYRAMID
+    bool overviewsMade = false;
+    CPLStringList structure;    // domain IMAGE_STRUCTURE, when it was asked for
+    CPLStringList description;  // domain ZMCPYRAMID, likewise
     std::unique_ptr<Creation> creation;
 };
 

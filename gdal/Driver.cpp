@@ -36,7 +36,9 @@ std::unique_ptr<Dataset> OpenDataset(GDALOpenInfo* info) {
         std::make_shared<OpenFile>(info->pszFilename, SignedByteFrom(info->papszOpenOptions));
     const zmchost::PyramidFileInfo layout = file->info;
     auto dataset = Dataset::FromFile(std::move(file), info->eAccess);
-    dataset->LoadSidecar(info->pszFilename, info->GetSiblingFiles());
+    // A look for each companion is cheaper than a list of the whole folder, unless that is there.
+    char** const siblings = info->AreSiblingFilesLoaded() ? info->GetSiblingFiles() : nullptr;
+    dataset->LoadSidecar(info->pszFilename, siblings);
     WarnIfIncomplete(*dataset, layout);
     return dataset;
 }
