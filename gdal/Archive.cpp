@@ -10,6 +10,8 @@ namespace zmcgdal {
 namespace {
 
 constexpr std::uint32_t kMaxColors = 65536;
+// Each place costs a parse; a file that was updated more often shows an older record.
+constexpr std::uint32_t kMaxUpdates = 1024;
 
 template <class T>
 double ToDouble(const T& value) {
@@ -98,7 +100,7 @@ bool StoredStatistics::IsFull() const {
     return (flags & kNeeded) == kNeeded;
 }
 
-Archive::Archive(const zmchost::Raster& pyramid, bool hasDocument)
+Archive::Archive(LazyRaster& pyramid, bool hasDocument)
     : raster(pyramid), documentExists(hasDocument) {}
 
 const StoredStatistics* Archive::Statistics(std::uint32_t band) {
@@ -120,7 +122,7 @@ std::optional<StoredStatistics> Archive::FetchStatistics(std::uint32_t band) {
             if (record.band == band && record.flags != 0) newest = Convert(record);
             if (newest || !reader.HasBandStats(band)) return;
         }
-        for (std::uint32_t place = 0;; ++place) {
+        for (std::uint32_t place = 0; place < reader.GetBands() + kMaxUpdates; ++place) {
             const auto record = reader.GetBandStats(place);
             if (record.flags == 0) return;
             if (record.band == band) newest = Convert(record);
@@ -170,6 +172,9 @@ std::unique_ptr<GDALColorTable> Archive::FetchColorTable(std::uint32_t band) con
     return table;
 }
 
+// The module's setters answer true for a file that they cannot write.
+bool Archive::CanStore() { return raster.Get().IsWritable(); }
+
 bool Archive::StoreStatistics(std::uint32_t band, const StoredStatistics& statistics) {
     bool stored = false;
     raster.Visit([&]<class T>(zelm::RasterReader<T>& reader) {
@@ -181,7 +186,7 @@ bool Archive::StoreStatistics(std::uint32_t band, const StoredStatistics& statis
         record.mean = statistics.mean;
         record.standardDeviation = statistics.standardDeviation;
         zelm::Array<zelm::RasterBandStats<T>> records;
-        stored = records.Append(record) && reader.SetBandStats(records);
+        stored = CanStore() && records.Append(record) && reader.SetBandStats(records);
     });
     documentExists |= stored;
     severalSets.reset();
@@ -196,7 +201,8 @@ bool Archive::StoreHistogram(const StoredHistogram& histogram) {
         zelm::RasterBandHistogram<T> record;
         Fill(record, histogram);
         zelm::Array<zelm::RasterBandHistogram<T>> records;
-        stored = record.counts.data && records.Append(record) && reader.SetHistograms(records);
+        stored = CanStore() && record.counts.data && records.Append(record) &&
+                 reader.SetHistograms(records);
     });
     documentExists |= stored;
     histograms_.reset();
@@ -209,7 +215,7 @@ bool Archive::StoreColorTable(std::uint32_t band, const GDALColorTable* table) {
         zelm::Palette palette;
         for (int i = 0; table && i < table->GetColorEntryCount(); ++i)
             AddEntry(palette, *table->GetColorEntry(i));
-        stored = reader.SetPalette(band, palette);
+        stored = CanStore() && reader.SetPalette(band, palette);
     });
     documentExists |= stored;
     colorTables.erase(band);

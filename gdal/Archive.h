@@ -14,7 +14,7 @@
 #include <optional>
 #include <vector>
 
-#include "host/Raster.h"
+#include "gdal/LazyRaster.h"
 
 namespace zmcgdal {
 
@@ -42,7 +42,7 @@ struct StoredHistogram {
 class Archive {
 public:
     // `pyramid` outlives this object. Without a document in the file nothing is fetched.
-    Archive(const zmchost::Raster& pyramid, bool hasDocument);
+    Archive(LazyRaster& pyramid, bool hasDocument);
 
     // Null where the file has none.
     const StoredStatistics* Statistics(std::uint32_t band);
@@ -56,13 +56,14 @@ public:
     bool StoreColorTable(std::uint32_t band, const GDALColorTable* table);
 
 private:
-    const zmchost::Raster& raster;
+    LazyRaster& raster;
     bool documentExists;
     std::map<std::uint32_t, std::optional<StoredStatistics>> statistics_;
     std::optional<bool> severalSets;
     std::optional<std::vector<StoredHistogram>> histograms_;
     std::map<std::uint32_t, std::unique_ptr<GDALColorTable>> colorTables;
 
+    bool CanStore();
     std::optional<StoredStatistics> FetchStatistics(std::uint32_t band);
     std::vector<StoredHistogram> FetchHistograms() const;
     std::unique_ptr<GDALColorTable> FetchColorTable(std::uint32_t band) const;

@@ -143,8 +143,9 @@ void Band::CompleteTile(int blockX, int blockY, const Window& tile, unsigned cha
 // The tile as the file holds it, with all bands where they lie together; `bands` tells which.
 std::vector<unsigned char> Band::GatherTile(int blockX, int blockY, const Window& tile,
                                             const void* data, std::vector<std::uint32_t>& bands) {
+    const zmchost::Raster& raster = owner.File().raster.Get();
     if (owner.File().tiles.IsPixelInterleaved())
-        bands = owner.File().raster.AllBands();
+        bands = raster.AllBands();
     else
         bands = {index};
     const auto size = static_cast<std::size_t>(GDALGetDataTypeSizeBytes(eDataType));
@@ -160,7 +161,7 @@ std::vector<unsigned char> Band::GatherTile(int blockX, int blockY, const Window
                 ->CompleteTile(blockX, blockY, tile, first, stride);
         first += size;
     }
-    if (IsWidened(owner.File().raster.PixelType(), eDataType)) NarrowSamples(samples);
+    if (IsWidened(raster.PixelType(), eDataType)) NarrowSamples(samples);
     return samples;
 }
 
@@ -171,7 +172,7 @@ CPLErr Band::IWriteBlock(int blockX, int blockY, void* data) {
     try {
         std::vector<std::uint32_t> bands;
         const auto samples = GatherTile(blockX, blockY, tile, data, bands);
-        owner.File().raster.Write(
+        owner.File().raster.Get().Write(
             owner.Level(),
             {positive(tile.x), positive(tile.y), positive(tile.width), positive(tile.height)},
             bands, samples.data());

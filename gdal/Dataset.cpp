@@ -17,11 +17,11 @@ constexpr const char* kOwnDomain = "ZMCPYRAMID";
 
 constexpr std::uint64_t kMaxTileBytes = INT_MAX;
 
-zmchost::PyramidFileInfo CheckedInfo(const zmchost::Raster& raster) {
+zmchost::PyramidFileInfo CheckedInfo(const std::string& fileName) {
     const auto refuse = [&](const char* why) {
-        throw zmchost::Error(raster.Name(), "show it to GDAL", why);
+        throw zmchost::Error(fileName, "show it to GDAL", why);
     };
-    zmchost::PyramidFileInfo info = zmchost::DescribePyramidFile(raster.Header());
+    zmchost::PyramidFileInfo info = zmchost::ReadPyramidFileInfo(fileName);
     const zmchost::PyramidHeader& header = info.header;
     const auto* const base = info.FindLevel(header.minLevel);
     if (!base || base->width == 0 || base->height == 0) refuse("it holds no pixels");
@@ -36,15 +36,10 @@ zmchost::PyramidFileInfo CheckedInfo(const zmchost::Raster& raster) {
 
 }  // namespace
 
-zmchost::ModulePtr SharedModule() {
-    static const zmchost::ModulePtr module = zmchost::Module::Load();
-    return module;
-}
-
-OpenFile::OpenFile(zmchost::Raster pyramid, SignedByteAs signedByteAs)
-    : raster(std::move(pyramid)),
-      info(CheckedInfo(raster)),
-      tiles(raster, info, GdalTypeOf(raster.PixelType(), signedByteAs)),
+OpenFile::OpenFile(const std::string& fileName, SignedByteAs signedByteAs)
+    : raster(fileName),
+      info(CheckedInfo(fileName)),
+      tiles(raster, info, GdalTypeOf(info.header.pixelType, signedByteAs)),
       archive(raster, info.HasMetadataDocument()) {}
 
 Dataset::Dataset(std::shared_ptr<OpenFile> openFile, std::uint32_t levelShown, GDALAccess access,
@@ -57,7 +52,6 @@ Dataset::Dataset(std::shared_ptr<OpenFile> openFile, std::uint32_t levelShown, G
     // Only the main dataset has a sidecar.
     if (main) nPamFlags |= GPF_DISABLED;
     AddBands();
-    DescribeFile();
 }
 
 Dataset::~Dataset() {
@@ -69,9 +63,7 @@ Dataset::~Dataset() {
 
 std::unique_ptr<Dataset> Dataset::FromFile(std::shared_ptr<OpenFile> file, GDALAccess access) {
     const std::uint32_t base = file->info.header.minLevel;
-    std::unique_ptr<Dataset> dataset(new Dataset(std::move(file), base, access, nullptr));
-    dataset->AddOverviews(access);
-    return dataset;
+    return std::unique_ptr<Dataset>(new Dataset(std::move(file), base, access, nullptr));
 }
 
 void Dataset::AddBands() {
@@ -79,12 +71,18 @@ void Dataset::AddBands() {
     for (int number = 1; number <= count; ++number) SetBand(number, new Band(*this, number));
 }
 
+const std::vector<std::unique_ptr<Dataset>>& Dataset::Overviews() {
+    if (!overviewsMade) AddOverviews();
+    return overviews;
+}
+
 // What an incomplete file holds of its coarser levels is anyone's guess.
-void Dataset::AddOverviews(GDALAccess access) {
-    if (!file->info.complete) return;
+void Dataset::AddOverviews() {
+    overviewsMade = true;
+    if (main || !file->info.complete) return;
     for (const zmchost::PyramidLevelInfo& coarser : file->info.levels)
         if (coarser.level > level && coarser.width > 0 && coarser.height > 0)
-            overviews.emplace_back(new Dataset(file, coarser.level, access, this));
+            overviews.emplace_back(new Dataset(file, coarser.level, eAccess, this));
 }
 
 void Dataset::DescribeFile() {
@@ -127,7 +125,8 @@ bool Dataset::ReadsDirectly(int x, int y, int width, int height) const {
            touched(x, width, nRasterXSize) * touched(y, height, nRasterYSize);
 }
 
-const CPLStringList* Dataset::OwnDomain(const char* domain) const {
+CPLStringList* Dataset::OwnDomain(const char* domain) {
+    if (structure.Count() == 0) DescribeFile();
     if (domain && EQUAL(domain, kStructureDomain)) return &structure;
     if (domain && EQUAL(domain, kOwnDomain)) return &description;
     return nullptr;
@@ -139,13 +138,12 @@ char** Dataset::GetMetadataDomainList() {
 }
 
 char** Dataset::GetMetadata(const char* domain) {
-    if (const CPLStringList* const own = OwnDomain(domain))
-        return const_cast<CPLStringList*>(own)->List();
+    if (CPLStringList* const own = OwnDomain(domain)) return own->List();
     return GDALPamDataset::GetMetadata(domain);
 }
 
 const char* Dataset::GetMetadataItem(const char* name, const char* domain) {
-    if (const CPLStringList* const own = OwnDomain(domain)) return own->FetchNameValue(name);
+    if (CPLStringList* const own = OwnDomain(domain)) return own->FetchNameValue(name);
     return GDALPamDataset::GetMetadataItem(name, domain);
 }
 
@@ -179,7 +177,7 @@ CPLErr Dataset::IBuildOverviews(const char* resampling, int overviewCount, const
                                 int bandCount, const int* bands, GDALProgressFunc progress,
                                 void* progressData, CSLConstList options) {
     if (creation) return creation->ChooseLevels(resampling, overviewCount, factors);
-    if (overviews.empty())
+    if (Overviews().empty())
         return GDALPamDataset::IBuildOverviews(resampling, overviewCount, factors, bandCount, bands,
                                                progress, progressData, options);
     return RefreshLevels(*this, resampling, std::vector<int>(factors, factors + overviewCount),

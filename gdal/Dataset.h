@@ -15,10 +15,10 @@
 #include <vector>
 
 #include "gdal/Archive.h"
+#include "gdal/LazyRaster.h"
 #include "gdal/SampleType.h"
 #include "gdal/TileReader.h"
 #include "host/PyramidFileInfo.h"
-#include "host/Raster.h"
 
 namespace zmcgdal {
 
@@ -27,17 +27,14 @@ class Creation;
 // What all levels of an open file share.
 class OpenFile {
 public:
-    // Throws zmchost::Error if GDAL cannot hold the raster.
-    OpenFile(zmchost::Raster pyramid, SignedByteAs signedByteAs);
+    // Throws zmchost::Error if the file is no pyramid, or one that GDAL cannot hold.
+    OpenFile(const std::string& fileName, SignedByteAs signedByteAs);
 
-    zmchost::Raster raster;
+    LazyRaster raster;
     const zmchost::PyramidFileInfo info;
     TileReader tiles;
     Archive archive;
 };
-
-// The module, loaded once per process.
-zmchost::ModulePtr SharedModule();
 
 class Dataset final : public GDALPamDataset {
 public:
@@ -48,7 +45,8 @@ public:
     std::uint32_t Level() const { return level; }
     bool IsOverview() const { return main != nullptr; }
     Dataset& Main() { return main ? *main : *this; }
-    const std::vector<std::unique_ptr<Dataset>>& Overviews() const { return overviews; }
+    // From fine to coarse; made when first asked for.
+    const std::vector<std::unique_ptr<Dataset>>& Overviews();
 
     // Reads the sidecar, and looks for other companions.
     void LoadSidecar(const char* fileName, char** siblings);
@@ -80,16 +78,17 @@ private:
     Dataset(std::shared_ptr<OpenFile> openFile, std::uint32_t levelShown, GDALAccess access,
             Dataset* mainDataset);
     void AddBands();
-    void AddOverviews(GDALAccess access);
+    void AddOverviews();
     void DescribeFile();
-    const CPLStringList* OwnDomain(const char* domain) const;
+    CPLStringList* OwnDomain(const char* domain);
 
     std::shared_ptr<OpenFile> file;
     std::uint32_t level;
     Dataset* main;  // null in the main dataset
     std::vector<std::unique_ptr<Dataset>> overviews;
-    CPLStringList structure;    // domain IMAGE_STRUCTURE
-    CPLStringList description;  // domain ZMCPYRAMID
+    bool overviewsMade = false;
+    CPLStringList structure;    // domain IMAGE_STRUCTURE, when it was asked for
+    CPLStringList description;  // domain ZMCPYRAMID, likewise
     std::unique_ptr<Creation> creation;
 };
 

@@ -32,11 +32,13 @@ void WarnIfIncomplete(const Dataset& dataset, const zmchost::PyramidFileInfo& in
 }
 
 std::unique_ptr<Dataset> OpenDataset(GDALOpenInfo* info) {
-    auto file = std::make_shared<OpenFile>(zmchost::Raster::Open(SharedModule(), info->pszFilename),
-                                           SignedByteFrom(info->papszOpenOptions));
+    auto file =
+        std::make_shared<OpenFile>(info->pszFilename, SignedByteFrom(info->papszOpenOptions));
     const zmchost::PyramidFileInfo layout = file->info;
     auto dataset = Dataset::FromFile(std::move(file), info->eAccess);
-    dataset->LoadSidecar(info->pszFilename, info->GetSiblingFiles());
+    // A look for each companion is cheaper than a list of the whole folder, unless that is there.
+    char** const siblings = info->AreSiblingFilesLoaded() ? info->GetSiblingFiles() : nullptr;
+    dataset->LoadSidecar(info->pszFilename, siblings);
     WarnIfIncomplete(*dataset, layout);
     return dataset;
 }

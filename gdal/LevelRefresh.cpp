@@ -141,7 +141,7 @@ void TellNoDataValues(Dataset& dataset) {
         const auto value = NoDataAsDouble(*dataset.GetRasterBand(number));
         if (value) values[static_cast<std::uint32_t>(number - 1)] = *value;
     }
-    dataset.File().raster.SetNoDataValues(values);
+    dataset.File().raster.Get().SetNoDataValues(values);
 }
 
 void DropCaches(Dataset& dataset) {
@@ -158,17 +158,18 @@ CPLErr RefreshLevels(Dataset& dataset, const char* resampling, const std::vector
         return Refuse("the levels of a pyramid are inside the file: open it for update");
     if (factors.empty()) return Refuse("the levels of a pyramid cannot be removed");
     const std::optional<zmchost::Resampling> method = ResamplingFrom(resampling);
-    zmchost::Raster& raster = dataset.File().raster;
-    if (!method || !zmchost::SupportsElementType(*method, raster.PixelType()))
+    const std::uint32_t pixelType = dataset.File().info.header.pixelType;
+    if (!method || !zmchost::SupportsElementType(*method, pixelType))
         return Refuse("this resampling is not known for the pixel type");
     const auto levels = LevelsOf(dataset, factors);
     if (!levels) return CE_Failure;
     DropCaches(dataset);
-    TellNoDataValues(dataset);
     try {
+        TellNoDataValues(dataset);
         bool finished = false;
-        zelm::VisitElementType(raster.PixelType(), [&]<class T>(std::type_identity<T>) {
-            finished = MakeLevels<T>(raster, *method, *levels, progress, progressData);
+        zelm::VisitElementType(pixelType, [&]<class T>(std::type_identity<T>) {
+            finished = MakeLevels<T>(dataset.File().raster.Get(), *method, *levels, progress,
+                                     progressData);
         });
         DropCaches(dataset);
         if (finished) return CE_None;

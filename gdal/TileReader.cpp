@@ -34,8 +34,7 @@ void Widen(const unsigned char* bytes, std::size_t count, unsigned char* out) {
 
 }  // namespace
 
-TileReader::TileReader(const zmchost::Raster& pyramid, const zmchost::PyramidFileInfo& info,
-                       GDALDataType type)
+TileReader::TileReader(LazyRaster& pyramid, const zmchost::PyramidFileInfo& info, GDALDataType type)
     : raster(pyramid),
       layout(info),
       sampleType(type),

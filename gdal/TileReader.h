@@ -12,8 +12,8 @@
 #include <cstdint>
 #include <vector>
 
+#include "gdal/LazyRaster.h"
 #include "host/PyramidFileInfo.h"
-#include "host/Raster.h"
 
 namespace zmcgdal {
 
@@ -38,8 +38,7 @@ struct Target {
 class TileReader {
 public:
     // Both outlive this object. `type` is what the samples are shown as.
-    TileReader(const zmchost::Raster& pyramid, const zmchost::PyramidFileInfo& info,
-               GDALDataType type);
+    TileReader(LazyRaster& pyramid, const zmchost::PyramidFileInfo& info, GDALDataType type);
 
     GDALDataType Type() const { return sampleType; }
     // The samples of all bands of a pixel lie together in the file.
@@ -56,7 +55,7 @@ public:
     Window TileAt(std::uint32_t level, int tileX, int tileY) const;
 
 private:
-    const zmchost::Raster& raster;
+    LazyRaster& raster;
     const zmchost::PyramidFileInfo& layout;
     GDALDataType sampleType;
     std::size_t rawSampleSize;

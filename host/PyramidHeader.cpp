@@ -1,22 +1,16 @@
 #include "host/PyramidHeader.h"
 
+#include <charconv>
 #include <cstring>
 #include <map>
-#include <memory>
 #include <sstream>
-#include <vector>
-#include <xercesc/framework/MemBufInputSource.hpp>
-#include <xercesc/internal/XMLScanner.hpp>
-#include <xercesc/parsers/SAXParser.hpp>
-#include <xercesc/sax/HandlerBase.hpp>
-#include <xercesc/sax/SAXParseException.hpp>
-#include <xercesc/util/OutOfMemoryException.hpp>
-#include <xercesc/util/XMLException.hpp>
+#include <stdexcept>
+#include <string_view>
 
 #include "core/PixelVocabulary.h"
 #include "host/Error.h"
+#include "host/HeaderScanner.h"
 #include "host/Text.h"
-#include "host/Xerces.h"
 #include "platform/File.h"
 #include "platform/FileSystem.h"
 
@@ -34,62 +28,7 @@ constexpr std::uint32_t kMaxLevel = 63;
     throw Error(file, "read the header", reason);
 }
 
-// Text of the elements by name; the header's elements do not nest.
-class Texts : public xercesc::HandlerBase {
-public:
-    std::map<std::string, std::string> byName;
-
-    void startElement(const XMLCh* name, xercesc::AttributeList&) override {
-        current = Narrow(zelm::String(name));
-        byName[current].clear();
-    }
-    void endElement(const XMLCh*) override { current.clear(); }
-    void characters(const XMLCh* text, XMLSize_t length) override {
-        if (current.empty()) return;
-        const std::u16string piece(text, length);
-        byName[current] += Narrow(zelm::String(piece.c_str()));
-    }
-    void error(const xercesc::SAXParseException& failure) override { throw failure; }
-    void fatalError(const xercesc::SAXParseException& failure) override { throw failure; }
-
-private:
-    std::string current;
-};
-
-// A header has no document type; one that has is hostile.
-class Parser : public xercesc::SAXParser {
-public:
-    Parser() {
-        setValidationScheme(Val_Never);
-        setDoNamespaces(false);
-        setDoSchema(false);
-        setLoadExternalDTD(false);
-        setDisableDefaultEntityResolution(true);
-        const_cast<xercesc::XMLScanner&>(getScanner()).setDisallowDTD(true);
-    }
-};
-
-std::map<std::string, std::string> ParseDocument(const std::string& file,
-                                                 const std::vector<unsigned char>& document) {
-    InitialiseXerces();
-    try {
-        Texts texts;
-        Parser parser;
-        parser.setDocumentHandler(&texts);
-        parser.setErrorHandler(&texts);
-        const xercesc::MemBufInputSource source(document.data(), document.size(), "header");
-        parser.parse(source);
-        return std::move(texts.byName);
-    } catch (const xercesc::SAXException& failure) {
-        Refuse(file, Narrow(zelm::String(failure.getMessage())));
-    } catch (const xercesc::XMLException& failure) {
-        Refuse(file, Narrow(zelm::String(failure.getMessage())));
-    } catch (const xercesc::OutOfMemoryException&) {
-        throw std::bad_alloc();
-    }
-}
-
-std::vector<unsigned char> ReadDocument(const std::string& file, PyramidHeader& header) {
+std::string ReadDocument(const std::string& file, PyramidHeader& header) {
     const zelm::String name = WideFileName(file);
     const auto stream = platform::File::Open(name.wide, platform::File::Mode::Read);
     if (!stream) Refuse(file, platform::LastErrorText());
@@ -103,7 +42,7 @@ std::vector<unsigned char> ReadDocument(const std::string& file, PyramidHeader& 
         header.tileDataStart - kDocumentOffset > kMaxDocument ||
         header.tileDataStart > header.fileSize)
         Refuse(file, "its header is damaged or was never finished");
-    std::vector<unsigned char> document(header.tileDataStart - kDocumentOffset);
+    std::string document(header.tileDataStart - kDocumentOffset, '\0');
     if (stream->ReadAt(kDocumentOffset, document.data(), document.size()) != document.size())
         Refuse(file, "its header cannot be read");
     return document;
@@ -111,25 +50,51 @@ std::vector<unsigned char> ReadDocument(const std::string& file, PyramidHeader& 
 
 class Fields {
 public:
-    explicit Fields(std::map<std::string, std::string> texts) : byName(std::move(texts)) {}
+    Fields(const std::string& fileName, std::string_view document) : file(fileName) {
+        try {
+            byName = ScanHeaderDocument(document);
+        } catch (const std::runtime_error& failure) {
+            Refuse(file, failure.what());
+        }
+    }
 
-    std::uint32_t Number(const char* name) {
+    std::uint32_t Number(std::string_view name) const {
+        const std::string& text = Text(name);
         std::uint32_t value = 0;
-        Stream(name) >> value;
+        const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), value);
+        if (error != std::errc() || end != text.data() + text.size())
+            Refuse(file, std::string(name) + " is no number");
         return value;
     }
+    // Words that are not known take the neutral value of the vocabulary, as in the readers.
     template <class Code>
-    Code Word(const char* name, void (*parse)(std::istream&, Code&)) {
+    Code Word(std::string_view name, void (*parse)(std::istream&, Code&)) const {
         Code code{};
-        auto stream = Stream(name);
+        std::istringstream stream(Text(name));
         parse(stream, code);
         return code;
     }
 
 private:
-    std::istringstream Stream(const char* name) { return std::istringstream(byName[name]); }
-    std::map<std::string, std::string> byName;
+    const std::string& file;
+    std::map<std::string, std::string, std::less<>> byName;
+
+    const std::string& Text(std::string_view name) const {
+        const auto found = byName.find(name);
+        if (found == byName.end()) Refuse(file, std::string(name) + " is missing");
+        return found->second;
+    }
 };
+
+// Whether the bytes of all levels, which are less than twice those of level 0, can be counted.
+bool CanBeCounted(const PyramidHeader& header) {
+    std::uint64_t bytes = 2;
+    for (const std::uint64_t factor :
+         {std::uint64_t{header.width}, std::uint64_t{header.height}, std::uint64_t{header.bands},
+          std::uint64_t{zelm::PixelSize(header.pixelType)}})
+        if (__builtin_mul_overflow(bytes, factor, &bytes)) return false;
+    return bytes <= UINT64_MAX - header.tileDataStart;
+}
 
 void Check(const std::string& file, const PyramidHeader& header) {
     if (header.tileSize == 0 || header.tileSize > kMaxTileSize)
@@ -138,6 +103,7 @@ void Check(const std::string& file, const PyramidHeader& header) {
         Refuse(file, "its levels are " + std::to_string(header.minLevel) + " to " +
                          std::to_string(header.maxLevel));
     if (zelm::CheckedPixelType(header.pixelType) == 0) Refuse(file, "its pixel type is not known");
+    if (!CanBeCounted(header)) Refuse(file, "its sizes are too large");
 }
 
 }  // namespace
@@ -156,7 +122,8 @@ std::uint64_t PyramidHeader::LevelOffset(std::uint32_t level) const {
 
 PyramidHeader PyramidHeader::Read(const std::string& file) {
     PyramidHeader header;
-    Fields fields(ParseDocument(file, ReadDocument(file, header)));
+    const std::string document = ReadDocument(file, header);
+    const Fields fields(file, document);
     header.versionMajor = fields.Number("HEADER_VERSION_MAJOR");
     header.versionMinor = fields.Number("HEADER_VERSION_MINOR");
     header.bands = fields.Number("HEADER_BANDS");

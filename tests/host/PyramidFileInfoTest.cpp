@@ -4,8 +4,10 @@
 
 #include <cstdio>
 #include <fstream>
+#include <stdexcept>
 
 #include "host/Error.h"
+#include "host/HeaderScanner.h"
 
 namespace zmchost {
 namespace {
@@ -118,8 +120,10 @@ TEST_F(PyramidFileInfoTest, LevelsMayStartAboveZeroAndShrinkToNothing) {
 
 TEST_F(PyramidFileInfoTest, RefusesHeadersThatNobodyCanReadBy) {
     const std::pair<std::string Fields::*, const char*> cases[] = {
-        {&Fields::tileSize, "0"}, {&Fields::tileSize, "2049"},   {&Fields::levelMax, "64"},
-        {&Fields::levelMin, "3"}, {&Fields::height, "<a>1</b>"}, {&Fields::type, "Nibble"}};
+        {&Fields::tileSize, "0"},  {&Fields::tileSize, "2049"},   {&Fields::levelMax, "64"},
+        {&Fields::levelMin, "3"},  {&Fields::height, "<a>1</b>"}, {&Fields::height, "&x;"},
+        {&Fields::type, "Nibble"}, {&Fields::width, "-1"},        {&Fields::width, "4294967296"},
+        {&Fields::width, ""}};
     for (const auto& [field, value] : cases) {
         Fields fields;
         fields.*field = value;
@@ -133,6 +137,52 @@ TEST_F(PyramidFileInfoTest, RefusesEveryCutFile) {
         std::ofstream(name, std::ios::binary) << whole.substr(0, size);
         EXPECT_THROW(ReadPyramidFileInfo(name), Error) << size;
     }
+}
+
+TEST_F(PyramidFileInfoTest, RefusesSizesThatCannotBeCounted) {
+    Fields fields;
+    fields.width = fields.height = fields.bands = "4294967295";
+    EXPECT_THROW(Read(fields), Error);
+}
+
+TEST_F(PyramidFileInfoTest, NoChangedByteDoesMoreThanRefuse) {
+    const std::string whole = FileStart(Document({}));
+    for (std::size_t at = 0; at < whole.size(); ++at)
+        for (const char byte : {'\0', '<', '>', '&', '9', '\xFF'}) {
+            std::string changed = whole;
+            changed[at] = byte;
+            std::ofstream(name, std::ios::binary) << changed;
+            try {
+                (void)ReadPyramidFileInfo(name);
+            } catch (const Error&) {
+            }
+        }
+}
+
+TEST_F(PyramidFileInfoTest, NamesTheFileInFailures) {
+    try {
+        (void)ReadPyramidFileInfo(name);
+        FAIL();
+    } catch (const Error& error) {
+        EXPECT_EQ(error.File(), name);
+    }
+}
+
+TEST(HeaderScanner, ReadsCommentsEntitiesAndEmptyElements) {
+    const auto values = ScanHeaderDocument(
+        "\xEF\xBB\xBF<?xml version='1.0'?><!-- > -->\n<DATASET><HEADER><A> x &lt;<!-- -->y </A>"
+        "<B/></HEADER><OTHER><A>2</A></OTHER></DATASET>\n");
+    EXPECT_EQ(values.size(), 2u);
+    EXPECT_EQ(values.at("A"), "x <y");
+    EXPECT_EQ(values.at("B"), "");
+}
+
+TEST(HeaderScanner, RefusesWhatIsNotWellFormed) {
+    for (const char* document :
+         {"", " ", "<DATASET>", "<DATASET></HEADER>", "<HEADER/>", "<DATASET/><DATASET/>",
+          "<!DOCTYPE a [<!ENTITY b 'c'>]><DATASET/>", "<DATASET>text</DATASET>", "</>",
+          "<DATASET><A><B><C/></B></A></DATASET>", "<DATASET/>trailing", "<DATASET", "<>"})
+        EXPECT_THROW((void)ScanHeaderDocument(document), std::runtime_error) << document;
 }
 
 TEST(PyramidFileInfo, KnowsAPyramidByItsStart) {
