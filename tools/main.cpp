@@ -99,8 +99,10 @@ std::vector<std::string> Reversed(int count, char** words) {
 }
 
 void Program::CheckCommand(const std::string& word) const {
-    if (!word.empty() && word[0] != '-' && !app.get_subcommand_no_throw(word))
-        throw UsageError(word, "there is no such command; see zmcraster --help");
+    if (word.empty() || word[0] == '-' || word == generate->get_name()) return;
+    for (const CLI::App* part : parts)
+        if (part->get_name() == word) return;
+    throw UsageError(word, "there is no such command; see zmcraster --help");
 }
 
 ExitStatus Program::Run(std::vector<std::string> arguments) {
