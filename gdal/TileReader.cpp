@@ -108,22 +108,67 @@ const unsigned char* TileReader::LoadTile(const Window& tile, int band) {
     return scratch.data();
 }
 
+// Who reads one band of a picture mostly goes on to the next, and all bands are taken apart by
+// vector code in the time that one takes without it.
+bool TileReader::SplitsIntoPlanes(int bandCount) const {
+    return bandCount == 1 && fileBands >= 2 && fileBands <= 4;
+}
+
+// Takes a tile apart into `planes`; the plane of `band` goes to `out` instead, if that is not null.
+bool TileReader::SplitTile(const Window& tile, int band, void* out) {
+    heldApart = TileKey();
+    if (!LoadTile(tile, 0)) return false;
+    const auto samples =
+        static_cast<std::size_t>(tile.width) * static_cast<std::size_t>(tile.height);
+    planes.resize(scratch.size());
+    void* parts[4] = {};
+    for (int i = 0; i < fileBands; ++i)
+        parts[i] = planes.data() + static_cast<std::size_t>(i) * samples * sampleSize;
+    if (out) parts[band] = out;
+    GDALDeinterleave(scratch.data(), sampleType, fileBands, parts, sampleType, samples);
+    heldApart = held;
+    planeAway = out ? band : -1;
+    return true;
+}
+
+const unsigned char* TileReader::LoadPlane(const Window& tile, int band) {
+    if (!IsPixelInterleaved()) return LoadTile(tile, band);
+    const TileKey key{tile.level, tile.x, tile.y, 0};
+    const bool there = heldApart == key && planeAway != band;
+    if (!there && !SplitTile(tile, band, nullptr)) return nullptr;
+    const auto samples =
+        static_cast<std::size_t>(tile.width) * static_cast<std::size_t>(tile.height);
+    return planes.data() + static_cast<std::size_t>(band) * samples * sampleSize;
+}
+
+// One band of a whole tile, in the caller's buffer as in a plane.
+bool TileReader::IsPlainPlane(const Window& window, int bandCount, const Target& target) const {
+    const auto size = static_cast<GSpacing>(sampleSize);
+    return SplitsIntoPlanes(bandCount) && IsPixelInterleaved() && target.type == sampleType &&
+           target.pixelSpace == size && target.lineSpace == size * window.width &&
+           window.width == tileSize && window.height == tileSize && window.x % tileSize == 0 &&
+           window.y % tileSize == 0;
+}
+
 bool TileReader::Read(const Window& window, const int* bands, int bandCount, const Target& target) {
     if (FitsTarget(window, bands, bandCount, target))
         return ReadRaw(window, bands, bandCount, target.data);
+    const TileKey key{window.level, window.x, window.y, 0};
+    if (IsPlainPlane(window, bandCount, target) && heldApart != key)
+        return SplitTile(window, bands[0], target.data);
     const int lastX = (window.x + window.width - 1) / tileSize;
     const int lastY = (window.y + window.height - 1) / tileSize;
     for (int tileY = window.y / tileSize; tileY <= lastY; ++tileY)
         for (int tileX = window.x / tileSize; tileX <= lastX; ++tileX) {
             const Window tile = TileAt(window.level, tileX, tileY);
-            if (IsPixelInterleaved()) {
+            if (IsPixelInterleaved() && !SplitsIntoPlanes(bandCount)) {
                 const unsigned char* const samples = LoadTile(tile, 0);
                 if (!samples) return false;
                 CopyTile(tile, samples, fileBands, window, bands, bandCount, target);
                 continue;
             }
             for (int i = 0; i < bandCount; ++i) {
-                const unsigned char* const samples = LoadTile(tile, bands[i]);
+                const unsigned char* const samples = LoadPlane(tile, bands[i]);
                 if (!samples) return false;
                 Target plane = target;
                 plane.data = static_cast<unsigned char*>(target.data) + i * target.bandSpace;
@@ -139,7 +184,6 @@ bool TileReader::Read(const Window& window, const int* bands, int bandCount, con
 bool TileReader::CopyAllBandsApart(const Window& tile, const unsigned char* samples,
                                    const Window& part, const Window& window, const int* bands,
                                    int bandCount, const Target& target) const {
-#if GDAL_VERSION_NUM >= GDAL_COMPUTE_VERSION(3, 6, 0)
     if (bandCount < 2 || bandCount > 4 || target.type != sampleType ||
         target.pixelSpace != static_cast<GSpacing>(sampleSize) ||
         !std::equal(bands, bands + bandCount, allBands.begin(), allBands.end()))
@@ -152,15 +196,12 @@ bool TileReader::CopyAllBandsApart(const Window& tile, const unsigned char* samp
         auto* const to = static_cast<unsigned char*>(target.data) +
                          (part.y - window.y + line) * target.lineSpace +
                          (part.x - window.x) * target.pixelSpace;
-        void* planes[4] = {};
-        for (int i = 0; i < bandCount; ++i) planes[i] = to + i * target.bandSpace;
-        GDALDeinterleave(samples + fromPixel * pixelSize, sampleType, bandCount, planes, sampleType,
+        void* parts[4] = {};
+        for (int i = 0; i < bandCount; ++i) parts[i] = to + i * target.bandSpace;
+        GDALDeinterleave(samples + fromPixel * pixelSize, sampleType, bandCount, parts, sampleType,
                          static_cast<std::size_t>(part.width));
     }
     return true;
-#else
-    return false;
-#endif
 }
 
 void TileReader::CopyTile(const Window& tile, const unsigned char* samples, int samplesPerPixel,

@@ -49,7 +49,7 @@ public:
     bool Read(const Window& window, const int* bands, int bandCount, const Target& target);
 
     // Must be called when the file has changed.
-    void Forget() { held = TileKey(); }
+    void Forget() { held = heldApart = TileKey(); }
 
     // The tile of the grid of `level`, clipped to the level.
     Window TileAt(std::uint32_t level, int tileX, int tileY) const;
@@ -64,6 +64,7 @@ private:
     int fileBands;
     std::vector<int> allBands;
     std::vector<unsigned char> scratch;  // one tile as GDAL sees its samples
+    std::vector<unsigned char> planes;   // the same, band after band
     std::vector<unsigned char> raw;      // one tile as the file holds it, where that differs
 
     struct TileKey {
@@ -73,12 +74,18 @@ private:
         int band = 0;  // 0 where all bands lie together
         friend bool operator==(const TileKey&, const TileKey&) = default;
     };
-    TileKey held;  // tile in `scratch`
+    TileKey held;        // tile in `scratch`
+    TileKey heldApart;   // tile in `planes`, and the
+    int planeAway = -1;  // band whose plane went straight to a caller
 
     bool ReadRaw(const Window& tile, const int* bands, int bandCount, void* buffer);
     bool FitsTarget(const Window& window, const int* bands, int bandCount,
                     const Target& target) const;
     const unsigned char* LoadTile(const Window& tile, int band);
+    const unsigned char* LoadPlane(const Window& tile, int band);
+    bool SplitTile(const Window& tile, int band, void* out);
+    bool IsPlainPlane(const Window& window, int bandCount, const Target& target) const;
+    bool SplitsIntoPlanes(int bandCount) const;
     void CopyTile(const Window& tile, const unsigned char* samples, int samplesPerPixel,
                   const Window& window, const int* bands, int bandCount,
                   const Target& target) const;
