@@ -52,8 +52,8 @@ std::string Module::DefaultPath() {
     const std::string name = ModuleFileName();
     const std::string here = platform::FolderOf(
         platform::FileOfCode(reinterpret_cast<const void*>(&Module::DefaultPath)));
-    for (const char* const folder :
-         {"", "zmcraster", "../zmcraster", "../lib/zmcraster", "../lib", ZMC_INSTALLED_MODULE_DIR}) {
+    for (const char* const folder : {"", "zmcraster", "../zmcraster", "../lib/zmcraster", "../lib",
+                                     ZMC_INSTALLED_MODULE_DIR}) {
         const bool absolute = folder[0] == '/';
         const std::string beside = *folder ? platform::JoinPath(here, folder) : here;
         const std::string candidate = platform::JoinPath(absolute ? folder : beside, name);
