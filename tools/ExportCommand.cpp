@@ -124,6 +124,7 @@ void ExportCommand::Translate(GDALDataset& dataset,
     const std::unique_ptr<GDALTranslateOptions, decltype(&GDALTranslateOptionsFree)> translate(
         GDALTranslateOptionsNew(list.List(), nullptr), &GDALTranslateOptionsFree);
     if (!translate) throw Failure(target, TakeGdalError(target));
+    SetSubject(target);
     const auto before = StampOf(target);
     TerminalProgress bar(fs::path(target).filename().string(), !quiet);
     GDALTranslateOptionsSetProgress(

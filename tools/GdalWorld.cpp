@@ -18,17 +18,18 @@ constexpr GIntBig kBlockCache = GIntBig{96} << 20;
 
 std::mutex mutex;
 std::string firstError;
-
-// GDAL works on threads of its own too, so there is one place for all of them.
-void CPL_STDCALL TakeError(CPLErr kind, CPLErrorNum, const char* text) {
-    if (kind == CE_Warning) return Warn(std::string("warning: ") + text);
-    if (kind < CE_Failure) return;
-    const std::lock_guard lock(mutex);
-    if (firstError.empty()) firstError = text;
-}
+std::string subject;
 
 std::string WithoutPrefix(const std::string& text, const std::string& prefix) {
     return text.compare(0, prefix.size(), prefix) == 0 ? text.substr(prefix.size()) : text;
+}
+
+// GDAL works on threads of its own too, so there is one place for all of them.
+void CPL_STDCALL TakeError(CPLErr kind, CPLErrorNum, const char* text) {
+    const std::lock_guard lock(mutex);
+    if (kind == CE_Warning) Warn(subject + ": warning: " + WithoutPrefix(text, subject + ": "));
+    if (kind < CE_Failure) return;
+    if (firstError.empty()) firstError = text;
 }
 
 }  // namespace
@@ -45,6 +46,11 @@ void StartGdal() {
     }
 }
 
+void SetSubject(const std::string& file) {
+    const std::lock_guard lock(mutex);
+    subject = file;
+}
+
 std::string TakeGdalError(const std::string& file) {
     const std::lock_guard lock(mutex);
     std::string text = WithoutPrefix(firstError, file + ": ");
@@ -56,6 +62,7 @@ DatasetPtr OpenDataset(const std::string& name, const std::vector<std::string>& 
     CPLStringList list;
     for (const std::string& option : options) list.AddString(option.c_str());
     TakeGdalError(name);
+    SetSubject(name);
     DatasetPtr dataset(GDALDataset::Open(name.c_str(), GDAL_OF_RASTER | GDAL_OF_VERBOSE_ERROR,
                                          nullptr, list.List(), nullptr));
     std::string reason = TakeGdalError(name);

@@ -23,6 +23,9 @@ void StartGdal();
 // Opens a raster for reading. Throws Failure with GDAL's reason.
 DatasetPtr OpenDataset(const std::string& name, const std::vector<std::string>& options = {});
 
+// Names the file that warnings are about from now on.
+void SetSubject(const std::string& file);
+
 // What GDAL reported as a failure since the last call, without the name of `file` at its front;
 // empty if nothing. Warnings are said at once.
 std::string TakeGdalError(const std::string& file);

@@ -202,9 +202,9 @@ void PrintPalettes(const Json& document) {
 
 void Print(const Json& document) {
     std::printf("%s\n", Text(document["file"]).c_str());
-    std::printf("%s x %s pixels, %s bands of %s\n", Text(document["width"]).c_str(),
+    std::printf("%s x %s pixels, %s band%s of %s\n", Text(document["width"]).c_str(),
                 Text(document["height"]).c_str(), Text(document["bands"]).c_str(),
-                Text(document["pixelType"]).c_str());
+                document["bands"] == 1 ? "" : "s", Text(document["pixelType"]).c_str());
     std::printf("interleave %s, ordering %s, tiles of %s, version %s\n",
                 Text(document["interleave"]).c_str(), Text(document["tileOrdering"]).c_str(),
                 Text(document["tileSize"]).c_str(), Text(document["version"]).c_str());

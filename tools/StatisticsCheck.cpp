@@ -102,11 +102,17 @@ private:
                                       (has ? Digits(b) : std::string("none")) + " in the pixels");
         };
         if constexpr (!zelm::kIsComplex<T>) {
+            // Readers take the ends of 64-bit ranges through a double, which those near the limits
+            // of the type do not survive.
+            const bool lost = std::is_integral_v<T> && sizeof(T) == 8 &&
+                              static_cast<double>(computed.maximum) >=
+                                  static_cast<double>(std::numeric_limits<T>::max());
             const double error = std::is_same_v<T, float> ? kSingleError : kRealError;
             expect(Flag::Minimum, "minimum", static_cast<double>(stored.minimum),
                    static_cast<double>(computed.minimum), error);
-            expect(Flag::Maximum, "maximum", static_cast<double>(stored.maximum),
-                   static_cast<double>(computed.maximum), error);
+            if (!lost)
+                expect(Flag::Maximum, "maximum", static_cast<double>(stored.maximum),
+                       static_cast<double>(computed.maximum), error);
         }
         expect(Flag::Mean, "mean", stored.mean, computed.mean, kRealError);
         expect(Flag::StandardDeviation, "standard deviation", stored.standardDeviation,

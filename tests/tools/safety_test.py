@@ -144,7 +144,7 @@ class FullDisk(ToolTest):
         done = self.run_tool("build", "large.tif", "disk/made.pyr", "--overwrite")
         self.assertEqual((done.returncode, done.stdout), (1, ""))
         self.assertRegex(done.stderr, r"^zmcraster: disk/made\.pyr: cannot build it: it needs \d+ "
-                                      r"bytes of disk space, and \d+ are free\n$")
+                                      r"bytes of disk space, and \d+ bytes are free\n$")
         with open(self.path("disk/made.pyr"), "rb") as file:
             self.assertEqual(file.read(), old)
         self.assertEqual(os.listdir(self.path("disk")), ["made.pyr"])
