@@ -7,6 +7,7 @@
 #include "tools/Command.h"
 #include "tools/HistogramBars.h"
 #include "tools/RasterView.h"
+#include "tools/Verification.h"
 
 namespace zmctools {
 namespace {
@@ -132,6 +133,10 @@ Json Describe(const std::string& file) {
     // Of a type without a reader the header is all that can be told.
     if (zelm::CheckedPixelType(header.pixelType) == 0 || !info.HasMetadataDocument())
         return document;
+    if (const std::string wrong = JudgeMetadata(file, info); !wrong.empty()) {
+        Warn(file + ": warning: " + wrong + "; statistics, histograms and palettes are not shown");
+        return document;
+    }
     const zmchost::Raster raster = OpenPyramid(file);
     zelm::VisitElementType(raster.PixelType(), [&]<class T>(std::type_identity<T>) {
         document["statistics"] = StatisticsOf<T>(raster);

@@ -55,6 +55,13 @@ void JudgeRecord(CheckResult& result, const zmchost::Raster& raster, const char*
 
 }  // namespace
 
+std::string JudgeMetadata(const std::string& file, const zmchost::PyramidFileInfo& info) {
+    if (!info.HasMetadataDocument()) return "";
+    if (info.header.fileSize - info.MetaDocumentOffset() > kMaxDocument)
+        return "the metadata document is longer than 256 MiB";
+    return JudgeDocument(ReadDocument(file, info));
+}
+
 CheckResult CheckStructure(const zmchost::PyramidFileInfo& info, const zmchost::Raster& raster) {
     CheckResult result{"structure", {}, {}};
     const zmchost::PyramidHeader& header = info.header;
@@ -93,11 +100,7 @@ CheckResult CheckDocuments(const std::string& file, const zmchost::PyramidFileIn
                            const zmchost::Raster& raster) {
     CheckResult result{"documents", {}, {}};
     if (!info.HasMetadataDocument()) return result;
-    if (info.header.fileSize - info.MetaDocumentOffset() > kMaxDocument) {
-        result.problems.push_back("the metadata document is longer than 256 MiB");
-        return result;
-    }
-    const std::string wrong = JudgeDocument(ReadDocument(file, info));
+    const std::string wrong = JudgeMetadata(file, info);
     if (!wrong.empty()) {
         result.problems.push_back(wrong);
         return result;

@@ -28,7 +28,7 @@ private:
     std::string bands;
     std::vector<CheckResult> results;
 
-    void CheckPixels(zmchost::Raster& raster);
+    void CheckPixels(zmchost::Raster& raster, bool documentIsGood);
     ExitStatus Report() const;
 };
 
@@ -72,11 +72,13 @@ bool HasPalette(const zmchost::Raster& raster) {
     return false;
 }
 
-void VerifyCommand::CheckPixels(zmchost::Raster& raster) {
+void VerifyCommand::CheckPixels(zmchost::Raster& raster, bool documentIsGood) {
     TakeNoDataValues(raster);
-    results.push_back(CheckStatistics(raster, quiet));
-    const auto usual =
-        HasPalette(raster) ? zmchost::Resampling::Mode : zmchost::Resampling::Average;
+    results.push_back(documentIsGood
+                          ? CheckStatistics(raster, quiet)
+                          : CheckResult{"statistics", "the document cannot be read", {}});
+    const auto usual = documentIsGood && HasPalette(raster) ? zmchost::Resampling::Mode
+                                                            : zmchost::Resampling::Average;
     results.push_back(
         CheckLevels(raster, zmchost::ParseResampling(resampling).value_or(usual), quiet));
     if (source.empty()) return;
@@ -114,8 +116,9 @@ ExitStatus VerifyCommand::Run() {
     results.push_back(CheckStructure(info, raster));
     results.push_back(CheckCompleteness(info));
     results.push_back(CheckDocuments(file, info, raster));
+    const bool documentIsGood = results.back().problems.empty();
     if (info.complete)
-        CheckPixels(raster);
+        CheckPixels(raster, documentIsGood);
     else
         for (const char* const check : {"statistics", "levels"})
             results.push_back({check, "the file is not complete", {}});

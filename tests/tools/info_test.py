@@ -1,4 +1,7 @@
 """What info tells, against the file itself."""
+import json
+import os
+
 import numpy as np
 
 from frame import COUNT, REAL, ToolTest, geotiff, samples
@@ -73,6 +76,15 @@ class Info(ToolTest):
         info = self.document("info", "picture.pyr")
         self.assertEqual((info["complete"], info["bytesMissing"]), (False, 1000))
         self.assertIn("not complete: 1000 bytes are missing", self.good("info", "picture.pyr"))
+
+    def test_a_malformed_document(self):
+        self.pyramid()
+        os.truncate(self.path("picture.pyr"), os.path.getsize(self.path("picture.pyr")) - 20)
+        done = self.run_tool("info", "picture.pyr", "--json")
+        self.assertEqual(done.returncode, 0)
+        self.assertRegex(done.stderr, r"^zmcraster: picture\.pyr: warning: the metadata document is "
+                                      r"malformed: .*\n$")
+        self.assertEqual(json.loads(done.stdout)["statistics"], [])
 
     def test_text_for_people(self):
         self.pyramid()
