@@ -17,12 +17,12 @@ constexpr const char* kOwnDomain = "ZMCPYRAMID";
 
 constexpr std::uint64_t kMaxTileBytes = INT_MAX;
 
-zmchost::PyramidFileInfo CheckedInfo(const std::string& fileName) {
+zmchost::PyramidFileInfo CheckedInfo(const std::string& fileName,
+                                     const zmchost::PyramidHeader& header) {
     const auto refuse = [&](const char* why) {
         throw zmchost::Error(fileName, "show it to GDAL", why);
     };
-    zmchost::PyramidFileInfo info = zmchost::ReadPyramidFileInfo(fileName);
-    const zmchost::PyramidHeader& header = info.header;
+    zmchost::PyramidFileInfo info = zmchost::DescribePyramidFile(header);
     const auto* const base = info.FindLevel(header.minLevel);
     if (!base || base->width == 0 || base->height == 0) refuse("it holds no pixels");
     if (header.width > INT_MAX || header.height > INT_MAX) refuse("it is too large");
@@ -37,8 +37,12 @@ zmchost::PyramidFileInfo CheckedInfo(const std::string& fileName) {
 }  // namespace
 
 OpenFile::OpenFile(const std::string& fileName, SignedByteAs signedByteAs)
+    : OpenFile(fileName, zmchost::PyramidHeader::Read(fileName), signedByteAs) {}
+
+OpenFile::OpenFile(const std::string& fileName, const zmchost::PyramidHeader& header,
+                   SignedByteAs signedByteAs)
     : raster(fileName),
-      info(CheckedInfo(fileName)),
+      info(CheckedInfo(fileName, header)),
       tiles(raster, info, GdalTypeOf(info.header.pixelType, signedByteAs)),
       archive(raster, info.HasMetadataDocument()) {}
 

@@ -29,6 +29,9 @@ class OpenFile {
 public:
     // Throws zmchost::Error if the file is no pyramid, or one that GDAL cannot hold.
     OpenFile(const std::string& fileName, SignedByteAs signedByteAs);
+    // The same with the header at hand.
+    OpenFile(const std::string& fileName, const zmchost::PyramidHeader& header,
+             SignedByteAs signedByteAs);
 
     LazyRaster raster;
     const zmchost::PyramidFileInfo info;

@@ -16,11 +16,14 @@ namespace {
 
 constexpr const char* kName = "ZMCPyramid";
 
+std::string_view StartOf(const GDALOpenInfo& info) {
+    if (!info.pabyHeader || info.nHeaderBytes <= 0) return {};
+    return {reinterpret_cast<const char*>(info.pabyHeader),
+            static_cast<std::size_t>(info.nHeaderBytes)};
+}
+
 int Identify(GDALOpenInfo* info) {
-    if (!info->pabyHeader || info->nHeaderBytes <= 0) return FALSE;
-    const std::string_view start(reinterpret_cast<const char*>(info->pabyHeader),
-                                 static_cast<std::size_t>(info->nHeaderBytes));
-    return zmchost::LooksLikePyramid(start) ? TRUE : FALSE;
+    return zmchost::LooksLikePyramid(StartOf(*info)) ? TRUE : FALSE;
 }
 
 void WarnIfIncomplete(const Dataset& dataset, const zmchost::PyramidFileInfo& info) {
@@ -31,9 +34,17 @@ void WarnIfIncomplete(const Dataset& dataset, const zmchost::PyramidFileInfo& in
              dataset.GetDescription(), static_cast<GUIntBig>(info.bytesMissing));
 }
 
+// GDAL has read the beginning of the file already, which holds the header as a rule.
+zmchost::PyramidHeader HeaderOf(GDALOpenInfo& info) {
+    const std::string_view start = StartOf(info);
+    if (info.fpL && zmchost::PyramidHeader::IsWhole(start) && VSIFSeekL(info.fpL, 0, SEEK_END) == 0)
+        return zmchost::PyramidHeader::Parse(info.pszFilename, start, VSIFTellL(info.fpL));
+    return zmchost::PyramidHeader::Read(info.pszFilename);
+}
+
 std::unique_ptr<Dataset> OpenDataset(GDALOpenInfo* info) {
-    auto file =
-        std::make_shared<OpenFile>(info->pszFilename, SignedByteFrom(info->papszOpenOptions));
+    auto file = std::make_shared<OpenFile>(info->pszFilename, HeaderOf(*info),
+                                           SignedByteFrom(info->papszOpenOptions));
     const zmchost::PyramidFileInfo layout = file->info;
     auto dataset = Dataset::FromFile(std::move(file), info->eAccess);
     // A look for each companion is cheaper than a list of the whole folder, unless that is there.

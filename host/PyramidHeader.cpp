@@ -1,5 +1,6 @@
 #include "host/PyramidHeader.h"
 
+#include <algorithm>
 #include <charconv>
 #include <cstring>
 #include <map>
@@ -21,6 +22,7 @@ namespace {
 constexpr char kMagic[] = {'K', 'O', 'B', 'T'};
 constexpr std::uint64_t kDocumentOffset = 20;
 constexpr std::uint64_t kMaxDocument = 1 << 20;
+constexpr std::uint64_t kUsualStart = 1024;  // holds the header of every file that is written
 constexpr std::uint32_t kMaxTileSize = 2048;
 constexpr std::uint32_t kMaxLevel = 63;
 
@@ -28,24 +30,28 @@ constexpr std::uint32_t kMaxLevel = 63;
     throw Error(file, "read the header", reason);
 }
 
-std::string ReadDocument(const std::string& file, PyramidHeader& header) {
-    const zelm::String name = WideFileName(file);
-    const auto stream = platform::File::Open(name.wide, platform::File::Mode::Read);
-    if (!stream) Refuse(file, platform::LastErrorText());
-    unsigned char start[kDocumentOffset];
-    if (stream->ReadAt(0, start, sizeof start) != sizeof start ||
-        std::memcmp(start, kMagic, sizeof kMagic) != 0)
+// Where the file says that its tiles begin; `start` holds both offsets.
+std::uint64_t LoadTileDataStart(std::string_view start) {
+    std::uint64_t value = 0;
+    for (unsigned i = 0; i < 8; ++i)
+        value |= std::uint64_t{static_cast<unsigned char>(start[4 + i])} << (8 * i);
+    return value;
+}
+
+// Where the header document ends, from the first bytes of a file.
+std::uint64_t DocumentEnd(const std::string& file, std::string_view start, std::uint64_t fileSize) {
+    if (start.size() < kDocumentOffset || std::memcmp(start.data(), kMagic, sizeof kMagic) != 0)
         Refuse(file, "it is no pyramid file");
-    for (unsigned i = 0; i < 8; ++i) header.tileDataStart |= std::uint64_t{start[4 + i]} << (8 * i);
-    header.fileSize = stream->Size();
-    if (header.tileDataStart <= kDocumentOffset ||
-        header.tileDataStart - kDocumentOffset > kMaxDocument ||
-        header.tileDataStart > header.fileSize)
+    const std::uint64_t end = LoadTileDataStart(start);
+    if (end <= kDocumentOffset || end - kDocumentOffset > kMaxDocument || end > fileSize)
         Refuse(file, "its header is damaged or was never finished");
-    std::string document(header.tileDataStart - kDocumentOffset, '\0');
-    if (stream->ReadAt(kDocumentOffset, document.data(), document.size()) != document.size())
-        Refuse(file, "its header cannot be read");
-    return document;
+    return end;
+}
+
+std::string ReadStart(const std::string& file, platform::File& stream, std::size_t size) {
+    std::string start(size, '\0');
+    if (stream.ReadAt(0, start.data(), size) != size) Refuse(file, "its header cannot be read");
+    return start;
 }
 
 class Fields {
@@ -121,9 +127,30 @@ std::uint64_t PyramidHeader::LevelOffset(std::uint32_t level) const {
 }
 
 PyramidHeader PyramidHeader::Read(const std::string& file) {
+    const zelm::String name = WideFileName(file);
+    const auto stream = platform::File::Open(name.wide, platform::File::Mode::Read);
+    if (!stream) Refuse(file, platform::LastErrorText());
+    const std::uint64_t size = stream->Size();
+    std::string start =
+        ReadStart(file, *stream, static_cast<std::size_t>(std::min(size, kUsualStart)));
+    const std::uint64_t end = DocumentEnd(file, start, size);
+    if (end > start.size()) start = ReadStart(file, *stream, static_cast<std::size_t>(end));
+    return Parse(file, start, size);
+}
+
+bool PyramidHeader::IsWhole(std::string_view start) {
+    return start.size() >= kDocumentOffset && LoadTileDataStart(start) <= start.size();
+}
+
+PyramidHeader PyramidHeader::Parse(const std::string& file, std::string_view start,
+                                   std::uint64_t fileSize) {
     PyramidHeader header;
-    const std::string document = ReadDocument(file, header);
-    const Fields fields(file, document);
+    header.fileSize = fileSize;
+    header.tileDataStart = DocumentEnd(file, start, fileSize);
+    if (header.tileDataStart > start.size()) Refuse(file, "its header cannot be read");
+    const Fields fields(
+        file, start.substr(kDocumentOffset,
+                           static_cast<std::size_t>(header.tileDataStart - kDocumentOffset)));
     header.versionMajor = fields.Number("HEADER_VERSION_MAJOR");
     header.versionMinor = fields.Number("HEADER_VERSION_MINOR");
     header.bands = fields.Number("HEADER_BANDS");

@@ -7,6 +7,7 @@
 
 #include <cstdint>
 #include <string>
+#include <string_view>
 
 namespace zmchost {
 
@@ -38,6 +39,12 @@ struct PyramidHeader {
 
     // Reads the header of a file. Throws Error if it is no pyramid file or its header is damaged.
     static PyramidHeader Read(const std::string& file);
+    // The same from the file's first bytes, which reach to the first tile at least; `file` names it
+    // in errors.
+    static PyramidHeader Parse(const std::string& file, std::string_view start,
+                               std::uint64_t fileSize);
+    // Whether these first bytes of a file reach to the first tile.
+    static bool IsWhole(std::string_view start);
 };
 
 }  // namespace zmchost

@@ -68,7 +68,7 @@ class Copies(FolderTest):
         source = memory_dataset(samples(gdal.GDT_Byte, 1200, 1300, 3), gdal.GDT_Byte)
         for limit in np.random.default_rng(3).uniform(0, 0.95, 12):
             with self.assertRaises(RuntimeError):
-                quiet(lambda: self.copy(source, callback=lambda done, *_: done < limit))
+                quiet(lambda: self.copy(source, callback=lambda done, *_: int(done < limit)))
             self.assertEqual(self.files(), [])
             self.assertEqual(self.descriptors(), [])
 

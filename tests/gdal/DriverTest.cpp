@@ -1,0 +1,241 @@
+// The driver from inside the process, with sanitizers where those are on.
+#include "gdal/Driver.h"
+
+#include <gdal_alg.h>
+#include <gdal_priv.h>
+#include <gtest/gtest.h>
+
+#include <cstdlib>
+#include <cstring>
+#include <filesystem>
+#include <fstream>
+#include <numeric>
+#include <random>
+#include <thread>
+#include <vector>
+
+#include "gdal/SampleType.h"
+
+namespace zmcgdal {
+namespace {
+
+namespace fs = std::filesystem;
+using DatasetPtr = std::unique_ptr<GDALDataset>;
+
+class DriverTest : public testing::Test {
+protected:
+    fs::path folder;
+
+    static void SetUpTestSuite() {
+        setenv("ZMCRASTER_MODULE", ZMC_MODULE_PATH, 1);
+        GDALRegister_ZMCPyramid();
+        GDALAllRegister();
+    }
+    void SetUp() override {
+        folder =
+            fs::path(testing::TempDir()) / ("zmcgdal" + std::to_string(std::random_device()()));
+        fs::create_directories(folder);
+    }
+    void TearDown() override { fs::remove_all(folder); }
+
+    std::string Path(const char* name) const { return folder / name; }
+
+    static GDALDriver& Driver(const char* name = "ZMCPyramid") {
+        return *GetGDALDriverManager()->GetDriverByName(name);
+    }
+
+    static DatasetPtr Open(const std::string& name, unsigned flags = GDAL_OF_RASTER) {
+        return DatasetPtr(GDALDataset::Open(name.c_str(), flags));
+    }
+
+    // Random bytes in memory; floating types get what the bytes happen to mean.
+    static DatasetPtr Memory(int width, int height, int bands, GDALDataType type) {
+        DatasetPtr dataset(Driver("MEM").Create("", width, height, bands, type, nullptr));
+        std::vector<double> line(static_cast<std::size_t>(width) * 2);
+        std::mt19937 random(5);
+        for (int band = 1; band <= bands; ++band)
+            for (int y = 0; y < height; ++y) {
+                for (double& value : line) value = static_cast<double>(random() % 251);
+                EXPECT_EQ(dataset->GetRasterBand(band)->RasterIO(
+                              GF_Write, 0, y, width, 1, line.data(), width, 1, GDT_CFloat64, 0, 0),
+                          CE_None);
+            }
+        return dataset;
+    }
+
+    static std::vector<unsigned char> Pixels(GDALDataset& dataset) {
+        const GDALDataType type = dataset.GetRasterBand(1)->GetRasterDataType();
+        const int width = dataset.GetRasterXSize(), height = dataset.GetRasterYSize();
+        std::vector<unsigned char> pixels(
+            static_cast<std::size_t>(width) * static_cast<std::size_t>(height) *
+            static_cast<std::size_t>(dataset.GetRasterCount() * GDALGetDataTypeSizeBytes(type)));
+        EXPECT_EQ(dataset.RasterIO(GF_Read, 0, 0, width, height, pixels.data(), width, height, type,
+                                   dataset.GetRasterCount(), nullptr, 0, 0, 0),
+                  CE_None);
+        return pixels;
+    }
+
+    std::string MakeCopy(GDALDataset& source, const char* name = "copy.pyr") {
+        const DatasetPtr made(
+            Driver().CreateCopy(Path(name).c_str(), &source, TRUE, nullptr, nullptr, nullptr));
+        EXPECT_TRUE(made);
+        return Path(name);
+    }
+};
+
+TEST_F(DriverTest, RegistersOnce) {
+    const int before = GetGDALDriverManager()->GetDriverCount();
+    GDALRegister_ZMCPyramid();
+    EXPECT_EQ(GetGDALDriverManager()->GetDriverCount(), before);
+}
+
+TEST_F(DriverTest, EveryElementTypeHasADataTypeAndComesBack) {
+#define ZMC_X(type, name, code)                                             \
+    EXPECT_NE(GdalTypeOf(code, SignedByteAs::Int16), GDT_Unknown) << #name; \
+    EXPECT_EQ(PixelTypeFor(GdalTypeOf(code, SignedByteAs::FlaggedByte), code == 99), code) << #name;
+    ZMC_ELEMENT_TYPES(ZMC_X)
+#undef ZMC_X
+    EXPECT_EQ(PixelTypeFor(GDT_Byte, true), zelm::PixelTypeCode::Char);
+    EXPECT_EQ(PixelTypeFor(GDT_Unknown, false), 0u);
+    EXPECT_EQ(GdalTypeOf(7, SignedByteAs::Int16), GDT_Unknown);
+}
+
+TEST_F(DriverTest, CopiesOfEveryTypeHoldTheSamePixels) {
+    for (const GDALDataType type :
+         {GDT_Byte, GDT_UInt16, GDT_Int16, GDT_UInt32, GDT_Int32, GDT_UInt64, GDT_Int64,
+          GDT_Float32, GDT_Float64, GDT_CFloat32, GDT_CFloat64})
+        for (const int bands : {1, 3, 9}) {
+            const DatasetPtr source = Memory(300, 270, bands, type);
+            const DatasetPtr copy = Open(MakeCopy(*source));
+            ASSERT_TRUE(copy);
+            EXPECT_EQ(Pixels(*copy), Pixels(*source)) << GDALGetDataTypeName(type);
+            for (int band = 1; band <= bands; ++band)
+                EXPECT_EQ(GDALChecksumImage(GDALRasterBand::ToHandle(copy->GetRasterBand(band)), 0,
+                                            0, 300, 270),
+                          GDALChecksumImage(GDALRasterBand::ToHandle(source->GetRasterBand(band)),
+                                            0, 0, 300, 270));
+        }
+}
+
+TEST_F(DriverTest, BlocksWrittenInAnyOrderArriveWithASmallCache) {
+    const GIntBig before = GDALGetCacheMax64();
+    GDALSetCacheMax64(200000);
+    for (const int bands : {2, 10}) {
+        const DatasetPtr source = Memory(600, 500, bands, GDT_Byte);
+        DatasetPtr made(
+            Driver().Create(Path("new.pyr").c_str(), 600, 500, bands, GDT_Byte, nullptr));
+        ASSERT_TRUE(made);
+        std::vector<unsigned char> window(60 * 50);
+        std::vector<int> order(static_cast<std::size_t>(100 * bands));
+        std::iota(order.begin(), order.end(), 0);
+        std::shuffle(order.begin(), order.end(), std::mt19937(3));
+        for (const int i : order) {
+            const int x = i % 10 * 60, y = i / 10 % 10 * 50, band = i / 100 + 1;
+            for (GDALDataset* const dataset : {source.get(), made.get()})
+                ASSERT_EQ(dataset->GetRasterBand(band)->RasterIO(
+                              dataset == source.get() ? GF_Read : GF_Write, x, y, 60, 50,
+                              window.data(), 60, 50, GDT_Byte, 0, 0),
+                          CE_None);
+        }
+        made.reset();
+        EXPECT_EQ(Pixels(*Open(Path("new.pyr"))), Pixels(*source));
+    }
+    GDALSetCacheMax64(before);
+}
+
+TEST_F(DriverTest, UpdatesAndRenewedLevelsReachTheFile) {
+    const DatasetPtr source = Memory(600, 500, 3, GDT_Byte);
+    const std::string name = MakeCopy(*source);
+    DatasetPtr dataset = Open(name, GDAL_OF_RASTER | GDAL_OF_UPDATE);
+    ASSERT_EQ(dataset->GetRasterBand(2)->Fill(9), CE_None);
+    const int factors[] = {2, 4};
+    ASSERT_EQ(dataset->BuildOverviews("LANCZOS", 2, factors, 0, nullptr, nullptr, nullptr),
+              CE_None);
+    dataset.reset();
+    dataset = Open(name);
+    unsigned char pixel = 0;
+    GDALRasterBand& level = *dataset->GetRasterBand(2)->GetOverview(1);
+    ASSERT_EQ(level.RasterIO(GF_Read, 149, 124, 1, 1, &pixel, 1, 1, GDT_Byte, 0, 0), CE_None);
+    EXPECT_EQ(pixel, 9);
+}
+
+TEST_F(DriverTest, MasksFollowTheNoDataValueThatIsSet) {
+    const DatasetPtr source = Memory(300, 270, 2, GDT_Int16);
+    const DatasetPtr copy = Open(MakeCopy(*source));
+    GDALRasterBand& band = *copy->GetRasterBand(2);
+    EXPECT_EQ(band.GetMaskFlags(), GMF_ALL_VALID);
+    copy->SetDescription("");  // nothing of this belongs into a sidecar
+    for (const double value : {7.0, 8.0, 70000.0}) {
+        band.SetNoDataValue(value);
+        std::vector<std::int16_t> samples(300 * 270);
+        std::vector<unsigned char> mask(300 * 270);
+        ASSERT_EQ(band.RasterIO(GF_Read, 0, 0, 300, 270, samples.data(), 300, 270, GDT_Int16, 0, 0),
+                  CE_None);
+        ASSERT_EQ(band.GetMaskBand()->RasterIO(GF_Read, 0, 0, 300, 270, mask.data(), 300, 270,
+                                               GDT_Byte, 0, 0),
+                  CE_None);
+        for (std::size_t i = 0; i < mask.size(); ++i)
+            ASSERT_EQ(mask[i], samples[i] == value ? 0 : 255) << i;
+    }
+}
+
+TEST_F(DriverTest, DatasetsInEightThreadsReadTheSame) {
+    const DatasetPtr source = Memory(700, 600, 3, GDT_UInt16);
+    const std::string name = MakeCopy(*source);
+    const auto expected = Pixels(*source);
+    std::vector<std::thread> threads;
+    std::vector<char> same(8);
+    for (std::size_t i = 0; i < same.size(); ++i)
+        threads.emplace_back([&, i] {
+            same[i] = 1;
+            for (int run = 0; run < 3; ++run) same[i] &= Pixels(*Open(name)) == expected;
+        });
+    for (std::thread& thread : threads) thread.join();
+    EXPECT_EQ(same, std::vector<char>(8, 1));
+}
+
+TEST_F(DriverTest, DamagedFilesDoNoHarm) {
+    const DatasetPtr source = Memory(300, 270, 2, GDT_Byte);
+    const std::string name = MakeCopy(*source);
+    std::ifstream file(name, std::ios::binary);
+    const std::string whole((std::istreambuf_iterator<char>(file)),
+                            std::istreambuf_iterator<char>());
+    std::mt19937 random(11);
+    CPLPushErrorHandler(CPLQuietErrorHandler);
+    for (int run = 0; run < 150; ++run) {
+        std::string damaged = whole;
+        // In the header, in the statistics behind the tiles, or by a cut.
+        const std::size_t at = run % 3 == 0 ? random() % 1000 : whole.size() - 1 - random() % 9000;
+        damaged[at] = static_cast<char>(random());
+        if (run % 5 == 0) damaged.resize(at);
+        std::ofstream(Path("bad.pyr"), std::ios::binary) << damaged;
+        const DatasetPtr dataset = Open(Path("bad.pyr"));
+        if (!dataset || dataset->GetRasterXSize() > 5000 || dataset->GetRasterYSize() > 5000)
+            continue;
+        GDALRasterBand& band = *dataset->GetRasterBand(1);
+        (void)band.GetMetadata();
+        (void)band.GetColorTable();
+        unsigned char pixels[64];
+        const CPLErr result = band.RasterIO(GF_Read, 0, 0, 1, 1, pixels, 1, 1, GDT_Byte, 0, 0);
+        EXPECT_LE(result, CE_Failure);
+    }
+    CPLPopErrorHandler();
+}
+
+TEST_F(DriverTest, CancelledCopiesLeaveNothing) {
+    const DatasetPtr source = Memory(900, 800, 3, GDT_Byte);
+    CPLPushErrorHandler(CPLQuietErrorHandler);
+    for (double limit : {0.0, 0.3, 0.6, 0.9}) {
+        const auto progress = [](double done, const char*, void* data) -> int {
+            return done <= *static_cast<double*>(data);
+        };
+        const DatasetPtr made(Driver().CreateCopy(Path("gone.pyr").c_str(), source.get(), TRUE,
+                                                  nullptr, progress, &limit));
+        EXPECT_FALSE(made);
+        EXPECT_TRUE(fs::is_empty(folder));
+    }
+    CPLPopErrorHandler();
+}
+
+}  // namespace
+}  // namespace zmcgdal
