@@ -2,13 +2,17 @@
 
 option(ZMC_WARNINGS_AS_ERRORS "Treat warnings as errors in our own sources" ${PROJECT_IS_TOP_LEVEL})
 set(ZMC_SANITIZE "" CACHE STRING "Sanitizers to build with, as for -fsanitize=")
+option(ZMC_FUZZ "Build the fuzz targets as fuzzers, with clang" OFF)
 option(ZMC_COVERAGE "Instrument for coverage" OFF)
 
 set(ZMC_ROOT "${CMAKE_CURRENT_SOURCE_DIR}")
 
 # Warnings are ours alone: they are private, so that nobody who builds on us inherits them.
 set(ZMC_WARNING_FLAGS -Wall -Wextra -Wpedantic -Wconversion -Wsign-conversion -Wshadow
-    -Wnon-virtual-dtor -Woverloaded-virtual -Wold-style-cast -Wcast-qual -Wformat=2)
+    -Wnon-virtual-dtor -Woverloaded-virtual -Wold-style-cast -Wcast-qual -Wcast-align -Wformat=2
+    -Wnull-dereference -Wdouble-promotion -Wimplicit-fallthrough -Wextra-semi -Wundef -Wvla
+    $<$<CXX_COMPILER_ID:GNU>:-Wduplicated-cond> $<$<CXX_COMPILER_ID:GNU>:-Wduplicated-branches>
+    $<$<CXX_COMPILER_ID:GNU>:-Wlogical-op>)
 if(ZMC_WARNINGS_AS_ERRORS)
     list(APPEND ZMC_WARNING_FLAGS -Werror)
 endif()
@@ -18,14 +22,38 @@ if(ZMC_SANITIZE)
     list(APPEND ZMC_INSTRUMENT_FLAGS -fsanitize=${ZMC_SANITIZE} -fno-omit-frame-pointer
          -fno-sanitize-recover=all)
 endif()
+if(ZMC_FUZZ)
+    list(APPEND ZMC_INSTRUMENT_FLAGS -fsanitize=fuzzer-no-link)
+endif()
 if(ZMC_COVERAGE)
     list(APPEND ZMC_INSTRUMENT_FLAGS --coverage)
 endif()
 
+# The module works inside somebody else's process on files from anywhere: what the compiler, the C
+# library and the loader can check there at little cost is checked. Sanitizers bring checks of their
+# own, which the fortified functions would hide.
+option(ZMC_HARDENING "Build with the checks that compiler, library and loader offer" ON)
+set(ZMC_HARDENING_FLAGS "")
+set(ZMC_HARDENING_LINK_FLAGS "")
+if(ZMC_HARDENING AND NOT ZMC_SANITIZE AND NOT ZMC_COVERAGE)
+    set(ZMC_HARDENING_FLAGS -fstack-protector-strong -fstack-clash-protection
+        $<$<NOT:$<CONFIG:Debug>>:-U_FORTIFY_SOURCE> $<$<NOT:$<CONFIG:Debug>>:-D_FORTIFY_SOURCE=3>
+        -D_GLIBCXX_ASSERTIONS)
+    if(CMAKE_SYSTEM_PROCESSOR MATCHES "x86_64|AMD64|i[3-6]86")
+        list(APPEND ZMC_HARDENING_FLAGS -fcf-protection=full)
+    endif()
+    if(CMAKE_SYSTEM_NAME STREQUAL "Linux")
+        set(ZMC_HARDENING_LINK_FLAGS LINKER:-z,relro LINKER:-z,now LINKER:-z,noexecstack)
+    endif()
+endif()
+include(CheckPIESupported)
+check_pie_supported(LANGUAGES CXX)
+
 # Options that every binary of ours is compiled and linked with.
 function(zmc_configure_target target)
-    target_compile_options(${target} PRIVATE ${ZMC_WARNING_FLAGS} ${ZMC_INSTRUMENT_FLAGS})
-    target_link_options(${target} PRIVATE ${ZMC_INSTRUMENT_FLAGS})
+    target_compile_options(${target} PRIVATE ${ZMC_WARNING_FLAGS} ${ZMC_HARDENING_FLAGS}
+        ${ZMC_INSTRUMENT_FLAGS})
+    target_link_options(${target} PRIVATE ${ZMC_HARDENING_LINK_FLAGS} ${ZMC_INSTRUMENT_FLAGS})
     set_target_properties(${target} PROPERTIES CXX_EXTENSIONS OFF POSITION_INDEPENDENT_CODE ON
         CXX_VISIBILITY_PRESET hidden VISIBILITY_INLINES_HIDDEN ON)
 endfunction()

@@ -77,8 +77,9 @@ public:
     }
 
     T* Get() const { return record ? static_cast<T*>(record->object) : nullptr; }
-    T* operator->() const { return Get(); }
-    T& operator*() const { return *Get(); }
+    // Only of pointers that are not empty.
+    T* operator->() const { return static_cast<T*>(record->object); }
+    T& operator*() const { return *static_cast<T*>(record->object); }
     explicit operator bool() const { return Get() != nullptr; }
 
 private:
