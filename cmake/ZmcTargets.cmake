@@ -10,7 +10,7 @@ set(ZMC_ROOT "${CMAKE_CURRENT_SOURCE_DIR}")
 # Warnings are ours alone: they are private, so that nobody who builds on us inherits them.
 set(ZMC_WARNING_FLAGS -Wall -Wextra -Wpedantic -Wconversion -Wsign-conversion -Wshadow
     -Wnon-virtual-dtor -Woverloaded-virtual -Wold-style-cast -Wcast-qual -Wcast-align -Wformat=2
-    -Wnull-dereference -Wdouble-promotion -Wimplicit-fallthrough -Wextra-semi -Wundef -Wvla
+    -Wnull-dereference -Wimplicit-fallthrough -Wextra-semi -Wundef -Wvla
     $<$<CXX_COMPILER_ID:GNU>:-Wduplicated-cond> $<$<CXX_COMPILER_ID:GNU>:-Wduplicated-branches>
     $<$<CXX_COMPILER_ID:GNU>:-Wlogical-op>)
 if(ZMC_WARNINGS_AS_ERRORS)
