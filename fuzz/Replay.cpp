@@ -6,7 +6,6 @@
 #include <cstdio>
 #include <filesystem>
 #include <fstream>
-#include <iterator>
 #include <vector>
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size);
@@ -29,9 +28,9 @@ std::vector<std::filesystem::path> Inputs(int count, char** arguments) {
 
 // Bytes in a block of their very size, so that a sanitizer sees the first byte beyond.
 std::vector<char> Bytes(const std::filesystem::path& path) {
+    std::vector<char> bytes(static_cast<std::size_t>(std::filesystem::file_size(path)));
     std::ifstream file(path, std::ios::binary);
-    std::vector<char> bytes((std::istreambuf_iterator<char>(file)), {});
-    bytes.shrink_to_fit();
+    file.read(bytes.data(), static_cast<std::streamsize>(bytes.size()));
     return bytes;
 }
 

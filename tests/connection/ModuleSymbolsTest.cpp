@@ -4,19 +4,16 @@
 #include <gtest/gtest.h>
 
 #include <cstring>
-#include <fstream>
-#include <iterator>
 #include <string>
 #include <vector>
+
+#include "tests/support/ScratchDirectory.h"
 
 namespace {
 
 class ElfFile {
 public:
-    explicit ElfFile(const char* path) {
-        std::ifstream stream(path, std::ios::binary);
-        bytes.assign(std::istreambuf_iterator<char>(stream), {});
-    }
+    explicit ElfFile(const char* path) : bytes(support::ReadText(path)) {}
 
     bool IsElf() const {
         return bytes.size() > sizeof(Elf64_Ehdr) && std::memcmp(bytes.data(), ELFMAG, SELFMAG) == 0;
@@ -55,7 +52,7 @@ public:
     }
 
 private:
-    std::vector<char> bytes;
+    std::string bytes;
 };
 
 TEST(ModuleSymbols, AreExactlyTheTwoFunctions) {

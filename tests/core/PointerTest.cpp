@@ -55,6 +55,7 @@ TEST(Pointer, NoDeleteLeavesTheObjectAlone) {
     Counted object;
     {
         Pointer<Counted> pointer(&object);
+        ASSERT_TRUE(pointer.record);
         pointer.record->noDelete = true;
         const Pointer<Counted> copy(pointer);
     }

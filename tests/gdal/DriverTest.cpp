@@ -15,6 +15,7 @@
 #include <vector>
 
 #include "gdal/SampleType.h"
+#include "tests/support/ScratchDirectory.h"
 
 namespace zmcgdal {
 namespace {
@@ -197,9 +198,7 @@ TEST_F(DriverTest, DatasetsInEightThreadsReadTheSame) {
 TEST_F(DriverTest, DamagedFilesDoNoHarm) {
     const DatasetPtr source = Memory(300, 270, 2, GDT_Byte);
     const std::string name = MakeCopy(*source);
-    std::ifstream file(name, std::ios::binary);
-    const std::string whole((std::istreambuf_iterator<char>(file)),
-                            std::istreambuf_iterator<char>());
+    const std::string whole = support::ReadText(name);
     std::mt19937 random(11);
     CPLPushErrorHandler(CPLQuietErrorHandler);
     for (int run = 0; run < 150; ++run) {

@@ -136,10 +136,10 @@ TEST_F(PyramidConnectionTest, CloseKeepsWhatIsTold) {
     EXPECT_EQ(connection.GetPixelType(), 0u);
     ASSERT_TRUE(Open(connection));
     EXPECT_EQ(connection.GetReader().Get(), dispatch);
-    EXPECT_NE(static_cast<PyramidRasterReader<unsigned char>*>(
-                  connection.GetReader()->As<unsigned char>().Get())
-                  ->dataset.Get(),
-              connection.dataset.Get());
+    const auto* reader = static_cast<const PyramidRasterReader<unsigned char>*>(
+        connection.GetReader()->As<unsigned char>().Get());
+    ASSERT_TRUE(reader);
+    EXPECT_NE(reader->dataset.Get(), connection.dataset.Get());
 }
 
 TEST_F(PyramidConnectionTest, FailedOpenKeepsTheMetadata) {

@@ -11,12 +11,12 @@
 #include <cstdint>
 #include <cstring>
 #include <filesystem>
-#include <fstream>
-#include <iterator>
 #include <map>
 #include <stdexcept>
 #include <string>
 #include <vector>
+
+#include "tests/support/ScratchDirectory.h"
 
 namespace zmctest {
 
@@ -186,8 +186,8 @@ public:
 
     // A file that somebody else wrote.
     explicit PyramidModel(const std::filesystem::path& path) {
-        std::ifstream stream(path, std::ios::binary);
-        file.assign(std::istreambuf_iterator<char>(stream), {});
+        const std::string bytes = support::ReadText(path);
+        file.assign(bytes.begin(), bytes.end());
         if (file.size() < 20 || std::memcmp(file.data(), "KOBT", 4) != 0)
             throw std::runtime_error("not a pyramid");
         const std::uint64_t start = Get64(4);

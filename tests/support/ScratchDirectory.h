@@ -8,7 +8,7 @@
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
-#include <iterator>
+#include <sstream>
 #include <string>
 
 namespace support {
@@ -64,8 +64,9 @@ private:
 };
 
 inline std::string ReadText(const std::string& name) {
-    std::ifstream file(name, std::ios::binary);
-    return {std::istreambuf_iterator<char>(file), {}};
+    std::ostringstream text;
+    text << std::ifstream(name, std::ios::binary).rdbuf();
+    return text.str();
 }
 
 inline void WriteText(const std::string& name, const std::string& text) {
