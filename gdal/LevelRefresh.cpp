@@ -8,82 +8,30 @@
 
 #include "gdal/NoDataValues.h"
 #include "gdal/Options.h"
-#include "host/NoData.h"
-#include "host/Reduction.h"
+#include "host/LevelReduction.h"
 
 namespace zmcgdal {
 namespace {
 
-// Columns and rows of the coarser level that are made beyond a tile and dropped: the widest kernel
-// reaches 5 finer pixels over the edge of its cell.
-constexpr std::uint32_t kMargin = 3;
-
-// The part of the finer level that a tile of the coarser one depends on. It begins on even
-// coordinates, so that its cells are those of the whole level.
-zmchost::Window SourceOf(const zmchost::Raster& raster, std::uint32_t level,
-                         const zmchost::Window& tile) {
-    const auto reach = [](std::uint32_t start, std::uint32_t extent, std::uint32_t limit) {
-        const std::uint32_t first = start > kMargin ? start - kMargin : 0;
-        const std::uint64_t end = std::uint64_t{start + extent + kMargin} * 2;
-        // The odd last line belongs to no cell, but wide kernels tap it.
-        const std::uint64_t last = end >= limit ? limit : end;
-        return std::pair{first * 2, static_cast<std::uint32_t>(last - first * 2)};
-    };
-    const auto [x, width] = reach(tile.x, tile.width, raster.Width(level - 1));
-    const auto [y, height] = reach(tile.y, tile.height, raster.Height(level - 1));
-    return {x, y, width, height};
-}
-
 template <class T>
 class TileMaker {
 public:
-    TileMaker(zmchost::Raster& pyramid, zmchost::Resampling resampling)
-        : raster(pyramid),
-          method(resampling),
-          halo(zmchost::ReductionHalo(resampling)),
-          bands(pyramid.Bands()) {
-        for (std::uint32_t band = 0; band < bands; ++band)
-            rules.push_back(zmchost::RuleOfBand<T>(pyramid.Props(), band));
-    }
+    TileMaker(zmchost::Raster& pyramid, zmchost::Resampling method)
+        : raster(pyramid), reduction(pyramid, method) {}
 
     void Make(std::uint32_t level, const zmchost::Window& tile) {
-        const zmchost::Window source = SourceOf(raster, level, tile);
-        fine.resize(std::size_t{source.width} * source.height * bands);
-        mask.assign(fine.size(), 0);
-        raster.Read(level - 1, source, raster.AllBands(), fine.data(), mask.data());
-        coarse.resize(std::size_t{tile.width} * tile.height * bands);
-        line.resize(std::size_t{source.width} / 2 * bands);
-        for (std::uint32_t row = 0; row < tile.height; ++row) MakeRow(source, tile, row);
+        const std::size_t samples = std::size_t{tile.width} * raster.Bands();
+        coarse.resize(samples * tile.height);
+        reduction.Load(level, tile);
+        for (std::uint32_t row = 0; row < tile.height; ++row)
+            std::copy_n(reduction.Row(row), samples, coarse.data() + row * samples);
         raster.Write(level, tile, raster.AllBands(), coarse.data());
     }
 
 private:
     zmchost::Raster& raster;
-    zmchost::Resampling method;
-    std::uint32_t halo;
-    std::uint32_t bands;
-    std::vector<zelm::NoDataRule<T>> rules;
-    std::vector<T> fine, coarse, line;
-    std::vector<unsigned char> mask;
-
-    void MakeRow(const zmchost::Window& source, const zmchost::Window& tile, std::uint32_t row) {
-        std::vector<const T*> rows;
-        std::vector<const unsigned char*> masks;
-        const std::size_t stride = std::size_t{source.width} * bands;
-        const std::int64_t first = (std::int64_t{tile.y} + row) * 2 - halo - source.y;
-        for (std::int64_t y = first; y < first + 2 + 2 * std::int64_t{halo}; ++y) {
-            const bool inside = y >= 0 && y < source.height;
-            const std::size_t at = inside ? static_cast<std::size_t>(y) * stride : 0;
-            rows.push_back(inside ? fine.data() + at : nullptr);
-            masks.push_back(inside ? mask.data() + at : nullptr);
-        }
-        zmchost::ReduceRow<T>(method, bands, source.width, {rows.data(), masks.data()},
-                              rules.data(), line.data(), nullptr);
-        const std::size_t skipped = std::size_t{tile.x - source.x / 2} * bands;
-        const std::size_t samples = std::size_t{tile.width} * bands;
-        std::copy_n(line.begin() + static_cast<std::ptrdiff_t>(skipped), samples,
-                    coarse.begin() + static_cast<std::ptrdiff_t>(row * samples));
-    }
+    zmchost::LevelReduction<T> reduction;
+    std::vector<T> coarse;
 };
 
 CPLErr Refuse(const char* why) {
