@@ -35,6 +35,8 @@ public:
 
     // Size of the file in bytes; 0 if it cannot be told.
     std::uint64_t Size() const;
+    // Makes the file end there; what lay beyond is gone. False, with nothing changed, on failure.
+    bool Truncate(std::uint64_t size);
     // Waits until what was written has reached the disk; false if that failed.
     bool Sync();
 

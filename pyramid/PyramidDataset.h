@@ -82,7 +82,7 @@ public:
     std::unique_ptr<xercesc::SAXParser> Parser;          // for both documents
     std::unique_ptr<xercesc::MemBufInputSource> MetaSource;
     std::unique_ptr<xercesc::MemBufInputSource> HeaderSource;
-    bool MetaLoaded = false;    // MetaSource reflects the file
+    bool MetaLoaded = false;    // MetaSource reflects the file, and no store is under way there
     bool HeaderLoaded = false;  // HeaderSource reflects the file
     PalettePtr CurrentPalette;  // palette of the last GetPalette
 
@@ -157,7 +157,7 @@ public:
     // FALSE when the document was loaded or File is null, TRUE when its region is empty.
     bool LoadHeaderDocument();
     bool ParseHeaderDocument(PyramidHeaderRecord& out);
-    // True when MetaSource was filled from the file.
+    // True when MetaSource was filled from the file: old or new, where another process stores.
     bool LoadMetaDocument();
     // Runs Parser over `source`, which may be null only after a failure; `handlers` may be null.
     // kParsed, kParseError or kParseOutOfMemory. The source is one of the two members: after an

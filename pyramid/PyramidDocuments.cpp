@@ -1,12 +1,14 @@
 // The documents of a dataset: from the file into a source, and from there into records and a tree.
 #include <algorithm>
 #include <new>
+#include <utility>
 
 #include <xercesc/framework/MemBufInputSource.hpp>
 #include <xercesc/util/OutOfMemoryException.hpp>
 #include <xercesc/util/XMLException.hpp>
 
 #include "pyramid/BoundedParser.h"
+#include "pyramid/DocumentText.h"
 #include "pyramid/PyramidDataset.h"
 #include "pyramid/PyramidXMLReaderHandlers.h"
 #include "pyramid/XercesText.h"
@@ -15,6 +17,21 @@ namespace zelm {
 namespace {
 
 constexpr std::uint64_t kHeaderOffset = 20;
+
+// A source over a text, or null if memory ran out.
+std::unique_ptr<xercesc::MemBufInputSource> MakeSource(std::unique_ptr<XMLByte[]> text,
+                                                       std::size_t size, const char* name) {
+    // The parser takes a NUL behind the root element for the end of the text and would believe the
+    // front part of a torn document; no parser accepts this character anywhere.
+    std::replace(text.get(), text.get() + size, XMLByte{0}, XMLByte{1});
+    try {
+        auto source = std::make_unique<xercesc::MemBufInputSource>(text.get(), size, name, true);
+        text.release();
+        return source;
+    } catch (...) {
+        return nullptr;
+    }
+}
 
 // A source over `size` bytes of the file at `offset`, or null: too long, past the end of the file,
 // or out of memory.
@@ -25,16 +42,7 @@ std::unique_ptr<xercesc::MemBufInputSource> LoadText(platform::File& file, std::
     std::unique_ptr<XMLByte[]> text(new (std::nothrow) XMLByte[static_cast<std::size_t>(size)]);
     if (!text) return nullptr;
     const std::size_t read = file.ReadAt(offset, text.get(), static_cast<std::size_t>(size));
-    // The parser takes a NUL behind the root element for the end of the text and would believe the
-    // front part of a torn document; no parser accepts this character anywhere.
-    std::replace(text.get(), text.get() + read, XMLByte{0}, XMLByte{1});
-    try {
-        auto source = std::make_unique<xercesc::MemBufInputSource>(text.get(), read, name, true);
-        text.release();
-        return source;
-    } catch (...) {
-        return nullptr;
-    }
+    return MakeSource(std::move(text), read, name);
 }
 
 // Handlers live on the stack of their parse, so the parser forgets them with it.
@@ -115,11 +123,14 @@ bool PyramidDataset::ParseHeaderDocument(PyramidHeaderRecord& out) {
 
 bool PyramidDataset::LoadMetaDocument() {
     if (!File) return false;
-    const std::uint64_t size = File->Size();
-    if (MetaDocumentOffset >= size) return false;
-    MetaSource = LoadText(*File, MetaDocumentOffset, size - MetaDocumentOffset, "ORVAPYRMETA");
-    MetaLoaded = MetaSource != nullptr;
-    return MetaLoaded;
+    DocumentText text = DocumentText::Take(*File, MetaDocumentOffset);
+    MetaSource.reset();
+    if (!text.bytes) return false;
+    // A text under a store is judged like any other, and the next fetch looks again.
+    const bool unfinished = text.IsUnfinished();
+    MetaSource = MakeSource(std::move(text.bytes), text.size, "ORVAPYRMETA");
+    MetaLoaded = MetaSource != nullptr && !unfinished;
+    return MetaSource != nullptr;
 }
 
 int PyramidDataset::ParseDocument(xercesc::HandlerBase* handlers,

@@ -1,6 +1,5 @@
 #include "pyramid/PyramidXMLDocument.h"
 
-#include <algorithm>
 #include <cstdio>
 #include <new>
 
@@ -12,6 +11,7 @@
 #include <xercesc/util/XMLException.hpp>
 
 #include "core/PixelVocabulary.h"
+#include "pyramid/DocumentStore.h"
 #include "pyramid/NumberText.h"
 #include "pyramid/XercesText.h"
 
@@ -49,17 +49,6 @@ bool Attempt(const char* heading, Step step) {
         // Memory ran out, or the DOM was asked for something impossible: no text tells which.
     }
     return false;
-}
-
-// Fills the file from `offset` to its end with line ends.
-bool BlankRest(platform::File& file, std::uint64_t offset) {
-    const std::string blank(4096, '\n');
-    for (const std::uint64_t end = file.Size(); offset < end; offset += blank.size()) {
-        const auto size =
-            static_cast<std::size_t>(std::min<std::uint64_t>(end - offset, blank.size()));
-        if (file.WriteAt(offset, blank.data(), size) != size) return false;
-    }
-    return true;
 }
 
 void Serialize(const xercesc::DOMDocument& document, xercesc::MemBufFormatTarget& target,
@@ -249,8 +238,7 @@ bool PyramidXMLDocument::SerializeDocument(platform::File& file, std::uint64_t o
         Serialize(*document, target, complete);
         const std::size_t length = target.getLen();
         if (!complete || length > kMaxDocumentBytes) return false;
-        return file.WriteAt(offset, target.getRawBuffer(), length) == length &&
-               BlankRest(file, offset + length);
+        return DocumentStore<platform::File>(file, offset).Write(target.getRawBuffer(), length);
     });
 }
 

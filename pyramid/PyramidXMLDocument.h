@@ -62,10 +62,12 @@ public:
     // Makes the element with one text node and appends it to `parent`. May throw what Xerces does.
     void AppendValueElement(xercesc::DOMElement& parent, ElementName name, const std::string& text);
 
-    // Writes the whole document at the offset. False, with a message where Xerces gives one, if
-    // there is none, or it is beyond the limits (then the file keeps what it had), or it cannot be
-    // written. A file that reaches further is filled with line ends, so that the text behind the
-    // document, which a writer of longer lines may have left, does not spoil it.
+    // Writes the whole document at the offset, over the one that stands there, in the order of
+    // steps of DocumentStore.h. False, with a message where Xerces gives one, if there is none, or
+    // it is beyond the limits, or it cannot be written; the file then keeps what it had, or has a
+    // document that no parser accepts. A file that reaches further is filled with line ends, so
+    // that the text behind the document, which a writer of longer lines may have left, does not
+    // spoil it.
     bool SerializeDocument(platform::File& file, std::uint64_t offset);
 
     // Number of elements under the root; RemoveFrom takes back all from that position on.

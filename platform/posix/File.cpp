@@ -110,6 +110,15 @@ std::uint64_t File::Size() const {
     return fstat(descriptor, &status) == 0 ? static_cast<std::uint64_t>(status.st_size) : 0;
 }
 
+bool File::Truncate(std::uint64_t size) {
+    if (size > kMaxOffset) return false;
+    int result;
+    do {
+        result = ftruncate(descriptor, static_cast<off_t>(size));
+    } while (result != 0 && errno == EINTR);
+    return result == 0;
+}
+
 bool File::Sync() { return fsync(descriptor) == 0; }
 
 bool RemoveFile(const char16_t* name) {

@@ -51,6 +51,21 @@ TEST_F(FileTest, ShortReadLeavesTheRestOfTheBuffer) {
     EXPECT_STREQ(buffer, "bcxxx");
 }
 
+TEST_F(FileTest, TruncatesAndGrows) {
+    const auto name = Name("a.bin");
+    const auto file = File::Open(name.c_str(), File::Mode::Create);
+    file->WriteAt(0, "abcdef", 6);
+    EXPECT_TRUE(file->Truncate(2));
+    EXPECT_EQ(file->Size(), 2u);
+    EXPECT_TRUE(file->Truncate(4));
+    char buffer[4] = {'x', 'x', 'x', 'x'};
+    EXPECT_EQ(file->ReadAt(0, buffer, 4), 4u);
+    EXPECT_EQ(std::string(buffer, 4), std::string("ab\0\0", 4));
+    EXPECT_FALSE(file->Truncate(~std::uint64_t{0}));
+    EXPECT_FALSE(File::Open(name.c_str(), File::Mode::Read)->Truncate(0));
+    EXPECT_EQ(file->Size(), 4u);
+}
+
 TEST_F(FileTest, CreateEmptiesAndUpdateKeeps) {
     const auto name = Name("a.bin");
     File::Open(name.c_str(), File::Mode::Create)->WriteAt(0, "abc", 3);

@@ -1,7 +1,10 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <sys/resource.h>
+
 #include <cmath>
+#include <csignal>
 #include <filesystem>
 #include <limits>
 #include <random>
@@ -471,6 +474,63 @@ TEST_F(ArchiveTest, TornDocumentIsNeverHalfBelieved) {
         ASSERT_EQ(loaded, tree) << "what is not believed is not grown either";
         ASSERT_TRUE(!loaded || stats.shape.elements == 2 || stats.shape.elements == 4) << written;
     }
+}
+
+TEST_F(ArchiveTest, UnfinishedStoreIsNeitherBelievedNorGrown) {
+    for (const std::string& document : {std::string("\x1A"), std::string("\x1A") + "DATASET/>",
+                                        std::string(" \n\t"), std::string(200, '\n')}) {
+        WriteFile(document);
+        const std::string before = support::ReadText(name);
+        const auto dataset = Open();
+        EXPECT_TRUE(dataset->HasPyramid);
+        ASSERT_TRUE(dataset->MetaDocument);
+        EXPECT_EQ(dataset->MetaDocument->document, nullptr);
+        EXPECT_FALSE(dataset->SetBandStats(ArrayOf({StatsOf<T>(0, 1)})));
+        EXPECT_EQ(support::ReadText(name), before);
+        Stderr messages;
+        EXPECT_FALSE(dataset->HasBandStats<T>(0));
+        EXPECT_THAT(messages.Text(),
+                    ::testing::StartsWith("\nFatal Error at file ORVAPYRMETA, line "));
+    }
+}
+
+// A reader that came in the middle of a store sees its end.
+TEST_F(ArchiveTest, TextUnderAStoreIsLoadedAgain) {
+    const auto writer = Make();
+    writer->SetBandStats(ArrayOf({StatsOf<T>(0, 1)}));
+    const auto file = platform::File::Open(String(name.c_str()).wide, platform::File::Mode::Update);
+    file->WriteAt(writer->MetaDocumentOffset, "\x1A", 1);
+    const auto reader = Open();
+    {
+        Stderr messages;
+        EXPECT_FALSE(reader->HasBandStats<T>(0));
+        EXPECT_FALSE(reader->MetaLoaded);
+    }
+    file->WriteAt(writer->MetaDocumentOffset, "<", 1);
+    EXPECT_TRUE(reader->HasBandStats<T>(0));
+    EXPECT_TRUE(reader->MetaLoaded);
+}
+
+// The process may not make files longer than they are: as on a full disk.
+TEST_F(ArchiveTest, FullDiskLosesNothing) {
+    const auto dataset = Make();
+    dataset->SetBandStats(ArrayOf({StatsOf<T>(0, 1)}));
+    const std::string before = support::ReadText(name);
+    rlimit old{};
+    ASSERT_EQ(getrlimit(RLIMIT_FSIZE, &old), 0);
+    const auto handler = std::signal(SIGXFSZ, SIG_IGN);
+    for (const std::size_t room : {0u, 1u, 60u}) {
+        const rlimit tight{before.size() + room, old.rlim_max};
+        ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &tight), 0);
+        dataset->SetBandStats(ArrayOf({StatsOf<T>(1, 2)}));
+        setrlimit(RLIMIT_FSIZE, &old);
+        EXPECT_EQ(support::ReadText(name), before);
+        EXPECT_TRUE(dataset->HasBandStats<T>(0));
+        EXPECT_FALSE(dataset->HasBandStats<T>(1));
+    }
+    std::signal(SIGXFSZ, handler);
+    EXPECT_TRUE(dataset->SetBandStats(Array<RasterBandStats<T>>()));
+    EXPECT_TRUE(dataset->HasBandStats<T>(1)) << "the tree kept it";
 }
 
 // --- header documents ---
