@@ -175,6 +175,47 @@ BENCHMARK(Open16384By12288)
     ->UseManualTime()
     ->Unit(benchmark::kMicrosecond);
 
+// With statistics and histograms of its bands. The bound is GDAL's open of a GeoTIFF that has the
+// same values as metadata, and asks for them: a pyramid has its document parsed when it is open.
+void OpenWithStatistics(benchmark::State& state) {
+    const auto made = Create("stored.pyr", 2048, 2048, 3, 3, 1);
+    zelm::Array<zelm::RasterBandStats<unsigned char>> stats;
+    zelm::Array<zelm::RasterBandHistogram<unsigned char>> histograms;
+    for (std::uint32_t band = 0; band < 3; ++band) {
+        zelm::RasterBandStats<unsigned char> record;
+        record.band = band;
+        record.flags = zelm::StatsFlag::All;
+        stats.Append(record);
+        zelm::RasterBandHistogram<unsigned char> bins;
+        bins.band = band;
+        bins.binCount = 256;
+        for (std::uint64_t i = 0; i < 256; ++i) bins.counts.Append(i * 1000);
+        histograms.Append(bins);
+    }
+    if (!made->SetBandStats(stats) || !made->SetHistograms(histograms)) std::abort();
+    const std::string tiff = PathOf("stored.tif");
+    char* options[] = {const_cast<char*>("TILED=YES"), const_cast<char*>("SPARSE_OK=TRUE"),
+                       nullptr};
+    GDALDataset* const file = GetGDALDriverManager()->GetDriverByName("GTiff")->Create(
+        tiff.c_str(), 2048, 2048, 3, GDT_Byte, options);
+    std::string counts;
+    for (int i = 0; i < 256; ++i) counts += std::to_string(i * 1000) + '|';
+    for (int band = 1; band <= 3; ++band) {
+        file->GetRasterBand(band)->SetStatistics(1, 2, 3, 4);
+        file->GetRasterBand(band)->SetMetadataItem("HISTOGRAM", counts.c_str());
+    }
+    GDALClose(file);
+    Compare(
+        state, [] { Open("stored.pyr"); },
+        [&] {
+            GDALDataset* const opened =
+                GDALDataset::FromHandle(GDALOpen(tiff.c_str(), GA_ReadOnly));
+            if (!opened->GetRasterBand(1)->GetMetadataItem("HISTOGRAM")) std::abort();
+            GDALClose(opened);
+        });
+}
+BENCHMARK(OpenWithStatistics)->UseManualTime()->Unit(benchmark::kMicrosecond);
+
 void TableOf16384By12288(benchmark::State& state) {
     const auto dataset = Create("table.pyr", 16384, 12288, 3, 5, 2);
     for (auto _ : state) {
