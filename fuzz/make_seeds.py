@@ -6,10 +6,29 @@ import sys
 
 
 def string_seeds():
-    yield "ascii", b"raster"
-    yield "two-byte", "café".encode()
-    yield "pair", "\U0001F30D".encode()
-    yield "broken", b"\xed\xa0\x80\xff"
+    # The locale, then steps: which string, what to do, and whatever that needs.
+    texts = {
+        "ascii": b"raster",
+        "two-byte": "café".encode(),
+        "pair": "\U0001F30D".encode(),
+        "broken": b"\xed\xa0\x80\xff",
+        "cut": b"\xf0\x9f\x8c",
+        "overlong": b"\xc0\xaf\xe0\x80\xaf\xf4\x90\x80\x80",
+        "blanks": b"  BIP\r\n next\t",
+        "zero": b"a\0b",
+        "invisible": "a\u00ad\u200d\ufeff".encode(),
+    }
+    for name, text in texts.items():
+        counted = bytes([len(text)]) + text
+        assign = b"\0\0" + counted + b"\1\2" + counted
+        ask = b"\0\x12\1\x0d\0\0\x0e" + counted + b"\1\x0f\0\0\x0c\0\x12"
+        join = b"\2\7\0\1\2\7\1\0\2\7\2\1\0\x09\2\2\x0a\0\1\0\3\0\x0f\2"
+        own = b"\0\6\0\0\6\1\2\0\4\1" + counted + b"\1\3\1\1\5\3"
+        convert = b"\0\x13\5" + counted + b"\3\x41\0\x10\x80\x20\x80"
+        for locale in (0, 1):
+            yield f"{name}-{locale}", bytes([locale]) + assign + ask + join + own + convert
+        yield f"tokens-{name}", b"\0\0\x11" + counted + b"\0\x12"
+    yield "wide", b"\1\0\1\4\x41\0\x10\x80\x90\x80\x08\xc8\0\x0c\0\x12"
 
 
 def memory_parameters_seeds():
@@ -43,6 +62,65 @@ def memory_parameters_seeds():
     yield "many-bands", b"\x05" + full.replace(b"BANDS=2", b"BANDS=0x7fffffff") + b"\0" + steps
     yield "negative", b"\x05" + full.replace(b"=010", b"=-5") + b"\0" + steps
     yield "no-data", b"\x05" + full.replace(b"\x02", b"zz") + b"\0" + steps
+
+
+def size(value):
+    """A size as the layout targets read it: a byte for small ones and those around powers of two."""
+    for kind in range(96, 224):
+        if value == (1 << (kind - 96) // 4) + (kind & 3) - 2 and value >= 96:
+            return bytes([kind])
+    return bytes([value]) if value < 96 else b"\xff" + value.to_bytes(4, "little")
+
+
+# Samples, lines, bands, tile, lowest and highest level.
+LAYOUTS = (
+    (1024, 1024, 1, 256, 0, 2), (1000, 777, 2, 256, 0, 1), (1001, 513, 3, 256, 0, 3),
+    (100, 100, 1, 256, 0, 7), (256, 3, 4, 256, 0, 0), (65536, 65536, 3, 256, 0, 8),
+    (2**32 - 1, 2**32 - 1, 1, 2048, 0, 31), (2**32 - 256, 1, 1, 256, 0, 33), (1, 65536, 1, 1, 0, 0),
+    (65537, 1, 1, 1, 0, 0), (1024, 1024, 2**32 - 1, 256, 0, 9), (64, 64, 9, 0, 0, 1),
+    (64, 64, 9, 2049, 0, 1), (512, 512, 1, 2048, 5, 3), (2**31, 2**31, 1, 1024, 0, 1023),
+    (300, 300, 2, 256, 2, 1024), (0, 9, 1, 256, 0, 1), (9, 9, 0, 256, 0, 1), (4096, 4096, 16, 512, 3, 9),
+)
+
+
+def hostile_fields():
+    for i, layout in enumerate(LAYOUTS):
+        for ordering in (0, 2):
+            pixel_type = bytes([(i + ordering) % 14])
+            yield f"{i}-{ordering}", b"".join(map(size, layout)) + pixel_type + bytes([ordering])
+
+
+def small_fields():
+    for pixel_type in range(14):
+        for ordering in (0, 1, 2):
+            bands = (1, 2, 3, 4, 9)[(pixel_type + ordering) % 5]
+            tile = (3, 4, 8, 7, 12)[pixel_type % 5]
+            yield f"{pixel_type}-{ordering}", bytes(
+                [19, 13, bands, tile - 1, pixel_type % 2, 2, pixel_type, ordering])
+
+
+def layout_seeds():
+    # Behind the fields: a level and a tile, then a window and a list of bands, then what to do.
+    for name, fields in hostile_fields():
+        yield f"hostile-{name}", b"\x21" + fields + b"\1\1\1" + b"\1\0\5\5\x10\x10\1\xff\0\0"
+        yield f"whole-{name}", b"\x20" + fields + b"\0\0\0" + b"\5\0\0\0\2\2\xff"
+    for name, fields in small_fields():
+        for kind, list_kind in ((1, 0), (1, 1), (1, 14), (5, 1), (5, 10), (0, 1)):
+            window = bytes([kind, 0, 5, 3, 9, 8]) if kind == 1 else bytes([kind, 0, 9, 9])
+            rest = bytes([list_kind, 1, 0, 2, 0xFF, 0xF, 1, 7, 1])
+            yield f"small-{name}-{kind}-{list_kind}", b"\xf0" + fields + b"\1\1\0" + window + rest
+    for sample in range(5):
+        for layout in (b"\0\0\0", b"\1\0\0\0", b"\1\0\0\1"):
+            for other in (b"\0\0\0", b"\0\1\3\0\1\2\3\4\5\6\7\0", b"\1\0\0\1"):
+                name = f"move-{sample}-{layout.hex()}-{other.hex()}"
+                yield name, b"\0\2\x13\x08" + bytes([sample]) + layout + other
+
+
+def layout_file_seeds():
+    for name, fields in hostile_fields():
+        yield f"hostile-{name}", b"\1" + fields
+    for name, fields in small_fields():
+        yield f"small-{name}", b"\0" + fields
 
 
 def control_file_seeds():
@@ -89,6 +167,8 @@ def environment_seeds():
 TARGETS = {
     "string": string_seeds,
     "memory_parameters": memory_parameters_seeds,
+    "layout": layout_seeds,
+    "layout_file": layout_file_seeds,
     "control_file": control_file_seeds,
     "environment": environment_seeds,
 }
