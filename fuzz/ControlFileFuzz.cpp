@@ -151,15 +151,17 @@ public:
         }
     }
 
-    // The folder of the logs: there, missing, or a file in its place.
+    // The folder of the logs: there, missing, a file in its place, or a link to nothing, beside
+    // which no folder can be made.
     void MakeLogs(InputBytes& input) const {
         const std::uint8_t kind = input.Byte();
         const std::uint8_t first = input.Byte();
         const std::uint8_t second = input.Byte();
         std::error_code ignored;
-        if (kind % 8 == 6 || kind % 8 == 7) {
+        if (kind % 8 >= 5) {
             std::filesystem::remove_all(Logs(), ignored);
             if (kind % 8 == 7) std::fclose(std::fopen(Logs().c_str(), "wb"));
+            if (kind % 8 == 5) std::filesystem::create_symlink("nothing", Logs(), ignored);
             return;
         }
         if (!std::filesystem::is_directory(Logs(), ignored)) {
@@ -206,7 +208,10 @@ struct LogModel {
     explicit LogModel(const Settings& settings, const Files& files) : toFile(settings.file) {
         if (settings.levels == 0 || !settings.file) return;
         std::error_code ignored;
-        if (!Files::Exists(files.Logs())) std::filesystem::create_directory(files.Logs(), ignored);
+        if (!Files::Exists(files.Logs()) && !std::filesystem::is_symlink(files.Logs(), ignored))
+            std::filesystem::create_directory(files.Logs(), ignored);
+        toFile = Files::Exists(files.Logs());
+        if (!toFile) return;
         for (int which = 1; which <= 2; ++which) {
             can[which] = std::filesystem::is_directory(files.Logs(), ignored) &&
                          !std::filesystem::is_directory(files.Log(which), ignored);
@@ -303,6 +308,10 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     const std::vector<Message> messages = TakeMessages(input);
     const std::string control = input.Rest();
     std::filesystem::remove(files.Control());
+    // Without the data directory there is no log at all.
+    ZMC_EXPECT(!CoordSysLog::CreateInstance((files.Folder() + "/none").c_str()));
+    ZMC_EXPECT(!gpCoordSysLogInstance);
+    CoordSysLog::LogMessage(~0u, u"nobody hears this");
     if (kind % 16 == 15) {  // without a control file one is written, which leaves the log off
         RunLog({}, messages);
         ZMC_EXPECT(Files::Read(files.Control()) == zelm::kCoordSysLogNotes);

@@ -85,8 +85,13 @@ struct Variable {
     bool IsEmpty() const { return !set || value.empty(); }
 };
 
-// Names of folders stay below this program's own.
+constexpr char kLogName[] = "metadata_parse_log.log";
+
+// Names of folders stay below this program's own, where one is such that it can hold no log.
 Variable TakeDirectory(InputBytes& input) {
+    static const bool made =
+        std::filesystem::create_directories(Scratch() / "blocked/metadata_parse_log.log");
+    static_cast<void>(made);
     Variable directory = Variable::Take(input);
     if (directory.IsEmpty()) return directory;
     std::string name = directory.value;
@@ -170,14 +175,15 @@ struct ParseLogModel {
         if (!open) level = 0;
     }
 
-    // Only the last component is made; what is a file cannot hold one.
+    // Only the last component is made; what is a file cannot hold one, and a folder is no log.
     static bool CanMake(const std::string& name) {
         std::error_code ignored;
         std::string bare = name;
         while (bare.size() > 1 && bare.back() == '/') bare.pop_back();
         const std::filesystem::path path(bare);
         if (std::filesystem::exists(path, ignored))
-            return std::filesystem::is_directory(path, ignored);
+            return std::filesystem::is_directory(path, ignored) &&
+                   !std::filesystem::is_directory(path / kLogName, ignored);
         return std::filesystem::is_directory(path.parent_path(), ignored) &&
                path.filename().string().size() <= 255;
     }
@@ -214,7 +220,7 @@ void RunParseLog(InputBytes& input) {
     }
     MetadataParseLog::Log(0, L"nobody hears this");
     if (!model.open) return;
-    const std::string file = directory.value + "/metadata_parse_log.log";
+    const std::string file = directory.value + "/" + kLogName;
     const std::string bytes = ReadAll(file);
     const std::string mark =
         "  MetadataImpl Parse Log.   Log Level is set to: " + std::to_string(model.level) + "\n\n";
@@ -297,8 +303,10 @@ void RunFactory(InputBytes& input) {
     fp_Esri_Pe_Initialize = &TakeInitialisation;
     toldPeDirectory = toldGdalDirectory = "nothing";
     {
-        zelm::CoordSysFactory factory;
-        ZMC_EXPECT(factory.Init() == 1 && !factory.funcPtrs.module);
+        const std::unique_ptr<zelm::CoordSysFactory> factory(zelm::CoordSysFactory::GetInstance());
+        ZMC_EXPECT(factory && factory.get() == zelm::CoordSysFactory::GetInstance());
+        ZMC_EXPECT(!factory->funcPtrs.module);
+        gpCoordSysFactoryInstance = nullptr;
     }
     ZMC_EXPECT(toldPeDirectory == OrNotSet(peDirectory));
     ZMC_EXPECT(toldGdalDirectory == (kind % 3 != 0 ? OrNotSet(gdal) : "Not Set"));

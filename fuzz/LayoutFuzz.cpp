@@ -338,6 +338,15 @@ public:
         ZMC_EXPECT(accepted == (empty || (dataset.LevelOffsets && IsAccepted(layout, window))));
     }
 
+    void ExpectTileOffset(std::uint32_t level, std::uint32_t tileX, std::uint32_t tileY) const {
+        if (!layout.IsAllowed() || level >= 32 || level < layout.fields.levelMin ||
+            level > layout.fields.levelMax || tileX >= layout.Across(level).tiles ||
+            tileY >= layout.Down(level).tiles)
+            return;
+        ZMC_EXPECT(dataset.GetTileOffset(tileX, tileY, level) ==
+                   layout.TileOffset(level, tileX, tileY));
+    }
+
     const NaiveLayout& layout;
     PyramidDataset& dataset;
 };
@@ -667,6 +676,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     const Window window = TakeWindow(input, layout);
     LaidOut laidOut(layout, TheWorld().Dataset());
     laidOut.ExpectAcceptance(window);
+    laidOut.ExpectTileOffset(layout.fields.levelMin, tileX, tileY);
     ExpectTable(laidOut, (kind & 15) == 0 ? tileX : layout.fields.tile, std::uint64_t{level} << 20);
     const bool empty = window.width == 0 || window.height == 0;
     if (!empty && layout.IsAllowed() && IsAccepted(layout, window)) {

@@ -321,7 +321,16 @@ public:
         ZMC_EXPECT(reader.GetSamples(0) == d.samples && reader.GetLines(0) == d.lines &&
                    reader.GetBands() == d.bands && reader.GetCapabilities() == 1);
         ZMC_EXPECT(reader.GetMinLevel() == 0 && reader.GetMaxLevel() == 0 && !reader.HasPyramid());
+        const std::int32_t pair[] = {2, 2};
+        ZMC_EXPECT(reader.GetBaseReduction() == 0 && reader.GetLevelReduction() == 0 &&
+                   !reader.BuildPyramid(0, 1, 0, pair) && !reader.CanBuildPyramid() &&
+                   !reader.DeletePyramid() && !reader.RefreshPyramidState());
+        ZMC_EXPECT(reader.GetStatsMask() == 0 && !reader.CanStoreBandStats() &&
+                   !reader.CanStoreHistograms() && reader.SupportsNoData() &&
+                   !reader.ReservedReaderQuery() && reader.GetConnection());
         const std::uint32_t band = input.Size();
+        ZMC_EXPECT(!reader.HasBandStats(band) && !reader.SetBandStats({}) &&
+                   !reader.SetHistograms({}) && !reader.SetPalette(band, zelm::Palette()));
         ZMC_EXPECT(reader.GetBandStats(band).band == band && !reader.HasPalette(band) &&
                    !reader.GetPalette(band) && reader.GetHistograms().shape.elements == 0);
     }
@@ -332,7 +341,9 @@ private:
         props.bands = d.bands;
         for (std::uint32_t i = input.UpTo(3); i > 0; --i) {
             const double values[] = {0, 5, 34, -1, 1e300, std::nan("")};
-            props.SetNoDataValue(input.UpTo(7), input.OneOf(values));
+            const std::uint32_t band = input.UpTo(7);
+            props.SetNoDataValue(band, input.OneOf(values));
+            if (input.Byte() % 4 == 0) props.SetNoDataFlag(band, input.Flag());
         }
         reader.SetNoDataValues(props);
         for (std::uint32_t band = 0; band < 9; ++band)
@@ -470,6 +481,25 @@ void ExpectConnection(zelm::MemoryRasterDataConnection& connection, const std::s
     ZMC_EXPECT(!connection.IsOpen() && connection.GetParameters().shape.elements == 0);
 }
 
+// Knows the size that it was told last; a clone counts as told nothing.
+class Georeference final : public zelm::GeoRef {
+public:
+    zelm::GeoRef* Clone() const override { return new Georeference; }
+    void SetRasterSize(std::uint32_t samples, std::uint32_t lines) override {
+        toldSamples = samples;
+        toldLines = lines;
+    }
+    std::uint32_t toldSamples = 1u << 31;
+    std::uint32_t toldLines = 1u << 31;
+};
+
+void ExpectGeoref(const zelm::GeoRefPtr& held, const Description& d, bool given) {
+    ZMC_EXPECT(static_cast<bool>(held) == given);
+    if (!given) return;
+    const auto& georeference = dynamic_cast<const Georeference&>(*held);
+    ZMC_EXPECT(georeference.toldSamples == d.samples && georeference.toldLines == d.lines);
+}
+
 // Format words and texts around the parameter string, as the first byte says.
 struct Argument {
     std::vector<std::string> elements;
@@ -502,17 +532,24 @@ void ExpectOpen(std::uint8_t kind, const std::string& text, const Buffer& buffer
     const Array<String> connection = ArrayOf(argument.elements);
     zelm::RasterDataConnectionFactory factory;
     factory.Test(connection);
+    ZMC_EXPECT(factory.IsRasterFactory() && !factory.CreateDefault());
+    zelm::RasterProps props;
+    props.formatName = text.c_str();
+    ZMC_EXPECT(!factory.Create(connection, props) || text == "Pyramid");
     // Without a word, what is no memory raster is the name of a file, which is opened and, being no
     // pyramid, closed; those in other folders are let alone.
     if (!argument.memory && text.find('/') != std::string::npos) return;
-    const zelm::DataConnectionPtr opened =
-        factory.Open(connection, zelm::GeoRefPtr(), zelm::MetadataPtr());
+    const bool located = (kind & 16) != 0;
+    const zelm::DataConnectionPtr opened = factory.Open(
+        connection, zelm::GeoRefPtr(located ? new Georeference : nullptr), zelm::MetadataPtr());
     const std::optional<Description> d = Description::Of(text);
     ZMC_EXPECT(static_cast<bool>(opened) == (d && argument.single && !IsWord(text)));
     if (!opened) return;
     ZMC_EXPECT(factory.Test(connection));
     auto* const memory = dynamic_cast<zelm::MemoryRasterDataConnection*>(opened.Get());
     ZMC_EXPECT(memory);
+    ExpectGeoref(memory->rasterProps.geoRef, *d, located);
+    ZMC_EXPECT(!memory->Create(connection, props) && !memory->ReservedConnectionQuery());
     ExpectConnection(*memory, text, *d, buffer, input);
 }
 

@@ -129,7 +129,7 @@ def control_file_seeds():
     message = b"\x01\x00\x05hello"
     long = b"\x01\x01\xc8\x28" + b"0123456789" * 4
     files = {"kept": b"\0\0\0", "full": b"\0\5\5", "nearly": b"\0\3\2", "folder": b"\0\7\1",
-             "second-folder": b"\0\5\7", "none": b"\6\0\0", "file": b"\7\0\0"}
+             "second-folder": b"\0\5\7", "none": b"\6\0\0", "file": b"\7\0\0", "link": b"\5\0\0"}
     for name, state in files.items():
         yield f"logs-{name}", b"\0" + state + b"\3" + message + long + message + on
     lines = (
@@ -152,6 +152,7 @@ def environment_seeds():
     for i, (folder, level, console) in enumerate((
         (b"a", b"1", b"0"), (b"a", b"0x10", b"1"), (b"a/b", b"010", b"1"), (b"a", b"0", b"0"),
         (b"a", b"-1", b"-0"), (b"\xff\xfe", b"4294967296", b"4294967295"), (b"a/", b" +7z", b"x"),
+        (b"blocked", b"3", b"0"),
         (b"/", b"99999999999999999999", b"0xg"),
     )):
         values = variable(folder) + variable(level) + variable(console)
