@@ -26,13 +26,18 @@ const char* NarrowText(const String& value) {
     return text ? text : "";
 }
 
-// Tells numbers below the range of a double from those above it: by the sign of the exponent, or by
-// the first digit where there is none.
+// Tells numbers below the range of a double from those above it: by the power of ten that the first
+// digit other than 0 stands for. The number lies in a zero-terminated text.
 bool IsTiny(std::string_view number) {
-    const std::size_t exponent = number.find_first_of("eE");
-    if (exponent != std::string_view::npos) return number[exponent + 1] == '-';
-    const char first = number[number[0] == '-' ? 1 : 0];
-    return first == '0' || first == '.';
+    constexpr long long kFar = 1ll << 40;  // longer than any text, and far from overflow
+    const std::size_t mark = std::min(number.find_first_of("eE"), number.size());
+    const std::string_view digits = number.substr(0, mark);
+    const std::size_t point = std::min(digits.find('.'), digits.size());
+    const std::size_t first = std::min(digits.find_first_of("123456789"), digits.size());
+    const long long scale =
+        mark == number.size() ? 0 : std::strtoll(number.data() + mark + 1, nullptr, 10);
+    return static_cast<long long>(point) + std::clamp(scale, -kFar, kFar) <
+           static_cast<long long>(first);
 }
 
 // Reads a double as far as it goes, whatever the locale says of decimal points.

@@ -85,12 +85,15 @@ bool CLocaleCanEncode(wchar_t unit) {
     return std::wcrtomb(bytes, unit, &state) != static_cast<std::size_t>(-1);
 }
 
+// Encoders of the C library go beyond the last character, to what no UTF-8 holds.
+bool IsCharacter(wchar_t unit) { return static_cast<std::uint32_t>(unit) <= 0x10FFFF; }
+
 // A character that a stream cannot encode stays in its buffer and fails every later write, ours
 // and the host's; so none gets there.
 template <class Test>
 void ReplaceUnless(Test canEncode, wchar_t* text) {
     for (; *text; ++text)
-        if ((*text < 0 || *text > 0x7F) && !canEncode(*text)) *text = L'?';
+        if ((*text < 0 || *text > 0x7F) && !(IsCharacter(*text) && canEncode(*text))) *text = L'?';
 }
 
 void WriteTo(std::wostream& stream, const wchar_t* text) {

@@ -3,6 +3,7 @@
 #include <langinfo.h>
 #include <unicode/uchar.h>
 #include <unicode/ucnv.h>
+#include <unicode/ucnv_cb.h>
 #include <unicode/ustring.h>
 
 #include <limits>
@@ -11,7 +12,7 @@
 namespace platform {
 namespace {
 
-constexpr UChar32 kReplacement = 0xFFFD;
+constexpr UChar kReplacement = 0xFFFD;
 
 // ICU counts in 32-bit signed numbers; longer text is refused rather than cut.
 bool FitsIcu(std::size_t n) { return n <= std::size_t{std::numeric_limits<int32_t>::max()}; }
@@ -20,6 +21,19 @@ bool FitsIcu(std::size_t n) { return n <= std::size_t{std::numeric_limits<int32_
 std::size_t Answer(UErrorCode status, int32_t needed) {
     if (U_FAILURE(status) && status != U_BUFFER_OVERFLOW_ERROR) return kConversionFailed;
     return static_cast<std::size_t>(needed);
+}
+
+// What a charset cannot hold becomes '?', characters that show nothing included, which ICU's own
+// callback drops. A surrogate without its partner becomes U+FFFD first, and '?' only where that has
+// no place either.
+void Substitute(const void*, UConverterFromUnicodeArgs* arguments, const UChar*, int32_t, UChar32,
+                UConverterCallbackReason reason, UErrorCode* status) {
+    if (reason > UCNV_IRREGULAR) return;  // no character: the converter is reset, cloned or closed
+    *status = U_ZERO_ERROR;
+    if (reason == UCNV_UNASSIGNED) return ucnv_cbFromUWriteBytes(arguments, "?", 1, 0, status);
+    const UChar replacement = kReplacement;
+    const UChar* next = &replacement;
+    ucnv_cbFromUWriteUChars(arguments, &next, &replacement + 1, 0, status);
 }
 
 struct ConverterCloser {
@@ -53,9 +67,7 @@ std::size_t Utf16ToLocale(const char16_t* text, std::size_t length, char* out,
     std::unique_ptr<UConverter, ConverterCloser> converter(
         ucnv_open(nl_langinfo(CODESET), &status));
     if (!converter) return kConversionFailed;
-    ucnv_setSubstChars(converter.get(), "?", 1, &status);
-    // Unicode charsets have a substitute of their own; that '?' is not taken is no failure.
-    status = U_ZERO_ERROR;
+    ucnv_setFromUCallBack(converter.get(), Substitute, nullptr, nullptr, nullptr, &status);
     const int32_t needed = ucnv_fromUChars(converter.get(), out, static_cast<int32_t>(capacity),
                                            text, static_cast<int32_t>(length), &status);
     return Answer(status, needed);

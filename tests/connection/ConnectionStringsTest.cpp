@@ -191,6 +191,19 @@ TEST(ReadDoublePairParameter, ReadsNumbersAsFarAsTheyGo) {
     EXPECT_EQ(Double("1" + std::string(400, '0')), std::numeric_limits<double>::infinity());
 }
 
+// Neither the first digit nor the sign of the exponent tells which end of the range was left.
+TEST(ReadDoublePairParameter, NumbersOutOfRangeGoToTheEndThatTheyPass) {
+    constexpr double infinity = std::numeric_limits<double>::infinity();
+    const std::string zeros(400, '0');
+    EXPECT_EQ(Double("0." + zeros + "1e5"), 0);
+    EXPECT_EQ(Double("-." + zeros + "9e+9"), 0);
+    EXPECT_EQ(Double("9" + zeros + "e-5"), infinity);
+    EXPECT_EQ(Double("-12" + zeros + ".5E-9"), -infinity);
+    EXPECT_EQ(Double("0001e400"), infinity);
+    EXPECT_EQ(Double("1e99999999999999999999"), infinity);
+    EXPECT_EQ(Double("1e-99999999999999999999"), 0);
+}
+
 TEST(ReadDoublePairParameter, AMegabyteOfTokensIsRefusedAtOnce) {
     std::string many;
     for (int i = 0; i < 1 << 19; ++i) many += "1,";

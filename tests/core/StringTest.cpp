@@ -2,7 +2,9 @@
 
 #include <gtest/gtest.h>
 
+#include <clocale>
 #include <sstream>
+#include <string>
 
 namespace zelm {
 namespace {
@@ -240,6 +242,21 @@ TEST(String, ToLowerFoldsUnitsAndDropsTheCaches) {
 TEST(String, AnsiInTheClassicLocaleMarksWhatDoesNotFit) {
     EXPECT_STREQ(String("plain").GetAnsi(), "plain");
     EXPECT_STREQ(String("a\xE2\x82\xAC").GetAnsi(), "a?");
+}
+
+// Characters that show nothing count like any other: a soft hyphen, a joiner, a mark of direction.
+TEST(String, AnsiMarksCharactersThatShowNothing) {
+    EXPECT_STREQ(String(u"a\u00AD\u200D\u200Fb").GetAnsi(), "a???b");
+    EXPECT_STREQ(String(u"a\xD801 \xDC00").GetAnsi(), "a? ?");
+}
+
+TEST(String, AnsiInALocaleOfUtf8IsTheUtf8Form) {
+    if (!std::setlocale(LC_CTYPE, "C.UTF-8")) GTEST_SKIP() << "no such locale";
+    const String text(u"a\u00AD\u20AC\xD801 \xDC00\U0001F30D");
+    const std::string ansi = text.GetAnsi();
+    std::setlocale(LC_CTYPE, "C");
+    EXPECT_EQ(ansi, text.GetUtf8());
+    EXPECT_NE(ansi.find("\xEF\xBF\xBD \xEF\xBF\xBD"), std::string::npos);
 }
 
 TEST(String, ReadTrimmedTokenStopsAtWhiteSpace) {

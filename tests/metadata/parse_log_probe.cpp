@@ -71,6 +71,13 @@ int main(int argc, char** argv) {
     } else if (command == "odd") {
         MetadataParseLog::Log(1, L"odd \u00e4\U0001F30D\n");
         MetadataParseLog::Log(1, L"worse \xdc00\n");
+        // What is no character at all, where units have the room to say so.
+        if constexpr (sizeof(wchar_t) == 4) {
+            const wchar_t beyond[] = {static_cast<wchar_t>(0x110000),
+                                      static_cast<wchar_t>(0x7FFFFFFF),
+                                      static_cast<wchar_t>(0xFFFFFFFF), 0};
+            MetadataParseLog::Log(1, L"beyond %s\n", beyond);
+        }
         MetadataParseLog::Log(1, L"plain\n");
     } else if (command == "long") {
         const std::wstring text(static_cast<std::size_t>(number), L'x');
