@@ -4,6 +4,7 @@ option(ZMC_WARNINGS_AS_ERRORS "Treat warnings as errors in our own sources" ${PR
 set(ZMC_SANITIZE "" CACHE STRING "Sanitizers to build with, as for -fsanitize=")
 option(ZMC_FUZZ "Build the fuzz targets as fuzzers, with clang" OFF)
 option(ZMC_COVERAGE "Instrument for coverage" OFF)
+option(ZMC_PROFILE "Instrument for coverage in clang's own way, for fuzz targets" OFF)
 
 set(ZMC_ROOT "${CMAKE_CURRENT_SOURCE_DIR}")
 
@@ -27,6 +28,9 @@ if(ZMC_FUZZ)
 endif()
 if(ZMC_COVERAGE)
     list(APPEND ZMC_INSTRUMENT_FLAGS --coverage)
+endif()
+if(ZMC_PROFILE)
+    list(APPEND ZMC_INSTRUMENT_FLAGS -fprofile-instr-generate -fcoverage-mapping)
 endif()
 
 # The module works inside somebody else's process on files from anywhere: what the compiler, the C

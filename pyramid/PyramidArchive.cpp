@@ -41,10 +41,12 @@ bool ParseMeta(PyramidDataset& dataset, bool withoutText, Take take) {
 }
 
 // Has `append` add records to the tree and writes the whole document. A store is whole or nothing:
-// where a record is refused, those before it are taken back.
+// where a record is refused, those before it are taken back. In a file without a layout, whose
+// tiles are too large, nobody knows where the document is: the offset in the file is not to be
+// trusted.
 template <class Append>
 bool Store(PyramidDataset& dataset, Append append) {
-    if (!dataset.Writable || !dataset.File) return false;
+    if (!dataset.Writable || !dataset.File || !dataset.LevelOffsets) return false;
     PyramidXMLDocument* document = dataset.EnsureMetaDocument();
     if (!document || !document->document) return false;
     const std::uint32_t before = document->RecordCount();

@@ -3,13 +3,16 @@
 #ifndef ZMC_FUZZ_SUPPORT_EXPECT_H
 #define ZMC_FUZZ_SUPPORT_EXPECT_H
 
+#include <unistd.h>
+
 #include <cstdio>
 #include <cstdlib>
 
 namespace zmcfuzz {
 
+// To the descriptor and not to the stream, which targets may have silenced.
 [[noreturn]] inline void Fail(const char* file, int line, const char* expectation) {
-    std::fprintf(stderr, "%s:%d: does not hold: %s\n", file, line, expectation);
+    dprintf(STDERR_FILENO, "%s:%d: does not hold: %s\n", file, line, expectation);
     std::abort();
 }
 

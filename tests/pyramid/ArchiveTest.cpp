@@ -426,6 +426,21 @@ TEST_F(ArchiveTest, HugeDocumentIsNotLoadedAndNotOverwritten) {
     EXPECT_FALSE(dataset->SetBandStats(ArrayOf({StatsOf<T>(0, 1)})));
 }
 
+// Its layout is not known, and the offset in its front may point anywhere, into the header as well.
+TEST_F(ArchiveTest, FileOfTooLargeTilesIsNeverStoredTo) {
+    HeaderText header;
+    header.tileSize = PyramidDataset::kMaxTileSize + 1;
+    for (const std::uint64_t offset : {std::uint64_t{0}, std::uint64_t{20}, std::uint64_t{600}}) {
+        const std::string before = FileWithHeader(header.Text(), offset) + "<DATASET/>";
+        support::WriteText(name, before);
+        const auto dataset = Open();
+        EXPECT_FALSE(dataset->SetBandStats(ArrayOf({StatsOf<T>(0, 1)})));
+        EXPECT_FALSE(dataset->SetHistograms(Array<RasterBandHistogram<T>>()));
+        EXPECT_FALSE(dataset->SetPalette(0, Palette()));
+        EXPECT_EQ(support::ReadText(name), before);
+    }
+}
+
 TEST_F(ArchiveTest, RefusedDocumentIsLoadedAfreshAndRefusedAgain) {
     std::string deep;
     for (int i = 0; i < 100; ++i) deep += "<A>";

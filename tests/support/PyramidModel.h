@@ -14,6 +14,7 @@
 #include <map>
 #include <stdexcept>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "tests/support/ScratchDirectory.h"
@@ -182,6 +183,12 @@ public:
         LayOut(file.size());
         Put64(4, tileDataStart);
         Put64(12, tileDataEnd);
+    }
+
+    // A file of these bytes, with this header and tile data from `start` on.
+    PyramidModel(const PyramidDescription& description, Bytes bytes, std::uint64_t start)
+        : d(description), file(std::move(bytes)) {
+        LayOut(start);
     }
 
     // A file that somebody else wrote.

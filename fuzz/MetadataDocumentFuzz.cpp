@@ -1,0 +1,64 @@
+// The metadata document of a file: whatever text stands there is read for one of the element types,
+// added to, and read again by another dataset. The last byte of the input names the type.
+#include <cstddef>
+#include <cstdint>
+#include <string>
+#include <string_view>
+
+#include "core/ElementTypes.h"
+#include "fuzz/support/Expect.h"
+#include "fuzz/support/Host.h"
+#include "fuzz/support/InputBytes.h"
+#include "fuzz/support/MemoryFile.h"
+#include "fuzz/support/Records.h"
+#include "fuzz/support/StoreCheck.h"
+#include "pyramid/PyramidDataConnection.h"
+#include "pyramid/PyramidDataset.h"
+#include "pyramid/PyramidRasterReader.h"
+#include "tests/support/PyramidFiles.h"
+
+namespace {
+
+using namespace zelm;
+using zmcfuzz::InputBytes;
+using zmcfuzz::MemoryFile;
+
+template <class T>
+void Use(const MemoryFile& file, InputBytes& input) {
+    Array<String> name;
+    ZMC_EXPECT(name.Append(String(file.Name().c_str())));
+    PyramidDataConnection connection;
+    ZMC_EXPECT(connection.Open(name, GeoRefPtr(), MetadataPtr()));
+    PyramidDataset& dataset = *connection.dataset;
+    zmcfuzz::Records<T> here, there;
+    here.Load(dataset);
+    // Each answer is a parse of its own, so not every input pays for them.
+    if (input.UpTo(3) == 0) {
+        const PyramidRasterReader<T> reader(&connection, GeoRefPtr(), MetadataPtr());
+        zmcfuzz::ExpectAnswers<T>(reader, here, input.UpTo(3));
+    }
+    zmcfuzz::StoreCheck<T>(dataset, file).Run(input);
+    here.Load(dataset);
+    PyramidDataset other(String(file.Name().c_str()));
+    ZMC_EXPECT(!other.ReadHeader());
+    there.Load(other);
+    ZMC_EXPECT(here == there);
+}
+
+}  // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+    static MemoryFile file;
+    static const std::string front = zelm::test::HeaderText{.width = 1, .height = 1}.File();
+    const std::string_view text(reinterpret_cast<const char*>(data), size);
+    const std::uint8_t type = text.empty() ? 0 : static_cast<std::uint8_t>(text.back()) % 12u;
+    file.Assign(front + std::string(text));
+    // The records to store are made of the document's own bytes.
+    InputBytes input(data + size / 3, size - size / 3);
+    std::uint8_t next = 0;
+#define ZMC_X(type_, name, code) \
+    if (next++ == type) Use<type_>(file, input);
+    ZMC_ELEMENT_TYPES(ZMC_X)
+#undef ZMC_X
+    return 0;
+}
