@@ -1,0 +1,209 @@
+#include "tests/campaigns/Campaign.h"
+
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <csignal>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <ctime>
+#include <utility>
+
+#include "tests/campaigns/MemoryMeter.h"
+
+#if defined(__SANITIZE_ADDRESS__)
+#include <sanitizer/common_interface_defs.h>
+#define ZMC_CAMPAIGN_SANITIZED 1
+#endif
+
+namespace campaigns {
+namespace {
+
+constexpr std::uint64_t kMostFailuresTold = 10;
+constexpr unsigned kHangSeconds = 120;
+
+double Seconds(clockid_t clock) {
+    timespec now{};
+    clock_gettime(clock, &now);
+    return static_cast<double>(now.tv_sec) + static_cast<double>(now.tv_nsec) * 1e-9;
+}
+
+const char* Environment(const char* name) {
+    const char* value = std::getenv(name);
+    return value ? value : "";
+}
+
+// The line that makes the variant in hand again, ready for a signal handler.
+char again[512];
+int realStderr = 2;
+
+void TellAgain() {
+    const std::size_t length = std::strlen(again);
+    if (write(realStderr, again, length) < 0) return;
+}
+
+void OnSignal(int number) {
+    TellAgain();
+    if (number == SIGALRM) _exit(3);
+    std::signal(number, SIG_DFL);
+    std::raise(number);
+}
+
+void CatchDeath() {
+    std::signal(SIGALRM, OnSignal);
+    std::signal(SIGABRT, OnSignal);
+#ifdef ZMC_CAMPAIGN_SANITIZED
+    __sanitizer_set_death_callback(TellAgain);
+#else
+    for (const int number : {SIGSEGV, SIGBUS, SIGFPE, SIGILL}) std::signal(number, OnSignal);
+#endif
+}
+
+// The standard error stream leads nowhere while one of these lives.
+class Silence {
+public:
+    Silence() {
+        realStderr = dup(2);
+        const int nowhere = open("/dev/null", O_WRONLY | O_CLOEXEC);
+        dup2(nowhere, 2);
+        close(nowhere);
+        ReportTo(realStderr);
+    }
+    ~Silence() {
+        std::fflush(stderr);
+        dup2(realStderr, 2);
+        ReportTo(2);
+        close(std::exchange(realStderr, 2));
+    }
+    Silence(const Silence&) = delete;
+    Silence& operator=(const Silence&) = delete;
+
+private:
+    static void ReportTo([[maybe_unused]] int descriptor) {
+#ifdef ZMC_CAMPAIGN_SANITIZED
+        __sanitizer_set_report_fd(reinterpret_cast<void*>(static_cast<std::intptr_t>(descriptor)));
+#endif
+    }
+};
+
+std::uint64_t FirstVariant(std::uint64_t stride) {
+    const char* fixed = Environment("ZMC_CAMPAIGN_PHASE");
+    const std::uint64_t day = static_cast<std::uint64_t>(std::time(nullptr)) / 86400;
+    return (*fixed ? std::strtoull(fixed, nullptr, 10) : day) % stride;
+}
+
+std::string Megabytes(std::int64_t bytes) {
+    char text[32];
+    std::snprintf(text, sizeof text, "%.1f MiB", static_cast<double>(bytes) / 1048576);
+    return text;
+}
+
+}  // namespace
+
+void Cost::NewVariant() { MemoryMeter::Reset(); }
+
+void Cost::Start() {
+    wallStart = Seconds(CLOCK_MONOTONIC);
+    cpuStart = Seconds(CLOCK_THREAD_CPUTIME_ID);
+    MemoryMeter::Switch(true);
+}
+
+void Cost::Stop() {
+    MemoryMeter::Switch(false);
+    cpuSeconds += Seconds(CLOCK_THREAD_CPUTIME_ID) - cpuStart;
+    wallSeconds += Seconds(CLOCK_MONOTONIC) - wallStart;
+    peakBytes = std::max(peakBytes, MemoryMeter::Peak());
+}
+
+bool Campaign::IsFull() { return std::strcmp(Environment("ZMC_CAMPAIGN"), "full") == 0; }
+
+std::optional<std::uint64_t> Campaign::Only() {
+    const char* only = Environment("ZMC_CAMPAIGN_ONLY");
+    if (!*only) return std::nullopt;
+    return std::strtoull(only, nullptr, 10);
+}
+
+Campaign::Campaign(std::string campaignName, std::uint64_t shortStride)
+    : name(std::move(campaignName)),
+      stride(IsFull() || Only() ? 1 : shortStride),
+      phase(FirstVariant(stride)) {
+    CatchDeath();
+}
+
+Campaign::~Campaign() {
+    std::string kinds;
+    for (const auto& [kind, count] : outcomes) kinds += ", " + kind + " " + std::to_string(count);
+    std::printf(
+        "campaign: %s: %s form%s, %llu of %llu variants, %llu failed%s; slowest %.1f ms of "
+        "processor time (variant %llu, %.1f ms on the wall), most memory %s (variant %llu), "
+        "%.1f s in all\n",
+        name.c_str(), IsFull() ? "full" : "short",
+        stride == 1 ? "" : (", phase " + std::to_string(phase)).c_str(),
+        static_cast<unsigned long long>(tried), static_cast<unsigned long long>(numbered),
+        static_cast<unsigned long long>(failed), kinds.c_str(), highest.cpuSeconds * 1e3,
+        static_cast<unsigned long long>(slowest), highest.wallSeconds * 1e3,
+        Megabytes(highest.peakBytes).c_str(), static_cast<unsigned long long>(largest), seconds);
+    std::fflush(stdout);
+}
+
+void Campaign::Run(const std::string& part, std::uint64_t count,
+                   const std::function<Verdict(std::uint64_t)>& run) {
+    const double start = Seconds(CLOCK_MONOTONIC);
+    const std::uint64_t first = numbered;
+    numbered += count;
+    const auto only = Only();
+    const std::string test =
+        std::string(testing::UnitTest::GetInstance()->current_test_info()->test_suite_name()) +
+        "." + testing::UnitTest::GetInstance()->current_test_info()->name();
+    for (std::uint64_t i = 0; i < count && failed < kMostFailuresTold; ++i) {
+        const std::uint64_t number = first + i;
+        if (only ? number != *only : number % stride != phase) continue;
+        std::snprintf(again, sizeof again,
+                      "\n%s, variant %llu of %s. Again with: ZMC_CAMPAIGN_ONLY=%llu %s "
+                      "--gtest_filter=%s\n",
+                      name.c_str(), static_cast<unsigned long long>(i), part.c_str(),
+                      static_cast<unsigned long long>(number), program_invocation_name,
+                      test.c_str());
+        alarm(kHangSeconds);
+        Cost::NewVariant();
+        Verdict verdict;
+        {
+            const std::optional<Silence> silence =
+                only ? std::nullopt : std::make_optional<Silence>();
+            verdict = run(i);
+        }
+        alarm(0);
+        Judge(part, number, verdict);
+    }
+    seconds += Seconds(CLOCK_MONOTONIC) - start;
+}
+
+void Campaign::Judge(const std::string& part, std::uint64_t number, const Verdict& verdict) {
+    ++tried;
+    std::vector<std::string> complaints = verdict.complaints;
+    if (verdict.cost.cpuSeconds > verdict.allowedSeconds)
+        complaints.push_back("took " + std::to_string(verdict.cost.cpuSeconds) + " s");
+    if (verdict.cost.peakBytes > verdict.allowedBytes)
+        complaints.push_back("took " + Megabytes(verdict.cost.peakBytes) + " where " +
+                             Megabytes(verdict.allowedBytes) + " are allowed");
+    for (const std::string& kind : verdict.outcomes) ++outcomes[kind];
+    if (verdict.cost.cpuSeconds > highest.cpuSeconds) {
+        highest.cpuSeconds = verdict.cost.cpuSeconds;
+        highest.wallSeconds = verdict.cost.wallSeconds;
+        slowest = number;
+    }
+    if (verdict.cost.peakBytes > highest.peakBytes) {
+        highest.peakBytes = verdict.cost.peakBytes;
+        largest = number;
+    }
+    if (complaints.empty()) return;
+    ++failed;
+    std::string text = part + ":";
+    for (const std::string& complaint : complaints) text += "\n  " + complaint;
+    ADD_FAILURE() << text << again;
+}
+
+}  // namespace campaigns
