@@ -19,8 +19,11 @@ CoordSys::CoordSys() : id(++lastId) {}
 CoordSys::~CoordSys() { ReleaseImpl(); }
 
 void CoordSys::ReleaseImpl() {
+    // A handle that is bound to nothing may go while another thread loads the engine and makes the
+    // section, or holds it; the module's own handle goes inside the loader's lock.
+    if (!impl) return;
     const auto lock = HoldLock(CoordSysSection());
-    if (!impl || impl->ReleaseReference() >= 1) return;
+    if (impl->ReleaseReference() >= 1) return;
     // The first release of a process can be what loads the engine.
     if (CoordSysFactory::GetInstance() && fp_Esri_Pe_Release && fp_Esri_Pe_Release(impl) != 0)
         impl = nullptr;

@@ -1,6 +1,7 @@
 #include "coordsys/CoordSysLog.h"
 
 #include <algorithm>
+#include <atomic>
 #include <cstdarg>
 #include <cstring>
 #include <memory>
@@ -19,6 +20,8 @@ namespace {
 
 constexpr std::size_t kTextCapacity = 4096;
 constexpr std::size_t kControlLineLength = 19;
+
+std::atomic_ref<CoordSysLog*> Instance() { return std::atomic_ref(gpCoordSysLogInstance); }
 
 struct StreamCloser {
     void operator()(std::FILE* stream) const { std::fclose(stream); }
@@ -56,21 +59,22 @@ bool IsPastLimit(std::uint64_t position) {
 
 CoordSysLog::~CoordSysLog() { CloseStream(); }
 
+// Other threads may log at any time, so they see the log when it is ready and not before.
 CoordSysLog* CoordSysLog::CreateInstance(const String& directory) {
+    std::unique_ptr<CoordSysLog> fresh;
     try {
-        gpCoordSysLogInstance = new (std::nothrow) CoordSysLog;
-        if (!gpCoordSysLogInstance) return nullptr;
-        gpCoordSysLogInstance->peDirectory = directory;
-        if (platform::PathExists(gpCoordSysLogInstance->peDirectory.GetAnsi())) {
-            gpCoordSysLogInstance->Init();
-            return gpCoordSysLogInstance;
-        }
+        fresh.reset(new (std::nothrow) CoordSysLog);
+        if (fresh) fresh->peDirectory = directory;
+        if (fresh && platform::PathExists(fresh->peDirectory.GetAnsi()))
+            fresh->Init();
+        else
+            fresh.reset();
     } catch (...) {
         // No directory that can be used, then.
+        fresh.reset();
     }
-    delete gpCoordSysLogInstance;
-    gpCoordSysLogInstance = nullptr;
-    return nullptr;
+    Instance().store(fresh.get(), std::memory_order_release);
+    return fresh.release();
 }
 
 void CoordSysLog::Init() {
@@ -163,7 +167,7 @@ void CoordSysLog::ApplyControlLine(const char* line) {
 }
 
 void CoordSysLog::LogMessage(std::uint32_t level, const WideChar* format, ...) {
-    CoordSysLog* const log = gpCoordSysLogInstance;
+    CoordSysLog* const log = Instance().load(std::memory_order_acquire);
     if (!log || (log->levelMask & level) == 0) return;
     std::va_list arguments;
     va_start(arguments, format);

@@ -3,7 +3,12 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <sys/stat.h>
+
+#include <atomic>
+#include <chrono>
 #include <sstream>
+#include <thread>
 
 #include "tests/coordsys/ProbeRun.h"
 #include "tests/support/ScratchDirectory.h"
@@ -326,6 +331,25 @@ TEST_F(CoordSysLogRun, FullDiskEndsTheLoggingToFiles) {
     EXPECT_THAT(result.err, Not(HasSubstr("sequence=1000")));
     EXPECT_GT(First().size(), 0u);
     EXPECT_LE(First().size(), 65536u);
+}
+
+// A control file that is a pipe holds the creation up until a line is written into it.
+TEST_F(CoordSysLogRun, IsSeenByOthersOnlyWhenItIsReady) {
+    ASSERT_EQ(mkfifo((scratch / "pelog.txt").c_str(), 0600), 0);
+    std::atomic<bool> ready{false};
+    std::thread creator([&] {
+        CoordSysLog::CreateInstance(scratch.String().c_str());
+        ready = true;
+    });
+    std::this_thread::sleep_for(std::chrono::milliseconds(100));
+    EXPECT_FALSE(ready);
+    EXPECT_EQ(std::atomic_ref(gpCoordSysLogInstance).load(), nullptr);
+    WriteText(scratch / "pelog.txt", "1000,0000,0000,0001\n");
+    creator.join();
+    ASSERT_NE(gpCoordSysLogInstance, nullptr);
+    EXPECT_EQ(gpCoordSysLogInstance->levelMask, 1u);
+    delete gpCoordSysLogInstance;
+    gpCoordSysLogInstance = nullptr;
 }
 
 TEST(CoordSysLog, WithoutAnInstanceMessagesVanish) {

@@ -3,6 +3,8 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <chrono>
+#include <future>
 
 #include "coordsys/CoordSysMutex.h"
 #include "coordsys/CoordSysUnit.h"
@@ -97,6 +99,15 @@ TEST(CoordSysMutex, IsMadeOnceAndCanBeEnteredAgain) {
     const auto outer = HoldLock(section);
     const auto inner = HoldLock(section);
     EXPECT_NE(inner, nullptr);
+}
+
+// The module has such a handle, and is unloaded while others may be at work on the engine.
+TEST(CoordSysMutex, UnboundHandleDoesNotWaitForIt) {
+    EnsureCoordSysSection();
+    auto held = HoldLock(CoordSysSection());
+    const auto gone = std::async(std::launch::async, [] { const CoordSys handle; });
+    EXPECT_EQ(gone.wait_for(std::chrono::seconds(2)), std::future_status::ready);
+    held.reset();
 }
 
 TEST(CoordSysUnit, TableHasSeventeenRowsAndAnEndMark) {
