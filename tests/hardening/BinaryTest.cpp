@@ -22,9 +22,7 @@ struct Shipped {
     bool program;
 };
 
-void PrintTo(const Shipped& shipped, std::ostream* out) {
-    *out << shipped.name;
-}
+void PrintTo(const Shipped& shipped, std::ostream* out) { *out << shipped.name; }
 
 class Hardening : public ::testing::TestWithParam<Shipped> {
 protected:
