@@ -1,0 +1,46 @@
+// What a binary does not show, from the commands that compiled it.
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <filesystem>
+#include <nlohmann/json.hpp>
+#include <set>
+#include <string>
+
+#include "tests/support/ScratchDirectory.h"
+
+namespace {
+
+using ::testing::HasSubstr;
+using ::testing::SizeIs;
+
+// Folders whose sources end up in something that is shipped.
+const std::set<std::string> shippedFolders{
+    "platform", "core",       "metadata", "colour", "raster", "dispatch", "pyramid",
+    "coordsys", "connection", "zmcg",     "zmcpe",  "host",   "gdal",     "tools"};
+
+TEST(HardeningCommandLine, EverySourceThatIsShippedHasTheFlags) {
+#ifndef ZMC_HARDENED
+    GTEST_SKIP() << "not a hardened build";
+#endif
+    const std::string text = support::ReadText(ZMC_BUILD_DIR "/compile_commands.json");
+    const auto commands = nlohmann::json::parse(text, nullptr, false);
+    ASSERT_TRUE(commands.is_array());
+
+    std::set<std::string> seen;
+    for (const auto& entry : commands) {
+        const std::filesystem::path file(entry.at("file").get<std::string>());
+        const std::string folder = file.lexically_relative(ZMC_SOURCE_DIR).begin()->string();
+        if (!shippedFolders.contains(folder)) continue;
+        seen.insert(folder);
+        const auto command = entry.at("command").get<std::string>();
+        for (const char* flag :
+             {" -D_FORTIFY_SOURCE=3", " -fstack-protector-strong", " -fstack-clash-protection",
+              " -D_GLIBCXX_ASSERTIONS", " -fcf-protection=full", " -O3"})
+            EXPECT_THAT(command, HasSubstr(flag)) << file;
+        EXPECT_THAT(command, ::testing::AnyOf(HasSubstr(" -fPIC"), HasSubstr(" -fPIE"))) << file;
+    }
+    EXPECT_THAT(seen, SizeIs(::testing::Ge(12U)));
+}
+
+}  // namespace
