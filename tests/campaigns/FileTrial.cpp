@@ -423,6 +423,8 @@ void FileTrial::WriteTile(const Bytes& before, const FileOracle& oracle, Verdict
     const HeaderFields& h = oracle.header;
     const std::uint32_t level = h.levelMin;
     if (h.bands == 0 || h.bands > 64 || level > std::min(h.levelMax, 31u)) return;
+    // Along the curve, tiles of sides that a level does not divide lie partly over each other.
+    if (h.ordering == 2 && h.tileSize % (1u << level) != 0) return;
     const std::uint32_t width = std::min(h.tileSize, oracle.Width(level));
     const std::uint32_t height = std::min(h.tileSize, oracle.Height(level));
     const Rect rect{0, 0, width, height};
