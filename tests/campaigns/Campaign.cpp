@@ -12,7 +12,7 @@
 #include <ctime>
 #include <utility>
 
-#include "tests/campaigns/MemoryMeter.h"
+#include "tests/support/MemoryMeter.h"
 
 #if defined(__SANITIZE_ADDRESS__)
 #include <sanitizer/common_interface_defs.h>
@@ -103,19 +103,19 @@ std::string Megabytes(std::int64_t bytes) {
 
 }  // namespace
 
-void Cost::NewVariant() { MemoryMeter::Reset(); }
+void Cost::NewVariant() { testsupport::MemoryMeter::Reset(); }
 
 void Cost::Start() {
     wallStart = Seconds(CLOCK_MONOTONIC);
     cpuStart = Seconds(CLOCK_THREAD_CPUTIME_ID);
-    MemoryMeter::Switch(true);
+    testsupport::MemoryMeter::Switch(true);
 }
 
 void Cost::Stop() {
-    MemoryMeter::Switch(false);
+    testsupport::MemoryMeter::Switch(false);
     cpuSeconds = std::max(cpuSeconds, Seconds(CLOCK_THREAD_CPUTIME_ID) - cpuStart);
     wallSeconds = std::max(wallSeconds, Seconds(CLOCK_MONOTONIC) - wallStart);
-    peakBytes = std::max(peakBytes, MemoryMeter::Peak());
+    peakBytes = std::max(peakBytes, testsupport::MemoryMeter::Peak());
 }
 
 bool Campaign::IsFull() { return std::strcmp(Environment("ZMC_CAMPAIGN"), "full") == 0; }
