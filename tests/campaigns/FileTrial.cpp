@@ -243,7 +243,7 @@ void FileTrial::LookAtLevel(const FileOracle& oracle, Session& session, Verdict&
     const auto at = static_cast<std::int32_t>(level);
     const std::uint64_t width = oracle.Width(level), height = oracle.Height(level);
     const std::vector<int> all = AllBands(h.bands);
-    const int last = static_cast<int>(std::min(h.bands, 1u << 31)) - 1;
+    const int last = static_cast<int>(std::min(h.bands, 1u << 30)) - 1;
     const auto look = [&](const Rect& rect, const std::vector<int>& list) {
         LookAtRect(oracle, session, verdict, rect, list, at);
     };
