@@ -158,8 +158,11 @@ bool FileOracle::TileAt(std::uint32_t level, std::uint64_t tx, std::uint64_t ty,
                       std::uint64_t{band} * sampleBytes;
         return true;
     }
-    if (!morton) return false;
     tile.pixelBytes = sampleBytes;
+    // The first tile of all comes first.
+    tile.start = tileDataStart;
+    if (level == 0 && tx == 0 && ty == 0 && band == 0) return true;
+    if (!morton) return false;
     const std::uint64_t row = (std::uint64_t{level} * header.bands + band) * morton->tiles;
     const auto start = morton->offsets.find(row + Across(level) * ty + tx);
     if (start == morton->offsets.end()) return false;

@@ -142,6 +142,8 @@ Verdict FileTrial::Try(const Bytes& file, const Depth& depth) {
     const FileOracle oracle(file);
     Verdict verdict;
     verdict.allowedBytes += static_cast<std::int64_t>(oracle.AllowedBytes());
+    // Its memory is filled once.
+    verdict.allowedSeconds += 3 * static_cast<double>(oracle.TableBytes()) / (1u << 30);
     Look(oracle, depth, verdict);
     const Bytes now = Take();
     if (now.size() != std::min<std::size_t>(file.size(), kTaken) ||
@@ -175,7 +177,9 @@ void FileTrial::Look(const FileOracle& oracle, const Depth& depth, Verdict& verd
         return session.End(verdict.cost);
     }
     LookAtFields(oracle, session, verdict);
-    if (session.reader && depth.pixels) LookAtPixels(oracle, session, verdict);
+    const bool deferred = oracle.TableBytes() > kMaxTable && !depth.tables;
+    if (deferred) verdict.Count("with a table too large to ask for here");
+    if (session.reader && depth.pixels && !deferred) LookAtPixels(oracle, session, verdict);
     if (session.reader && depth.records) LookAtRecords(oracle, session, verdict);
     session.End(verdict.cost);
 }
@@ -220,10 +224,6 @@ void FileTrial::LookAtFields(const FileOracle& oracle, Session& session, Verdict
 }
 
 void FileTrial::LookAtPixels(const FileOracle& oracle, Session& session, Verdict& verdict) {
-    if (oracle.TableBytes() > kMaxTable) {
-        verdict.Count("with a table too large to ask for here");
-        return;
-    }
     const HeaderFields& h = oracle.header;
     std::set<std::int64_t> levels{
         -1, 0, 1, 2, 31, 32, std::int64_t{h.levelMin} - 1, h.levelMin, h.levelMin + 1, h.levelMax};
@@ -403,7 +403,7 @@ void FileTrial::Store(const Bytes& before, const FileOracle& oracle, Verdict& ve
     }
     Verdict again;
     again.cost = verdict.cost;
-    Look(stores, {true, true, false}, again);
+    Look(stores, {.stores = false}, again);
     verdict.cost = again.cost;
     for (const std::string& complaint : again.complaints)
         verdict.Complain("after a store: " + complaint);

@@ -31,6 +31,7 @@ public:
     struct Depth {
         bool pixels = true;   // read all levels
         bool records = true;  // fetch statistics, histograms and palettes
+        bool tables = false;  // with any table of tile offsets that the limits allow
         bool stores = true;   // store records, refresh, write a tile; then look at the whole again
     };
 

@@ -3,6 +3,7 @@
 
 #include <array>
 #include <string>
+#include <vector>
 
 #include "tests/campaigns/Campaign.h"
 #include "tests/campaigns/FileTrial.h"
@@ -92,6 +93,37 @@ TEST(HeaderFields, EveryPairAtTheBorders) {
                                  values[second] = ValuesOf(second)[i % kValues];
                                  return trial.Try(WithHeader(sample, values), {});
                              });
+}
+
+// Headers of some hundred bytes whose tables of tile offsets are as large as they may be, asked for
+// their first tiles.
+TEST(HeaderFields, LargeTables) {
+    FileTrial trial;
+    Campaign campaign("HeaderFields.LargeTables", 1);
+    struct Table {
+        std::uint32_t width, height, bands, levelMax, tile;
+    };
+    std::vector<Table> tables{{2048, 2048, 1, 0, 1},
+                              {65536, 512, 1, 0, 1},
+                              {16, 16, 4194304, 0, 16},
+                              {64, 64, 2048, 1023, 16},
+                              {1, 65536, 16, 31, 1}};
+    if (Campaign::IsFull()) {
+        const Table full[] = {{16384, 16384, 1, 0, 1},    {8190, 65536, 1, 0, 1},
+                              {65536, 8190, 1, 0, 1},     {65536, 8192, 1, 0, 1},
+                              {16, 16, 536870000, 0, 16}, {1024, 1024, 127, 1023, 16}};
+        tables.insert(tables.end(), std::begin(full), std::end(full));
+    }
+    const Sample sample = Samples().back();
+    campaign.Run("Morton", tables.size(), [&](std::uint64_t i) {
+        std::array<std::string, kFields> values = FieldsOf(sample);
+        values[2] = std::to_string(tables[i].bands);
+        values[3] = std::to_string(tables[i].height);
+        values[4] = std::to_string(tables[i].width);
+        values[6] = std::to_string(tables[i].levelMax);
+        values[7] = std::to_string(tables[i].tile);
+        return trial.Try(WithHeader(sample, values), {.tables = true, .stores = false});
+    });
 }
 
 }  // namespace

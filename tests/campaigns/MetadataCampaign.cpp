@@ -257,7 +257,7 @@ TEST(Metadata, DocumentsAtTheLimits) {
     const auto large = LargeDocuments();
     campaign.Run("large", large.size(), [&](std::uint64_t i) {
         const Sample sample = MakeSample("Blocked", 1, 4, 26, 37, 2);
-        Verdict verdict = trial.Try(WithDocument(sample, large[i]()), {true, true, false});
+        Verdict verdict = trial.Try(WithDocument(sample, large[i]()), {.stores = false});
         // In proportion to the text, which is read once for each question.
         verdict.allowedSeconds = 60;
         return verdict;
