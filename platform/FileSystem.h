@@ -56,14 +56,6 @@ bool ReserveSpace(const std::string& path, std::uint64_t size);
 // Gives back what was reserved and not used.
 bool ReleaseReserve(const std::string& path);
 
-// A stretch of a file that holds nothing: it reads as zeros and was never written.
-struct Hole {
-    std::uint64_t begin = 0;
-    std::uint64_t end = 0;
-};
-// The holes of a file; none where the file system does not tell, or when the file cannot be read.
-std::vector<Hole> FindHoles(const std::string& path);
-
 std::uint64_t CurrentProcess();
 bool ProcessAlive(std::uint64_t process);
 // Path of the program or library that the code at an address was loaded from; empty if not known.

@@ -22,6 +22,7 @@
 #include <new>
 #include <string>
 
+#include "platform/File.h"
 #include "pyramid/DocumentLimits.h"
 
 namespace zelm {
@@ -39,7 +40,7 @@ public:
 
     // False if it could not be written whole.
     bool Write(const unsigned char* text, std::size_t length) {
-        if (length == 0) return false;
+        if (length == 0 || oldSize == kUnknownSize) return false;
         KeepOldText();
         if (!Grow(offset + length)) return CutBack(), false;
         if (file.WriteAt(offset, &kUnfinishedDocument, 1) != 1) return CutBack(), false;
@@ -90,13 +91,19 @@ private:
             return;
         }
         if (!oldText) return;
-        if (!CutBack() && !Blank(oldSize, file.Size())) return;
+        if (!CutBack() && !BlankTail()) return;
         const std::size_t rest = OldLength() - 1;
         if (file.WriteAt(offset + 1, oldText.get() + 1, rest) == rest)
             file.WriteAt(offset, oldText.get(), 1);
     }
 
+    bool BlankTail() {
+        const std::uint64_t size = file.Size();
+        return size != kUnknownSize && Blank(oldSize, size);
+    }
+
     static constexpr std::size_t kBlank = 65536;
+    static constexpr std::uint64_t kUnknownSize = platform::File::kUnknownSize;
 
     File& file;
     const std::uint64_t offset;
