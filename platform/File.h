@@ -35,6 +35,8 @@ public:
 
     // Size of the file in bytes; 0 if it cannot be told.
     std::uint64_t Size() const;
+    // The same for those who would take that 0 for an empty file: false, with `size` as it was.
+    bool TellSize(std::uint64_t& size) const;
     // Makes the file end there; what lay beyond is gone. False, with nothing changed, on failure.
     bool Truncate(std::uint64_t size);
     // Waits until what was written has reached the disk; false if that failed.

@@ -106,8 +106,16 @@ std::size_t File::WriteAt(std::uint64_t offset, const void* buffer, std::size_t 
 }
 
 std::uint64_t File::Size() const {
+    std::uint64_t size = 0;
+    TellSize(size);
+    return size;
+}
+
+bool File::TellSize(std::uint64_t& size) const {
     struct stat status;
-    return fstat(descriptor, &status) == 0 ? static_cast<std::uint64_t>(status.st_size) : 0;
+    if (fstat(descriptor, &status) != 0) return false;
+    size = static_cast<std::uint64_t>(status.st_size);
+    return true;
 }
 
 bool File::Truncate(std::uint64_t size) {
