@@ -5,6 +5,7 @@
 #include <sstream>
 
 #include "core/PixelVocabulary.h"
+#include "host/MetadataCopy.h"
 #include "host/NoData.h"
 #include "host/Text.h"
 #include "platform/FileSystem.h"
@@ -101,6 +102,7 @@ Raster Raster::Open(ModulePtr module, const std::string& file) {
     const platform::FileStatus status = platform::StatusOf(file);
     if (!status.exists) throw Error(file, "open the raster", "there is no such file");
     if (!status.isRegular) throw Error(file, "open the raster", "it is not a file");
+    const Recovery recovery = RecoverMetadata(file);
     PyramidHeader header = PyramidHeader::Read(file);
     zelm::RasterDataConnectionPtr connection = module->OpenPyramid(file);
     if (!connection) throw Error(file, "open the raster", "the module refuses it");
@@ -109,6 +111,7 @@ Raster Raster::Open(ModulePtr module, const std::string& file) {
     raster.header = header;
     raster.minLevel = header.minLevel;
     raster.maxLevel = header.maxLevel;
+    raster.recoveryNote = recovery.text;
     return raster;
 }
 
@@ -136,6 +139,7 @@ Raster Raster::Create(ModulePtr module, const std::string& file, zelm::RasterPro
     if (raster.header->maxLevel != maxLevel || raster.header->width != props.samples ||
         raster.header->height != props.lines || raster.header->bands != props.bands)
         throw Error(file, "lay out the raster", "an older file stands in its place");
+    platform::RemoveEntry(MetadataCopy::PathFor(file));
     raster.SetNoDataValues(noData);
     return raster;
 }
@@ -414,6 +418,18 @@ zelm::RasterBandStats<T> Raster::Statistics(std::uint32_t band) const {
     return record;
 }
 
+// Runs what stores and reads back.
+template <class Action>
+void Raster::Store(Action action) {
+    if (!keepsCopies || !header) {
+        action();
+        return;
+    }
+    MetadataCopy copy(name);
+    action();
+    copy.Finish();
+}
+
 template <class T>
 void Raster::SetStatistics(const std::vector<zelm::RasterBandStats<T>>& records) {
     zelm::RasterReader<T>& typed = Typed<T>();
@@ -423,9 +439,11 @@ void Raster::SetStatistics(const std::vector<zelm::RasterBandStats<T>>& records)
             throw Error(name, "store statistics", "they are not those of all bands in order");
     if (HasStatistics(0))
         throw Error(name, "store statistics", "it has some already, and a file keeps the oldest");
-    typed.SetBandStats(ToArray(records));
-    if (!HasStatistics(0) || !HasStatistics(Bands() - 1))
-        throw Error(name, "store statistics", "they did not reach the file (disk full?)");
+    Store([&] {
+        typed.SetBandStats(ToArray(records));
+        if (!HasStatistics(0) || !HasStatistics(Bands() - 1))
+            throw Error(name, "store statistics", "they did not reach the file (disk full?)");
+    });
 }
 
 template <class T>
@@ -439,9 +457,11 @@ void Raster::SetHistograms(const std::vector<zelm::RasterBandHistogram<T>>& hist
     zelm::RasterReader<T>& typed = Typed<T>();
     CheckWritable("store histograms");
     const std::size_t before = typed.GetHistograms().shape.elements;
-    typed.SetHistograms(ToArray(histograms));
-    if (typed.GetHistograms().shape.elements != before + histograms.size())
-        throw Error(name, "store histograms", "they did not reach the file (disk full?)");
+    Store([&] {
+        typed.SetHistograms(ToArray(histograms));
+        if (typed.GetHistograms().shape.elements != before + histograms.size())
+            throw Error(name, "store histograms", "they did not reach the file (disk full?)");
+    });
 }
 
 // A copy of this library's making: the module's own palette must not outlive the module.
@@ -459,10 +479,12 @@ zelm::PalettePtr Raster::BandPalette(std::uint32_t band) const {
 void Raster::SetBandPalette(std::uint32_t band, const zelm::Palette& palette) {
     CheckWritable("store a palette");
     if (band >= Bands()) throw Error(name, "store a palette", "there is no such band");
-    Visit([&](auto& typed) { typed.SetPalette(band, palette); });
-    const zelm::PalettePtr stored = BandPalette(band);
-    if ((stored ? stored->nextIndex : 0) != palette.nextIndex)
-        throw Error(name, "store a palette", "it did not reach the file (disk full?)");
+    Store([&] {
+        Visit([&](auto& typed) { typed.SetPalette(band, palette); });
+        const zelm::PalettePtr stored = BandPalette(band);
+        if ((stored ? stored->nextIndex : 0) != palette.nextIndex)
+            throw Error(name, "store a palette", "it did not reach the file (disk full?)");
+    });
 }
 
 #define ZMC_X(type, word, code)                                                           \

@@ -37,6 +37,8 @@ public:
     // so that nothing takes a file that cannot be looked at for an empty one.
     static constexpr std::uint64_t kUnknownSize = ~std::uint64_t{0};
     std::uint64_t Size() const;
+    // The same; false, with `size` as it was, if the system does not tell.
+    bool TellSize(std::uint64_t& size) const;
     // Makes the file end there; what lay beyond is gone. False, with nothing changed, on failure.
     bool Truncate(std::uint64_t size);
     // Waits until what was written has reached the disk; false if that failed.

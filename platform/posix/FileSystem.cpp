@@ -56,6 +56,7 @@ FileStatus StatusOf(const std::string& path) {
     const bool nobodyWrites = (info.st_mode & (S_IWUSR | S_IWGRP | S_IWOTH)) == 0;
     status.readOnly = nobodyWrites || ::access(path.c_str(), W_OK) != 0;
     if (status.isRegular) status.size = static_cast<std::uint64_t>(info.st_size);
+    status.number = static_cast<std::uint64_t>(info.st_ino);
     return status;
 }
 
@@ -104,6 +105,16 @@ bool RenameFile(const std::string& from, const std::string& to) {
     return ::rename(from.c_str(), to.c_str()) == 0;
 }
 
+bool RenameToNewName(const std::string& from, const std::string& to) {
+#if defined(RENAME_NOREPLACE)
+    if (::renameat2(AT_FDCWD, from.c_str(), AT_FDCWD, to.c_str(), RENAME_NOREPLACE) == 0)
+        return true;
+    if (errno != EINVAL && errno != ENOSYS) return false;
+#endif
+    // A file system without that service: a second name, and away with the first.
+    return ::link(from.c_str(), to.c_str()) == 0 && ::unlink(from.c_str()) == 0;
+}
+
 bool RemoveEntry(const std::string& path) { return ::unlink(path.c_str()) == 0; }
 
 bool SyncFile(const std::string& path) { return Sync(path, O_RDONLY); }
@@ -137,6 +148,15 @@ bool ReleaseReserve(const std::string& path) {
     struct stat info {};
     return file && ::fstat(file.value, &info) == 0 &&
            Uninterrupted([&] { return ::ftruncate(file.value, info.st_size); }) == 0;
+}
+
+std::string SystemRun() {
+    char text[64];
+    const Descriptor file("/proc/sys/kernel/random/boot_id", O_RDONLY);
+    const ssize_t length = file ? ::read(file.value, text, sizeof text) : 0;
+    std::string run(text, length > 0 ? static_cast<std::size_t>(length) : 0);
+    while (run.ends_with('\n')) run.pop_back();
+    return run;
 }
 
 std::uint64_t CurrentProcess() { return static_cast<std::uint64_t>(::getpid()); }
