@@ -305,6 +305,19 @@ def metadata_seeds():
     yield "wide-text", metadata_document(statistics(0)).decode().encode("utf-16")
 
 
+def wide_format_seeds():
+    # Flags, width and precision; then text in front and the room, and what is formatted.
+    numbers = {"none": b"\0\0", "fixed": b"\0\1\3\1\1\2", "stars": b"\2\0\4\2\4\1\1\2\3\0"}
+    for name, start in numbers.items():
+        for kind in range(6):
+            for letter in range(4):
+                rest = bytes([2, 1, kind, letter, letter, 1, 5]) + b"some text\0\x2a"
+                yield f"{name}-{kind}-{letter}", b"\1" + start + rest
+    yield "short", b"\1\0\0\0\2\0\4\3\0\0\5hello"
+    for broken in range(15):
+        yield f"broken-{broken}", bytes([15, broken, 19])
+
+
 TARGETS = {
     "string": string_seeds,
     "memory_parameters": memory_parameters_seeds,
@@ -315,6 +328,7 @@ TARGETS = {
     "file": file_seeds,
     "header": header_seeds,
     "metadata": metadata_seeds,
+    "wide_format": wide_format_seeds,
 }
 
 
