@@ -141,6 +141,7 @@ def control_file_seeds():
     )
     for i, line in enumerate(lines):
         yield f"line-{i}", b"\0\0\0\0\2" + message + message + line
+    yield "no-data-folder", b"\x0d\0\0\0\1" + message + on
     yield "no-control-file", b"\x0f\0\0\0\1" + message
     yield "control-folder", b"\x0e\0\0\0\1" + message
 
