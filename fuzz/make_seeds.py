@@ -148,7 +148,7 @@ def control_file_seeds():
     # The line that fills a file to its limit, and one that is a byte longer.
     for length in (8, 9):
         filling = b"\1\0" + bytes([length]) + b"x" * length
-        yield f"fill-{length}", b"\0\0\3\2\2" + filling + message + on
+        yield f"fill-{length}", b"\0\0\3\2\1" + filling + on
     lines = (
         b"0110,0000,0000,0001\n", b"1000,0000,0000,0001\n", b"0110, 0000, 0000, 0001\n",
         b"1,,,,,,,,,,,,,,,,,1\n", b"# notes\n \n0110,0000,0000,0001 and more\n", b"0\n" + on,
