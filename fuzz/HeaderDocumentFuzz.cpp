@@ -30,6 +30,8 @@ void AskForGeometry(const PyramidDataset& dataset) {
         if (level >= 32 || geometry.tilesAcross == 0 || geometry.tilesDown == 0) continue;
         const std::uint32_t x = geometry.tilesAcross - 1u;
         const std::uint32_t y = geometry.tilesDown - 1u;
+        ZMC_EXPECT(geometry.HasTile(x, y) && !geometry.HasTile(x + 1u, y) &&
+                   !geometry.HasTile(x, y + 1u));
         const Wide end = Wide{dataset.LevelOffsets[level]} + dataset.GetTileOffset(x, y, level) +
                          Wide{geometry.TileWidth(x)} * geometry.TileHeight(y) *
                              dataset.BytesPerSample * dataset.BandCount;
