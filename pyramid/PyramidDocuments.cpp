@@ -21,9 +21,12 @@ constexpr std::uint64_t kHeaderOffset = 20;
 // A source over a text, or null if memory ran out.
 std::unique_ptr<xercesc::MemBufInputSource> MakeSource(std::unique_ptr<XMLByte[]> text,
                                                        std::size_t size, const char* name) {
-    // The parser takes a NUL behind the root element for the end of the text and would believe the
-    // front part of a torn document; no parser accepts this character anywhere.
-    std::replace(text.get(), text.get() + size, XMLByte{0}, XMLByte{1});
+    // The parser takes a NUL behind the root element for the end of the text, and so it takes a
+    // character that lacks its last bytes, and would believe the front part of a torn document. No
+    // parser accepts this character anywhere, and no document ends with one outside ASCII.
+    constexpr XMLByte refused = 1;
+    std::replace(text.get(), text.get() + size, XMLByte{0}, refused);
+    for (std::size_t end = size; end != 0 && text[end - 1] >= 0x80; --end) text[end - 1] = refused;
     try {
         auto source = std::make_unique<xercesc::MemBufInputSource>(text.get(), size, name, true);
         text.release();

@@ -193,6 +193,7 @@ private:
         if (LiesAlike(piece))
             return ReadOrZero(PlaneStart(0, piece.tileX, piece.tileY) + piece.firstRow * rowBytes,
                               buffer + BufferOffset(piece, 0), piece.rows * rowBytes);
+        if (HasLongRows(piece)) return ReadLongRows(piece, buffer);
         for (std::uint32_t first = 0; first < planes; first += kPlanesTogether) {
             const std::uint32_t count = std::min(planes - first, kPlanesTogether);
             const bool done =
@@ -209,6 +210,67 @@ private:
             if (!done) return false;
         }
         return true;
+    }
+
+    // Rows that no run can hold: a header may claim any number of bands, and a row is not to cost
+    // more than what is asked of it. In the ordering Morton rows are short.
+    bool HasLongRows(const TilePiece& piece) const {
+        return !planar && piece.tileWidth * tilePixelBytes > kRunBytes;
+    }
+
+    // Calls run(offset in the file, offset in the buffer, pixels) for runs of a piece's pixels, of
+    // one row each and at most as many as given, until one gives false.
+    template <class Run>
+    bool VisitPixels(const TilePiece& piece, std::uint64_t most, Run&& run) const {
+        const std::uint64_t tile = PlaneStart(0, piece.tileX, piece.tileY);
+        const auto step = static_cast<std::uint32_t>(std::min<std::uint64_t>(most, piece.columns));
+        for (std::uint32_t row = 0; row < piece.rows; ++row) {
+            const std::uint64_t line = std::uint64_t{piece.firstRow} + row;
+            const std::uint64_t first = line * piece.tileWidth + piece.firstColumn;
+            for (std::uint32_t column = 0; column < piece.columns; column += step)
+                if (!run(tile + (first + column) * tilePixelBytes,
+                         BufferOffset(piece, row) + column * bufferPixelBytes,
+                         std::min(step, piece.columns - column)))
+                    return false;
+        }
+        return true;
+    }
+
+    // Calls move(offset in the file, offset in the buffer) for each listed sample of a piece, until
+    // one gives false.
+    template <class Move>
+    bool VisitSamples(const TilePiece& piece, Move&& move) const {
+        return VisitPixels(
+            piece, 1, [&](std::uint64_t pixel, std::uint64_t inBuffer, std::uint32_t) {
+                for (std::uint32_t i = 0; i < bands; ++i)
+                    if (!move(pixel + static_cast<std::uint64_t>(list[i]) * sampleBytes,
+                              inBuffer + std::uint64_t{i} * sampleBytes))
+                        return false;
+                return true;
+            });
+    }
+
+    bool ReadLongRows(const TilePiece& piece, unsigned char* buffer) const {
+        if (allInOrder)
+            return VisitPixels(
+                piece, piece.columns,
+                [&](std::uint64_t start, std::uint64_t inBuffer, std::uint32_t pixels) {
+                    return ReadOrZero(start, buffer + inBuffer, pixels * tilePixelBytes);
+                });
+        if (tilePixelBytes > kRunBytes)
+            return VisitSamples(piece, [&](std::uint64_t sample, std::uint64_t inBuffer) {
+                return ReadOrZero(sample, buffer + inBuffer, sampleBytes);
+            });
+        unsigned char* const work = dataset.WorkSpace(kRunBytes);
+        return work &&
+               VisitPixels(piece, kRunBytes / tilePixelBytes,
+                           [&](std::uint64_t start, std::uint64_t inBuffer, std::uint32_t pixels) {
+                               if (!ReadOrZero(start, work, pixels * tilePixelBytes)) return false;
+                               MoveSamples({work, 0, tilePixelBytes, sampleBytes, list},
+                                           BufferSide(buffer + inBuffer), 1, pixels, bands,
+                                           sampleBytes);
+                               return true;
+                           });
     }
 
     bool ReadRun(const TilePiece& piece, std::uint32_t first, std::uint32_t count,
@@ -235,6 +297,7 @@ private:
     bool WriteBehind(const unsigned char* buffer) {
         const std::uint64_t start = DirectStart();
         const std::uint64_t behind = start + PixelCount() * tilePixelBytes;
+        if (tilePixelBytes > kRunBytes) return WriteLongPixelsBehind(start, behind, buffer);
         return VisitPixelRuns(
             tilePixelBytes, [&](std::uint64_t pixel, std::uint32_t count, unsigned char* work) {
                 const std::uint64_t offset = pixel * tilePixelBytes;
@@ -245,6 +308,26 @@ private:
                 dataset.File->WriteAt(behind + offset, work, count * tilePixelBytes);
                 return true;
             });
+    }
+
+    // The same for pixels that no run can hold: all bytes go over, then the new samples.
+    bool WriteLongPixelsBehind(std::uint64_t start, std::uint64_t behind,
+                               const unsigned char* buffer) {
+        unsigned char* const work = dataset.WorkSpace(kRunBytes);
+        if (!work) return false;
+        for (std::uint64_t offset = start; offset < behind; offset += kRunBytes) {
+            const std::uint64_t size = std::min(behind - offset, kRunBytes);
+            if (!ReadOrZero(offset, work, size)) return false;
+            dataset.File->WriteAt(behind + (offset - start), work, size);
+        }
+        for (std::uint64_t pixel = 0; pixel < PixelCount(); ++pixel)
+            for (std::uint32_t i = 0; i < bands; ++i)
+                dataset.File->WriteAt(
+                    behind + pixel * tilePixelBytes +
+                        static_cast<std::uint64_t>(list[i]) * sampleBytes,
+                    buffer + pixel * bufferPixelBytes + std::uint64_t{i} * sampleBytes,
+                    sampleBytes);
+        return true;
     }
 
     // All pixels of the rectangle in buffer order, in runs that fit in the work space, until one
@@ -293,6 +376,7 @@ private:
         const std::uint64_t rowBytes = piece.tileWidth * tilePixelBytes;
         const std::uint64_t tile = PlaneStart(0, piece.tileX, piece.tileY);
         const bool replaced = allInOrder && piece.columns == piece.tileWidth;
+        if (HasLongRows(piece)) return MergeLongRows(piece, buffer);
         return VisitRuns(
             piece.rows, rowBytes, 1,
             [&](std::uint32_t row, std::uint32_t rows, unsigned char* work) {
@@ -304,6 +388,33 @@ private:
                 dataset.File->WriteAt(tile + start, work, rows * rowBytes);
                 return true;
             });
+    }
+
+    bool MergeLongRows(const TilePiece& piece, const unsigned char* buffer) {
+        platform::File& file = *dataset.File;
+        if (allInOrder)
+            return VisitPixels(
+                piece, piece.columns,
+                [&](std::uint64_t start, std::uint64_t inBuffer, std::uint32_t pixels) {
+                    file.WriteAt(start, buffer + inBuffer, pixels * tilePixelBytes);
+                    return true;
+                });
+        if (tilePixelBytes > kRunBytes)
+            return VisitSamples(piece, [&](std::uint64_t sample, std::uint64_t inBuffer) {
+                file.WriteAt(sample, buffer + inBuffer, sampleBytes);
+                return true;
+            });
+        unsigned char* const work = dataset.WorkSpace(kRunBytes);
+        return work &&
+               VisitPixels(piece, kRunBytes / tilePixelBytes,
+                           [&](std::uint64_t start, std::uint64_t inBuffer, std::uint32_t pixels) {
+                               if (!ReadOrZero(start, work, pixels * tilePixelBytes)) return false;
+                               MoveSamples(BufferSide(buffer + inBuffer),
+                                           {work, 0, tilePixelBytes, sampleBytes, list}, 1, pixels,
+                                           bands, sampleBytes);
+                               file.WriteAt(start, work, pixels * tilePixelBytes);
+                               return true;
+                           });
     }
 
     // A merged tile exists as a whole: where the file was shorter, the rest of it reads as zeros.

@@ -12,7 +12,7 @@
 #include <ctime>
 #include <utility>
 
-#include "tests/campaigns/MemoryMeter.h"
+#include "tests/support/MemoryMeter.h"
 
 #if defined(__SANITIZE_ADDRESS__)
 #include <sanitizer/common_interface_defs.h>
@@ -103,19 +103,19 @@ std::string Megabytes(std::int64_t bytes) {
 
 }  // namespace
 
-void Cost::NewVariant() { MemoryMeter::Reset(); }
+void Cost::NewVariant() { testsupport::MemoryMeter::Reset(); }
 
 void Cost::Start() {
     wallStart = Seconds(CLOCK_MONOTONIC);
     cpuStart = Seconds(CLOCK_THREAD_CPUTIME_ID);
-    MemoryMeter::Switch(true);
+    testsupport::MemoryMeter::Switch(true);
 }
 
 void Cost::Stop() {
-    MemoryMeter::Switch(false);
-    cpuSeconds += Seconds(CLOCK_THREAD_CPUTIME_ID) - cpuStart;
-    wallSeconds += Seconds(CLOCK_MONOTONIC) - wallStart;
-    peakBytes = std::max(peakBytes, MemoryMeter::Peak());
+    testsupport::MemoryMeter::Switch(false);
+    cpuSeconds = std::max(cpuSeconds, Seconds(CLOCK_THREAD_CPUTIME_ID) - cpuStart);
+    wallSeconds = std::max(wallSeconds, Seconds(CLOCK_MONOTONIC) - wallStart);
+    peakBytes = std::max(peakBytes, testsupport::MemoryMeter::Peak());
 }
 
 bool Campaign::IsFull() { return std::strcmp(Environment("ZMC_CAMPAIGN"), "full") == 0; }
@@ -137,7 +137,7 @@ Campaign::~Campaign() {
     std::string kinds;
     for (const auto& [kind, count] : outcomes) kinds += ", " + kind + " " + std::to_string(count);
     std::printf(
-        "campaign: %s: %s form%s, %llu of %llu variants, %llu failed%s; slowest %.1f ms of "
+        "campaign: %s: %s form%s, %llu of %llu variants, %llu failed%s; slowest request %.1f ms of "
         "processor time (variant %llu, %.1f ms on the wall), most memory %s (variant %llu), "
         "%.1f s in all\n",
         name.c_str(), IsFull() ? "full" : "short",
@@ -185,7 +185,7 @@ void Campaign::Judge(const std::string& part, std::uint64_t number, const Verdic
     ++tried;
     std::vector<std::string> complaints = verdict.complaints;
     if (verdict.cost.cpuSeconds > verdict.allowedSeconds)
-        complaints.push_back("took " + std::to_string(verdict.cost.cpuSeconds) + " s");
+        complaints.push_back("a request took " + std::to_string(verdict.cost.cpuSeconds) + " s");
     if (verdict.cost.peakBytes > verdict.allowedBytes)
         complaints.push_back("took " + Megabytes(verdict.cost.peakBytes) + " where " +
                              Megabytes(verdict.allowedBytes) + " are allowed");

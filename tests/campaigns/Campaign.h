@@ -22,15 +22,15 @@
 
 namespace campaigns {
 
-// What one variant cost, by the clock of the thread's own processor time, the wall's, and
-// MemoryMeter.
+// What one variant cost: its slowest request, by the thread's own processor time and by the wall's
+// clock, and the most memory of all requests together by MemoryMeter.
 struct Cost {
     double cpuSeconds = 0;
     double wallSeconds = 0;
     std::int64_t peakBytes = 0;
 
-    // Runs `call` on the account of this variant. The memory that it leaves behind still counts in
-    // the next call.
+    // Runs `call`, one request, on the account of this variant. The memory that it leaves behind
+    // still counts in the next.
     template <class Call>
     void Of(Call&& call) {
         Start();

@@ -360,7 +360,7 @@ private:
                 Instruction();
             } else if (Looking("</")) {
                 at += 2;
-                if (Name() != open.back()) Refuse();
+                if (open.empty() || Name() != open.back()) Refuse();
                 SkipSpace();
                 Need(">");
                 open.pop_back();

@@ -299,14 +299,13 @@ void FileTrial::LookAtRecords(const FileOracle& oracle, Session& session, Verdic
     std::set<std::uint32_t> bands{0, 1, 7};
     for (const auto& [band, palette] : oracle.meta.palettes)
         if (bands.size() < 6) bands.insert(band);
-    verdict.cost.Of([&] {
-        for (std::uint32_t i = 0; i < asked; ++i) stats.push_back(reader.Stats(i));
-        histograms = reader.Histograms();
-        for (const std::uint32_t band : bands) {
-            palettes[band] = reader.PaletteOf(band);
-            has[band] = reader.Basic().HasBandStats(band);
-        }
-    });
+    Cost& cost = verdict.cost;
+    for (std::uint32_t i = 0; i < asked; ++i) cost.Of([&] { stats.push_back(reader.Stats(i)); });
+    cost.Of([&] { histograms = reader.Histograms(); });
+    for (const std::uint32_t band : bands) {
+        cost.Of([&] { palettes[band] = reader.PaletteOf(band); });
+        cost.Of([&] { has[band] = reader.Basic().HasBandStats(band); });
+    }
     if (!oracle.hasDocument)
         verdict.Count("without a document");
     else if (oracle.documentTrust == Trust::Malformed)
@@ -351,10 +350,9 @@ void FileTrial::Store(const Bytes& before, const FileOracle& oracle, Verdict& ve
     Session session(module, path, verdict.cost);
     if (!session.reader) return verdict.Complain("does not open again");
     bool stored = false, refreshed = false;
-    verdict.cost.Of([&] {
-        stored = session.reader->StoreStats(stats) && session.reader->StorePalette(1, palette);
-        refreshed = session.reader->Basic().RefreshPyramidState();
-    });
+    verdict.cost.Of([&] { stored = session.reader->StoreStats(stats); });
+    verdict.cost.Of([&] { stored = session.reader->StorePalette(1, palette) && stored; });
+    verdict.cost.Of([&] { refreshed = session.reader->Basic().RefreshPyramidState(); });
     if (!stored || !refreshed) verdict.Complain("a store or the refresh has another answer");
     if (oracle.tileDataEnd > kNear) {
         StoreFar(before, session, verdict);
@@ -423,6 +421,8 @@ void FileTrial::WriteTile(const Bytes& before, const FileOracle& oracle, Verdict
     const HeaderFields& h = oracle.header;
     const std::uint32_t level = h.levelMin;
     if (h.bands == 0 || h.bands > 64 || level > std::min(h.levelMax, 31u)) return;
+    // Along the curve, tiles of sides that a level does not divide lie partly over each other.
+    if (h.ordering == 2 && h.tileSize % (1u << level) != 0) return;
     const std::uint32_t width = std::min(h.tileSize, oracle.Width(level));
     const std::uint32_t height = std::min(h.tileSize, oracle.Height(level));
     const Rect rect{0, 0, width, height};

@@ -390,7 +390,11 @@ TEST_F(ArchiveTest, UnparsableDocumentLeavesThePixels) {
         "<!DOCTYPE DATASET><DATASET/>",
         std::string("\0\0\0\0", 4),
         std::string("<DATASET/>\0", 11),
-        std::string("<DATASET/>\n") + '\0' + "<BANDSTATISTICS/></DATASET>"};
+        std::string("<DATASET/>\n") + '\0' + "<BANDSTATISTICS/></DATASET>",
+        // Beginnings of characters whose other bytes lie behind the end.
+        "<DATASET/>\xFF",
+        "<DATASET/>\n\xC3",
+        "<DATASET/>\n\xF0\x9F\x97"};
     for (const std::string& document : documents) {
         SCOPED_TRACE(document);
         WriteFile(document);
@@ -553,7 +557,8 @@ TEST_F(ArchiveTest, FullDiskLosesNothing) {
 TEST_F(ArchiveTest, HeaderDocumentsThatAreRefused) {
     const std::string good = HeaderText().Text();
     const std::string documents[] = {"<DATASET>", "<!DOCTYPE DATASET>" + good,
-                                     good + std::string(1, '\0'), std::string(40, '\0')};
+                                     good + std::string(1, '\0'), std::string(40, '\0'),
+                                     good + "\xE5\x9C"};
     for (const std::string& document : documents) {
         SCOPED_TRACE(document);
         support::WriteText(name, FileWithHeader(document) + std::string(200, 'x'));

@@ -1,4 +1,4 @@
-#include "tests/campaigns/MemoryMeter.h"
+#include "tests/support/MemoryMeter.h"
 
 #include <malloc.h>
 
@@ -6,7 +6,7 @@
 #include <cstdlib>
 #include <new>
 
-namespace campaigns {
+namespace testsupport {
 namespace {
 
 struct State {
@@ -44,12 +44,12 @@ void MemoryMeter::Reset() { state = {}; }
 void MemoryMeter::Switch(bool on) { state.on = on; }
 std::int64_t MemoryMeter::Peak() { return state.peak; }
 
-}  // namespace campaigns
+}  // namespace testsupport
 
-using campaigns::Give;
-using campaigns::OrThrow;
-using campaigns::Take;
-using campaigns::TakeAligned;
+using testsupport::Give;
+using testsupport::OrThrow;
+using testsupport::Take;
+using testsupport::TakeAligned;
 
 void* operator new(std::size_t size) { return OrThrow(Take(size)); }
 void* operator new[](std::size_t size) { return OrThrow(Take(size)); }
