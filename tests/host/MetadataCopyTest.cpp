@@ -473,6 +473,7 @@ TEST(MetadataDocument, IsJudgedAsReadersDo) {
         {" \n\t\r\n", "is empty"},
         {"\x1A?xml version='1.0'?><DATASET/>", "a store did not end"},
         {std::string("<DATASET/>\0", 11), "bytes of 0"},
+        {"<DATASET/>\xC3", "middle of a character"},
         {"<DATASET>", "malformed: line 1"},
         {"<DATASET/>\n<DATASET/>", "malformed: line 2"},
         {"text", "malformed"},
