@@ -98,25 +98,33 @@ private:
     // The order of steps is that of a store: mark, rest, first byte.
     void PutBack() const {
         const auto stream = OpenFile(file, File::Mode::Update);
-        if (!stream) Fail();
+        std::uint64_t size = 0;
+        if (!stream || !stream->TellSize(size)) Fail();
         const auto write = [&](std::uint64_t at, std::string_view bytes) {
             if (stream->WriteAt(at, bytes.data(), bytes.size()) != bytes.size()) Fail();
         };
         const std::string_view text = record.text;
         if (!text.empty()) write(record.offset, std::string_view(&kUnfinishedStore, 1));
-        std::uint64_t size = 0;
-        if (!stream->TellSize(size) || (size > OldEnd() && !stream->Truncate(OldEnd()))) Fail();
+        const std::uint64_t end = GotTiles(*stream) ? record.offset : record.fileSize;
+        if (size > end && !stream->Truncate(end)) Fail();
         if (text.empty()) return;
         write(record.offset + 1, text.substr(1));
         write(record.offset, text.substr(0, 1));
     }
 
-    // Where the file is to end. A file that ended within its tiles may have got some since.
-    std::uint64_t OldEnd() const {
-        if (record.fileSize >= record.offset) return record.fileSize;
-        for (const platform::Hole& hole : platform::FindHoles(file))
-            if (hole.begin <= record.fileSize && hole.end >= record.offset) return record.fileSize;
-        return record.offset;
+    // Whether a file that ended within its tiles has, or may have, got some since.
+    bool GotTiles(File& stream) const {
+        constexpr std::uint64_t kMost = std::uint64_t{256} << 20;
+        if (record.fileSize >= record.offset) return false;
+        if (record.offset - record.fileSize > kMost) return true;
+        std::string piece(1 << 20, '\0');
+        for (std::uint64_t at = record.fileSize; at < record.offset; at += piece.size()) {
+            const auto size =
+                static_cast<std::size_t>(std::min<std::uint64_t>(piece.size(), record.offset - at));
+            if (stream.ReadAt(at, piece.data(), size) != size) return true;
+            if (piece.find_first_not_of('\0') < size) return true;
+        }
+        return false;
     }
 
     [[noreturn]] void Fail() const {

@@ -89,6 +89,8 @@ std::string JudgeMetadataText(std::string_view text) {
     if (text.find_first_not_of(" \t\r\n") == text.npos) return subject + "is empty";
     if (text.front() == kUnfinishedStore) return subject + "is damaged: a store did not end";
     if (text.find('\0') != text.npos) return subject + "holds bytes of 0";
+    // The parser would take the beginning of one for the end of the text.
+    if ((text.back() & 0x80) != 0) return subject + "ends in the middle of a character";
     InitialiseXerces();
     Watcher watcher;
     try {
