@@ -343,6 +343,7 @@ private:
             const std::uint32_t band = input.UpTo(7);
             props.SetNoDataValue(band, input.OneOf(values));
             if (input.Byte() % 4 == 0) props.SetNoDataFlag(band, input.Flag());
+            if (props.HasNoDataValue(band)) props.GetNoDataValue(band) += 0;
         }
         reader.SetNoDataValues(props);
         for (std::uint32_t band = 0; band < 9; ++band)
@@ -522,6 +523,16 @@ Argument ArgumentOf(std::uint8_t kind, const std::string& text) {
     }
 }
 
+bool IsWord(const std::string& text);
+
+// A new pyramid needs a name alone, and no file is made for it yet; memory rasters are not created.
+void ExpectCreate(const zelm::DataConnectionPtr& created, bool pyramid, const Argument& argument) {
+    const auto name = std::find_if_not(argument.elements.begin(), argument.elements.end(), IsWord);
+    const bool named = name != argument.elements.end() && !name->empty();
+    ZMC_EXPECT(static_cast<bool>(created) == (pyramid && named));
+    if (created) ZMC_EXPECT(!created->IsReadable());
+}
+
 bool IsWord(const std::string& text) { return text == "MemoryRaster" || text == "Pyramid"; }
 
 void ExpectOpen(std::uint8_t kind, const std::string& text, const std::string& held,
@@ -532,8 +543,9 @@ void ExpectOpen(std::uint8_t kind, const std::string& text, const std::string& h
     factory.Test(connection);
     ZMC_EXPECT(factory.IsRasterFactory() && !factory.CreateDefault());
     zelm::RasterProps props;
-    props.formatName = text.c_str();
-    ZMC_EXPECT(!factory.Create(connection, props) || text == "Pyramid");
+    const bool pyramid = kind >> 3 == 5;
+    props.formatName = pyramid ? "Pyramid" : text.c_str();
+    ExpectCreate(factory.Create(connection, props), pyramid || text == "Pyramid", argument);
     // Without a word, what is no memory raster is the name of a file, which is opened and, being no
     // pyramid, closed; those in other folders are let alone.
     if (!argument.memory && text.find('/') != std::string::npos) return;
