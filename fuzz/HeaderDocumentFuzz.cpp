@@ -58,6 +58,10 @@ void AskForTable(PyramidDataset& dataset) {
         offsets, offsets + dataset.TileOffsets.shape.elements, [&](std::uint64_t offset) {
             return offset == 0 || (offset >= dataset.TileDataStart && offset < dataset.TileDataEnd);
         }));
+    // Tiles are square: others leave no table.
+    dataset.BuildTileTable(dataset.Samples, dataset.Lines, dataset.TileSize, dataset.TileSize + 1u,
+                           dataset.BandCount, dataset.BytesPerSample);
+    ZMC_EXPECT(!dataset.TileOffsets.data);
 }
 
 // A dataset described by hand makes the same file again, in the ordering asked for.

@@ -64,7 +64,8 @@ public:
     }
 
     void Run(InputBytes& script) {
-        while (dataset && !script.AtEnd()) Step(script);
+        // Inputs stay quick: what takes more steps than this is two inputs.
+        for (int steps = 0; dataset && !script.AtEnd() && steps < 6; ++steps) Step(script);
         if (dataset && !forgotten) Reopen();
     }
 
@@ -339,6 +340,7 @@ private:
         const bool done = reader.WriteTile(r.x, r.y, r.width, r.height, r.BandList(), r.level,
                                            buffer.empty() ? &nothing : buffer.data(), mask.data());
         ZMC_EXPECT(!expected || done == *expected);
+        if (!buffer.empty()) ExpectOtherOrderingRefuses(r, buffer.data());
         const Bytes after = file.Read(0, kModelBytes + 1);
         const bool changes = done && dataset->Writable && !sealed && !buffer.empty();
         if (!changes) {
@@ -362,6 +364,18 @@ private:
         if (file.Size() <= dataset->MetaDocumentOffset) forgotten = false;
     }
 
+    template <class T>
+    void ExpectOtherOrderingRefuses(const Request& r, const T* buffer) {
+        const auto x = static_cast<std::uint32_t>(r.x);
+        const auto y = static_cast<std::uint32_t>(r.y);
+        if (dataset->TileOrdering < 2)
+            ZMC_EXPECT(
+                !dataset->WriteTileMorton(x, y, r.width, r.height, r.BandList(), r.level, buffer));
+        else
+            ZMC_EXPECT(!dataset->WriteTileInterleaved(x, y, r.width, r.height, r.BandList(),
+                                                      r.level, buffer));
+    }
+
     static bool SameFrom(std::uint64_t offset, const Bytes& a, const Bytes& b) {
         if (a.size() != b.size()) return false;
         if (offset >= a.size()) return true;
@@ -377,9 +391,10 @@ private:
     }
 
     template <class T>
-    void StoreWith(RasterReader<T>&, InputBytes& script) {
+    void StoreWith(RasterReader<T>& reader, InputBytes& script) {
         if (forgotten || sealed) {
-            dataset->SetBandStats(Array<RasterBandStats<T>>());
+            ZMC_EXPECT(reader.SetBandStats(Array<RasterBandStats<T>>()));
+            ZMC_EXPECT(reader.SetHistograms(Array<RasterBandHistogram<T>>()));
         } else {
             zmcfuzz::StoreCheck<T>(*dataset, file).Run(script);
         }
@@ -435,7 +450,7 @@ private:
 
     void Refresh() {
         if (!addressable) return;
-        ZMC_EXPECT(dataset->RefreshPyramidState());
+        dispatch->Visit([&](auto& reader) { ZMC_EXPECT(reader.RefreshPyramidState()); });
         ExpectCompleteness();
     }
 
@@ -460,9 +475,37 @@ private:
         ZMC_EXPECT(before == after);
     }
 
+    // Makes the file anew by another connection, which chooses tile size and ordering.
+    void Create(InputBytes& script) {
+        static RasterDataConnectionFactory factory;
+        Array<String> name;
+        ZMC_EXPECT(name.Append(String(file.Name().c_str())));
+        RasterProps props = static_cast<PyramidDataConnection*>(connection.Get())->GetRasterProps();
+        props.formatName = script.UpTo(7) == 0 ? "Unknown" : "Pyramid";
+        props.tileLines = script.Byte();
+        const DataConnectionPtr made = factory.Create(name, props);
+        ZMC_EXPECT(static_cast<bool>(made) == (props.formatName == "Pyramid"));
+        if (!made) return;
+        const std::int32_t pair[2] = {0, 0};
+        const std::int32_t levels = static_cast<std::int32_t>(script.UpTo(4));
+        auto* const pyramid = static_cast<PyramidDataConnection*>(made.Get());
+        PyramidDataset& fresh = *pyramid->dataset;
+        pyramid->GetReader()->Visit(
+            [&](auto& reader) { ZMC_EXPECT(reader.BuildPyramid(0, levels, 0, pair)); });
+        const PyramidHeaderRecord header = zmcfuzz::HeaderOf(fresh);
+        ZMC_EXPECT(header.tileSize == 256 && header.tileOrdering == (props.bands > 8       ? 2u
+                                                                     : props.tileLines > 1 ? 1u
+                                                                                           : 0u));
+        const bool laidOut = static_cast<bool>(fresh.LevelOffsets);
+        ZMC_EXPECT(!laidOut || zmcfuzz::MayOpen(header));
+        Open();
+        ZMC_EXPECT(dataset && (!laidOut || zmcfuzz::HeaderOf(*dataset) == header));
+    }
+
     // Lays the file out for other levels, or deletes it; both end what was known about it.
     void LayOutOrDelete(InputBytes& script) {
         if (!addressable || dispatch->pixelType == 0) return;
+        if (script.UpTo(2) == 0) return Create(script);
         const std::int32_t pair[2] = {3, script.UpTo(7) == 0 ? 4 : 3};
         const std::uint32_t levelMin = script.UpTo(3);
         const std::uint32_t levelMax = script.Flag() ? script.Size() : levelMin + script.UpTo(6);

@@ -315,6 +315,9 @@ def metadata_seeds():
         "<HISTOGRAMS><HIST_SOURCE>Native</HIST_SOURCE><HIST_SOURCE>Dynamic</HIST_SOURCE>"
         "<HIST_TYPE>1</HIST_TYPE></HISTOGRAMS>")
     yield "cut", metadata_document(statistics(0), HISTOGRAM)[:-9]
+    for length in range(12):
+        yield f"padded-{length}", metadata_document(statistics(1), HISTOGRAM) + b"\n" * length
+    yield "long", metadata_document(statistics(0)) + b" \n" * 1500
     yield "torn", metadata_document(statistics(0)) + b"</DATASET>"
     yield "type", b"<!DOCTYPE d [<!ENTITY e 'x'>]><DATASET>&e;</DATASET>"
     yield "deep", b"<A>" * 70 + b"</A>" * 70
