@@ -144,27 +144,35 @@ bool FileOracle::Accepts(const Rect& rect, const std::vector<int>& list, std::in
            Product({h.tileSize, planar ? 1 : h.bands, sampleBytes}) < limit;
 }
 
-bool FileOracle::SampleAt(std::uint32_t level, std::uint32_t x, std::uint32_t y, std::uint32_t band,
-                          std::uint64_t& offset) const {
+bool FileOracle::TileAt(std::uint32_t level, std::uint64_t tx, std::uint64_t ty, std::uint32_t band,
+                        Tile& tile) const {
     const std::uint64_t side = header.tileSize, width = Width(level), height = Height(level);
-    const std::uint64_t tx = x / side, ty = y / side;
-    const std::uint64_t tileWidth = std::min(side, width - tx * side);
+    tile.width = std::min(side, width - tx * side);
     const std::uint64_t tileHeight = std::min(side, height - ty * side);
-    const std::uint64_t inTile = (y - ty * side) * tileWidth + (x - tx * side);
     if (header.ordering != 2) {
-        const std::uint64_t pixelBytes = std::uint64_t{sampleBytes} * header.bands;
-        offset = tileDataStart;
+        tile.pixelBytes = std::uint64_t{sampleBytes} * header.bands;
+        tile.start = tileDataStart;
         for (std::uint32_t above = header.levelMax; above > level; --above)
-            offset += LevelBytes(above);
-        offset += (width * ty * side + tx * side * tileHeight + inTile) * pixelBytes +
-                  std::uint64_t{band} * sampleBytes;
+            tile.start += LevelBytes(above);
+        tile.start += (width * ty * side + tx * side * tileHeight) * tile.pixelBytes +
+                      std::uint64_t{band} * sampleBytes;
         return true;
     }
     if (!morton) return false;
+    tile.pixelBytes = sampleBytes;
     const std::uint64_t row = (std::uint64_t{level} * header.bands + band) * morton->tiles;
     const auto start = morton->offsets.find(row + Across(level) * ty + tx);
     if (start == morton->offsets.end()) return false;
-    offset = start->second + inTile * sampleBytes;
+    tile.start = start->second;
+    return true;
+}
+
+bool FileOracle::SampleAt(std::uint32_t level, std::uint32_t x, std::uint32_t y, std::uint32_t band,
+                          std::uint64_t& offset) const {
+    const std::uint64_t side = header.tileSize, tx = x / side, ty = y / side;
+    Tile tile;
+    if (!TileAt(level, tx, ty, band, tile)) return false;
+    offset = tile.start + ((y - ty * side) * tile.width + (x - tx * side)) * tile.pixelBytes;
     return true;
 }
 
@@ -173,28 +181,39 @@ FileOracle::Answer FileOracle::Read(const Rect& rect, const std::vector<int>& li
     if (rect.width == 0 || rect.height == 0) return Answer::Given;
     if (!Accepts(rect, list, level)) return Answer::Refused;
     const auto at = static_cast<std::uint32_t>(level);
-    const std::uint32_t side = header.tileSize;
+    const std::uint64_t side = header.tileSize;
     // Of one whole tile with all bands, what the file does not hold stays as it was.
     const bool keeps = header.ordering != 2 && rect.width == side && rect.height == side &&
                        rect.x % side == 0 && rect.y % side == 0 &&
                        (list.empty() || IsIdentity(list, header.bands));
     const std::size_t count = list.empty() ? header.bands : list.size();
-    unsigned char* next = buffer.data();
-    for (std::uint32_t row = 0; row < rect.height; ++row)
-        for (std::uint32_t column = 0; column < rect.width; ++column)
-            for (std::size_t i = 0; i < count; ++i, next += sampleBytes) {
-                const auto band =
-                    static_cast<std::uint32_t>(list.empty() ? static_cast<int>(i) : list[i]);
-                std::uint64_t offset = 0;
-                if (!SampleAt(at, rect.x + column, rect.y + row, band, offset))
-                    return Answer::Unknown;
-                const std::uint64_t held = bytes.size() > offset ? bytes.size() - offset : 0;
-                const auto known =
-                    static_cast<std::size_t>(std::min<std::uint64_t>(held, sampleBytes));
-                if (known != 0) std::memcpy(next, bytes.data() + offset, known);
-                if (!keeps) std::memset(next + known, 0, sampleBytes - known);
+    const std::uint64_t endX = std::uint64_t{rect.x} + rect.width;
+    const std::uint64_t endY = std::uint64_t{rect.y} + rect.height;
+    for (std::uint64_t ty = rect.y / side; ty * side < endY; ++ty)
+        for (std::uint64_t tx = rect.x / side; tx * side < endX; ++tx)
+            for (std::size_t i = 0; i < count; ++i) {
+                Tile tile;
+                const auto band = list.empty() ? static_cast<std::uint32_t>(i)
+                                               : static_cast<std::uint32_t>(list[i]);
+                if (!TileAt(at, tx, ty, band, tile)) return Answer::Unknown;
+                for (std::uint64_t y = std::max<std::uint64_t>(rect.y, ty * side);
+                     y < std::min(endY, (ty + 1) * side); ++y)
+                    for (std::uint64_t x = std::max<std::uint64_t>(rect.x, tx * side);
+                         x < std::min(endX, (tx + 1) * side); ++x) {
+                        const std::uint64_t pixel = (y - rect.y) * rect.width + (x - rect.x);
+                        Copy(tile.start +
+                                 ((y - ty * side) * tile.width + (x - tx * side)) * tile.pixelBytes,
+                             buffer.data() + (pixel * count + i) * sampleBytes, keeps);
+                    }
             }
     return Answer::Given;
+}
+
+void FileOracle::Copy(std::uint64_t offset, unsigned char* sample, bool keeps) const {
+    const std::uint64_t held = bytes.size() > offset ? bytes.size() - offset : 0;
+    const auto known = static_cast<std::size_t>(std::min<std::uint64_t>(held, sampleBytes));
+    if (known != 0) std::memcpy(sample, bytes.data() + offset, known);
+    if (!keeps && known < sampleBytes) std::memset(sample + known, 0, sampleBytes - known);
 }
 
 }  // namespace campaigns

@@ -69,6 +69,14 @@ private:
     bool Accepts(const Rect& rect, const std::vector<int>& list, std::int64_t level) const;
     void ReadDocument();
 
+    // The samples of one band in one tile.
+    struct Tile {
+        std::uint64_t start = 0, width = 0, pixelBytes = 0;
+    };
+    bool TileAt(std::uint32_t level, std::uint64_t tx, std::uint64_t ty, std::uint32_t band,
+                Tile& tile) const;
+    void Copy(std::uint64_t offset, unsigned char* sample, bool keeps) const;
+
     const Bytes& bytes;
     std::uint64_t headerBytes = 0;
     std::unique_ptr<zmctest::MortonModel> morton;
