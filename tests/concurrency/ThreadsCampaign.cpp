@@ -286,7 +286,7 @@ TEST_F(ThreadsCampaign, EverythingAtOnce) {
 TEST_F(ThreadsCampaign, FirstUsesAtTheSameMoment) {
     const std::string file = folder / "first.pyr";
     PrepareFile(support::TestModule(), file, kFileKinds[1]);
-    const int rounds = CampaignLength(6, 200);
+    const int rounds = CampaignLength(4, 100);
     for (int i = 0; i < rounds && !HasFailure(); ++i) {
         std::vector<std::string> environment = ParseLogOn();
         if (i % 2 != 0) environment = {"metadata_parse_log_dir"};
