@@ -60,14 +60,6 @@ bool ReserveSpace(const std::string& path, std::uint64_t size);
 // Gives back what was reserved and not used.
 bool ReleaseReserve(const std::string& path);
 
-// A stretch of a file that holds nothing: it reads as zeros and was never written.
-struct Hole {
-    std::uint64_t begin = 0;
-    std::uint64_t end = 0;
-};
-// The holes of a file; none where the file system does not tell, or when the file cannot be read.
-std::vector<Hole> FindHoles(const std::string& path);
-
 // What tells this run of the operating system from those before and after: as long as it is the
 // same, the power did not fail, and files have all that was written to them. Empty if not known.
 std::string SystemRun();

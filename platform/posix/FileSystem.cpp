@@ -150,27 +150,6 @@ bool ReleaseReserve(const std::string& path) {
            Uninterrupted([&] { return ::ftruncate(file.value, info.st_size); }) == 0;
 }
 
-std::vector<Hole> FindHoles(const std::string& path) {
-    std::vector<Hole> holes;
-#if defined(SEEK_HOLE) && defined(SEEK_DATA)
-    const Descriptor file(path, O_RDONLY);
-    struct stat info {};
-    if (!file || ::fstat(file.value, &info) != 0) return holes;
-    off_t position = 0;
-    while (position < info.st_size) {
-        const off_t begin = ::lseek(file.value, position, SEEK_HOLE);
-        if (begin < 0 || begin >= info.st_size) break;
-        const off_t data = ::lseek(file.value, begin, SEEK_DATA);
-        const off_t end = data < 0 ? info.st_size : data;
-        holes.push_back({static_cast<std::uint64_t>(begin), static_cast<std::uint64_t>(end)});
-        position = end;
-    }
-#else
-    static_cast<void>(path);
-#endif
-    return holes;
-}
-
 std::string SystemRun() {
     char text[64];
     const Descriptor file("/proc/sys/kernel/random/boot_id", O_RDONLY);
