@@ -14,8 +14,8 @@ namespace {
 
 namespace tbb = oneapi::tbb;
 
-// Bytes of tiles that the second walk over level 0 reads at a time.
-constexpr std::size_t kChunkBytes = std::size_t{8} << 20;
+// Bytes of tiles that the second walk over level 0 reads at a time: well below the least budget.
+constexpr std::size_t kChunkBytes = std::size_t{4} << 20;
 
 }  // namespace
 

@@ -7,6 +7,8 @@
 
 #include <cerrno>
 
+#include "platform/posix/Uninterrupted.h"
+
 namespace platform {
 namespace {
 
@@ -19,20 +21,15 @@ bool StillBears(int descriptor, const std::string& path) {
 }
 
 int LockNow(int descriptor) {
-    int result;
-    do {
-        result = ::flock(descriptor, LOCK_EX | LOCK_NB);
-    } while (result != 0 && errno == EINTR);
-    return result;
+    return Uninterrupted([&] { return ::flock(descriptor, LOCK_EX | LOCK_NB); });
 }
 
 }  // namespace
 
 FileLock::Result FileLock::Take(const std::string& path) {
     Release();
-    do {
-        descriptor = ::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK);
-    } while (descriptor < 0 && errno == EINTR);
+    descriptor =
+        Uninterrupted([&] { return ::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK); });
     if (descriptor < 0) return errno == ENOENT ? Result::Missing : Result::Failed;
     Result result = Result::Taken;
     if (LockNow(descriptor) != 0)

@@ -5,6 +5,7 @@
 
 #include <cstdint>
 #include <map>
+#include <ostream>
 #include <string>
 #include <vector>
 
@@ -18,6 +19,9 @@ struct Layout {
     std::uint32_t bands;
     std::uint32_t tileLines;  // of the properties that the file is made from
 };
+// For the names of tests.
+inline void PrintTo(const Layout& layout, std::ostream* out) { *out << layout.name; }
+
 inline constexpr Layout kLayouts[] = {{"Scanline", 2, 1}, {"Blocked", 2, 256}, {"Morton", 9, 256}};
 
 // Stores of a session, as bits.
