@@ -42,7 +42,9 @@ def main():
     failed = False
     for source, lines in read_counts(sys.stdin, sources).items():
         text = pathlib.Path(source).read_text().splitlines()
-        missed = [number for number, count in sorted(lines.items()) if count == 0]
+        # A lone bracket shares the fate of the line before it.
+        missed = [number for number, count in sorted(lines.items())
+                  if count == 0 and text[number - 1].strip(" });")]
         explained, open_lines = [], []
         for number in missed:
             here = text[number - 1].strip()

@@ -263,6 +263,19 @@ def file_seeds():
         yield f"{order}-cut", with_script(pyramid_file(order=order)[:-20], 1)
         yield f"{order}-odd-tile", with_script(pyramid_file(order=order, tile=3), 0)
         yield f"{order}-bands", with_script(pyramid_file(order=order, bands=20, tile=5), 0)
+    # Rows, and single pixels, beyond what the module moves at a time; the pixels are not there yet.
+    rows = {"width": 256, "height": 2, "bands": 64, "tile": 256, "levels": (0, 0),
+            "pixel_type": "ComplexDouble"}
+    pixels = {"width": 2, "height": 3, "bands": 70000, "tile": 256, "levels": (0, 0)}
+    for number, script in enumerate((
+            bytes([0, 5, 36, 0, 0, 3, 2, 0, 0, 77, 0, 36, 0, 0, 3, 2, 0, 0, 0, 12]),
+            bytes([0, 5, 36, 0, 4, 1, 9, 7, 3, 2, 0, 0, 77, 0, 36, 0, 4, 1, 9, 7, 3, 2, 0, 0, 12]),
+            bytes([0, 5, 36, 0, 7, 0, 1, 0, 0, 77, 0, 36, 0, 7, 0, 1, 0, 0, 12]),
+            bytes([0, 5, 36, 0, 4, 0, 9, 0, 0, 0, 1, 0, 0, 0, 7, 0, 36, 0, 4, 0, 9, 0, 0, 0, 1]))):
+        for name, header in (("rows", rows), ("pixels", pixels)):
+            front = pyramid_file(**header)
+            front = front[:struct.unpack_from("<Q", front, 4)[0]]
+            yield f"wide-{name}-{number}", front + script + bytes([len(script)])
     yield "old-version", with_script(pyramid_file(version=(1, 0)), 2)
     yield "large-tile", with_script(pyramid_file(tile=4096), 2)
     yield "malformed", with_script(pyramid_file(metadata[:-12]), 2)
