@@ -68,9 +68,9 @@ private:
 
 // Throws Refused.
 void ParseText(std::string_view text, Watcher& watcher) {
-    const xercesc::MemBufInputSource source(reinterpret_cast<const XMLByte*>(text.data()),
-                                            text.size(), "metadata");
     try {
+        const xercesc::MemBufInputSource source(reinterpret_cast<const XMLByte*>(text.data()),
+                                                text.size(), "metadata");
         Parser parser;
         parser.setDocumentHandler(&watcher);
         parser.setErrorHandler(&watcher);

@@ -76,6 +76,17 @@ zelm::Array<Record> ToArray(const std::vector<Record>& records) {
     return array;
 }
 
+// Without memory the copy of a list is empty, and the module takes the counts that are not there
+// for zeros.
+template <class T>
+bool HaveSameCounts(const zelm::RasterBandHistogram<T>& histogram,
+                    const zelm::RasterBandHistogram<T>& given) {
+    const zelm::Array<std::uint64_t>& counts = given.counts;
+    return counts.shape.elements == given.binCount && histogram.binCount == given.binCount &&
+           histogram.counts.shape.elements == given.binCount &&
+           std::equal(counts.data, counts.data + given.binCount, histogram.counts.data);
+}
+
 std::string MemoryParameters(const void* samples, const zelm::RasterProps& props) {
     std::ostringstream text;
     text << "SAMPLES=" << props.samples << ";LINES=" << props.lines << ";BANDS=" << props.bands
@@ -441,8 +452,9 @@ void Raster::SetStatistics(const std::vector<zelm::RasterBandStats<T>>& records)
         throw Error(name, "store statistics", "it has some already, and a file keeps the oldest");
     Store([&] {
         typed.SetBandStats(ToArray(records));
-        if (!HasStatistics(0) || !HasStatistics(Bands() - 1))
-            throw Error(name, "store statistics", "they did not reach the file (disk full?)");
+        bool has = true;
+        for (std::uint32_t band = 0; has && band < Bands(); ++band) has = HasStatistics(band);
+        if (!has) throw Error(name, "store statistics", "they did not reach the file (disk full?)");
     });
 }
 
@@ -456,10 +468,17 @@ template <class T>
 void Raster::SetHistograms(const std::vector<zelm::RasterBandHistogram<T>>& histograms) {
     zelm::RasterReader<T>& typed = Typed<T>();
     CheckWritable("store histograms");
+    const zelm::Array<zelm::RasterBandHistogram<T>> given = ToArray(histograms);
+    for (std::size_t i = 0; i < histograms.size(); ++i)
+        if (!HaveSameCounts(given.data[i], histograms[i])) throw std::bad_alloc();
     const std::size_t before = typed.GetHistograms().shape.elements;
     Store([&] {
-        typed.SetHistograms(ToArray(histograms));
-        if (typed.GetHistograms().shape.elements != before + histograms.size())
+        typed.SetHistograms(given);
+        const zelm::Array<zelm::RasterBandHistogram<T>> stored = typed.GetHistograms();
+        bool same = stored.shape.elements == before + histograms.size();
+        for (std::size_t i = 0; same && i < histograms.size(); ++i)
+            same = HaveSameCounts(stored.data[before + i], histograms[i]);
+        if (!same)
             throw Error(name, "store histograms", "they did not reach the file (disk full?)");
     });
 }

@@ -9,11 +9,11 @@
 #include <filesystem>
 #include <functional>
 
-#include "host/PyramidBuilder.h"
+#include "tests/campaigns/BuildSession.h"
 #include "tests/campaigns/HostSession.h"
+#include "tests/campaigns/Silence.h"
 #include "tests/concurrency/CampaignLength.h"
 #include "tests/support/FileFaults.h"
-#include "tests/support/MemorySource.h"
 
 namespace campaigns {
 namespace {
@@ -45,23 +45,6 @@ constexpr Failing kFailings[] = {
     {"short counts from then on", FileFaultAction::Short, 0, true, true},
     {"no count once", FileFaultAction::Nothing, 0, false, false},
     {"no counts from then on", FileFaultAction::Nothing, 0, true, false},
-};
-
-// The parser tells of every malformed document.
-class Silence {
-public:
-    Silence() : kept(dup(2)) {
-        std::fflush(stderr);
-        if (!std::freopen("/dev/null", "w", stderr)) std::abort();
-    }
-    ~Silence() {
-        std::fflush(stderr);
-        dup2(kept, 2);
-        close(kept);
-    }
-
-private:
-    int kept;
 };
 
 class FileFaultCampaign : public testing::TestWithParam<Layout> {
@@ -205,89 +188,25 @@ TEST_P(FileFaultCampaign, ProcessesThatEndInNewFiles) {
     Report("ends of the process in a new file");
 }
 
-// Builds by the host's library, in place of an old file or of none.
 class BuildFaultCampaign : public FileFaultCampaign {
 protected:
-    static constexpr const char* kOldText = "the old file";
-
-    BuildFaultCampaign()
-        : source(HostSession::kSamples, HostSession::kLines, GetParam().bands),
-          target(session.Folder() + "/built.pyr") {
-        source.FillWithNoise(5);
-        options.overwrite = true;
-        options.threads = 1;
-        options.levels = 1;
-        if (GetParam().tileLines == 1) options.ordering = zmchost::Ordering::Scanline;
-        std::filesystem::remove(session.Path());
-        Build();
-        built = support::ReadText(target);
-    }
-
-    void Build() {
-        failure.clear();
-        try {
-            builder.Build(source, target, options);
-        } catch (const std::exception& error) {
-            failure = error.what();
-            if (failure.empty()) failure = "without a reason";
-        }
-    }
-
-    void Prepare(bool withOld) {
-        old = withOld;
-        for (const auto& entry : std::filesystem::directory_iterator(session.Folder()))
-            std::filesystem::remove(entry.path());
-        if (old) support::WriteText(target, kOldText);
-    }
-
-    // The target is the old file or the new one, whole.
-    std::string FaultOfTarget() {
-        if (!std::filesystem::exists(target)) {
-            ++outcomes["absent"];
-            return old ? "the old file is gone" : "";
-        }
-        const std::string bytes = support::ReadText(target);
-        if (bytes == built) {
-            ++outcomes["new"];
-            return "";
-        }
-        ++outcomes["old"];
-        if (old && bytes == kOldText) return "";
-        const auto first = std::mismatch(bytes.begin(), bytes.end(), built.begin(), built.end());
-        return "the target of " + std::to_string(bytes.size()) +
-               " bytes differs from the new one, of " + std::to_string(built.size()) + ", at " +
-               std::to_string(first.first - bytes.begin());
-    }
-
-    std::size_t Leavings() const {
-        std::size_t count = 0;
-        for (const auto& entry : std::filesystem::directory_iterator(session.Folder()))
-            count += entry.path().string() != target;
-        return count;
-    }
-
-    support::MemorySource<unsigned char> source;
-    zmchost::PyramidBuilder builder{support::TestModule()};
-    zmchost::BuildOptions options;
-    std::string target, built, failure;
-    bool old = false;
+    BuildSession build{session.Folder(), GetParam()};
 };
 
 TEST_P(BuildFaultCampaign, Builds) {
     for (const bool withOld : {false, true})
         for (const Failing& failing : kFailings) {
             ASSERT_NO_FATAL_FAILURE(FailEach(
-                failing, Stride(7), [&] { Prepare(withOld); }, [&] { Build(); },
+                failing, Stride(7), [&] { build.Prepare(withOld); }, [&] { build.Build(); },
                 [&](bool harmless) -> std::string {
-                    const std::string fault = FaultOfTarget();
+                    std::string outcome;
+                    const std::string fault = build.FaultOfBuild(outcome);
+                    ++outcomes[outcome];
                     if (!fault.empty()) return fault;
-                    const bool isNew = outcomes.contains("new") &&
-                                       std::filesystem::exists(target) &&
-                                       support::ReadText(target) == built;
-                    if (failure.empty() && !isNew) return "success was told without a result";
-                    if (harmless && !failure.empty()) return "it was not got over: " + failure;
+                    if (harmless && !build.Failure().empty())
+                        return "it was not got over: " + build.Failure();
                     const bool removable = (failedKinds & testsupport::kRemoveCall) == 0;
-                    return removable && Leavings() != 0 ? "temporary files stay" : "";
+                    return removable && build.Leavings() != 0 ? "temporary files stay" : "";
                 }));
         }
     Report("file calls of a build");
@@ -299,14 +218,17 @@ TEST_P(BuildFaultCampaign, ProcessesThatEndInBuilds) {
         for (const FileFaultAction action : {FileFaultAction::Kill, FileFaultAction::KillPartway}) {
             if (!zmctest::IsFullCampaign() && withOld && action == FileFaultAction::Kill) continue;
             ASSERT_NO_FATAL_FAILURE(KillAtEach(
-                action, [&] { Prepare(withOld); }, [&] { Build(); },
+                action, [&] { build.Prepare(withOld); }, [&] { build.Build(); },
                 [&]() -> std::string {
-                    const std::string fault = FaultOfTarget();
+                    std::string outcome;
+                    const std::string fault = build.FaultOfTarget(outcome);
+                    ++outcomes[outcome];
                     if (!fault.empty() || points % 8 != 0) return fault;
                     ++cleaned;
-                    Build();
-                    if (!failure.empty()) return "the next build fails: " + failure;
-                    return Leavings() == 0 ? "" : "the next build leaves the last one's files";
+                    build.Build();
+                    if (!build.Failure().empty()) return "the next build fails: " + build.Failure();
+                    return build.Leavings() == 0 ? ""
+                                                 : "the next build leaves the last one's files";
                 }));
         }
     EXPECT_GT(cleaned, 0u);

@@ -2,7 +2,9 @@
 
 #include <cstring>
 #include <filesystem>
+#include <new>
 #include <stdexcept>
+#include <utility>
 
 #include "tests/support/MemorySource.h"
 #include "tests/support/PyramidFiles.h"
@@ -32,17 +34,36 @@ std::vector<Rectangle> Tiles() {
     return tiles;
 }
 
+// A host looks whether its lists took what it gave them.
+template <class T>
+void AppendTo(zelm::Array<T>& list, const T& value) {
+    if (!list.Append(value)) throw std::bad_alloc();
+}
+
 zelm::Array<int> BandList(std::uint32_t bands) {
     zelm::Array<int> list;
-    for (std::uint32_t band = 0; band < bands; ++band) list.Append(static_cast<int>(band));
+    for (std::uint32_t band = 0; band < bands; ++band) AppendTo(list, static_cast<int>(band));
     return list;
+}
+
+std::size_t throws = 0;
+
+// A call of the module, out of which nothing may be thrown.
+template <class Call>
+auto Calling(Call&& call) {
+    try {
+        return call();
+    } catch (...) {
+        ++throws;
+        throw;
+    }
 }
 
 // Calls use(reader) if the connection has one.
 template <class Use>
 void WithReader(const zelm::RasterDataConnectionPtr& connection, Use use) {
     if (!connection) return;
-    const zelm::RasterReaderDispatchPtr dispatch = connection->GetReader();
+    const zelm::RasterReaderDispatchPtr dispatch = Calling([&] { return connection->GetReader(); });
     if (!dispatch || !dispatch->readerByte) return;
     use(*dispatch->readerByte);
 }
@@ -51,8 +72,10 @@ void ReadTile(Reader& reader, const zelm::Array<int>& list, const Rectangle& til
     const std::size_t samples = std::size_t{tile.width} * tile.height * list.shape.elements;
     if (samples == 0) return;
     std::vector<Sample> pixels(samples), mask(samples);
-    reader.ReadTile(static_cast<int>(tile.x), static_cast<int>(tile.y), tile.width, tile.height,
-                    list, tile.level, pixels.data(), mask.data());
+    Calling([&] {
+        return reader.ReadTile(static_cast<int>(tile.x), static_cast<int>(tile.y), tile.width,
+                               tile.height, list, tile.level, pixels.data(), mask.data());
+    });
 }
 
 void WriteTile(Reader& reader, const zelm::Array<int>& list, const Rectangle& tile,
@@ -62,8 +85,10 @@ void WriteTile(Reader& reader, const zelm::Array<int>& list, const Rectangle& ti
     std::vector<Sample> pixels(samples), mask(samples);
     for (std::size_t i = 0; i < samples; ++i)
         pixels[i] = static_cast<Sample>(1 + (i * 7 + tile.x + tile.y + generation * 101) % 250);
-    reader.WriteTile(static_cast<int>(tile.x), static_cast<int>(tile.y), tile.width, tile.height,
-                     list, tile.level, pixels.data(), mask.data());
+    Calling([&] {
+        return reader.WriteTile(static_cast<int>(tile.x), static_cast<int>(tile.y), tile.width,
+                                tile.height, list, tile.level, pixels.data(), mask.data());
+    });
 }
 
 void StoreStatistics(Reader& reader, std::uint32_t bands, double mean) {
@@ -73,9 +98,9 @@ void StoreStatistics(Reader& reader, std::uint32_t bands, double mean) {
         record.band = band;
         record.flags = zelm::StatsFlag::Mean;
         record.mean = mean;
-        records.Append(record);
+        AppendTo(records, record);
     }
-    reader.SetBandStats(records);
+    Calling([&] { return reader.SetBandStats(records); });
 }
 
 void StoreHistograms(Reader& reader) {
@@ -84,16 +109,17 @@ void StoreHistograms(Reader& reader) {
     histogram.binSize = 64;
     histogram.maximum = 255;
     histogram.binCount = 4;
-    for (std::uint64_t bin = 0; bin < 4; ++bin) histogram.counts.Append(bin * 1000);
-    records.Append(histogram);
-    reader.SetHistograms(records);
+    for (std::uint64_t bin = 0; bin < 4; ++bin) AppendTo(histogram.counts, bin * 1000);
+    AppendTo(records, histogram);
+    Calling([&] { return reader.SetHistograms(records); });
 }
 
 void StorePalette(Reader& reader) {
     zelm::Palette palette;
     zelm::Color color;
     for (std::uint32_t i = 0; i < 40; ++i) palette.AddColor(color);
-    reader.SetPalette(0, palette);
+    if (palette.nextIndex != 40) throw std::bad_alloc();
+    Calling([&] { return reader.SetPalette(0, palette); });
 }
 
 std::string Stripped(std::string text) {
@@ -128,11 +154,11 @@ void HostSession::Create() const {
         path, zelm::test::PyramidProps(kSamples, kLines, layout.bands, 1, layout.tileLines));
     WithReader(connection, [&](Reader& reader) {
         const std::int32_t pair[] = {2, 2};
-        if (!reader.BuildPyramid(0, kMaxLevel, 0, pair)) return;
+        if (!Calling([&] { return reader.BuildPyramid(0, kMaxLevel, 0, pair); })) return;
         const zelm::Array<int> list = BandList(layout.bands);
         for (const Rectangle& tile : Tiles()) WriteTile(reader, list, tile, 0);
         StoreStatistics(reader, layout.bands, 1);
-        reader.RefreshPyramidState();
+        Calling([&] { return reader.RefreshPyramidState(); });
     });
 }
 
@@ -144,18 +170,21 @@ void HostSession::Update(unsigned stores) const {
         if (stores & kStatistics) StoreStatistics(reader, layout.bands, 2);
         if (stores & kHistograms) StoreHistograms(reader);
         if (stores & kPalette) StorePalette(reader);
-        reader.HasBandStats(0);
-        reader.GetBandStats(0);
-        reader.GetHistograms();
-        reader.GetPalette(0);
-        reader.RefreshPyramidState();
-        reader.HasPyramid();
+        Calling([&] { return reader.HasBandStats(0); });
+        Calling([&] { return reader.GetBandStats(0); });
+        Calling([&] { return reader.GetHistograms(); });
+        Calling([&] { return reader.GetPalette(0); });
+        Calling([&] { return reader.RefreshPyramidState(); });
+        Calling([&] { return reader.HasPyramid(); });
     });
 }
 
 void HostSession::Delete() const {
-    WithReader(module->OpenPyramid(path), [](Reader& reader) { reader.DeletePyramid(); });
+    WithReader(module->OpenPyramid(path),
+               [](Reader& reader) { Calling([&] { return reader.DeletePyramid(); }); });
 }
+
+std::size_t HostSession::TakeThrows() const { return std::exchange(throws, 0); }
 
 std::string HostSession::DocumentOf(const std::string& file) const {
     return file.size() > documentOffset ? file.substr(documentOffset) : std::string();

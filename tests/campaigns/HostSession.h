@@ -49,6 +49,9 @@ public:
     // Opens the file and deletes it.
     void Delete() const;
 
+    // Calls of readers that an exception came out of, since the last question.
+    std::size_t TakeThrows() const;
+
     // What is wrong with the file after an Update that was interrupted anywhere; empty if nothing
     // is. `outcome` becomes "old", "new", "part" (of the stores) or "damaged", by its document.
     std::string FaultAfterUpdate(std::string& outcome) const;
