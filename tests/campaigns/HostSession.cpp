@@ -111,6 +111,8 @@ void StoreHistograms(Reader& reader) {
     histogram.binCount = 4;
     for (std::uint64_t bin = 0; bin < 4; ++bin) AppendTo(histogram.counts, bin * 1000);
     AppendTo(records, histogram);
+    // The copy of a list that found no memory is empty.
+    if (records.data[0].counts.shape.elements != 4) throw std::bad_alloc();
     Calling([&] { return reader.SetHistograms(records); });
 }
 
