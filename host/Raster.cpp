@@ -296,8 +296,8 @@ void Raster::ReadTiles(std::uint32_t level, const Window& window,
             ReadTile(level, piece, bands, part.data());
             unsigned char* to = pixels + OffsetIn(window, piece, pixelBytes);
             for (std::uint32_t line = 0; line < piece.height; ++line)
-                std::memcpy(to + line * window.width * pixelBytes, part.data() + line * rowBytes,
-                            rowBytes);
+                std::memcpy(to + std::size_t{line} * window.width * pixelBytes,
+                            part.data() + line * rowBytes, rowBytes);
         }
 }
 
