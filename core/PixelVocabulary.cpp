@@ -1,9 +1,10 @@
 #include "core/PixelVocabulary.h"
 
 #include <istream>
+#include <string>
+#include <string_view>
 
 #include "core/ElementTypes.h"
-#include "core/String.h"
 
 namespace zelm {
 namespace {
@@ -45,16 +46,18 @@ const char* NameOf(const Word<Code> (&words)[N], Code code, const char* unknown)
 }
 
 template <class Code, std::size_t N>
-Code CodeOf(const Word<Code> (&words)[N], const String& token, Code unknown) {
+Code CodeOf(const Word<Code> (&words)[N], std::string_view token, Code unknown) {
     for (const auto& word : words)
         if (token == word.text) return word.code;
     return unknown;
 }
 
-String ReadToken(std::istream& stream) {
-    String token;
-    ReadTrimmedToken(stream, token);
-    return token;
+// Narrow and short, so that it takes no memory: a word that were lost for want of it would pass for
+// an unknown one, and a file be read by another ordering than its own.
+std::string ReadToken(std::istream& stream) {
+    std::string token;
+    stream >> token;
+    return token.c_str();
 }
 
 }  // namespace
@@ -64,7 +67,7 @@ const char* InterleaveName(std::int32_t code) { return NameOf(kInterleaves, code
 const char* TileOrderName(std::uint32_t code) { return NameOf(kTileOrders, code, "Scanline"); }
 
 void ParsePixelType(std::istream& stream, std::uint32_t& code) {
-    const String token = ReadToken(stream);
+    const std::string token = ReadToken(stream);
     code = token == "USHORT" ? PixelTypeCode::UInt16 : CodeOf(kPixelTypes, token, 0u);
 }
 

@@ -110,6 +110,10 @@ public:
     }
     const std::string& Folder() const { return folder.Path(); }
 
+    void Clear() const {
+        std::error_code ignored;
+        std::filesystem::remove(Control(), ignored);
+    }
     void Write(const std::string& bytes) const {
         std::FILE* const file = std::fopen(Control().c_str(), "wb");
         ZMC_EXPECT(file && std::fwrite(bytes.data(), 1, bytes.size(), file) == bytes.size());
@@ -153,7 +157,8 @@ public:
 
     // The folder of the logs: there, missing, a file in its place, or a link to nothing, beside
     // which no folder can be made.
-    void MakeLogs(InputBytes& input) const {
+    void MakeLogs(const std::string& state) const {
+        InputBytes input(reinterpret_cast<const std::uint8_t*>(state.data()), state.size());
         const std::uint8_t kind = input.Byte();
         const std::uint8_t first = input.Byte();
         const std::uint8_t second = input.Byte();
@@ -303,26 +308,33 @@ void RunLog(const Settings& settings, const std::vector<Message>& messages) {
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
     InputBytes input(data, size);
     const Files& files = TheFiles();
-    const std::uint8_t kind = input.Byte();
-    files.MakeLogs(input);
+    const std::uint8_t kind = input.Byte() % 16;
+    const std::string state = input.Bytes(3);
     const std::vector<Message> messages = TakeMessages(input);
     const std::string control = input.Rest();
-    std::filesystem::remove(files.Control());
-    // Without the data directory there is no log at all.
-    ZMC_EXPECT(!CoordSysLog::CreateInstance((files.Folder() + "/none").c_str()));
-    ZMC_EXPECT(!gpCoordSysLogInstance);
-    CoordSysLog::LogMessage(~0u, u"nobody hears this");
-    if (kind % 16 == 15) {  // without a control file one is written, which leaves the log off
-        RunLog({}, messages);
+    const Settings settings = kind < 14 ? SettingsOf(control) : Settings();
+    // A log that is off leaves its files alone, and so do we.
+    if (settings.levels != 0) files.MakeLogs(state);
+    if (kind == 15) {  // without a control file one is written, which leaves the log off
+        files.Clear();
+        RunLog(settings, messages);
         ZMC_EXPECT(Files::Read(files.Control()) == zelm::kCoordSysLogNotes);
-        RunLog({}, messages);
-    } else if (kind % 16 == 14) {  // a folder cannot be read
+        RunLog(settings, messages);
+    } else if (kind == 14) {  // a folder cannot be read
+        files.Clear();
         std::filesystem::create_directory(files.Control());
-        RunLog({}, messages);
+        RunLog(settings, messages);
+        files.Clear();
     } else {
         files.Write(control);
-        RunLog(SettingsOf(control), messages);
+        RunLog(settings, messages);
+    }
+    if (kind == 13) {
         ZMC_EXPECT(Files::Read(files.Control()) == control);
+        // Without the data directory there is no log at all.
+        ZMC_EXPECT(!CoordSysLog::CreateInstance((files.Folder() + "/none").c_str()));
+        ZMC_EXPECT(!gpCoordSysLogInstance);
+        CoordSysLog::LogMessage(~0u, u"nobody hears this");
     }
     return 0;
 }

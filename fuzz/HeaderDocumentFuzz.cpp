@@ -30,6 +30,8 @@ void AskForGeometry(const PyramidDataset& dataset) {
         if (level >= 32 || geometry.tilesAcross == 0 || geometry.tilesDown == 0) continue;
         const std::uint32_t x = geometry.tilesAcross - 1u;
         const std::uint32_t y = geometry.tilesDown - 1u;
+        ZMC_EXPECT(geometry.HasTile(x, y) && !geometry.HasTile(x + 1u, y) &&
+                   !geometry.HasTile(x, y + 1u));
         const Wide end = Wide{dataset.LevelOffsets[level]} + dataset.GetTileOffset(x, y, level) +
                          Wide{geometry.TileWidth(x)} * geometry.TileHeight(y) *
                              dataset.BytesPerSample * dataset.BandCount;
@@ -56,6 +58,10 @@ void AskForTable(PyramidDataset& dataset) {
         offsets, offsets + dataset.TileOffsets.shape.elements, [&](std::uint64_t offset) {
             return offset == 0 || (offset >= dataset.TileDataStart && offset < dataset.TileDataEnd);
         }));
+    // Tiles are square: others leave no table.
+    dataset.BuildTileTable(dataset.Samples, dataset.Lines, dataset.TileSize, dataset.TileSize + 1u,
+                           dataset.BandCount, dataset.BytesPerSample);
+    ZMC_EXPECT(!dataset.TileOffsets.data);
 }
 
 // A dataset described by hand makes the same file again, in the ordering asked for.

@@ -70,6 +70,11 @@ void ExpectFile(const NaiveLayout& layout) {
     // An ordering that has no word reads as the first.
     ZMC_EXPECT(opened.TileOrdering == (f.ordering > 2 ? 0 : f.ordering));
     ZMC_EXPECT(opened.PixelType == f.pixelType && opened.TileDataEnd == end);
+    ZMC_EXPECT(opened.RefreshPyramidState() && opened.HasPyramid == made.HasPyramid);
+    made.DeleteFile();
+    ZMC_EXPECT(!made.File && !made.HasPyramid);
+    ZMC_EXPECT(opened.RefreshPyramidState() && !opened.HasPyramid && !opened.File);
+    ZMC_EXPECT(opened.ReadHeader());
 }
 
 }  // namespace

@@ -43,9 +43,8 @@ using Value = std::optional<std::string>;
 // As the module holds it: bytes that make no character are replaced by one that is.
 std::string Held(const std::string& text) { return zmcfuzz::Utf8Of(zmcfuzz::Utf16Of(text)); }
 
-Value FindValue(const std::string& raw, const std::string& rawKey) {
-    const std::string source = Held(raw);
-    const std::string key = Held(rawKey);
+// Of a text and a key as they are held.
+Value FindValue(const std::string& source, const std::string& key) {
     if (key.empty()) return {};
     const std::size_t at = source.find(key + "=");
     if (at == std::string::npos) return {};
@@ -146,10 +145,10 @@ void ExpectPair(const String& source, const String& key, const Value& value) {
     }
 }
 
-void ExpectHelpers(const std::string& text, const std::string& keyText) {
+void ExpectHelpers(const std::string& text, const std::string& held, const std::string& keyText) {
     const String source(text.c_str());
     const String key(keyText.c_str());
-    const Value value = FindValue(text, keyText);
+    const Value value = FindValue(held, Held(keyText));
     String found("old");
     ZMC_EXPECT(zelm::FindParameterValue(source, key, found) == value.has_value());
     ZMC_EXPECT(found == value.value_or("").c_str());
@@ -344,6 +343,7 @@ private:
             const std::uint32_t band = input.UpTo(7);
             props.SetNoDataValue(band, input.OneOf(values));
             if (input.Byte() % 4 == 0) props.SetNoDataFlag(band, input.Flag());
+            if (props.HasNoDataValue(band)) props.GetNoDataValue(band) += 0;
         }
         reader.SetNoDataValues(props);
         for (std::uint32_t band = 0; band < 9; ++band)
@@ -508,9 +508,8 @@ struct Argument {
 };
 
 Argument ArgumentOf(std::uint8_t kind, const std::string& text) {
+    if (kind == 0 || kind == 0x58) return {{text}, false, true};
     switch (kind & 7) {
-        case 0:
-            return {{text}, false, true};
         case 1:
             return {{text, "MemoryRaster"}, true, true};
         case 2:
@@ -524,25 +523,36 @@ Argument ArgumentOf(std::uint8_t kind, const std::string& text) {
     }
 }
 
+bool IsWord(const std::string& text);
+
+// A new pyramid needs a name alone, and no file is made for it yet; memory rasters are not created.
+void ExpectCreate(const zelm::DataConnectionPtr& created, bool pyramid, const Argument& argument) {
+    const auto name = std::find_if_not(argument.elements.begin(), argument.elements.end(), IsWord);
+    const bool named = name != argument.elements.end() && !name->empty();
+    ZMC_EXPECT(static_cast<bool>(created) == (pyramid && named));
+    if (created) ZMC_EXPECT(!created->IsReadable());
+}
+
 bool IsWord(const std::string& text) { return text == "MemoryRaster" || text == "Pyramid"; }
 
-void ExpectOpen(std::uint8_t kind, const std::string& text, const Buffer& buffer,
-                InputBytes& input) {
+void ExpectOpen(std::uint8_t kind, const std::string& text, const std::string& held,
+                const Buffer& buffer, InputBytes& input) {
     const Argument argument = ArgumentOf(kind, text);
     const Array<String> connection = ArrayOf(argument.elements);
     zelm::RasterDataConnectionFactory factory;
     factory.Test(connection);
     ZMC_EXPECT(factory.IsRasterFactory() && !factory.CreateDefault());
     zelm::RasterProps props;
-    props.formatName = text.c_str();
-    ZMC_EXPECT(!factory.Create(connection, props) || text == "Pyramid");
+    const bool pyramid = kind >> 3 == 5;
+    props.formatName = pyramid ? "Pyramid" : text.c_str();
+    ExpectCreate(factory.Create(connection, props), pyramid || text == "Pyramid", argument);
     // Without a word, what is no memory raster is the name of a file, which is opened and, being no
     // pyramid, closed; those in other folders are let alone.
     if (!argument.memory && text.find('/') != std::string::npos) return;
     const bool located = (kind & 16) != 0;
     const zelm::DataConnectionPtr opened = factory.Open(
         connection, zelm::GeoRefPtr(located ? new Georeference : nullptr), zelm::MetadataPtr());
-    const std::optional<Description> d = Description::Of(text);
+    const std::optional<Description> d = Description::Of(held);
     ZMC_EXPECT(static_cast<bool>(opened) == (d && argument.single && !IsWord(text)));
     if (!opened) return;
     ZMC_EXPECT(factory.Test(connection));
@@ -571,8 +581,9 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     if (end < whole.size())
         steps = InputBytes(reinterpret_cast<const std::uint8_t*>(whole.data()) + end + 1,
                            whole.size() - end - 1);
-    ExpectHelpers(text, key);
+    const std::string held = Held(text);
+    ExpectHelpers(text, held, key);
     ExpectSplit(text, key);
-    ExpectOpen(kind, text, buffer, steps);
+    ExpectOpen(kind, text, held, buffer, steps);
     return 0;
 }

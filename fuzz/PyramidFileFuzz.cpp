@@ -26,6 +26,7 @@
 #include "fuzz/support/Records.h"
 #include "fuzz/support/StoreCheck.h"
 #include "pyramid/PyramidDataConnection.h"
+#include "pyramid/PyramidRasterReader.h"
 #include "tests/support/PyramidModel.h"
 
 namespace {
@@ -39,6 +40,7 @@ using Bytes = std::vector<unsigned char>;
 constexpr std::uint64_t kModelBytes = 1u << 20;     // larger files have no model
 constexpr std::uint64_t kBufferBytes = 256u << 10;  // a host's buffer, at the most
 constexpr std::uint32_t kModelTiles = 1024;
+constexpr std::uint64_t kTouchedBytes = 16u << 20;  // of the file, by one request
 
 struct Request {
     std::int32_t x = 0;
@@ -64,7 +66,8 @@ public:
     }
 
     void Run(InputBytes& script) {
-        while (dataset && !script.AtEnd()) Step(script);
+        // Inputs stay quick: what takes more steps than this is two inputs.
+        for (int steps = 0; dataset && !script.AtEnd() && steps < 6; ++steps) Step(script);
         if (dataset && !forgotten) Reopen();
     }
 
@@ -235,13 +238,16 @@ private:
     }
 
     // A host has a buffer of the size of its request, and a fuzzing run not the memory for all; nor
-    // for tile tables as large as the module allows.
+    // for tile tables as large as the module allows, nor the time for the whole pixels of 4 GiB
+    // that one request may touch in the file, whatever bands it lists.
     bool CanTry(const Request& r, std::optional<bool> expected) const {
         if (expected && !*expected) return true;
-        const bool largeTable =
-            dataset->TileOrdering == 2 && zmcfuzz::TileTableBytes(*dataset) > Wide{64u << 20};
+        const bool planar = dataset->TileOrdering == 2;
+        const bool largeTable = planar && zmcfuzz::TileTableBytes(*dataset) > Wide{64u << 20};
+        const Wide wholePixels = Wide{r.width} * r.height * dataset->BandCount;
         return !largeTable &&
-               r.Samples(dataset->BandCount) * dataset->BytesPerSample <= kBufferBytes;
+               r.Samples(dataset->BandCount) * dataset->BytesPerSample <= kBufferBytes &&
+               (planar || wholePixels * dataset->BytesPerSample <= kTouchedBytes);
     }
 
     // What is refused touches no buffer: then one sample will do.
@@ -339,6 +345,7 @@ private:
         const bool done = reader.WriteTile(r.x, r.y, r.width, r.height, r.BandList(), r.level,
                                            buffer.empty() ? &nothing : buffer.data(), mask.data());
         ZMC_EXPECT(!expected || done == *expected);
+        if (!buffer.empty()) ExpectOtherOrderingRefuses(r, buffer.data());
         const Bytes after = file.Read(0, kModelBytes + 1);
         const bool changes = done && dataset->Writable && !sealed && !buffer.empty();
         if (!changes) {
@@ -362,6 +369,18 @@ private:
         if (file.Size() <= dataset->MetaDocumentOffset) forgotten = false;
     }
 
+    template <class T>
+    void ExpectOtherOrderingRefuses(const Request& r, const T* buffer) {
+        const auto x = static_cast<std::uint32_t>(r.x);
+        const auto y = static_cast<std::uint32_t>(r.y);
+        if (dataset->TileOrdering < 2)
+            ZMC_EXPECT(
+                !dataset->WriteTileMorton(x, y, r.width, r.height, r.BandList(), r.level, buffer));
+        else
+            ZMC_EXPECT(!dataset->WriteTileInterleaved(x, y, r.width, r.height, r.BandList(),
+                                                      r.level, buffer));
+    }
+
     static bool SameFrom(std::uint64_t offset, const Bytes& a, const Bytes& b) {
         if (a.size() != b.size()) return false;
         if (offset >= a.size()) return true;
@@ -377,9 +396,10 @@ private:
     }
 
     template <class T>
-    void StoreWith(RasterReader<T>&, InputBytes& script) {
+    void StoreWith(RasterReader<T>& reader, InputBytes& script) {
         if (forgotten || sealed) {
-            dataset->SetBandStats(Array<RasterBandStats<T>>());
+            ZMC_EXPECT(reader.SetBandStats(Array<RasterBandStats<T>>()));
+            ZMC_EXPECT(reader.SetHistograms(Array<RasterBandHistogram<T>>()));
         } else {
             zmcfuzz::StoreCheck<T>(*dataset, file).Run(script);
         }
@@ -431,11 +451,16 @@ private:
             reader.GetNoDataValue(band);
         });
         ZMC_EXPECT(!connection->IsReadable() && connection->IsOpen());
+        PyramidRasterReader<unsigned char> unbound(nullptr, GeoRefPtr(), MetadataPtr());
+        unsigned char pixel = 0;
+        ZMC_EXPECT(!unbound.IsValid() && !unbound.HasPalette(band) &&
+                   !unbound.RefreshPyramidState());
+        ZMC_EXPECT(!unbound.ReadTile(0, 0, 1, 1, Array<int>(), level, &pixel, nullptr));
     }
 
     void Refresh() {
         if (!addressable) return;
-        ZMC_EXPECT(dataset->RefreshPyramidState());
+        dispatch->Visit([&](auto& reader) { ZMC_EXPECT(reader.RefreshPyramidState()); });
         ExpectCompleteness();
     }
 
@@ -460,9 +485,39 @@ private:
         ZMC_EXPECT(before == after);
     }
 
+    // Makes the file anew by another connection, which chooses tile size and ordering.
+    void Create(InputBytes& script) {
+        static RasterDataConnectionFactory factory;
+        Array<String> name;
+        ZMC_EXPECT(name.Append(String(file.Name().c_str())));
+        RasterProps props = static_cast<PyramidDataConnection*>(connection.Get())->GetRasterProps();
+        props.formatName = script.UpTo(7) == 0 ? "Unknown" : "Pyramid";
+        props.tileLines = script.Byte();
+        const DataConnectionPtr made = factory.Create(name, props);
+        ZMC_EXPECT(static_cast<bool>(made) == (props.formatName == "Pyramid"));
+        PyramidDataConnection unknown;
+        if (!made) ZMC_EXPECT(!unknown.Create(name, props));
+        if (!made) return;
+        const std::int32_t pair[2] = {0, 0};
+        const std::int32_t levels = static_cast<std::int32_t>(script.UpTo(4));
+        auto* const pyramid = static_cast<PyramidDataConnection*>(made.Get());
+        PyramidDataset& fresh = *pyramid->dataset;
+        pyramid->GetReader()->Visit(
+            [&](auto& reader) { ZMC_EXPECT(reader.BuildPyramid(0, levels, 0, pair)); });
+        const PyramidHeaderRecord header = zmcfuzz::HeaderOf(fresh);
+        ZMC_EXPECT(header.tileSize == 256 && header.tileOrdering == (props.bands > 8       ? 2u
+                                                                     : props.tileLines > 1 ? 1u
+                                                                                           : 0u));
+        const bool laidOut = static_cast<bool>(fresh.LevelOffsets);
+        ZMC_EXPECT(!laidOut || zmcfuzz::MayOpen(header));
+        Open();
+        ZMC_EXPECT(dataset && (!laidOut || zmcfuzz::HeaderOf(*dataset) == header));
+    }
+
     // Lays the file out for other levels, or deletes it; both end what was known about it.
     void LayOutOrDelete(InputBytes& script) {
         if (!addressable || dispatch->pixelType == 0) return;
+        if (script.UpTo(2) == 0) return Create(script);
         const std::int32_t pair[2] = {3, script.UpTo(7) == 0 ? 4 : 3};
         const std::uint32_t levelMin = script.UpTo(3);
         const std::uint32_t levelMax = script.Flag() ? script.Size() : levelMin + script.UpTo(6);

@@ -29,6 +29,7 @@ def string_seeds():
         for locale in (0, 1):
             yield f"{name}-{locale}", bytes([locale]) + assign + ask + join + own + convert
         yield f"tokens-{name}", b"\0\0\x11" + counted + b"\0\x12"
+    yield "case", b"\0\0\0\6raster\1\0\6raSter\0\x0d\1\0\x0e\6Raster"
     yield "wide", b"\1\0\1\4\x41\0\x10\x80\x90\x80\x08\xc8\0\x0c\0\x12"
 
 
@@ -51,6 +52,9 @@ def memory_parameters_seeds():
         yield f"kind-{kind}", bytes([kind]) + full + b"\0" + steps
     for key in (b"LINES", b"=", b",", b"A;", b"PIXELSI"):
         yield f"key-{key.decode()}", bytes([len(key) << 5 | 5]) + key + full
+    for number in (b"4294967295", b"4294967296", b"-4294967295", b"-4294967296", b"2147483647",
+                   b"2147483648", b"-2147483648", b"-2147483649", b"0xFFFFFFFF", b"040000000000"):
+        yield f"number-{number.decode()}", b"\x25K" + b"K=" + number
     # Numbers outside the range of a double, however they are written.
     zeros = b"0" * 400
     for name, pair in (
@@ -81,6 +85,8 @@ LAYOUTS = (
     (65537, 1, 1, 1, 0, 0), (1024, 1024, 2**32 - 1, 256, 0, 9), (64, 64, 9, 0, 0, 1),
     (64, 64, 9, 2049, 0, 1), (512, 512, 1, 2048, 5, 3), (2**31, 2**31, 1, 1024, 0, 1023),
     (300, 300, 2, 256, 2, 1024), (0, 9, 1, 256, 0, 1), (9, 9, 0, 256, 0, 1), (4096, 4096, 16, 512, 3, 9),
+    (1, 65537, 1, 1, 0, 0), (65536, 65536, 1, 1, 0, 0), (256, 256, 8191, 1, 0, 0),
+    (256, 256, 8192, 1, 0, 0), (2**31, 2**31, 1, 2048, 0, 0), (2**31, 2**31, 2, 2048, 0, 0),
 )
 
 
@@ -110,6 +116,12 @@ def layout_seeds():
             window = bytes([kind, 0, 5, 3, 9, 8]) if kind == 1 else bytes([kind, 0, 9, 9])
             rest = bytes([list_kind, 1, 0, 2, 0xFF, 0xF, 1, 7, 1])
             yield f"small-{name}-{kind}-{list_kind}", b"\xf0" + fields + b"\1\1\0" + window + rest
+        above = bytes([fields[5] + fields[4] + 1])
+        yield f"above-{name}", b"\xf0" + fields + b"\1\1\0" + b"\x09" + above + b"\0\0\1\1\1"
+    # As many bytes as a transfer may have, and one more.
+    whole = b"\x21" + b"".join(map(size, (65536, 65536, 1, 256, 0, 0))) + b"\0\0\0\0\0\1\0\0\0"
+    yield "transfer-limit", whole + size(65536) + size(65536) + b"\0\xff"
+    yield "transfer-below", whole + size(65535) + size(65536) + b"\0\xff"
     for sample in range(5):
         for layout in (b"\0\0\0", b"\1\0\0\0", b"\1\0\0\1"):
             for other in (b"\0\0\0", b"\0\1\3\0\1\2\3\4\5\6\7\0", b"\1\0\0\1"):
@@ -133,6 +145,10 @@ def control_file_seeds():
              "second-folder": b"\0\5\7", "none": b"\6\0\0", "file": b"\7\0\0", "link": b"\5\0\0"}
     for name, state in files.items():
         yield f"logs-{name}", b"\0" + state + b"\3" + message + long + message + on
+    # The line that fills a file to its limit, and one that is a byte longer.
+    for length in (8, 9):
+        filling = b"\1\0" + bytes([length]) + b"x" * length
+        yield f"fill-{length}", b"\0\0\3\2\1" + filling + on
     lines = (
         b"0110,0000,0000,0001\n", b"1000,0000,0000,0001\n", b"0110, 0000, 0000, 0001\n",
         b"1,,,,,,,,,,,,,,,,,1\n", b"# notes\n \n0110,0000,0000,0001 and more\n", b"0\n" + on,
@@ -141,6 +157,7 @@ def control_file_seeds():
     )
     for i, line in enumerate(lines):
         yield f"line-{i}", b"\0\0\0\0\2" + message + message + line
+    yield "no-data-folder", b"\x0d\0\0\0\1" + message + on
     yield "no-control-file", b"\x0f\0\0\0\1" + message
     yield "control-folder", b"\x0e\0\0\0\1" + message
 
@@ -153,7 +170,7 @@ def environment_seeds():
     for i, (folder, level, console) in enumerate((
         (b"a", b"1", b"0"), (b"a", b"0x10", b"1"), (b"a/b", b"010", b"1"), (b"a", b"0", b"0"),
         (b"a", b"-1", b"-0"), (b"\xff\xfe", b"4294967296", b"4294967295"), (b"a/", b" +7z", b"x"),
-        (b"blocked", b"3", b"0"),
+        (b"blocked", b"3", b"0"), (b"a", b"-4294967295", b"-4294967296"),
         (b"/", b"99999999999999999999", b"0xg"),
     )):
         values = variable(folder) + variable(level) + variable(console)
@@ -246,6 +263,19 @@ def file_seeds():
         yield f"{order}-cut", with_script(pyramid_file(order=order)[:-20], 1)
         yield f"{order}-odd-tile", with_script(pyramid_file(order=order, tile=3), 0)
         yield f"{order}-bands", with_script(pyramid_file(order=order, bands=20, tile=5), 0)
+    # Rows, and single pixels, beyond what the module moves at a time; the pixels are not there yet.
+    rows = {"width": 256, "height": 2, "bands": 64, "tile": 256, "levels": (0, 0),
+            "pixel_type": "ComplexDouble"}
+    pixels = {"width": 2, "height": 3, "bands": 70000, "tile": 256, "levels": (0, 0)}
+    for number, script in enumerate((
+            bytes([0, 5, 36, 0, 0, 3, 2, 0, 0, 77, 0, 36, 0, 0, 3, 2, 0, 0, 0, 12]),
+            bytes([0, 5, 36, 0, 4, 1, 9, 7, 3, 2, 0, 0, 77, 0, 36, 0, 4, 1, 9, 7, 3, 2, 0, 0, 12]),
+            bytes([0, 5, 36, 0, 7, 0, 1, 0, 0, 77, 0, 36, 0, 7, 0, 1, 0, 0, 12]),
+            bytes([0, 5, 36, 0, 4, 0, 9, 0, 0, 0, 1, 0, 0, 0, 7, 0, 36, 0, 4, 0, 9, 0, 0, 0, 1]))):
+        for name, header in (("rows", rows), ("pixels", pixels)):
+            front = pyramid_file(**header)
+            front = front[:struct.unpack_from("<Q", front, 4)[0]]
+            yield f"wide-{name}-{number}", front + script + bytes([len(script)])
     yield "old-version", with_script(pyramid_file(version=(1, 0)), 2)
     yield "large-tile", with_script(pyramid_file(tile=4096), 2)
     yield "malformed", with_script(pyramid_file(metadata[:-12]), 2)
@@ -298,11 +328,27 @@ def metadata_seeds():
         "<HISTOGRAMS><HIST_SOURCE>Native</HIST_SOURCE><HIST_SOURCE>Dynamic</HIST_SOURCE>"
         "<HIST_TYPE>1</HIST_TYPE></HISTOGRAMS>")
     yield "cut", metadata_document(statistics(0), HISTOGRAM)[:-9]
+    for length in range(12):
+        yield f"padded-{length}", metadata_document(statistics(1), HISTOGRAM) + b"\n" * length
+    yield "long", metadata_document(statistics(0)) + b" \n" * 1500
     yield "torn", metadata_document(statistics(0)) + b"</DATASET>"
     yield "type", b"<!DOCTYPE d [<!ENTITY e 'x'>]><DATASET>&e;</DATASET>"
     yield "deep", b"<A>" * 70 + b"</A>" * 70
     yield "names", b"<A>" + b"".join(b"<a%d/>" % i for i in range(300)) + b"</A>"
     yield "wide-text", metadata_document(statistics(0)).decode().encode("utf-16")
+
+
+def wide_format_seeds():
+    # Flags, width and precision; then text in front and the room, and what is formatted.
+    numbers = {"none": b"\0\0", "fixed": b"\0\1\3\1\1\2", "stars": b"\2\0\4\2\4\1\1\2\3\0"}
+    for name, start in numbers.items():
+        for kind in range(6):
+            for letter in range(4):
+                rest = bytes([2, 1, kind, letter, letter, 1, 5]) + b"some text\0\x2a"
+                yield f"{name}-{kind}-{letter}", b"\1" + start + rest
+    yield "short", b"\1\0\0\0\2\0\4\3\0\0\5hello"
+    for broken in range(15):
+        yield f"broken-{broken}", bytes([15, broken, 19])
 
 
 TARGETS = {
@@ -315,6 +361,7 @@ TARGETS = {
     "file": file_seeds,
     "header": header_seeds,
     "metadata": metadata_seeds,
+    "wide_format": wide_format_seeds,
 }
 
 

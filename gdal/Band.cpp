@@ -9,6 +9,7 @@
 #include "gdal/Create.h"
 #include "gdal/MaskBand.h"
 #include "gdal/NoDataValues.h"
+#include "gdal/Sidecar.h"
 #include "raster/RasterBandStats.h"
 
 namespace zmcgdal {
@@ -122,6 +123,7 @@ void Band::CompleteTile(int blockX, int blockY, const Window& tile, unsigned cha
                         std::size_t stride) {
     if (GDALRasterBlock* const block = TryGetLockedBlockRef(blockX, blockY)) {
         CopyFromBlock(block->GetDataRef(), tile, samples, stride);
+        if (block->GetDirty()) DropSidecarStatistics();
         block->MarkClean();
         block->DropLock();
         return;
@@ -165,6 +167,14 @@ std::vector<unsigned char> Band::GatherTile(int blockX, int blockY, const Window
     return samples;
 }
 
+// Nobody takes them for the new pixels. A sidecar without any is not written for this.
+void Band::DropSidecarStatistics() {
+    if (owner.IsOverview()) return;
+    char** const items = GDALPamRasterBand::GetMetadata("");
+    CPLStringList kept = WithoutStatistics(items);
+    if (kept.Count() != CSLCount(items)) GDALPamRasterBand::SetMetadata(kept.List(), "");
+}
+
 CPLErr Band::IWriteBlock(int blockX, int blockY, void* data) {
     TileReader& tiles = owner.File().tiles;
     const Window tile = tiles.TileAt(owner.Level(), blockX, blockY);
@@ -177,6 +187,7 @@ CPLErr Band::IWriteBlock(int blockX, int blockY, void* data) {
             {positive(tile.x), positive(tile.y), positive(tile.width), positive(tile.height)},
             bands, samples.data());
         tiles.Forget();
+        DropSidecarStatistics();
         if (Creation* const creation = owner.UnderCreation())
             for (const std::uint32_t band : bands)
                 creation->MarkWritten(BlockNumber(blockX, blockY), band);

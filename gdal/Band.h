@@ -1,7 +1,8 @@
 // Band: one band of one level.
 //
 // Statistics, histograms and palettes come from the file, without a scan; where the file has none,
-// from the sidecar. In update mode they are stored in the file.
+// from the sidecar. In update mode they are stored in the file. When pixels change, statistics in
+// the sidecar go; those in the file stay until newer ones are stored.
 #ifndef ZMC_GDAL_BAND_H
 #define ZMC_GDAL_BAND_H
 
@@ -83,6 +84,7 @@ private:
     std::vector<unsigned char> GatherTile(int blockX, int blockY, const Window& tile,
                                           const void* data, std::vector<std::uint32_t>& bands);
 
+    void DropSidecarStatistics();
     Band* MainBand();
     bool StoresInFile() const;
     const CPLStringList& StatisticsItems();

@@ -8,6 +8,7 @@
 #include "gdal/Create.h"
 #include "gdal/Dataset.h"
 #include "gdal/Options.h"
+#include "host/MetadataCopy.h"
 #include "host/PyramidFileInfo.h"
 #include "host/Xerces.h"
 
@@ -42,7 +43,19 @@ zmchost::PyramidHeader HeaderOf(GDALOpenInfo& info) {
     return zmchost::PyramidHeader::Read(info.pszFilename);
 }
 
+// What a store that was cut off has left: statistics that GDAL stores into it now would be lost
+// when somebody else puts the old ones back.
+void PutInOrder(const std::string& name) {
+    const zmchost::Recovery recovery = zmchost::RecoverMetadata(name);
+    using Outcome = zmchost::Recovery::Outcome;
+    if (recovery.outcome == Outcome::Restored || recovery.outcome == Outcome::Complete)
+        CPLError(CE_Warning, CPLE_AppDefined, "%s: %s", name.c_str(), recovery.text.c_str());
+    else if (!recovery.text.empty())
+        CPLDebug(kName, "%s: %s", name.c_str(), recovery.text.c_str());
+}
+
 std::unique_ptr<Dataset> OpenDataset(GDALOpenInfo* info) {
+    PutInOrder(info->pszFilename);
     auto file = std::make_shared<OpenFile>(info->pszFilename, HeaderOf(*info),
                                            SignedByteFrom(info->papszOpenOptions));
     const zmchost::PyramidFileInfo layout = file->info;

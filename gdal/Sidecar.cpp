@@ -18,13 +18,6 @@ bool DescribesTheFile(const char* domain) {
                        [&](const char* name) { return EQUAL(domain, name); });
 }
 
-CPLStringList WithoutStatistics(CSLConstList items) {
-    CPLStringList kept;
-    for (; items && *items; ++items)
-        if (!STARTS_WITH_CI(*items, "STATISTICS_")) kept.AddString(*items);
-    return kept;
-}
-
 void CopyMetadata(GDALMajorObject& source, GDALMajorObject& target) {
     CPLStringList domains(source.GetMetadataDomainList());
     if (domains.FindString("") < 0) domains.AddString("");
@@ -47,6 +40,13 @@ void CopyInterpretation(GDALDataset& source, Dataset& target) {
 }
 
 }  // namespace
+
+CPLStringList WithoutStatistics(CSLConstList items) {
+    CPLStringList kept;
+    for (; items && *items; ++items)
+        if (!STARTS_WITH_CI(*items, "STATISTICS_")) kept.AddString(*items);
+    return kept;
+}
 
 CPLErr CopySidecar(GDALDataset& source, Dataset& target, bool strict) {
     constexpr int kByHand =

@@ -2,6 +2,7 @@
 #ifndef ZMC_GDAL_SIDECAR_H
 #define ZMC_GDAL_SIDECAR_H
 
+#include <cpl_string.h>
 #include <gdal_priv.h>
 
 namespace zmcgdal {
@@ -12,6 +13,9 @@ class Dataset;
 // category names, attribute tables, colour interpretation, every metadata domain and a mask of the
 // whole dataset from `source`. Statistics are not taken: the file has its own.
 CPLErr CopySidecar(GDALDataset& source, Dataset& target, bool strict);
+
+// The items of a metadata domain that are no statistics.
+CPLStringList WithoutStatistics(CSLConstList items);
 
 }  // namespace zmcgdal
 

@@ -1,40 +1,14 @@
 #include "host/BuildFile.h"
 
-#include <charconv>
-#include <string_view>
-
 #include "host/Error.h"
+#include "host/MetadataCopy.h"
+#include "host/SideFile.h"
 #include "platform/FileSystem.h"
 
 namespace zmchost {
 namespace {
 
-constexpr std::string_view kInfix = ".zmcbuild-";
-constexpr std::string_view kSuffix = ".tmp";
-// Names of files have 255 bytes at most; process and random number take up to 40 of them.
-constexpr std::size_t kMaxStem = 200;
-
-// What all temporary names of a target begin with. A long name is cut, between two characters.
-std::string Prefix(const std::string& target) {
-    std::string name = platform::NameOf(target);
-    if (name.size() > kMaxStem) {
-        name.resize(kMaxStem);
-        while (!name.empty() && (name.back() & 0xC0) == 0x80) name.pop_back();
-        if (!name.empty()) name.pop_back();
-    }
-    return '.' + name + std::string(kInfix);
-}
-
-// The process of a temporary name; 0 for a name that is not one of ours.
-std::uint64_t ProcessOf(std::string_view name, std::string_view prefix) {
-    if (!name.starts_with(prefix) || !name.ends_with(kSuffix)) return 0;
-    name.remove_prefix(prefix.size());
-    std::uint64_t process = 0;
-    const char* const end = name.data() + name.size();
-    const auto parsed = std::from_chars(name.data(), end, process);
-    const bool ours = parsed.ec == std::errc() && parsed.ptr != end && *parsed.ptr == '-';
-    return ours ? process : 0;
-}
+const std::string kKind = "zmcbuild";
 
 std::string Bytes(std::uint64_t size) { return std::to_string(size) + " bytes"; }
 
@@ -43,13 +17,11 @@ std::string Bytes(std::uint64_t size) { return std::to_string(size) + " bytes"; 
 BuildFile::BuildFile(const std::string& targetName, bool mayOverwrite)
     : given(targetName), overwrite(mayOverwrite), target(platform::ResolveLinks(targetName)) {
     CheckTarget();
-    RemoveStale();
-    const std::string folder = platform::FolderOf(target);
-    path = platform::JoinPath(folder, Prefix(target) + std::to_string(platform::CurrentProcess()) +
-                                          '-' + std::to_string(platform::RandomNumber()) +
-                                          std::string(kSuffix));
+    SideFile::RemoveStale(target, kKind);
+    path = SideFile::TemporaryPath(target, kKind);
     if (!platform::CreateNewFile(path))
-        throw Error(given, "build a file in the folder " + folder, platform::LastErrorText());
+        throw Error(given, "build a file in the folder " + platform::FolderOf(target),
+                    platform::LastErrorText());
 }
 
 BuildFile::~BuildFile() {
@@ -64,16 +36,6 @@ void BuildFile::CheckTarget() const {
     if (!status.isRegular) throw Error(given, "replace it", "it is not a regular file");
     if (!overwrite) throw Error(given, "build it", "the file exists already");
     if (status.readOnly) throw Error(given, "replace it", "the file is read-only");
-}
-
-void BuildFile::RemoveStale() const {
-    const std::string folder = platform::FolderOf(target);
-    const std::string prefix = Prefix(target);
-    for (const std::string& name : platform::ListFolder(folder)) {
-        const std::uint64_t process = ProcessOf(name, prefix);
-        if (process != 0 && !platform::ProcessAlive(process))
-            platform::RemoveEntry(platform::JoinPath(folder, name));
-    }
 }
 
 void BuildFile::CheckSpace(std::uint64_t size) const {
@@ -99,6 +61,8 @@ void BuildFile::Commit() {
     if (!platform::RenameFile(path, target))
         throw Error(given, "give the finished file its name", platform::LastErrorText());
     committed = true;
+    // What may be left of a store into the old file has no file any more.
+    platform::RemoveEntry(MetadataCopy::PathFor(target));
     if (!platform::SyncFolder(platform::FolderOf(target)))
         throw Error(given, "write its name to the disk", platform::LastErrorText());
 }

@@ -35,7 +35,6 @@ public:
 
 private:
     void CheckTarget() const;
-    void RemoveStale() const;
 
     std::string given;  // the target as the caller named it, for messages
     bool overwrite;

@@ -8,15 +8,14 @@
 #include "core/PixelVocabulary.h"
 #include "host/Lanes.h"
 #include "host/Threads.h"
-#include "platform/FileSystem.h"
 
 namespace zmchost {
 namespace {
 
 namespace tbb = oneapi::tbb;
 
-// Bytes of tiles that the second walk over level 0 reads at a time.
-constexpr std::size_t kChunkBytes = std::size_t{8} << 20;
+// Bytes of tiles that the second walk over level 0 reads at a time: well below the least budget.
+constexpr std::size_t kChunkBytes = std::size_t{4} << 20;
 
 }  // namespace
 
@@ -324,12 +323,6 @@ void PyramidBuild::Check() {
             name, "finish it",
             std::to_string(raster->Header().BytesMissing()) + " bytes did not reach the file");
     file->Flush();
-    const PyramidHeader header = raster->Header();
-    const auto holes = platform::FindHoles(file->Path());
-    const bool lost = std::any_of(holes.begin(), holes.end(), [&](const platform::Hole& hole) {
-        return hole.begin < header.tileDataEnd;
-    });
-    if (lost) tiles->CompareAll();
     const std::uint32_t lastBand = props.bands - 1;
     const bool hasRecords = raster->HasStatistics(lastBand);
     tiles.reset();

@@ -5,6 +5,7 @@
 #include <sstream>
 
 #include "core/PixelVocabulary.h"
+#include "host/MetadataCopy.h"
 #include "host/NoData.h"
 #include "host/Text.h"
 #include "platform/FileSystem.h"
@@ -75,6 +76,17 @@ zelm::Array<Record> ToArray(const std::vector<Record>& records) {
     return array;
 }
 
+// Without memory the copy of a list is empty, and the module takes the counts that are not there
+// for zeros.
+template <class T>
+bool HaveSameCounts(const zelm::RasterBandHistogram<T>& histogram,
+                    const zelm::RasterBandHistogram<T>& given) {
+    const zelm::Array<std::uint64_t>& counts = given.counts;
+    return counts.shape.elements == given.binCount && histogram.binCount == given.binCount &&
+           histogram.counts.shape.elements == given.binCount &&
+           std::equal(counts.data, counts.data + given.binCount, histogram.counts.data);
+}
+
 std::string MemoryParameters(const void* samples, const zelm::RasterProps& props) {
     std::ostringstream text;
     text << "SAMPLES=" << props.samples << ";LINES=" << props.lines << ";BANDS=" << props.bands
@@ -101,6 +113,7 @@ Raster Raster::Open(ModulePtr module, const std::string& file) {
     const platform::FileStatus status = platform::StatusOf(file);
     if (!status.exists) throw Error(file, "open the raster", "there is no such file");
     if (!status.isRegular) throw Error(file, "open the raster", "it is not a file");
+    const Recovery recovery = RecoverMetadata(file);
     PyramidHeader header = PyramidHeader::Read(file);
     zelm::RasterDataConnectionPtr connection = module->OpenPyramid(file);
     if (!connection) throw Error(file, "open the raster", "the module refuses it");
@@ -109,6 +122,7 @@ Raster Raster::Open(ModulePtr module, const std::string& file) {
     raster.header = header;
     raster.minLevel = header.minLevel;
     raster.maxLevel = header.maxLevel;
+    raster.recoveryNote = recovery.text;
     return raster;
 }
 
@@ -136,6 +150,7 @@ Raster Raster::Create(ModulePtr module, const std::string& file, zelm::RasterPro
     if (raster.header->maxLevel != maxLevel || raster.header->width != props.samples ||
         raster.header->height != props.lines || raster.header->bands != props.bands)
         throw Error(file, "lay out the raster", "an older file stands in its place");
+    platform::RemoveEntry(MetadataCopy::PathFor(file));
     raster.SetNoDataValues(noData);
     return raster;
 }
@@ -281,8 +296,8 @@ void Raster::ReadTiles(std::uint32_t level, const Window& window,
             ReadTile(level, piece, bands, part.data());
             unsigned char* to = pixels + OffsetIn(window, piece, pixelBytes);
             for (std::uint32_t line = 0; line < piece.height; ++line)
-                std::memcpy(to + line * window.width * pixelBytes, part.data() + line * rowBytes,
-                            rowBytes);
+                std::memcpy(to + std::size_t{line} * window.width * pixelBytes,
+                            part.data() + line * rowBytes, rowBytes);
         }
 }
 
@@ -414,6 +429,18 @@ zelm::RasterBandStats<T> Raster::Statistics(std::uint32_t band) const {
     return record;
 }
 
+// Runs what stores and reads back.
+template <class Action>
+void Raster::Store(Action action) {
+    if (!keepsCopies || !header) {
+        action();
+        return;
+    }
+    MetadataCopy copy(name);
+    action();
+    copy.Finish();
+}
+
 template <class T>
 void Raster::SetStatistics(const std::vector<zelm::RasterBandStats<T>>& records) {
     zelm::RasterReader<T>& typed = Typed<T>();
@@ -423,9 +450,12 @@ void Raster::SetStatistics(const std::vector<zelm::RasterBandStats<T>>& records)
             throw Error(name, "store statistics", "they are not those of all bands in order");
     if (HasStatistics(0))
         throw Error(name, "store statistics", "it has some already, and a file keeps the oldest");
-    typed.SetBandStats(ToArray(records));
-    if (!HasStatistics(0) || !HasStatistics(Bands() - 1))
-        throw Error(name, "store statistics", "they did not reach the file (disk full?)");
+    Store([&] {
+        typed.SetBandStats(ToArray(records));
+        bool has = true;
+        for (std::uint32_t band = 0; has && band < Bands(); ++band) has = HasStatistics(band);
+        if (!has) throw Error(name, "store statistics", "they did not reach the file (disk full?)");
+    });
 }
 
 template <class T>
@@ -438,10 +468,19 @@ template <class T>
 void Raster::SetHistograms(const std::vector<zelm::RasterBandHistogram<T>>& histograms) {
     zelm::RasterReader<T>& typed = Typed<T>();
     CheckWritable("store histograms");
+    const zelm::Array<zelm::RasterBandHistogram<T>> given = ToArray(histograms);
+    for (std::size_t i = 0; i < histograms.size(); ++i)
+        if (!HaveSameCounts(given.data[i], histograms[i])) throw std::bad_alloc();
     const std::size_t before = typed.GetHistograms().shape.elements;
-    typed.SetHistograms(ToArray(histograms));
-    if (typed.GetHistograms().shape.elements != before + histograms.size())
-        throw Error(name, "store histograms", "they did not reach the file (disk full?)");
+    Store([&] {
+        typed.SetHistograms(given);
+        const zelm::Array<zelm::RasterBandHistogram<T>> stored = typed.GetHistograms();
+        bool same = stored.shape.elements == before + histograms.size();
+        for (std::size_t i = 0; same && i < histograms.size(); ++i)
+            same = HaveSameCounts(stored.data[before + i], histograms[i]);
+        if (!same)
+            throw Error(name, "store histograms", "they did not reach the file (disk full?)");
+    });
 }
 
 // A copy of this library's making: the module's own palette must not outlive the module.
@@ -459,10 +498,12 @@ zelm::PalettePtr Raster::BandPalette(std::uint32_t band) const {
 void Raster::SetBandPalette(std::uint32_t band, const zelm::Palette& palette) {
     CheckWritable("store a palette");
     if (band >= Bands()) throw Error(name, "store a palette", "there is no such band");
-    Visit([&](auto& typed) { typed.SetPalette(band, palette); });
-    const zelm::PalettePtr stored = BandPalette(band);
-    if ((stored ? stored->nextIndex : 0) != palette.nextIndex)
-        throw Error(name, "store a palette", "it did not reach the file (disk full?)");
+    Store([&] {
+        Visit([&](auto& typed) { typed.SetPalette(band, palette); });
+        const zelm::PalettePtr stored = BandPalette(band);
+        if ((stored ? stored->nextIndex : 0) != palette.nextIndex)
+            throw Error(name, "store a palette", "it did not reach the file (disk full?)");
+    });
 }
 
 #define ZMC_X(type, word, code)                                                           \

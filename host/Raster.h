@@ -28,7 +28,8 @@ namespace zmchost {
 
 class Raster {
 public:
-    // Opens a pyramid file, for writing too where the file allows it.
+    // Opens a pyramid file, for writing too where the file allows it. What a store with a copy
+    // (KeepCopies) left behind when it was cut off is put in order first; RecoveryNote tells of it.
     static Raster Open(ModulePtr module, const std::string& file);
 
     // Lays out a new pyramid with the levels from 0 to maxLevel, replacing a file of that name. Of
@@ -43,6 +44,8 @@ public:
     static Raster OfMemory(ModulePtr module, void* samples, const zelm::RasterProps& props);
 
     const std::string& Name() const { return name; }
+    // What opening found of a store that was cut off, for people; empty as a rule.
+    const std::string& RecoveryNote() const { return recoveryNote; }
     const zelm::RasterProps& Props() const { return props; }
     std::uint32_t Bands() const { return props.bands; }
     std::uint32_t PixelType() const { return props.pixelType; }
@@ -100,6 +103,12 @@ public:
         Write(level, window, AllBands(), pixels.data());
     }
 
+    // From now on each of the three stores below keeps a copy of what was stored before in a file
+    // beside the pyramid (MetadataCopy.h) until it has reached the disk, and returns only then. A
+    // process that dies or a power failure then loses nothing of the old statistics. Off at first:
+    // it costs some flushes of the disk for each store.
+    void KeepCopies(bool keep) { keepsCopies = keep; }
+
     bool HasStatistics(std::uint32_t band) const;
     // The record of a band. Throws if there is none.
     template <class T>
@@ -145,6 +154,8 @@ private:
                    std::span<const std::uint32_t> bands, const unsigned char* pixels);
     template <class T>
     zelm::RasterReader<T>& Typed() const;
+    template <class Action>
+    void Store(Action action);
 
     // In this order: the module goes last.
     ModulePtr module;
@@ -155,6 +166,8 @@ private:
     std::optional<PyramidHeader> header;
     std::uint32_t minLevel = 0;
     std::uint32_t maxLevel = 0;
+    std::string recoveryNote;
+    bool keepsCopies = false;
 };
 
 }  // namespace zmchost

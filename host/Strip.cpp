@@ -48,27 +48,29 @@ StripStore::StripStore(MemoryMeter& countingMeter, std::uint32_t firstLevel,
       width(baseWidth),
       pixelBytes(sampleBytesOfPixel),
       maskBytes(maskBytesOfPixel),
-      idle(lastLevel - firstLevel + 1) {}
+      shelves(lastLevel - firstLevel + 1) {}
 
 StripStore::Loan StripStore::Take(std::uint32_t level) {
     {
         const std::lock_guard<std::mutex> lock(mutex);
-        auto& shelf = idle[level - baseLevel];
-        if (!shelf.empty()) {
-            Loan loan(shelf.back().release(), Return{this});
-            shelf.pop_back();
+        Shelf& shelf = shelves[level - baseLevel];
+        if (!shelf.idle.empty()) {
+            Loan loan(shelf.idle.back().release(), Return{this});
+            shelf.idle.pop_back();
             return loan;
         }
+        shelf.idle.reserve(shelf.made + 1);
+        ++shelf.made;
     }
     const std::size_t capacity = static_cast<std::size_t>(width >> (level - baseLevel)) * kTileSide;
     auto strip = std::make_unique<Strip>(meter, level, capacity, pixelBytes, maskBytes, kTileSide);
     return Loan(strip.release(), Return{this});
 }
 
-void StripStore::Give(Strip* strip) {
+void StripStore::Give(Strip* strip) noexcept {
     std::unique_ptr<Strip> returned(strip);
     const std::lock_guard<std::mutex> lock(mutex);
-    idle[returned->level - baseLevel].push_back(std::move(returned));
+    shelves[returned->level - baseLevel].idle.push_back(std::move(returned));
 }
 
 }  // namespace zmchost

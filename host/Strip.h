@@ -95,7 +95,13 @@ public:
     Loan Take(std::uint32_t level);
 
 private:
-    void Give(Strip* strip);
+    struct Shelf {
+        std::vector<std::unique_ptr<Strip>> idle;  // with room for all that were made
+        std::size_t made = 0;
+    };
+
+    // Takes no memory: strips come back while a failure is under way too.
+    void Give(Strip* strip) noexcept;
 
     MemoryMeter& meter;
     std::uint32_t baseLevel;
@@ -103,7 +109,7 @@ private:
     std::uint32_t pixelBytes;
     std::uint32_t maskBytes;
     std::mutex mutex;
-    std::vector<std::vector<std::unique_ptr<Strip>>> idle;  // by level above the base
+    std::vector<Shelf> shelves;  // by level above the base
 };
 
 }  // namespace zmchost

@@ -1,9 +1,9 @@
 // TileStore: the tiles of the file that is being built.
 //
 // Writes rows of tiles from strips and reads windows of finished levels back. The module says true
-// for a write that the disk refused, so a sum of every tile's words is kept: what was lost reads as
-// zeros, and makes the sum of what is in the file smaller. Reads and writes may come from several
-// threads; one at a time goes on, as the module wants it.
+// for a write that the disk refused, so every tile is read back at once, while the system still
+// holds it in memory, and compared. Reads and writes may come from several threads; one at a time
+// goes on, as the module wants it.
 #ifndef ZMC_HOST_TILESTORE_H
 #define ZMC_HOST_TILESTORE_H
 
@@ -30,11 +30,12 @@ class TileStore {
 public:
     TileStore(TileStoreSetup storeSetup, PixelWork& pixelWork, MemoryMeter& meter);
 
-    // Bytes that an object holds beside its sums.
+    // Bytes that an object holds.
     static std::uint64_t WorkMemory(const TileStoreSetup& setup);
 
     // Writes the tiles of columns [begin, end) of the strip's level, which the strip holds from
-    // column `stripBegin` on. Its lines are whole rows of tiles, and so are the columns.
+    // column `stripBegin` on. Its lines are whole rows of tiles, and so are the columns. Throws
+    // Error for a tile that is not in the file afterwards.
     void Write(const Strip& strip, std::uint32_t stripBegin, std::uint32_t begin,
                std::uint32_t end);
 
@@ -44,9 +45,6 @@ public:
     // Reads one whole tile; the buffer has room for a full one.
     void ReadTile(std::uint32_t level, const Window& tile, std::byte* pixels);
 
-    // Reads every tile again and compares the sums. Throws Error where one differs.
-    void CompareAll();
-
     Window Tile(std::uint32_t level, std::uint32_t column, std::uint32_t row) const;
     std::uint32_t TilesAcross(std::uint32_t level) const;
     std::uint32_t TilesDown(std::uint32_t level) const;
@@ -54,19 +52,12 @@ public:
 private:
     void WriteTile(const Strip& strip, std::uint32_t stripBegin, std::uint32_t column,
                    std::uint32_t row);
-    std::uint64_t& Sum(std::uint32_t level, std::uint32_t column, std::uint32_t row) {
-        return sums[level][std::size_t{row} * TilesAcross(level) + column];
-    }
-    std::size_t TileBytes(const Window& tile) const {
-        return std::size_t{tile.width} * tile.height * setup.pixelBytes;
-    }
 
     TileStoreSetup setup;
     PixelWork& work;
     std::mutex mutex;
-    MeteredBytes buffer;
+    MeteredBytes buffer, readBack;
     std::vector<unsigned char> cleanMask;
-    std::vector<std::vector<std::uint64_t>> sums;  // by level and tile
 };
 
 }  // namespace zmchost

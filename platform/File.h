@@ -33,8 +33,12 @@ public:
     std::size_t ReadAt(std::uint64_t offset, void* buffer, std::size_t size);
     std::size_t WriteAt(std::uint64_t offset, const void* buffer, std::size_t size);
 
-    // Size of the file in bytes; 0 if it cannot be told.
+    // Size of the file in bytes. kUnknownSize if the system does not tell: larger than any file,
+    // so that nothing takes a file that cannot be looked at for an empty one.
+    static constexpr std::uint64_t kUnknownSize = ~std::uint64_t{0};
     std::uint64_t Size() const;
+    // The same; false, with `size` as it was, if the system does not tell.
+    bool TellSize(std::uint64_t& size) const;
     // Makes the file end there; what lay beyond is gone. False, with nothing changed, on failure.
     bool Truncate(std::uint64_t size);
     // Waits until what was written has reached the disk; false if that failed.

@@ -20,6 +20,8 @@ struct FileStatus {
     // This process may not write it, or nobody may: the second counts for the superuser too.
     bool readOnly = false;
     std::uint64_t size = 0;  // bytes, of a regular file
+    // What tells the file from all others of its file system while it exists, whatever its name.
+    std::uint64_t number = 0;
 };
 
 std::string LastErrorText();
@@ -42,6 +44,8 @@ std::vector<std::string> ListFolder(const std::string& folder);
 bool CreateNewFile(const std::string& path);
 // Gives a file another name, replacing what bears it, in one step that others see whole.
 bool RenameFile(const std::string& from, const std::string& to);
+// The same, and fails if anything bears that name.
+bool RenameToNewName(const std::string& from, const std::string& to);
 bool RemoveEntry(const std::string& path);
 
 // Waits until a file's bytes, or a folder's names, have reached the disk.
@@ -56,13 +60,9 @@ bool ReserveSpace(const std::string& path, std::uint64_t size);
 // Gives back what was reserved and not used.
 bool ReleaseReserve(const std::string& path);
 
-// A stretch of a file that holds nothing: it reads as zeros and was never written.
-struct Hole {
-    std::uint64_t begin = 0;
-    std::uint64_t end = 0;
-};
-// The holes of a file; none where the file system does not tell, or when the file cannot be read.
-std::vector<Hole> FindHoles(const std::string& path);
+// What tells this run of the operating system from those before and after: as long as it is the
+// same, the power did not fail, and files have all that was written to them. Empty if not known.
+std::string SystemRun();
 
 std::uint64_t CurrentProcess();
 bool ProcessAlive(std::uint64_t process);

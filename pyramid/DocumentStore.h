@@ -34,12 +34,12 @@ template <class File>
 class DocumentStore {
 public:
     // The document is to stand at `start`. What the file has behind that is the old one.
-    DocumentStore(File& target, std::uint64_t start)
-        : file(target), offset(start), oldSize(target.Size()) {}
+    DocumentStore(File& target, std::uint64_t start) : file(target), offset(start) {}
 
     // False if it could not be written whole.
     bool Write(const unsigned char* text, std::size_t length) {
-        if (length == 0) return false;
+        // Not knowing where the file ends, nothing could be taken back.
+        if (length == 0 || !file.TellSize(oldSize)) return false;
         KeepOldText();
         if (!Grow(offset + length)) return CutBack(), false;
         if (file.WriteAt(offset, &kUnfinishedDocument, 1) != 1) return CutBack(), false;
@@ -81,7 +81,10 @@ private:
     }
 
     // True if the file ends where it did.
-    bool CutBack() { return file.Size() <= oldSize || file.Truncate(oldSize); }
+    bool CutBack() {
+        std::uint64_t size = 0;
+        return file.TellSize(size) && (size == oldSize || file.Truncate(oldSize));
+    }
 
     // The mark stands. It goes last, so that this can be interrupted as well.
     void TakeBack() {
@@ -90,7 +93,8 @@ private:
             return;
         }
         if (!oldText) return;
-        if (!CutBack() && !Blank(oldSize, file.Size())) return;
+        std::uint64_t size = 0;
+        if (!CutBack() && !(file.TellSize(size) && Blank(oldSize, size))) return;
         const std::size_t rest = OldLength() - 1;
         if (file.WriteAt(offset + 1, oldText.get() + 1, rest) == rest)
             file.WriteAt(offset, oldText.get(), 1);
@@ -100,7 +104,7 @@ private:
 
     File& file;
     const std::uint64_t offset;
-    const std::uint64_t oldSize;
+    std::uint64_t oldSize = 0;
     std::unique_ptr<unsigned char[]> oldText;
 };
 

@@ -36,10 +36,12 @@ struct DocumentText {
         DocumentText text;
         for (int attempt = 0; attempt < kAttempts; ++attempt) {
             if (attempt >= kPatience) std::this_thread::yield();
-            const std::uint64_t end = file.Size();
-            if (end <= offset || end - offset > kMaxDocumentBytes || !text.Resize(end - offset))
+            std::uint64_t end = 0, endAfter = 0;
+            if (!file.TellSize(end) || end <= offset || end - offset > kMaxDocumentBytes ||
+                !text.Resize(end - offset))
                 return DocumentText();
-            const bool settled = text.Read(file, offset) && file.Size() == end;
+            const bool settled =
+                text.Read(file, offset) && file.TellSize(endAfter) && endAfter == end;
             // The mark of a store under way is worth another look; one that stays is an answer.
             if (settled && (!text.IsUnfinished() || attempt + 1 >= kPatience)) return text;
         }

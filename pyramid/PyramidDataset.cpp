@@ -74,7 +74,9 @@ bool PyramidDataset::ReadFixedFields() {
         return false;
     TileDataStart = DecodeUint64(fields + kOffsetsOffset);
     MetaDocumentOffset = DecodeUint64(fields + kOffsetsOffset + 8);
-    return TileDataStart >= kHeaderOffset && TileDataStart <= File->Size();
+    const std::uint64_t size = File->Size();
+    return TileDataStart >= kHeaderOffset && TileDataStart <= size &&
+           size != platform::File::kUnknownSize;
 }
 
 bool PyramidDataset::ReadHeader() {
@@ -112,19 +114,20 @@ void PyramidDataset::CreateFile(std::uint32_t levelMin, std::uint32_t levelMax) 
 }
 
 // Writes everything in front of the tile data, with offsets that are not known yet; the file then
-// ends with its header document.
+// ends with its header document. What a failure leaves is refused by everybody who opens it.
 bool PyramidDataset::WriteHeader() {
     TileDataStart = MetaDocumentOffset = 0;
     const unsigned char noOffsets[kOffsetsSize] = {};
-    File->WriteAt(0, kMagic, sizeof kMagic);
-    File->WriteAt(kOffsetsOffset, noOffsets, sizeof noOffsets);
     HeaderDocument = PyramidXMLDocument::Make();
-    if (!HeaderDocument) return false;
-    HeaderDocument->CreateDocument();
-    HeaderDocument->WriteHeaderElement(MakeHeaderRecord());
-    HeaderDocument->SerializeDocument(*File, kHeaderOffset);
+    const bool written = File->WriteAt(0, kMagic, sizeof kMagic) == sizeof kMagic &&
+                         File->WriteAt(kOffsetsOffset, noOffsets, kOffsetsSize) == kOffsetsSize &&
+                         HeaderDocument && HeaderDocument->CreateDocument() &&
+                         HeaderDocument->WriteHeaderElement(MakeHeaderRecord()) &&
+                         HeaderDocument->SerializeDocument(*File, kHeaderOffset);
     HeaderDocument.reset();
-    TileDataStart = std::max(File->Size(), kHeaderOffset);
+    const std::uint64_t end = File->Size();
+    if (!written || end == platform::File::kUnknownSize) return false;
+    TileDataStart = end;
     return true;
 }
 
@@ -140,7 +143,7 @@ bool PyramidDataset::CheckPyramidComplete() {
 // Files of version 1.0 never do, however long they are.
 bool PyramidDataset::CountsAsComplete(std::uint64_t fileSize) const {
     const bool outdated = VersionMajor == 0 || (VersionMajor == 1 && VersionMinor == 0);
-    return !outdated && fileSize >= TileDataEnd;
+    return !outdated && fileSize >= TileDataEnd && fileSize != platform::File::kUnknownSize;
 }
 
 void PyramidDataset::DeleteFile() {

@@ -161,14 +161,18 @@ void PyramidDataset::ReadMetaTree() {
         MetaDocument = PyramidXMLDocument::Make();
         if (MetaDocument) MetaDocument->ParseTree(*MetaSource);
         metaTreeLost = !MetaDocument;
-    } else if (File && File->Size() > MetaDocumentOffset) {
-        // There is a document, and it cannot be had: without a tree nothing will overwrite it.
-        MetaDocument = PyramidXMLDocument::Make();
-        metaTreeLost = !MetaDocument;
+        return;
     }
+    std::uint64_t size = 0;
+    if (!File || (File->TellSize(size) && size <= MetaDocumentOffset)) return;
+    // There is, or may be, a document, and it cannot be had: without a tree nothing overwrites it.
+    MetaDocument = PyramidXMLDocument::Make();
+    metaTreeLost = !MetaDocument;
 }
 
 PyramidXMLDocument* PyramidDataset::EnsureMetaDocument() {
+    // An open that could not tell the size of the file has not looked for one.
+    if (!MetaDocument && !metaTreeLost) ReadMetaTree();
     if (!MetaDocument && !metaTreeLost) {
         MetaDocument = PyramidXMLDocument::Make();
         if (MetaDocument) MetaDocument->CreateDocument();

@@ -254,7 +254,12 @@ void PyramidXMLDocument::RemoveFrom(std::uint32_t position) {
     for (std::uint32_t count = RecordCount(); count > position; --count) {
         xercesc::DOMElement* last = root->getLastElementChild();
         elementCount -= 1 + last->getChildElementCount();
-        root->removeChild(last)->release();
+        xercesc::DOMNode* const removed = root->removeChild(last);
+        try {
+            removed->release();
+        } catch (...) {
+            // Giving memory back takes some. The document keeps what is not given back, unseen.
+        }
     }
 }
 

@@ -75,9 +75,8 @@ public:
 
     bool Read(unsigned char* buffer) {
         if (!planar && allInOrder && IsWholeTile()) {
-            dataset.File->ReadAt(PlaneStart(0, FirstTileX(), FirstTileY()), buffer,
-                                 rect.width * std::uint64_t{rect.height} * tilePixelBytes);
-            return true;
+            std::uint64_t got = 0;
+            return Read(DirectStart(), buffer, PixelCount() * tilePixelBytes, got);
         }
         return VisitPieces(geometry, rect,
                            [&](const TilePiece& piece) { return ReadPiece(piece, buffer); });
@@ -137,9 +136,18 @@ private:
                           std::uint64_t{geometry.tilesAcross} * tileY + tileX];
     }
 
-    void ReadOrZero(std::uint64_t offset, unsigned char* target, std::uint64_t size) const {
-        const std::uint64_t got = dataset.File->ReadAt(offset, target, size);
-        if (got < size) std::memset(target + got, 0, size - got);
+    // False if the disk did not give what the file has; what lies behind its end is no failure.
+    bool Read(std::uint64_t offset, unsigned char* target, std::uint64_t size,
+              std::uint64_t& got) const {
+        got = dataset.File->ReadAt(offset, target, size);
+        return got == size || offset + got >= dataset.File->Size();
+    }
+
+    bool ReadOrZero(std::uint64_t offset, unsigned char* target, std::uint64_t size) const {
+        std::uint64_t got = 0;
+        const bool read = Read(offset, target, size, got);
+        std::memset(target + got, 0, size - got);
+        return read;
     }
 
     std::uint64_t BufferOffset(const TilePiece& piece, std::uint32_t row) const {
@@ -160,8 +168,8 @@ private:
         return {buffer, rect.width * bufferPixelBytes, bufferPixelBytes, sampleBytes};
     }
 
-    // Calls run(firstRow, rows) for runs of a piece's rows whose data, of `count` planes, fit in
-    // the work space.
+    // Calls run(firstRow, rows, work) for runs of a piece's rows whose data, of `count` planes, fit
+    // in the work space, until one gives false.
     template <class Run>
     bool VisitRuns(std::uint32_t rows, std::uint64_t rowBytes, std::uint32_t count,
                    Run&& run) const {
@@ -170,7 +178,7 @@ private:
         unsigned char* const work = dataset.WorkSpace(step * rowBytes * count);
         if (!work) return false;
         for (std::uint32_t row = 0; row < rows; row += step)
-            run(row, std::min(step, rows - row), work);
+            if (!run(row, std::min(step, rows - row), work)) return false;
         return true;
     }
 
@@ -182,23 +190,22 @@ private:
 
     bool ReadPiece(const TilePiece& piece, unsigned char* buffer) {
         const std::uint64_t rowBytes = piece.tileWidth * tilePixelBytes;
-        if (LiesAlike(piece)) {
-            ReadOrZero(PlaneStart(0, piece.tileX, piece.tileY) + piece.firstRow * rowBytes,
-                       buffer + BufferOffset(piece, 0), piece.rows * rowBytes);
-            return true;
-        }
+        if (LiesAlike(piece))
+            return ReadOrZero(PlaneStart(0, piece.tileX, piece.tileY) + piece.firstRow * rowBytes,
+                              buffer + BufferOffset(piece, 0), piece.rows * rowBytes);
         if (HasLongRows(piece)) return ReadLongRows(piece, buffer);
         for (std::uint32_t first = 0; first < planes; first += kPlanesTogether) {
             const std::uint32_t count = std::min(planes - first, kPlanesTogether);
             const bool done =
                 VisitRuns(piece.rows, rowBytes, count,
                           [&](std::uint32_t row, std::uint32_t rows, unsigned char* work) {
-                              ReadRun(piece, first, count, row, rows, work);
+                              if (!ReadRun(piece, first, count, row, rows, work)) return false;
                               unsigned char* const target = buffer + BufferOffset(piece, row) +
                                                             first * std::uint64_t{sampleBytes};
                               MoveSamples(TileSide<const unsigned char>(work, piece, rows),
                                           BufferSide(target), rows, piece.columns,
                                           planar ? count : bands, sampleBytes);
+                              return true;
                           });
             if (!done) return false;
         }
@@ -212,63 +219,69 @@ private:
     }
 
     // Calls run(offset in the file, offset in the buffer, pixels) for runs of a piece's pixels, of
-    // one row each and at most as many as given.
+    // one row each and at most as many as given, until one gives false.
     template <class Run>
-    void VisitPixels(const TilePiece& piece, std::uint64_t most, Run&& run) const {
+    bool VisitPixels(const TilePiece& piece, std::uint64_t most, Run&& run) const {
         const std::uint64_t tile = PlaneStart(0, piece.tileX, piece.tileY);
         const auto step = static_cast<std::uint32_t>(std::min<std::uint64_t>(most, piece.columns));
         for (std::uint32_t row = 0; row < piece.rows; ++row) {
             const std::uint64_t line = std::uint64_t{piece.firstRow} + row;
             const std::uint64_t first = line * piece.tileWidth + piece.firstColumn;
             for (std::uint32_t column = 0; column < piece.columns; column += step)
-                run(tile + (first + column) * tilePixelBytes,
-                    BufferOffset(piece, row) + column * bufferPixelBytes,
-                    std::min(step, piece.columns - column));
+                if (!run(tile + (first + column) * tilePixelBytes,
+                         BufferOffset(piece, row) + column * bufferPixelBytes,
+                         std::min(step, piece.columns - column)))
+                    return false;
         }
-    }
-
-    // Calls move(offset in the file, offset in the buffer) for each listed sample of a piece.
-    template <class Move>
-    void VisitSamples(const TilePiece& piece, Move&& move) const {
-        VisitPixels(piece, 1, [&](std::uint64_t pixel, std::uint64_t inBuffer, std::uint32_t) {
-            for (std::uint32_t i = 0; i < bands; ++i)
-                move(pixel + static_cast<std::uint64_t>(list[i]) * sampleBytes,
-                     inBuffer + std::uint64_t{i} * sampleBytes);
-        });
-    }
-
-    bool ReadLongRows(const TilePiece& piece, unsigned char* buffer) const {
-        if (allInOrder) {
-            VisitPixels(piece, piece.columns,
-                        [&](std::uint64_t start, std::uint64_t inBuffer, std::uint32_t pixels) {
-                            ReadOrZero(start, buffer + inBuffer, pixels * tilePixelBytes);
-                        });
-            return true;
-        }
-        if (tilePixelBytes > kRunBytes) {
-            VisitSamples(piece, [&](std::uint64_t sample, std::uint64_t inBuffer) {
-                ReadOrZero(sample, buffer + inBuffer, sampleBytes);
-            });
-            return true;
-        }
-        unsigned char* const work = dataset.WorkSpace(kRunBytes);
-        if (!work) return false;
-        VisitPixels(piece, kRunBytes / tilePixelBytes,
-                    [&](std::uint64_t start, std::uint64_t inBuffer, std::uint32_t pixels) {
-                        ReadOrZero(start, work, pixels * tilePixelBytes);
-                        MoveSamples({work, 0, tilePixelBytes, sampleBytes, list},
-                                    BufferSide(buffer + inBuffer), 1, pixels, bands, sampleBytes);
-                    });
         return true;
     }
 
-    void ReadRun(const TilePiece& piece, std::uint32_t first, std::uint32_t count,
+    // Calls move(offset in the file, offset in the buffer) for each listed sample of a piece, until
+    // one gives false.
+    template <class Move>
+    bool VisitSamples(const TilePiece& piece, Move&& move) const {
+        return VisitPixels(
+            piece, 1, [&](std::uint64_t pixel, std::uint64_t inBuffer, std::uint32_t) {
+                for (std::uint32_t i = 0; i < bands; ++i)
+                    if (!move(pixel + static_cast<std::uint64_t>(list[i]) * sampleBytes,
+                              inBuffer + std::uint64_t{i} * sampleBytes))
+                        return false;
+                return true;
+            });
+    }
+
+    bool ReadLongRows(const TilePiece& piece, unsigned char* buffer) const {
+        if (allInOrder)
+            return VisitPixels(
+                piece, piece.columns,
+                [&](std::uint64_t start, std::uint64_t inBuffer, std::uint32_t pixels) {
+                    return ReadOrZero(start, buffer + inBuffer, pixels * tilePixelBytes);
+                });
+        if (tilePixelBytes > kRunBytes)
+            return VisitSamples(piece, [&](std::uint64_t sample, std::uint64_t inBuffer) {
+                return ReadOrZero(sample, buffer + inBuffer, sampleBytes);
+            });
+        unsigned char* const work = dataset.WorkSpace(kRunBytes);
+        return work &&
+               VisitPixels(piece, kRunBytes / tilePixelBytes,
+                           [&](std::uint64_t start, std::uint64_t inBuffer, std::uint32_t pixels) {
+                               if (!ReadOrZero(start, work, pixels * tilePixelBytes)) return false;
+                               MoveSamples({work, 0, tilePixelBytes, sampleBytes, list},
+                                           BufferSide(buffer + inBuffer), 1, pixels, bands,
+                                           sampleBytes);
+                               return true;
+                           });
+    }
+
+    bool ReadRun(const TilePiece& piece, std::uint32_t first, std::uint32_t count,
                  std::uint32_t row, std::uint32_t rows, unsigned char* work) const {
         const std::uint64_t rowBytes = piece.tileWidth * tilePixelBytes;
         const std::uint64_t start = (std::uint64_t{piece.firstRow} + row) * rowBytes;
         for (std::uint32_t i = 0; i < count; ++i)
-            ReadOrZero(PlaneStart(first + i, piece.tileX, piece.tileY) + start,
-                       work + i * rows * rowBytes, rows * rowBytes);
+            if (!ReadOrZero(PlaneStart(first + i, piece.tileX, piece.tileY) + start,
+                            work + i * rows * rowBytes, rows * rowBytes))
+                return false;
+        return true;
     }
 
     std::uint64_t DirectStart() const { return PlaneStart(0, FirstTileX(), FirstTileY()); }
@@ -288,11 +301,12 @@ private:
         return VisitPixelRuns(
             tilePixelBytes, [&](std::uint64_t pixel, std::uint32_t count, unsigned char* work) {
                 const std::uint64_t offset = pixel * tilePixelBytes;
-                ReadOrZero(start + offset, work, count * tilePixelBytes);
+                if (!ReadOrZero(start + offset, work, count * tilePixelBytes)) return false;
                 const unsigned char* const source = buffer + pixel * bufferPixelBytes;
                 MoveSamples(BufferSide(source), {work, 0, tilePixelBytes, sampleBytes, list}, 1,
                             count, bands, sampleBytes);
                 dataset.File->WriteAt(behind + offset, work, count * tilePixelBytes);
+                return true;
             });
     }
 
@@ -303,7 +317,7 @@ private:
         if (!work) return false;
         for (std::uint64_t offset = start; offset < behind; offset += kRunBytes) {
             const std::uint64_t size = std::min(behind - offset, kRunBytes);
-            ReadOrZero(offset, work, size);
+            if (!ReadOrZero(offset, work, size)) return false;
             dataset.File->WriteAt(behind + (offset - start), work, size);
         }
         for (std::uint64_t pixel = 0; pixel < PixelCount(); ++pixel)
@@ -316,7 +330,8 @@ private:
         return true;
     }
 
-    // All pixels of the rectangle in buffer order, in runs that fit in the work space.
+    // All pixels of the rectangle in buffer order, in runs that fit in the work space, until one
+    // gives false.
     template <class Run>
     bool VisitPixelRuns(std::uint64_t workBytesPerPixel, Run&& run) {
         const std::uint64_t total = PixelCount();
@@ -325,7 +340,8 @@ private:
         unsigned char* const work = dataset.WorkSpace(step * workBytesPerPixel);
         if (!work) return false;
         for (std::uint64_t pixel = 0; pixel < total; pixel += step)
-            run(pixel, static_cast<std::uint32_t>(std::min(step, total - pixel)), work);
+            if (!run(pixel, static_cast<std::uint32_t>(std::min(step, total - pixel)), work))
+                return false;
         return true;
     }
 
@@ -341,6 +357,7 @@ private:
                     MoveSamples(BufferSide(source), {work, 0, sampleBytes, planeBytes}, 1, pixels,
                                 count, sampleBytes);
                     WriteRun(first, count, pixel * sampleBytes, planeBytes, work);
+                    return true;
                 });
             if (!done) return false;
         }
@@ -363,40 +380,41 @@ private:
         return VisitRuns(
             piece.rows, rowBytes, 1,
             [&](std::uint32_t row, std::uint32_t rows, unsigned char* work) {
-                if (!replaced) ReadRun(piece, 0, 1, row, rows, work);
+                // Without the old samples around the new ones these would be lost.
+                if (!replaced && !ReadRun(piece, 0, 1, row, rows, work)) return false;
                 MoveSamples(BufferSide(buffer + BufferOffset(piece, row)),
                             TileSide(work, piece, rows), rows, piece.columns, bands, sampleBytes);
                 const std::uint64_t start = (std::uint64_t{piece.firstRow} + row) * rowBytes;
                 dataset.File->WriteAt(tile + start, work, rows * rowBytes);
+                return true;
             });
     }
 
     bool MergeLongRows(const TilePiece& piece, const unsigned char* buffer) {
         platform::File& file = *dataset.File;
-        if (allInOrder) {
-            VisitPixels(piece, piece.columns,
-                        [&](std::uint64_t start, std::uint64_t inBuffer, std::uint32_t pixels) {
-                            file.WriteAt(start, buffer + inBuffer, pixels * tilePixelBytes);
-                        });
-            return true;
-        }
-        if (tilePixelBytes > kRunBytes) {
-            VisitSamples(piece, [&](std::uint64_t sample, std::uint64_t inBuffer) {
+        if (allInOrder)
+            return VisitPixels(
+                piece, piece.columns,
+                [&](std::uint64_t start, std::uint64_t inBuffer, std::uint32_t pixels) {
+                    file.WriteAt(start, buffer + inBuffer, pixels * tilePixelBytes);
+                    return true;
+                });
+        if (tilePixelBytes > kRunBytes)
+            return VisitSamples(piece, [&](std::uint64_t sample, std::uint64_t inBuffer) {
                 file.WriteAt(sample, buffer + inBuffer, sampleBytes);
+                return true;
             });
-            return true;
-        }
         unsigned char* const work = dataset.WorkSpace(kRunBytes);
-        if (!work) return false;
-        VisitPixels(piece, kRunBytes / tilePixelBytes,
-                    [&](std::uint64_t start, std::uint64_t inBuffer, std::uint32_t pixels) {
-                        ReadOrZero(start, work, pixels * tilePixelBytes);
-                        MoveSamples(BufferSide(buffer + inBuffer),
-                                    {work, 0, tilePixelBytes, sampleBytes, list}, 1, pixels, bands,
-                                    sampleBytes);
-                        file.WriteAt(start, work, pixels * tilePixelBytes);
-                    });
-        return true;
+        return work &&
+               VisitPixels(piece, kRunBytes / tilePixelBytes,
+                           [&](std::uint64_t start, std::uint64_t inBuffer, std::uint32_t pixels) {
+                               if (!ReadOrZero(start, work, pixels * tilePixelBytes)) return false;
+                               MoveSamples(BufferSide(buffer + inBuffer),
+                                           {work, 0, tilePixelBytes, sampleBytes, list}, 1, pixels,
+                                           bands, sampleBytes);
+                               file.WriteAt(start, work, pixels * tilePixelBytes);
+                               return true;
+                           });
     }
 
     // A merged tile exists as a whole: where the file was shorter, the rest of it reads as zeros.

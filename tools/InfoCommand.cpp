@@ -3,11 +3,11 @@
 #include <cstdio>
 
 #include "core/PixelVocabulary.h"
+#include "host/MetadataDocument.h"
 #include "host/PyramidFileInfo.h"
 #include "tools/Command.h"
 #include "tools/HistogramBars.h"
 #include "tools/RasterView.h"
-#include "tools/Verification.h"
 
 namespace zmctools {
 namespace {
@@ -133,7 +133,7 @@ Json Describe(const std::string& file) {
     // Of a type without a reader the header is all that can be told.
     if (zelm::CheckedPixelType(header.pixelType) == 0 || !info.HasMetadataDocument())
         return document;
-    if (const std::string wrong = JudgeMetadata(file, info); !wrong.empty()) {
+    if (const std::string wrong = zmchost::JudgeMetadata(file, info.header); !wrong.empty()) {
         Warn(file + ": warning: " + wrong + "; statistics, histograms and palettes are not shown");
         return document;
     }

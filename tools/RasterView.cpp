@@ -3,10 +3,12 @@
 #include <algorithm>
 #include <filesystem>
 #include <fstream>
+#include <set>
 
 #include "core/PixelVocabulary.h"
 #include "gdal/Dataset.h"
 #include "gdal/GdalRasterSource.h"
+#include "host/MetadataCopy.h"
 #include "tools/GdalWorld.h"
 #include "tools/Interrupt.h"
 #include "tools/Message.h"
@@ -57,6 +59,12 @@ private:
     zelm::RasterProps props = source.Props();
 };
 
+// Once for each file: a copy that cannot be used is found again by whoever looks next.
+void TellRecovery(const std::string& name, const std::string& text) {
+    static std::set<std::string> told;
+    if (!text.empty() && told.insert(name).second) Warn(name + ": warning: " + text);
+}
+
 std::uint64_t LineBytes(const RasterView& view, const Selection& selection) {
     return std::uint64_t{selection.window.width} * selection.bands.size() *
            zelm::PixelSize(view.PixelType());
@@ -78,15 +86,22 @@ bool IsPyramidFile(const std::string& name) {
     return zmchost::LooksLikePyramid({start, static_cast<std::size_t>(file.gcount())});
 }
 
-zmchost::PyramidFileInfo ReadLayout(const std::string& name) {
+void CheckIsFile(const std::string& name) {
     std::error_code ignored;
     if (!std::filesystem::exists(name, ignored)) throw Failure(name, "there is no such file");
     if (std::filesystem::is_directory(name, ignored)) throw Failure(name, "it is a folder");
+}
+
+zmchost::PyramidFileInfo ReadLayout(const std::string& name) {
+    CheckIsFile(name);
+    TellRecovery(name, zmchost::RecoverMetadata(name).text);
     return zmchost::ReadPyramidFileInfo(name);
 }
 
 zmchost::Raster OpenPyramid(const std::string& name) {
-    return zmchost::Raster::Open(zmcgdal::SharedModule(), name);
+    zmchost::Raster raster = zmchost::Raster::Open(zmcgdal::SharedModule(), name);
+    TellRecovery(name, raster.RecoveryNote());
+    return raster;
 }
 
 std::unique_ptr<RasterView> OpenView(const std::string& name) {

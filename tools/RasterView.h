@@ -40,7 +40,11 @@ public:
 // True if the file of that name begins like a pyramid.
 bool IsPyramidFile(const std::string& name);
 
-// The layout of a pyramid file. Throws Failure, or what its reader throws.
+// Throws Failure if there is no file of that name.
+void CheckIsFile(const std::string& name);
+
+// The layout of a pyramid file, once statistics whose store was cut off are put in order. Throws
+// Failure, or what its reader throws.
 zmchost::PyramidFileInfo ReadLayout(const std::string& name);
 
 // Opens a pyramid file, any other raster, or whichever of both the name tells.

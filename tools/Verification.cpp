@@ -1,47 +1,13 @@
 #include "tools/Verification.h"
 
-#include <cpl_error.h>
-#include <cpl_minixml.h>
-
-#include <fstream>
-
 #include "core/PixelVocabulary.h"
+#include "host/MetadataDocument.h"
 #include "tools/Interrupt.h"
 #include "tools/Message.h"
 #include "tools/SampleDifferences.h"
 
 namespace zmctools {
 namespace {
-
-// A document that is longer is none of a raster: 65,536 colours take 3 MB.
-constexpr std::uint64_t kMaxDocument = std::uint64_t{256} << 20;
-
-std::string ReadDocument(const std::string& file, const zmchost::PyramidFileInfo& info) {
-    const std::uint64_t size = info.header.fileSize - info.MetaDocumentOffset();
-    std::string text(static_cast<std::size_t>(size), '\0');
-    std::ifstream stream(file, std::ios::binary);
-    stream.seekg(static_cast<std::streamoff>(info.MetaDocumentOffset()));
-    stream.read(text.data(), static_cast<std::streamsize>(text.size()));
-    if (!stream) throw Failure(file, "its metadata document cannot be read");
-    return text;
-}
-
-// What is wrong with the document; empty if nothing.
-std::string JudgeDocument(const std::string& text) {
-    if (text.find("<!DOCTYPE") != text.npos) return "the metadata document has a document type";
-    if (text.find('\0') != text.npos) return "the metadata document holds bytes of 0";
-    CPLPushErrorHandler(CPLQuietErrorHandler);
-    CPLErrorReset();
-    CPLXMLNode* const tree = CPLParseXMLString(text.c_str());
-    const bool good = tree && CPLGetLastErrorType() < CE_Failure;
-    const bool rooted = good && CPLGetXMLNode(tree, "=DATASET");
-    const std::string reason = CPLGetLastErrorMsg();
-    CPLDestroyXMLNode(tree);
-    CPLErrorReset();
-    CPLPopErrorHandler();
-    if (!good) return "the metadata document is malformed: " + reason;
-    return rooted ? "" : "the metadata document has no root DATASET";
-}
 
 void JudgeRecord(CheckResult& result, const zmchost::Raster& raster, const char* what,
                  std::uint32_t band, std::uint32_t level) {
@@ -54,13 +20,6 @@ void JudgeRecord(CheckResult& result, const zmchost::Raster& raster, const char*
 }
 
 }  // namespace
-
-std::string JudgeMetadata(const std::string& file, const zmchost::PyramidFileInfo& info) {
-    if (!info.HasMetadataDocument()) return "";
-    if (info.header.fileSize - info.MetaDocumentOffset() > kMaxDocument)
-        return "the metadata document is longer than 256 MiB";
-    return JudgeDocument(ReadDocument(file, info));
-}
 
 CheckResult CheckStructure(const zmchost::PyramidFileInfo& info, const zmchost::Raster& raster) {
     CheckResult result{"structure", {}, {}};
@@ -100,7 +59,7 @@ CheckResult CheckDocuments(const std::string& file, const zmchost::PyramidFileIn
                            const zmchost::Raster& raster) {
     CheckResult result{"documents", {}, {}};
     if (!info.HasMetadataDocument()) return result;
-    const std::string wrong = JudgeMetadata(file, info);
+    const std::string wrong = zmchost::JudgeMetadata(file, info.header);
     if (!wrong.empty()) {
         result.problems.push_back(wrong);
         return result;

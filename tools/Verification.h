@@ -23,10 +23,6 @@ struct CheckResult {
     std::vector<std::string> problems;
 };
 
-// What is wrong with the form of the metadata document; empty if nothing, or if there is none. The
-// module leaves aside what it cannot parse, and complains on stderr each time that it is asked.
-std::string JudgeMetadata(const std::string& file, const zmchost::PyramidFileInfo& info);
-
 // Header against the module's reading of it, and the file's length.
 CheckResult CheckStructure(const zmchost::PyramidFileInfo& info, const zmchost::Raster& raster);
 CheckResult CheckCompleteness(const zmchost::PyramidFileInfo& info);

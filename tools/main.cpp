@@ -51,6 +51,7 @@ Program::Program() {
     Add(MakeHashCommand());
     Add(MakeVerifyCommand());
     Add(MakeCompareCommand());
+    Add(MakeRecoverCommand());
     app.footer(
         std::string("zmcraster COMMAND --help tells more, with examples. Bands count from 1, "
                     "levels from 0, the finest.\nExit status: ") +

@@ -36,6 +36,11 @@ public:
                    static_cast<ssize_t>(bytes.size()));
     }
 
+    // Makes the file longer, by zeros that take no memory.
+    void Extend(std::uint64_t bytes) {
+        ZMC_EXPECT(ftruncate(descriptor, static_cast<off_t>(Size() + bytes)) == 0);
+    }
+
     std::uint64_t Size() const {
         struct stat status = {};
         ZMC_EXPECT(fstat(descriptor, &status) == 0);

@@ -296,9 +296,9 @@ bool CameBackBehind(const zelm::Array<Record>& old, const zelm::Array<Record>& s
 }
 
 // Whether a document is of the plain kind that the module writes: ASCII, no comments, references or
-// the like, and text in nothing but elements without children. Only then has a rewrite to leave the
-// records as they are: the line breaks of a rewrite and the text around children mix, and a text in
-// pieces becomes one piece.
+// the like, nothing that is written as a reference, and text in nothing but elements without
+// children. Only then has a rewrite to leave the records as they are: the line breaks of a rewrite
+// and the text around children mix, and a text in pieces becomes one piece, or the reverse.
 inline bool IsPlainDocument(const std::vector<unsigned char>& bytes) {
     const std::string text(bytes.begin(), bytes.end());
     for (const char c : text)
@@ -315,6 +315,7 @@ inline bool IsPlainDocument(const std::vector<unsigned char>& bytes) {
         opened = text[at + 1] != '/' && text[end - 1] != '/';
         const std::size_t next = std::min(text.find('<', end), text.size());
         const bool closes = next + 1 < text.size() && text[next + 1] == '/';
+        if (text.find('>', end + 1) < next) return false;
         const bool blank = text.find_first_not_of(" \t\r\n", end + 1) >= next;
         // Blank text alone in an element is a value too, and a rewrite may drop it.
         if (opened && closes ? blank && next != end + 1 : !blank) return false;

@@ -61,10 +61,21 @@ private:
         zelm::Array<zelm::RasterBandHistogram<T>> histograms;
         for (std::uint32_t count = input.UpTo(3); count > 0; --count)
             histograms.Append(TakeHistogram<T>(input));
+        if (input.UpTo(7) == 7) RefuseHistograms(histograms);
         if (!Judge(dataset.SetHistograms(histograms))) return;
         ZMC_EXPECT(CameBackBehind(before.histograms, histograms, after.histograms));
         ZMC_EXPECT(SameRecords(before.stats, after.stats));
         ZMC_EXPECT(after.HasPalettesOf(before));
+    }
+
+    // A store with a record that no document holds is refused as a whole.
+    void RefuseHistograms(zelm::Array<zelm::RasterBandHistogram<T>> histograms) {
+        zelm::RasterBandHistogram<T> tooLong;
+        tooLong.binCount = 0xF0000000u;
+        histograms.Append(tooLong);
+        ZMC_EXPECT(!dataset.SetHistograms(histograms));
+        after.Load(dataset);
+        ZMC_EXPECT(after == before && Front() == front && Tail() == tail);
     }
 
     void StorePalette(InputBytes& input) {

@@ -12,6 +12,7 @@
 #include <string_view>
 
 #include "platform/TextConversion.h"
+#include "platform/posix/Uninterrupted.h"
 
 namespace platform {
 namespace {
@@ -55,7 +56,8 @@ bool IsRegular(int descriptor) {
 
 // Emptied only once it is known to be a regular file.
 bool Prepare(int descriptor, File::Mode mode) {
-    return IsRegular(descriptor) && (mode != File::Mode::Create || ftruncate(descriptor, 0) == 0);
+    return IsRegular(descriptor) && (mode != File::Mode::Create ||
+                                     Uninterrupted([&] { return ftruncate(descriptor, 0); }) == 0);
 }
 
 // Repeats `call(offset, done, size)` until all is moved, or it fails, or it moves nothing.
@@ -78,10 +80,7 @@ std::size_t Transfer(std::uint64_t offset, std::size_t size, Call&& call) {
 std::unique_ptr<File> File::Open(const char16_t* name, Mode mode) {
     const std::unique_ptr<char[]> narrow = NarrowName(name);
     if (!narrow) return nullptr;
-    int descriptor;
-    do {
-        descriptor = open(narrow.get(), OpenFlags(mode), 0666);
-    } while (descriptor < 0 && errno == EINTR);
+    const int descriptor = Uninterrupted([&] { return open(narrow.get(), OpenFlags(mode), 0666); });
     if (descriptor < 0) return nullptr;
     std::unique_ptr<File> file;
     if (Prepare(descriptor, mode)) file.reset(new (std::nothrow) File(descriptor));
@@ -106,20 +105,25 @@ std::size_t File::WriteAt(std::uint64_t offset, const void* buffer, std::size_t 
 }
 
 std::uint64_t File::Size() const {
+    std::uint64_t size = 0;
+    return TellSize(size) ? size : kUnknownSize;
+}
+
+bool File::TellSize(std::uint64_t& size) const {
     struct stat status;
-    return fstat(descriptor, &status) == 0 ? static_cast<std::uint64_t>(status.st_size) : 0;
+    if (fstat(descriptor, &status) != 0) return false;
+    size = static_cast<std::uint64_t>(status.st_size);
+    return true;
 }
 
 bool File::Truncate(std::uint64_t size) {
-    if (size > kMaxOffset) return false;
-    int result;
-    do {
-        result = ftruncate(descriptor, static_cast<off_t>(size));
-    } while (result != 0 && errno == EINTR);
-    return result == 0;
+    return size <= kMaxOffset &&
+           Uninterrupted([&] { return ftruncate(descriptor, static_cast<off_t>(size)); }) == 0;
 }
 
-bool File::Sync() { return fsync(descriptor) == 0; }
+bool File::Sync() {
+    return Uninterrupted([&] { return fsync(descriptor); }) == 0;
+}
 
 bool RemoveFile(const char16_t* name) {
     const std::unique_ptr<char[]> narrow = NarrowName(name);

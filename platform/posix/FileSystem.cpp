@@ -16,13 +16,15 @@
 #include <random>
 #include <system_error>
 
+#include "platform/posix/Uninterrupted.h"
+
 namespace platform {
 namespace {
 
 class Descriptor {
 public:
     Descriptor(const std::string& path, int flags)
-        : value(::open(path.c_str(), flags | O_CLOEXEC, 0666)) {}
+        : value(Uninterrupted([&] { return ::open(path.c_str(), flags | O_CLOEXEC, 0666); })) {}
     ~Descriptor() {
         const int kept = errno;
         if (value >= 0) ::close(value);
@@ -37,7 +39,7 @@ public:
 
 bool Sync(const std::string& path, int flags) {
     const Descriptor file(path, flags);
-    return file && ::fsync(file.value) == 0;
+    return file && Uninterrupted([&] { return ::fsync(file.value); }) == 0;
 }
 
 }  // namespace
@@ -54,6 +56,7 @@ FileStatus StatusOf(const std::string& path) {
     const bool nobodyWrites = (info.st_mode & (S_IWUSR | S_IWGRP | S_IWOTH)) == 0;
     status.readOnly = nobodyWrites || ::access(path.c_str(), W_OK) != 0;
     if (status.isRegular) status.size = static_cast<std::uint64_t>(info.st_size);
+    status.number = static_cast<std::uint64_t>(info.st_ino);
     return status;
 }
 
@@ -102,6 +105,16 @@ bool RenameFile(const std::string& from, const std::string& to) {
     return ::rename(from.c_str(), to.c_str()) == 0;
 }
 
+bool RenameToNewName(const std::string& from, const std::string& to) {
+#if defined(RENAME_NOREPLACE)
+    if (::renameat2(AT_FDCWD, from.c_str(), AT_FDCWD, to.c_str(), RENAME_NOREPLACE) == 0)
+        return true;
+    if (errno != EINVAL && errno != ENOSYS) return false;
+#endif
+    // A file system without that service: a second name, and away with the first.
+    return ::link(from.c_str(), to.c_str()) == 0 && ::unlink(from.c_str()) == 0;
+}
+
 bool RemoveEntry(const std::string& path) { return ::unlink(path.c_str()) == 0; }
 
 bool SyncFile(const std::string& path) { return Sync(path, O_RDONLY); }
@@ -119,7 +132,10 @@ bool ReserveSpace(const std::string& path, std::uint64_t size) {
     const Descriptor file(path, O_WRONLY);
     if (!file) return false;
 #if defined(__linux__)
-    if (::fallocate(file.value, FALLOC_FL_KEEP_SIZE, 0, static_cast<off_t>(size)) == 0) return true;
+    const auto reserve = [&] {
+        return ::fallocate(file.value, FALLOC_FL_KEEP_SIZE, 0, static_cast<off_t>(size));
+    };
+    if (Uninterrupted(reserve) == 0) return true;
     return errno != ENOSPC && errno != EDQUOT && errno != EFBIG;
 #else
     static_cast<void>(size);
@@ -130,28 +146,17 @@ bool ReserveSpace(const std::string& path, std::uint64_t size) {
 bool ReleaseReserve(const std::string& path) {
     const Descriptor file(path, O_WRONLY);
     struct stat info {};
-    return file && ::fstat(file.value, &info) == 0 && ::ftruncate(file.value, info.st_size) == 0;
+    return file && ::fstat(file.value, &info) == 0 &&
+           Uninterrupted([&] { return ::ftruncate(file.value, info.st_size); }) == 0;
 }
 
-std::vector<Hole> FindHoles(const std::string& path) {
-    std::vector<Hole> holes;
-#if defined(SEEK_HOLE) && defined(SEEK_DATA)
-    const Descriptor file(path, O_RDONLY);
-    struct stat info {};
-    if (!file || ::fstat(file.value, &info) != 0) return holes;
-    off_t position = 0;
-    while (position < info.st_size) {
-        const off_t begin = ::lseek(file.value, position, SEEK_HOLE);
-        if (begin < 0 || begin >= info.st_size) break;
-        const off_t data = ::lseek(file.value, begin, SEEK_DATA);
-        const off_t end = data < 0 ? info.st_size : data;
-        holes.push_back({static_cast<std::uint64_t>(begin), static_cast<std::uint64_t>(end)});
-        position = end;
-    }
-#else
-    static_cast<void>(path);
-#endif
-    return holes;
+std::string SystemRun() {
+    char text[64];
+    const Descriptor file("/proc/sys/kernel/random/boot_id", O_RDONLY);
+    const ssize_t length = file ? ::read(file.value, text, sizeof text) : 0;
+    std::string run(text, length > 0 ? static_cast<std::size_t>(length) : 0);
+    while (run.ends_with('\n')) run.pop_back();
+    return run;
 }
 
 std::uint64_t CurrentProcess() { return static_cast<std::uint64_t>(::getpid()); }

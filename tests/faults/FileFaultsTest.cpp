@@ -104,6 +104,22 @@ TEST_F(FileFaultsTest, OpenInterruptedIsTriedAgain) {
     EXPECT_EQ(faults.Count(), 2u);
 }
 
+// The opening of a new file empties it first, so the call that is interrupted is that of Open too.
+TEST_F(FileFaultsTest, EveryCallOfALifeIsMadeAgainWhenInterrupted) {
+    for (const unsigned calls : {kOpenCall, kReadCall, kWriteCall, kResizeCall, kSyncCall})
+        for (const std::size_t n : {1u, 2u}) {
+            SCOPED_TRACE(std::to_string(calls) + ", call " + std::to_string(n));
+            FileFaults faults(Fault(calls, n, FileFaultAction::Error, EINTR));
+            const auto file = Make();
+            ASSERT_TRUE(file);
+            EXPECT_EQ(file->WriteAt(0, bytes, sizeof bytes), sizeof bytes);
+            EXPECT_EQ(file->ReadAt(0, bytes, sizeof bytes), sizeof bytes);
+            EXPECT_TRUE(file->Truncate(5));
+            EXPECT_TRUE(file->Sync());
+            EXPECT_EQ(faults.Failed(), n == 1 || calls == kResizeCall ? 1u : 0u);
+        }
+}
+
 TEST_F(FileFaultsTest, OpenThatCannotLookOrEmptyGivesNothing) {
     support::WriteText(name, "old");
     for (const unsigned kind : {kOpenCall, kStatusCall, kResizeCall}) {

@@ -4,6 +4,8 @@
 #include <gdal_alg.h>
 #include <gdal_priv.h>
 #include <gtest/gtest.h>
+#include <sys/wait.h>
+#include <unistd.h>
 
 #include <cstdlib>
 #include <cstring>
@@ -15,6 +17,8 @@
 #include <vector>
 
 #include "gdal/SampleType.h"
+#include "host/MetadataCopy.h"
+#include "host/PyramidHeader.h"
 #include "tests/support/ScratchDirectory.h"
 
 namespace zmcgdal {
@@ -234,6 +238,36 @@ TEST_F(DriverTest, CancelledCopiesLeaveNothing) {
         EXPECT_TRUE(fs::is_empty(folder));
     }
     CPLPopErrorHandler();
+}
+
+double MeanOf(GDALDataset& dataset) {
+    double mean = 0;
+    EXPECT_EQ(
+        dataset.GetRasterBand(1)->GetStatistics(FALSE, FALSE, nullptr, nullptr, &mean, nullptr),
+        CE_None);
+    return mean;
+}
+
+TEST_F(DriverTest, StoreThatWasCutOffIsPutInOrder) {
+    const std::string name = MakeCopy(*Memory(20, 10, 1, GDT_Byte));
+    const double mean = MeanOf(*Open(name));
+    const std::uint64_t document = zmchost::PyramidHeader::Read(name).tileDataEnd;
+    const pid_t child = fork();
+    if (child == 0) {
+        const auto* const left = new zmchost::MetadataCopy(name);
+        _exit(left ? 0 : 1);
+    }
+    waitpid(child, nullptr, 0);
+    ASSERT_TRUE(fs::exists(zmchost::MetadataCopy::PathFor(name)));
+    std::fstream(name, std::ios::in | std::ios::out | std::ios::binary)
+            .seekp(static_cast<std::streamoff>(document))
+        << '\x1A';
+    CPLPushErrorHandler(CPLQuietErrorHandler);
+    const DatasetPtr opened = Open(name);
+    EXPECT_NE(std::string(CPLGetLastErrorMsg()).find("again the one of before"), std::string::npos);
+    CPLPopErrorHandler();
+    EXPECT_EQ(MeanOf(*opened), mean);
+    EXPECT_FALSE(fs::exists(zmchost::MetadataCopy::PathFor(name)));
 }
 
 }  // namespace

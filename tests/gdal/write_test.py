@@ -382,6 +382,32 @@ class Updates(FolderTest):
         self.assertEqual(dataset.GetRasterBand(1).GetMinimum(), 0)
         self.assertEqual(dataset.GetRasterBand(3).GetMaximum(), 255)
 
+    def test_statistics_of_a_file_stay_until_they_are_renewed(self):
+        dataset = gdal.Open(self.name, gdal.GA_Update)
+        dataset.GetRasterBand(2).WriteArray(np.full((600, 700), 9, np.uint8))
+        del dataset
+        dataset = gdal.Open(self.name, gdal.GA_Update)
+        self.assertEqual(dataset.GetRasterBand(2).GetStatistics(0, 1)[1], 255)
+        dataset.GetRasterBand(2).ComputeStatistics(False)
+        del dataset
+        dataset = gdal.Open(self.name)
+        self.assertEqual(dataset.GetRasterBand(2).GetStatistics(0, 0), [9, 9, 9, 0])
+
+    def test_statistics_of_a_sidecar_go_when_pixels_change(self):
+        source = memory_dataset(self.array, gdal.GDT_Byte)
+        name = self.copy(source, "plain.pyr", options=["STATISTICS=NO"])
+        dataset = gdal.Open(name)
+        for number in (2, 3):
+            dataset.GetRasterBand(number).ComputeStatistics(False)
+        del dataset
+        dataset = gdal.Open(name, gdal.GA_Update)
+        dataset.GetRasterBand(2).SetMetadataItem("kept", "yes")
+        dataset.GetRasterBand(2).WriteArray(np.full((600, 700), 9, np.uint8))
+        del dataset
+        dataset = gdal.Open(name)
+        self.assertEqual(dataset.GetRasterBand(2).GetMetadata(), {"kept": "yes"})
+        self.assertEqual(dataset.GetRasterBand(3).GetStatistics(0, 0)[1], 255)
+
     def test_no_data_goes_to_the_sidecar_and_into_the_masks(self):
         dataset = gdal.Open(self.name, gdal.GA_Update)
         dataset.GetRasterBand(1).SetNoDataValue(40)

@@ -3,11 +3,16 @@
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sys/stat.h>
+#include <sys/wait.h>
 #include <unistd.h>
 
+#include <csignal>
 #include <filesystem>
 #include <string>
 #include <vector>
+
+#include "platform/FileLock.h"
+#include "platform/FileSystem.h"
 
 namespace platform {
 namespace {
@@ -148,6 +153,58 @@ TEST_F(FileTest, ChildrenDoNotInheritTheHandle) {
     ASSERT_GE(flags, 0);
     EXPECT_NE(flags & FD_CLOEXEC, 0);
 }
+
+TEST_F(FileTest, LockHasOneHolder) {
+    const std::string path = (directory / "lock").string();
+    FileLock first, second;
+    EXPECT_EQ(first.Take(path), FileLock::Result::Missing);
+    ASSERT_TRUE(CreateNewFile(path));
+    EXPECT_EQ(first.Take(path), FileLock::Result::Taken);
+    EXPECT_EQ(second.Take(path), FileLock::Result::Held);
+    std::filesystem::rename(path, path + "2");
+    EXPECT_EQ(second.Take(path), FileLock::Result::Missing);
+    EXPECT_EQ(second.Take(path + "2"), FileLock::Result::Held) << "it goes with the file";
+    first.Release();
+    EXPECT_EQ(second.Take(path + "2"), FileLock::Result::Taken);
+}
+
+TEST_F(FileTest, LockGoesWithItsProcess) {
+    const std::string path = (directory / "lock").string();
+    ASSERT_TRUE(CreateNewFile(path));
+    int taken[2];
+    ASSERT_EQ(pipe(taken), 0);
+    const pid_t child = fork();
+    if (child == 0) {
+        FileLock lock;
+        const char result = lock.Take(path) == FileLock::Result::Taken ? 'y' : 'n';
+        if (write(taken[1], &result, 1) == 1) pause();
+        _exit(0);
+    }
+    char result = 0;
+    EXPECT_EQ(read(taken[0], &result, 1), 1);
+    EXPECT_EQ(result, 'y');
+    FileLock lock;
+    EXPECT_EQ(lock.Take(path), FileLock::Result::Held);
+    kill(child, SIGKILL);
+    waitpid(child, nullptr, 0);
+    EXPECT_EQ(lock.Take(path), FileLock::Result::Taken);
+    close(taken[0]);
+    close(taken[1]);
+}
+
+TEST_F(FileTest, NewNamesReplaceNothing) {
+    const std::string from = (directory / "from").string();
+    const std::string to = (directory / "to").string();
+    ASSERT_TRUE(CreateNewFile(from));
+    EXPECT_TRUE(RenameToNewName(from, to));
+    EXPECT_FALSE(StatusOf(from).exists);
+    ASSERT_TRUE(CreateNewFile(from));
+    EXPECT_FALSE(RenameToNewName(from, to));
+    EXPECT_TRUE(StatusOf(from).exists);
+    EXPECT_NE(StatusOf(from).number, StatusOf(to).number);
+}
+
+TEST_F(FileTest, RunOfTheSystemStaysTheSame) { EXPECT_EQ(SystemRun(), SystemRun()); }
 
 }  // namespace
 }  // namespace platform

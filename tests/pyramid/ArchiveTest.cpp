@@ -384,17 +384,11 @@ TEST_F(ArchiveTest, AllTypesThroughStoreAndReopen) {
 
 TEST_F(ArchiveTest, UnparsableDocumentLeavesThePixels) {
     const std::string documents[] = {
-        "<DATASET>",
-        "garbage",
-        "<DATASET/>\n</DATASET>",
-        "<!DOCTYPE DATASET><DATASET/>",
-        std::string("\0\0\0\0", 4),
-        std::string("<DATASET/>\0", 11),
+        "<DATASET>", "garbage", "<DATASET/>\n</DATASET>", "<!DOCTYPE DATASET><DATASET/>",
+        std::string("\0\0\0\0", 4), std::string("<DATASET/>\0", 11),
         std::string("<DATASET/>\n") + '\0' + "<BANDSTATISTICS/></DATASET>",
         // Beginnings of characters whose other bytes lie behind the end.
-        "<DATASET/>\xFF",
-        "<DATASET/>\n\xC3",
-        "<DATASET/>\n\xF0\x9F\x97"};
+        "<DATASET/>\xFF", "<DATASET/>\n\xC3", "<DATASET/>\n\xF0\x9F\x97"};
     for (const std::string& document : documents) {
         SCOPED_TRACE(document);
         WriteFile(document);

@@ -1,31 +1,45 @@
 #include "tests/support/AllocationFaults.h"
 
+#include <atomic>
 #include <cstdlib>
 #include <new>
 
 namespace testsupport {
 namespace {
 
+// Plain data, so that it needs no initialiser and can be met by the first allocation of a thread.
+// Atomic because that of the process is met by all of them.
 struct State {
-    bool armed;
+    std::atomic<bool> armed;
     std::size_t failAt;
     FaultMode mode;
-    std::size_t count;
-    std::size_t failed;
+    std::atomic<std::size_t> count;
+    std::atomic<std::size_t> failed;
+
+    void Start(std::size_t n, FaultMode newMode) {
+        armed = false;
+        failAt = n;
+        mode = newMode;
+        count = failed = 0;
+        armed = true;
+    }
+
+    bool ShallFail() {
+        if (!armed) return false;
+        const std::size_t number = ++count;
+        const bool fail =
+            failAt != 0 && (mode == FaultMode::Once ? number == failAt : number >= failAt);
+        if (fail) ++failed;
+        return fail;
+    }
 };
 
-// Plain data, so that it needs no initialiser and can be met by the first allocation of a thread.
-thread_local State state;
+thread_local State ofThread;
+State ofProcess;
 
-bool ShallFail() {
-    if (!state.armed) return false;
-    ++state.count;
-    const bool fail =
-        state.failAt != 0 &&
-        (state.mode == FaultMode::Once ? state.count == state.failAt : state.count >= state.failAt);
-    if (fail) ++state.failed;
-    return fail;
-}
+State& Of(FaultScope scope) { return scope == FaultScope::Thread ? ofThread : ofProcess; }
+
+bool ShallFail() { return ofThread.ShallFail() || ofProcess.ShallFail(); }
 
 void* Take(std::size_t size) { return ShallFail() ? nullptr : std::malloc(size != 0 ? size : 1); }
 
@@ -42,12 +56,15 @@ void* OrThrow(void* memory) {
 
 }  // namespace
 
-AllocationFaults::AllocationFaults(std::size_t n, FaultMode mode) { state = {true, n, mode, 0, 0}; }
+AllocationFaults::AllocationFaults(std::size_t n, FaultMode mode, FaultScope ofWhat)
+    : scope(ofWhat) {
+    Of(scope).Start(n, mode);
+}
 AllocationFaults::~AllocationFaults() { Disarm(); }
-void AllocationFaults::Disarm() { state.armed = false; }
-void AllocationFaults::Rearm() { state = {true, state.failAt, state.mode, 0, 0}; }
-std::size_t AllocationFaults::Count() const { return state.count; }
-std::size_t AllocationFaults::Failed() const { return state.failed; }
+void AllocationFaults::Disarm() { Of(scope).armed = false; }
+void AllocationFaults::Rearm() { Of(scope).Start(Of(scope).failAt, Of(scope).mode); }
+std::size_t AllocationFaults::Count() const { return Of(scope).count; }
+std::size_t AllocationFaults::Failed() const { return Of(scope).failed; }
 
 }  // namespace testsupport
 

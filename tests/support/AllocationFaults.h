@@ -4,7 +4,7 @@
 // replaced, in the program and in the modules that it loads, by malloc and free behind a switch:
 // while an AllocationFaults lives, the n-th allocation of its thread fails, by std::bad_alloc or by
 // null as the form promises. Counting and failing are per thread, so that other threads (a
-// scheduler's, a sanitizer's) are left alone.
+// scheduler's, a sanitizer's) are left alone, unless the whole process is asked for.
 #ifndef ZMC_TESTS_SUPPORT_ALLOCATIONFAULTS_H
 #define ZMC_TESTS_SUPPORT_ALLOCATIONFAULTS_H
 
@@ -20,11 +20,17 @@ enum class FaultMode {
     FromThenOn,  // the n-th fails and all that follow
 };
 
-// One at a time on a thread.
+enum class FaultScope {
+    Thread,
+    Process,  // all threads, whose allocations count as they come
+};
+
+// One at a time on a thread, and one of the whole process.
 class AllocationFaults {
 public:
     // `n` counts from 1, starting with the next allocation; 0 lets none fail and only counts.
-    explicit AllocationFaults(std::size_t n, FaultMode mode = FaultMode::Once);
+    explicit AllocationFaults(std::size_t n, FaultMode mode = FaultMode::Once,
+                              FaultScope scope = FaultScope::Thread);
     ~AllocationFaults();
     AllocationFaults(const AllocationFaults&) = delete;
     AllocationFaults& operator=(const AllocationFaults&) = delete;
@@ -38,6 +44,9 @@ public:
     std::size_t Count() const;
     // How many of them failed.
     std::size_t Failed() const;
+
+private:
+    FaultScope scope;
 };
 
 // Allocations that `call` asks for.

@@ -39,6 +39,7 @@ Orders orders;
 std::atomic<bool> armed;
 std::atomic<std::size_t> count;
 std::atomic<std::size_t> failed;
+std::atomic<unsigned> failedKinds;
 
 bool BelowFolder(const char* path) {
     return path && std::strncmp(path, orders.folder, orders.folderLength) == 0 &&
@@ -66,7 +67,10 @@ bool ShallFail(FileCall kind, Place place) {
     const std::size_t number = ++count;
     const bool fail =
         orders.n != 0 && (orders.fromThenOn ? number >= orders.n : number == orders.n);
-    if (fail) ++failed;
+    if (fail) {
+        ++failed;
+        failedKinds |= kind;
+    }
     return fail;
 }
 
@@ -123,6 +127,7 @@ void Arm(const FileFault& fault) {
     orders.action = fault.action;
     orders.error = fault.error;
     count = failed = 0;
+    failedKinds = 0;
     armed = true;
 }
 
@@ -162,6 +167,7 @@ FileFaults::~FileFaults() { Disarm(); }
 void FileFaults::Disarm() { armed = false; }
 std::size_t FileFaults::Count() const { return count; }
 std::size_t FileFaults::Failed() const { return failed; }
+unsigned FileFaults::FailedKinds() const { return failedKinds; }
 
 std::vector<std::string> FileFaults::ForChild(const FileFault& fault,
                                               const std::string& countFile) {

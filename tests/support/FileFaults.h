@@ -63,6 +63,8 @@ public:
     std::size_t Count() const;
     // How many of them failed.
     std::size_t Failed() const;
+    // The kinds of those that failed.
+    unsigned FailedKinds() const;
 
     // What a child process needs in its environment to meet the fault: "NAME=value" each. With
     // `countFile` it leaves the count of its calls there when it ends in good order.

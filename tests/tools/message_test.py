@@ -3,7 +3,7 @@ import os
 
 from frame import ToolTest, geotiff, samples
 
-COMMANDS = ["build", "info", "export", "hash", "verify", "compare"]
+COMMANDS = ["build", "info", "export", "hash", "verify", "compare", "recover"]
 
 
 class Help(ToolTest):

@@ -1,0 +1,146 @@
+// What the module does when the disk fails under it. The files are good; the calls fail.
+#include <gtest/gtest.h>
+
+#include <cerrno>
+
+#include "pyramid/PyramidDataset.h"
+#include "tests/support/FileFaults.h"
+#include "tests/support/PyramidFiles.h"
+#include "tests/support/ScratchDirectory.h"
+#include "tests/support/XercesEnvironment.h"
+
+namespace zelm::test {
+namespace {
+
+using testsupport::FileFaultAction;
+using testsupport::FileFaults;
+
+class DiskFailureTest : public ::testing::Test {
+protected:
+    static constexpr std::uint32_t kSamples = 300, kLines = 280;
+
+    FileFaults Fail(unsigned calls, std::size_t n, int error = EIO) {
+        return FileFaults({folder.String(), calls, n, false, FileFaultAction::Error, error});
+    }
+
+    // A file of two bands whose samples are all 7.
+    void Make(std::uint32_t tileLines, std::uint32_t bands = 2) {
+        PyramidDataset dataset(String(name.c_str()),
+                               PyramidProps(kSamples, kLines, bands, 1, tileLines));
+        dataset.CreateFile(0, 0);
+        Array<int> all;
+        for (std::uint32_t band = 0; band < bands; ++band) all.Append(static_cast<int>(band));
+        std::vector<unsigned char> pixels(std::size_t{256} * 256 * bands, 7);
+        for (const std::uint32_t y : {0u, 256u})
+            for (const std::uint32_t x : {0u, 256u}) {
+                const std::uint32_t width = std::min(256u, kSamples - x);
+                const std::uint32_t height = std::min(256u, kLines - y);
+                if (bands > 8)
+                    dataset.WriteTileMorton(x, y, width, height, all, 0, pixels.data());
+                else
+                    dataset.WriteTileInterleaved(x, y, width, height, all, 0, pixels.data());
+            }
+    }
+
+    support::ScratchDirectory folder;
+    const std::string name = folder / "scene.pyr";
+};
+
+TEST_F(DiskFailureTest, PixelsAroundAPartialTileAreNotLost) {
+    Make(256);
+    const std::string before = support::ReadText(name);
+    PyramidDataset dataset{String(name.c_str())};
+    ASSERT_FALSE(dataset.ReadHeader());
+    Array<int> bands;
+    bands.Append(0);
+    bands.Append(1);
+    std::vector<unsigned char> pixels(200, 9);
+    {
+        const FileFaults faults = Fail(testsupport::kReadCall, 1);
+        EXPECT_FALSE(dataset.WriteTileInterleaved(5, 5, 10, 10, bands, 0, pixels.data()));
+        EXPECT_EQ(faults.Failed(), 1u);
+    }
+    EXPECT_EQ(support::ReadText(name), before);
+    EXPECT_TRUE(dataset.WriteTileInterleaved(5, 5, 10, 10, bands, 0, pixels.data()));
+}
+
+TEST_F(DiskFailureTest, BandsBesideTheListedOnesAreNotInvented) {
+    Make(256);
+    const std::string before = support::ReadText(name);
+    PyramidDataset dataset{String(name.c_str())};
+    ASSERT_FALSE(dataset.ReadHeader());
+    Array<int> bands;
+    bands.Append(1);
+    std::vector<unsigned char> pixels(65536, 9);
+    const FileFaults faults = Fail(testsupport::kReadCall, 1);
+    EXPECT_FALSE(dataset.WriteTileInterleaved(0, 0, 256, 256, bands, 0, pixels.data()));
+    EXPECT_EQ(faults.Failed(), 1u);
+    EXPECT_EQ(support::ReadText(name), before);
+}
+
+TEST_F(DiskFailureTest, ReadsThatFailAreTold) {
+    for (const std::uint32_t count : {2u, 9u}) {
+        Make(256, count);
+        PyramidDataset dataset{String(name.c_str())};
+        ASSERT_FALSE(dataset.ReadHeader());
+        Array<int> all, last;
+        for (std::uint32_t band = 0; band < count; ++band) all.Append(static_cast<int>(band));
+        last.Append(static_cast<int>(count) - 1);
+        std::vector<unsigned char> pixels(std::size_t{256} * 256 * count);
+        for (const Array<int>* bands : {&all, &last})
+            for (const std::uint32_t side : {256u, 100u}) {
+                SCOPED_TRACE(std::to_string(count) + " bands, side " + std::to_string(side));
+                FileFaults faults = Fail(testsupport::kReadCall, 1);
+                EXPECT_FALSE(dataset.ReadTile(0, 0, side, side, *bands, 0, pixels.data()));
+                EXPECT_TRUE(dataset.ReadTile(0, 0, side, side, *bands, 0, pixels.data()));
+                EXPECT_EQ(faults.Failed(), 1u);
+                EXPECT_EQ(pixels[0], 7);
+            }
+    }
+}
+
+TEST_F(DiskFailureTest, FileOfUnknownSizeIsNotTakenForAnEmptyOne) {
+    Make(256);
+    Array<RasterBandStats<unsigned char>> stats;
+    stats.Append({});
+    {
+        PyramidDataset dataset{String(name.c_str())};
+        ASSERT_FALSE(dataset.ReadHeader());
+        ASSERT_TRUE(dataset.SetBandStats(stats));
+    }
+    const std::string before = support::ReadText(name);
+    std::size_t opened = 0;
+    bool met = true;
+    for (std::size_t n = 1; met; ++n) {
+        PyramidDataset dataset{String(name.c_str())};
+        FileFaults faults = Fail(testsupport::kStatusCall, n);
+        const bool open = !dataset.ReadHeader();
+        faults.Disarm();
+        met = faults.Failed() != 0;
+        if (!met || !open) continue;
+        ++opened;
+        dataset.SetBandStats(stats);
+        const std::string after = support::ReadText(name);
+        EXPECT_TRUE(after == before ||
+                    after.find("<BANDSTATISTICS>") != after.rfind("<BANDSTATISTICS>"))
+            << "the old record went, at " << n;
+        support::WriteText(name, before);
+    }
+    EXPECT_GT(opened, 0u);
+}
+
+TEST_F(DiskFailureTest, HeaderThatCouldNotBeWrittenIsRefused) {
+    bool met = true;
+    for (std::size_t n = 1; met; ++n) {
+        PyramidDataset made(String(name.c_str()), PyramidProps(kSamples, kLines, 2, 1, 256));
+        FileFaults faults = Fail(testsupport::kWriteCall, n);
+        made.CreateFile(0, 0);
+        faults.Disarm();
+        met = faults.Failed() != 0;
+        PyramidDataset again{String(name.c_str())};
+        EXPECT_EQ(again.ReadHeader(), met) << "true is failure; write " << n;
+    }
+}
+
+}  // namespace
+}  // namespace zelm::test

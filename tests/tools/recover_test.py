@@ -1,0 +1,162 @@
+"""Statistics whose store was cut off are put back, or said to be damaged."""
+import json
+import os
+import struct
+
+from frame import ToolTest
+from pyramid import Pyramid
+
+MARK = b"\x1a"  # stands for the first byte of a document while it is stored
+
+
+def checksum(data):
+    total = 0xCBF29CE484222325
+    for byte in data:
+        total = (total ^ byte) * 0x100000001B3 & 0xFFFFFFFFFFFFFFFF
+    return total
+
+
+def boot():
+    with open("/proc/sys/kernel/random/boot_id", "rb") as file:
+        return file.read().strip()
+
+
+class Recover(ToolTest):
+    def setUp(self):
+        super().setUp()
+        self.pyramid()
+        self.file = self.path("picture.pyr")
+        self.copy = self.file + ".zmcmeta"
+        self.good_file = Pyramid(self.file)
+
+    def leave_copy(self, run=None):
+        """What a store leaves that is cut off before its first write."""
+        file = self.good_file
+        run = boot() if run is None else run
+        text = file.data[file.end:]
+        data = b"ZMCMETA1" + struct.pack(
+            "<7Q", file.end, len(file.data), os.stat(self.file).st_ino, file.start,
+            checksum(file.data[:file.start]), len(run), len(text)) + run + text
+        with open(self.copy, "wb") as copy:
+            copy.write(data + struct.pack("<Q", checksum(data)))
+
+    def damage(self):
+        with open(self.file, "r+b") as file:
+            file.seek(self.good_file.end)
+            file.write(MARK)
+
+    def bytes(self):
+        with open(self.file, "rb") as file:
+            return file.read()
+
+    def test_a_copy_is_put_back(self):
+        self.leave_copy()
+        self.damage()
+        self.assertEqual(self.good("recover", "picture.pyr"),
+                         "picture.pyr: a store into it did not end; its metadata document is again "
+                         "the one of before\n")
+        self.assertEqual(self.bytes(), self.good_file.data)
+        self.assertEqual(self.files(), ["picture.pyr", "picture.tif"])
+        self.assertEqual(self.good("recover", "picture.pyr"),
+                         "picture.pyr: there is nothing to recover\n")
+
+    def test_documents(self):
+        self.leave_copy()
+        self.damage()
+        shape = {"schema": int, "file": str, "result": str, "text": str}
+        for result in "restored", "nothing":
+            document = self.document("recover", "picture.pyr")
+            self.assertShape(document, shape)
+            self.assertEqual(document["result"], result)
+        self.leave_copy()
+        self.assertEqual(self.document("recover", "picture.pyr")["result"], "complete")
+        self.damage()
+        self.assertEqual(self.document("recover", "picture.pyr", "--discard")["result"],
+                         "discarded")
+
+    def test_after_a_new_start_of_the_system(self):
+        self.leave_copy(b"another start")
+        file = self.bytes()
+        with open(self.file, "wb") as changed:
+            changed.write(file.replace(b"<RSTC_MEAN>1", b"<RSTC_MEAN>9"))
+        self.assertNotEqual(self.bytes(), file)
+        self.assertEqual(self.document("recover", "picture.pyr")["result"], "restored")
+        self.assertEqual(self.bytes(), file)
+
+    def test_other_commands_put_it_back_too(self):
+        for command in "info", "verify", "hash":
+            with self.subTest(command):
+                self.leave_copy()
+                self.damage()
+                done = self.run_tool(command, "picture.pyr")
+                self.assertEqual(done.returncode, 0)
+                self.assertEqual(done.stderr, "zmcraster: picture.pyr: warning: a store into it did "
+                                 "not end; its metadata document is again the one of before\n")
+                self.assertEqual(self.bytes(), self.good_file.data)
+
+    def test_damage_without_a_copy(self):
+        self.damage()
+        wrong = "the metadata document is damaged: a store did not end"
+        self.refused(1, f"picture.pyr: {wrong}, and there is no copy of the one before; --discard "
+                        "removes it", "recover", "picture.pyr")
+        done = self.run_tool("info", "picture.pyr", "--json")
+        self.assertEqual(done.returncode, 0)
+        self.assertEqual(done.stderr, f"zmcraster: picture.pyr: warning: {wrong}; statistics, "
+                                      "histograms and palettes are not shown\n")
+        self.assertEqual(json.loads(done.stdout)["statistics"], [])
+        checks = {check["check"]: check
+                  for check in self.document("verify", "picture.pyr", status=3)["checks"]}
+        self.assertEqual(checks["documents"]["problems"], [wrong])
+        self.assertEqual(checks["statistics"]["result"], "skipped")
+        self.assertEqual(checks["levels"]["result"], "good")
+
+    def test_discarding(self):
+        self.damage()
+        self.assertEqual(self.good("recover", "picture.pyr", "--discard"),
+                         "picture.pyr: what was damaged is removed; statistics can be stored anew\n")
+        self.assertEqual(self.bytes(), self.good_file.data[:self.good_file.end])
+        self.good("verify", "picture.pyr")
+
+    def test_what_is_not_discarded(self):
+        why = "picture.pyr: cannot discard its metadata document: "
+        self.refused(1, why + "it is not damaged", "recover", "picture.pyr", "--discard")
+        self.leave_copy()
+        self.damage()
+        self.refused(1, why + "there is a copy of it, which can be put back", "recover",
+                     "picture.pyr", "--discard")
+
+    def test_a_torn_copy(self):
+        self.leave_copy()
+        os.truncate(self.copy, os.path.getsize(self.copy) - 1)
+        self.damage()
+        damaged = self.bytes()
+        text = ("picture.pyr: the copy of its metadata document, picture.pyr.zmcmeta, is not used: "
+                "it is torn")
+        self.refused(1, text + "; --discard removes it", "recover", "picture.pyr")
+        done = self.run_tool("verify", "picture.pyr")
+        self.assertEqual(done.returncode, 3)
+        self.assertEqual(done.stderr, "zmcraster: " + text.replace("pyr:", "pyr: warning:", 1) + "\n")
+        self.assertEqual(self.bytes(), damaged)
+        self.good("recover", "picture.pyr", "--discard")
+        self.assertEqual(self.files(), ["picture.pyr", "picture.tif"])
+        self.assertEqual(self.bytes(), self.good_file.data[:self.good_file.end])
+
+    def test_a_copy_of_another_file(self):
+        self.leave_copy()
+        os.rename(self.file, self.path("old.pyr"))
+        self.good("build", "picture.tif", "other.pyr")
+        os.rename(self.path("other.pyr"), self.file)
+        self.damage()
+        self.refused(1, "picture.pyr: the copy of its metadata document, picture.pyr.zmcmeta, is not "
+                        "used: it is a copy of another file of that name; --discard removes it",
+                     "recover", "picture.pyr")
+
+    def test_a_build_takes_the_copy_of_the_old_file_away(self):
+        self.leave_copy()
+        self.good("build", "picture.tif", "picture.pyr", "--overwrite")
+        self.assertEqual(self.files(), ["picture.pyr", "picture.tif"])
+
+    def test_no_pyramid(self):
+        self.refused(1, "none.pyr: there is no such file", "recover", "none.pyr")
+        self.refused(1, "picture.tif: cannot read the header: it is no pyramid file", "recover",
+                     "picture.tif")
