@@ -11,8 +11,8 @@
 #include "tests/campaigns/BuildSession.h"
 #include "tests/campaigns/HostSession.h"
 #include "tests/campaigns/Silence.h"
-#include "tests/concurrency/CampaignLength.h"
 #include "tests/support/AllocationFaults.h"
+#include "tests/support/CampaignLength.h"
 
 // The parser library gives up its buffers without freeing them when its own memory runs out in the
 // middle of a parse; nobody but it knows them. Leaks of ours are still reported.

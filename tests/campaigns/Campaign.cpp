@@ -14,6 +14,7 @@
 #include <ctime>
 #include <utility>
 
+#include "tests/support/CampaignLength.h"
 #include "tests/support/MemoryMeter.h"
 
 namespace campaigns {
@@ -127,8 +128,6 @@ void Cost::Stop() {
     peakBytes = std::max(peakBytes, testsupport::MemoryMeter::Peak());
 }
 
-bool Campaign::IsFull() { return std::strcmp(Environment("ZMC_CAMPAIGN"), "full") == 0; }
-
 std::optional<std::uint64_t> Campaign::Only() {
     const char* only = Environment("ZMC_CAMPAIGN_ONLY");
     if (!*only) return std::nullopt;
@@ -137,7 +136,7 @@ std::optional<std::uint64_t> Campaign::Only() {
 
 Campaign::Campaign(std::string campaignName, std::uint64_t shortStride)
     : name(std::move(campaignName)),
-      stride(IsFull() || Only() ? 1 : shortStride),
+      stride(zmctest::IsFullCampaign() || Only() ? 1 : shortStride),
       phase(FirstVariant(stride)) {
     CatchDeath();
 }
@@ -149,7 +148,7 @@ Campaign::~Campaign() {
         "campaign: %s: %s form%s, %llu of %llu variants, %llu failed%s; slowest request %.1f ms of "
         "processor time (variant %llu, %.1f ms on the wall), most memory %s (variant %llu), "
         "%.1f s of processor time in all\n",
-        name.c_str(), IsFull() ? "full" : "short",
+        name.c_str(), zmctest::IsFullCampaign() ? "full" : "short",
         stride == 1 ? "" : (", phase " + std::to_string(phase)).c_str(),
         static_cast<unsigned long long>(tried), static_cast<unsigned long long>(numbered),
         static_cast<unsigned long long>(failed), kinds.c_str(), highest.cpuSeconds * 1e3,

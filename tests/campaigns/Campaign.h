@@ -64,7 +64,6 @@ public:
     Campaign(const Campaign&) = delete;
     Campaign& operator=(const Campaign&) = delete;
 
-    static bool IsFull();
     // Set while one variant alone is run.
     static std::optional<std::uint64_t> Only();
 

@@ -12,7 +12,7 @@
 #include "tests/campaigns/BuildSession.h"
 #include "tests/campaigns/HostSession.h"
 #include "tests/campaigns/Silence.h"
-#include "tests/concurrency/CampaignLength.h"
+#include "tests/support/CampaignLength.h"
 #include "tests/support/FileFaults.h"
 
 namespace campaigns {

@@ -9,6 +9,7 @@
 #include "tests/campaigns/Campaign.h"
 #include "tests/campaigns/FileTrial.h"
 #include "tests/campaigns/Samples.h"
+#include "tests/support/CampaignLength.h"
 #include "tests/support/XercesEnvironment.h"
 
 namespace campaigns {
@@ -253,7 +254,7 @@ TEST(Metadata, DocumentsAtTheLimits) {
         campaign.Run(sample.name, documents.size(), [&](std::uint64_t i) {
             return trial.Try(WithDocument(sample, documents[i]()), {});
         });
-    if (!Campaign::IsFull()) return;
+    if (!zmctest::IsFullCampaign()) return;
     const auto large = LargeDocuments();
     campaign.Run("large", large.size(), [&](std::uint64_t i) {
         const Sample sample = MakeSample("Blocked", 1, 4, 26, 37, 2);

@@ -8,7 +8,7 @@
 #include <thread>
 
 #include "host/PyramidBuilder.h"
-#include "tests/concurrency/CampaignLength.h"
+#include "tests/support/CampaignLength.h"
 #include "tests/support/MemorySource.h"
 #include "tests/support/ScratchDirectory.h"
 

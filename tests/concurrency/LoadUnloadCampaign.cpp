@@ -14,7 +14,7 @@
 
 #include "connection/DataConnectionFactory.h"
 #include "host/Raster.h"
-#include "tests/concurrency/CampaignLength.h"
+#include "tests/support/CampaignLength.h"
 #include "tests/support/ChildProcess.h"
 #include "tests/support/CountingGeoRef.h"
 #include "tests/support/MemoryRaster.h"

@@ -17,8 +17,8 @@
 #include <new>
 #include <random>
 
-#include "tests/concurrency/CampaignLength.h"
 #include "tests/concurrency/GenerationFile.h"
+#include "tests/support/CampaignLength.h"
 #include "tests/support/MemorySource.h"
 #include "tests/support/ScratchDirectory.h"
 

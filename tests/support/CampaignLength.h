@@ -1,7 +1,7 @@
 // How long a campaign runs: its short form is a test like any other, its long form is asked for by
 // the environment variable ZMC_CAMPAIGN=full.
-#ifndef ZMC_TESTS_CONCURRENCY_CAMPAIGNLENGTH_H
-#define ZMC_TESTS_CONCURRENCY_CAMPAIGNLENGTH_H
+#ifndef ZMC_TESTS_SUPPORT_CAMPAIGNLENGTH_H
+#define ZMC_TESTS_SUPPORT_CAMPAIGNLENGTH_H
 
 #include <cstdlib>
 #include <string_view>
