@@ -18,6 +18,7 @@
 #include "tests/support/ChildProcess.h"
 #include "tests/support/CountingGeoRef.h"
 #include "tests/support/MemoryRaster.h"
+#include "tests/support/Sanitizers.h"
 #include "tests/support/ScratchDirectory.h"
 #include "tests/support/XercesEnvironment.h"
 
@@ -37,11 +38,6 @@ using namespace zelm;
 // The address sanitizer keeps a record of every global that was ever loaded, about a megabyte for
 // each round here, and adds some 600 bytes a round to the heap, and mappings. What is ours to keep
 // small is judged to the byte without it.
-bool IsSanitized() {
-    static const bool sanitized = dlsym(RTLD_DEFAULT, "__asan_init") != nullptr;
-    return sanitized;
-}
-
 int Rounds() { return IsSanitized() ? CampaignLength(30, 300) : CampaignLength(200, 1000); }
 
 bool IsModuleMapped() {
