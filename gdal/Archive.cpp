@@ -173,11 +173,21 @@ std::unique_ptr<GDALColorTable> Archive::FetchColorTable(std::uint32_t band) con
 }
 
 // The module's setters answer true for a file that they cannot write.
-bool Archive::CanStore() { return raster.Get().IsWritable(); }
+template <class Setter>
+bool Archive::Store(Setter&& setter) {
+    bool stored = false;
+    raster.Visit([&](auto& reader) {
+        if (!raster.Get().IsWritable()) return;
+        bool taken = false;
+        raster.Get().Store([&] { taken = setter(reader); });
+        stored = taken;
+    });
+    documentExists |= stored;
+    return stored;
+}
 
 bool Archive::StoreStatistics(std::uint32_t band, const StoredStatistics& statistics) {
-    bool stored = false;
-    raster.Visit([&]<class T>(zelm::RasterReader<T>& reader) {
+    const bool stored = Store([&]<class T>(zelm::RasterReader<T>& reader) {
         zelm::RasterBandStats<T> record;
         record.band = band;
         record.flags = statistics.flags;
@@ -186,9 +196,8 @@ bool Archive::StoreStatistics(std::uint32_t band, const StoredStatistics& statis
         record.mean = statistics.mean;
         record.standardDeviation = statistics.standardDeviation;
         zelm::Array<zelm::RasterBandStats<T>> records;
-        stored = CanStore() && records.Append(record) && reader.SetBandStats(records);
+        return records.Append(record) && reader.SetBandStats(records);
     });
-    documentExists |= stored;
     severalSets.reset();
     statistics_.clear();
     return stored;
@@ -196,28 +205,23 @@ bool Archive::StoreStatistics(std::uint32_t band, const StoredStatistics& statis
 
 bool Archive::StoreHistogram(const StoredHistogram& histogram) {
     if (histogram.counts.empty()) return false;
-    bool stored = false;
-    raster.Visit([&]<class T>(zelm::RasterReader<T>& reader) {
+    const bool stored = Store([&]<class T>(zelm::RasterReader<T>& reader) {
         zelm::RasterBandHistogram<T> record;
         Fill(record, histogram);
         zelm::Array<zelm::RasterBandHistogram<T>> records;
-        stored = CanStore() && record.counts.data && records.Append(record) &&
-                 reader.SetHistograms(records);
+        return record.counts.data && records.Append(record) && reader.SetHistograms(records);
     });
-    documentExists |= stored;
     histograms_.reset();
     return stored;
 }
 
 bool Archive::StoreColorTable(std::uint32_t band, const GDALColorTable* table) {
-    bool stored = false;
-    raster.Visit([&](auto& reader) {
+    const bool stored = Store([&](auto& reader) {
         zelm::Palette palette;
         for (int i = 0; table && i < table->GetColorEntryCount(); ++i)
             AddEntry(palette, *table->GetColorEntry(i));
-        stored = CanStore() && reader.SetPalette(band, palette);
+        return reader.SetPalette(band, palette);
     });
-    documentExists |= stored;
     colorTables.erase(band);
     return stored;
 }

@@ -63,7 +63,9 @@ private:
     std::optional<std::vector<StoredHistogram>> histograms_;
     std::map<std::uint32_t, std::unique_ptr<GDALColorTable>> colorTables;
 
-    bool CanStore();
+    // Lets `setter(reader)` store; false where the file cannot be written or it answers false.
+    template <class Setter>
+    bool Store(Setter&& setter);
     std::optional<StoredStatistics> FetchStatistics(std::uint32_t band);
     std::vector<StoredHistogram> FetchHistograms() const;
     std::unique_ptr<GDALColorTable> FetchColorTable(std::uint32_t band) const;

@@ -46,7 +46,7 @@ void UseProgress(zmchost::BuildOptions& options, GDALProgressFunc progress, void
 }
 
 std::unique_ptr<Dataset> OpenForUpdate(const std::string& name) {
-    auto file = std::make_shared<OpenFile>(name, SignedByteAs::Int16);
+    auto file = std::make_shared<OpenFile>(name, OpenOptions{});
     auto dataset = Dataset::FromFile(std::move(file), GA_Update);
     dataset->LoadSidecar(name.c_str(), nullptr);
     return dataset;
@@ -79,9 +79,10 @@ zelm::RasterProps PropsOf(const char* target, int width, int height, int bands,
 
 GDALDataset* OpenSpool(const std::string& target, const zmchost::Raster& raster,
                        CreationOptions options, std::unique_ptr<zmchost::BuildFile> spool) {
-    const auto how = options.signedByte ? SignedByteAs::FlaggedByte : SignedByteAs::Int16;
+    OpenOptions open;
+    if (options.signedByte) open.signedByteAs = SignedByteAs::FlaggedByte;
     const std::size_t blocks = std::size_t{raster.TilesAcross()} * raster.TilesDown();
-    auto file = std::make_shared<OpenFile>(spool->Path(), how);
+    auto file = std::make_shared<OpenFile>(spool->Path(), open);
     auto dataset = Dataset::FromFile(std::move(file), GA_Update);
     dataset->SetDescription(target.c_str());
     dataset->BeginCreation(std::make_unique<Creation>(target, std::move(options), std::move(spool),

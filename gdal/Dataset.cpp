@@ -36,14 +36,14 @@ zmchost::PyramidFileInfo CheckedInfo(const std::string& fileName,
 
 }  // namespace
 
-OpenFile::OpenFile(const std::string& fileName, SignedByteAs signedByteAs)
-    : OpenFile(fileName, zmchost::PyramidHeader::Read(fileName), signedByteAs) {}
+OpenFile::OpenFile(const std::string& fileName, const OpenOptions& options)
+    : OpenFile(fileName, zmchost::PyramidHeader::Read(fileName), options) {}
 
 OpenFile::OpenFile(const std::string& fileName, const zmchost::PyramidHeader& header,
-                   SignedByteAs signedByteAs)
-    : raster(fileName),
+                   const OpenOptions& options)
+    : raster(fileName, options.keepCopies),
       info(CheckedInfo(fileName, header)),
-      tiles(raster, info, GdalTypeOf(info.header.pixelType, signedByteAs)),
+      tiles(raster, info, GdalTypeOf(info.header.pixelType, options.signedByteAs)),
       archive(raster, info.HasMetadataDocument()) {}
 
 Dataset::Dataset(std::shared_ptr<OpenFile> openFile, std::uint32_t levelShown, GDALAccess access,

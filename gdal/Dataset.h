@@ -16,7 +16,7 @@
 
 #include "gdal/Archive.h"
 #include "gdal/LazyRaster.h"
-#include "gdal/SampleType.h"
+#include "gdal/Options.h"
 #include "gdal/TileReader.h"
 #include "host/PyramidFileInfo.h"
 
@@ -28,10 +28,10 @@ class Creation;
 class OpenFile {
 public:
     // Throws zmchost::Error if the file is no pyramid, or one that GDAL cannot hold.
-    OpenFile(const std::string& fileName, SignedByteAs signedByteAs);
+    OpenFile(const std::string& fileName, const OpenOptions& options);
     // The same with the header at hand.
     OpenFile(const std::string& fileName, const zmchost::PyramidHeader& header,
-             SignedByteAs signedByteAs);
+             const OpenOptions& options);
 
     LazyRaster raster;
     const zmchost::PyramidFileInfo info;

@@ -57,7 +57,7 @@ void PutInOrder(const std::string& name) {
 std::unique_ptr<Dataset> OpenDataset(GDALOpenInfo* info) {
     PutInOrder(info->pszFilename);
     auto file = std::make_shared<OpenFile>(info->pszFilename, HeaderOf(*info),
-                                           SignedByteFrom(info->papszOpenOptions));
+                                           OpenOptionsFrom(info->papszOpenOptions));
     const zmchost::PyramidFileInfo layout = file->info;
     auto dataset = Dataset::FromFile(std::move(file), info->eAccess);
     // A look for each companion is cheaper than a list of the whole folder, unless that is there.

@@ -24,11 +24,16 @@ inline const zmchost::ModulePtr& SharedModule() {
 
 class LazyRaster {
 public:
-    explicit LazyRaster(std::string fileName) : name(std::move(fileName)) {}
+    // With `keepCopies` its stores keep the document of before until they have reached the disk.
+    LazyRaster(std::string fileName, bool keepCopies)
+        : name(std::move(fileName)), keepsCopies(keepCopies) {}
 
     // Throws zmchost::Error, each time anew, if the module does not open the file.
     zmchost::Raster& Get() {
-        if (!raster) raster.emplace(zmchost::Raster::Open(SharedModule(), name));
+        if (!raster) {
+            raster.emplace(zmchost::Raster::Open(SharedModule(), name));
+            raster->KeepCopies(keepsCopies);
+        }
         return *raster;
     }
 
@@ -47,6 +52,7 @@ public:
 
 private:
     std::string name;
+    bool keepsCopies;
     std::optional<zmchost::Raster> raster;
 };
 

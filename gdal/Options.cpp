@@ -14,6 +14,7 @@ const char* const kOpenOptionsXml = R"(<OpenOptionList>
     <Value>INT16</Value>
     <Value>SIGNEDBYTE</Value>
   </Option>
+  <Option name='KEEP_COPIES' type='boolean' default='NO' description='Whether stores of statistics, histograms and color tables keep what was stored before in FILE.zmcmeta until they have reached the disk'/>
 </OpenOptionList>)";
 
 const char* const kCreationOptionsXml = R"(<CreationOptionList>
@@ -100,9 +101,12 @@ bool TakeCount(CSLConstList options, const char* name, const char* automatic, Nu
 
 }  // namespace
 
-SignedByteAs SignedByteFrom(CSLConstList openOptions) {
-    const char* const word = CSLFetchNameValueDef(openOptions, "INT8_AS", "INT16");
-    return EQUAL(word, "SIGNEDBYTE") ? SignedByteAs::FlaggedByte : SignedByteAs::Int16;
+OpenOptions OpenOptionsFrom(CSLConstList options) {
+    OpenOptions parsed;
+    if (EQUAL(CSLFetchNameValueDef(options, "INT8_AS", "INT16"), "SIGNEDBYTE"))
+        parsed.signedByteAs = SignedByteAs::FlaggedByte;
+    parsed.keepCopies = CPLFetchBool(options, "KEEP_COPIES", false);
+    return parsed;
 }
 
 std::optional<zmchost::Resampling> ResamplingFrom(const char* word) {

@@ -16,7 +16,12 @@ namespace zmcgdal {
 extern const char* const kOpenOptionsXml;
 extern const char* const kCreationOptionsXml;
 
-SignedByteAs SignedByteFrom(CSLConstList openOptions);
+struct OpenOptions {
+    SignedByteAs signedByteAs = SignedByteAs::Int16;
+    bool keepCopies = false;  // zmchost::Raster::KeepCopies
+};
+
+OpenOptions OpenOptionsFrom(CSLConstList options);
 
 // Names of GDAL's overview methods and of this project's, in any case.
 std::optional<zmchost::Resampling> ResamplingFrom(const char* word);

@@ -429,9 +429,7 @@ zelm::RasterBandStats<T> Raster::Statistics(std::uint32_t band) const {
     return record;
 }
 
-// Runs what stores and reads back.
-template <class Action>
-void Raster::Store(Action action) {
+void Raster::Store(const std::function<void()>& action) {
     if (!keepsCopies || !header) {
         action();
         return;

@@ -13,6 +13,7 @@
 #define ZMC_HOST_RASTER_H
 
 #include <cstdint>
+#include <functional>
 #include <map>
 #include <optional>
 #include <span>
@@ -103,11 +104,13 @@ public:
         Write(level, window, AllBands(), pixels.data());
     }
 
-    // From now on each of the three stores below keeps a copy of what was stored before in a file
+    // From now on each of the four stores below keeps a copy of what was stored before in a file
     // beside the pyramid (MetadataCopy.h) until it has reached the disk, and returns only then. A
     // process that dies or a power failure then loses nothing of the old statistics. Off at first:
     // it costs some flushes of the disk for each store.
     void KeepCopies(bool keep) { keepsCopies = keep; }
+    // Runs `action`, which stores through the module's reader, and throws where it has failed.
+    void Store(const std::function<void()>& action);
 
     bool HasStatistics(std::uint32_t band) const;
     // The record of a band. Throws if there is none.
@@ -154,8 +157,6 @@ private:
                    std::span<const std::uint32_t> bands, const unsigned char* pixels);
     template <class T>
     zelm::RasterReader<T>& Typed() const;
-    template <class Action>
-    void Store(Action action);
 
     // In this order: the module goes last.
     ModulePtr module;

@@ -382,6 +382,25 @@ class Updates(FolderTest):
         self.assertEqual(dataset.GetRasterBand(1).GetMinimum(), 0)
         self.assertEqual(dataset.GetRasterBand(3).GetMaximum(), 255)
 
+    def test_stores_that_keep_copies_leave_none_and_need_one(self):
+        def store(maximum, *options):
+            dataset = gdal.OpenEx(self.name, gdal.OF_UPDATE, open_options=list(options))
+            dataset.GetRasterBand(2).SetStatistics(1, maximum, 1.5, 0.25)
+
+        def maximum():
+            dataset = gdal.Open(self.name)
+            return dataset.GetRasterBand(2).GetStatistics(0, 0)[1]
+
+        store(2, "KEEP_COPIES=YES")
+        self.assertEqual((maximum(), self.files()), (2, ["raster.pyr"]))
+        # Where no copy can be made, nothing is stored over the only document.
+        os.mkdir(self.name + ".zmcmeta")
+        with self.assertRaises(RuntimeError):
+            quiet(lambda: store(3, "KEEP_COPIES=YES"))
+        self.assertEqual(maximum(), 2)
+        store(4, "KEEP_COPIES=NO")
+        self.assertEqual(maximum(), 4)
+
     def test_statistics_of_a_file_stay_until_they_are_renewed(self):
         dataset = gdal.Open(self.name, gdal.GA_Update)
         dataset.GetRasterBand(2).WriteArray(np.full((600, 700), 9, np.uint8))
