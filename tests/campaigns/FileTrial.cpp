@@ -149,7 +149,7 @@ Verdict FileTrial::Try(const Bytes& file, const Depth& depth) {
     Look(oracle, depth, verdict);
     const Bytes now = Take();
     if (now.size() != std::min<std::size_t>(file.size(), kTaken) ||
-        std::memcmp(now.data(), file.data(), now.size()) != 0)
+        !std::equal(now.begin(), now.end(), file.begin()))
         verdict.Complain("the file has been changed by reading");
     if (depth.stores && verdict.complaints.empty() && oracle.opening == FileOracle::Opening::Open &&
         oracle.hasReader && oracle.hasTiles) {
