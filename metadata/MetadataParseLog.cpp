@@ -25,6 +25,7 @@ constexpr wchar_t kFileName[] = L"metadata_parse_log.log";
 // gives them back, whatever the charset.
 std::wstring ReadVariable(const char* name) {
     std::wstring wide;
+    // NOLINTNEXTLINE(concurrency-mt-unsafe): nothing of ours changes the environment.
     if (const char* value = std::getenv(name))
         for (; *value; ++value) wide += static_cast<wchar_t>(static_cast<signed char>(*value));
     return wide;

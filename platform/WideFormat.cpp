@@ -181,8 +181,8 @@ std::uintmax_t NextUnsigned(Length length, Arguments& arguments) {
 template <class Unit, class Number>
 void PutNumber(Output<Unit>& out, const Conversion& item, const char* length, Number number) {
     char format[32];
-    std::snprintf(format, sizeof format, "%%%s%s*.*%s%c", item.flags, item.left ? "-" : "", length,
-                  item.conversion);
+    static_cast<void>(std::snprintf(format, sizeof format, "%%%s%s*.*%s%c", item.flags,
+                                    item.left ? "-" : "", length, item.conversion));
     char digits[kLongestNumber + 1];
     if (std::snprintf(digits, sizeof digits, format, item.width, item.precision, number) < 0)
         return;
@@ -192,7 +192,7 @@ void PutNumber(Output<Unit>& out, const Conversion& item, const char* length, Nu
 template <class Unit>
 void PutPointer(Output<Unit>& out, const Conversion& item, const void* pointer) {
     char digits[32];
-    std::snprintf(digits, sizeof digits, "%p", pointer);
+    static_cast<void>(std::snprintf(digits, sizeof digits, "%p", pointer));
     Conversion text = item;
     text.precision = -1;
     out.PutText(static_cast<const char*>(digits), text);
