@@ -56,7 +56,8 @@ public:
         }
         ReduceRow<T>(method, bands, source.width, {rows.data(), masks.data()}, rules.data(),
                      line.data(), nullptr);
-        return line.data() + std::size_t{window.x - source.x / 2} * bands;
+        const std::size_t skipped = window.x - source.x / 2;
+        return line.data() + skipped * bands;
     }
 
 private:
