@@ -169,7 +169,7 @@ void CoordSysLog::ApplyControlLine(const char* line) {
     levelMask = toDebugger != 0 || toFile != 0 ? bits & 0x3FFF : 0;
 }
 
-// NOLINTNEXTLINE(cert-dcl50-cpp): its callers outside this library give printf arguments.
+// NOLINTNEXTLINE(cert-dcl50-cpp): its callers give printf arguments.
 void CoordSysLog::LogMessage(std::uint32_t level, const WideChar* format, ...) {
     CoordSysLog* const log = Instance().load(std::memory_order_acquire);
     if (!log || (log->levelMask & level) == 0) return;

@@ -295,13 +295,11 @@ void ApplyNoDataMask(const RasterReader<T>& reader, std::uint32_t width, std::ui
     }
 }
 
-// NOLINTBEGIN(bugprone-macro-parentheses): `type` is a type.
 #define ZMC_X(type, name, code)                                                                    \
     template void ComputeNoDataMask<type>(const RasterReader<type>&, std::uint32_t, std::uint32_t, \
                                           std::uint32_t, const type*, unsigned char*);             \
     template void ApplyNoDataMask<type>(const RasterReader<type>&, std::uint32_t, std::uint32_t,   \
                                         std::uint32_t, type*, const unsigned char*);
-// NOLINTEND(bugprone-macro-parentheses)
 ZMC_ELEMENT_TYPES(ZMC_X)
 #undef ZMC_X
 

@@ -140,7 +140,6 @@ std::wstring TakeText(InputBytes& input) {
 }
 
 bool IsCharacter(wchar_t unit) {
-    // NOLINTNEXTLINE(bugprone-signed-char-misuse): the log widens bytes with their sign.
     const auto code = static_cast<std::uint32_t>(unit);
     return code <= 0x10FFFF && !zmcfuzz::IsSurrogate(code);
 }

@@ -125,10 +125,8 @@ void ExpectCut(const std::basic_string<Unit>& found, const std::u16string& expec
                std::size_t capacity) {
     const std::u16string cut = expected.substr(0, capacity - 1);
     ZMC_EXPECT(found.size() == cut.size());
-    ZMC_EXPECT(std::equal(found.begin(), found.end(), cut.begin(), [](Unit a, char16_t b) {
-        // NOLINTNEXTLINE(bugprone-signed-char-misuse): wide units are no bytes.
-        return static_cast<std::uint32_t>(a) == b;
-    }));
+    ZMC_EXPECT(std::equal(found.begin(), found.end(), cut.begin(),
+                          [](Unit a, char16_t b) { return static_cast<std::uint32_t>(a) == b; }));
 }
 
 class Session {

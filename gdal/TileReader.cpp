@@ -29,7 +29,6 @@ Window Intersection(const Window& a, const Window& b) {
 void Widen(const unsigned char* bytes, std::size_t count, unsigned char* out) {
     const auto* from = reinterpret_cast<const signed char*>(bytes);
     auto* to = reinterpret_cast<std::int16_t*>(out);
-    // NOLINTNEXTLINE(bugprone-signed-char-misuse): a signed byte is a number here.
     for (std::size_t i = 0; i < count; ++i) to[i] = from[i];
 }
 

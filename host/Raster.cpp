@@ -468,7 +468,7 @@ void Raster::SetHistograms(const std::vector<zelm::RasterBandHistogram<T>>& hist
     CheckWritable("store histograms");
     const zelm::Array<zelm::RasterBandHistogram<T>> given = ToArray(histograms);
     for (std::size_t i = 0; i < histograms.size(); ++i)
-        if (!HaveSameCounts(given.data[i], histograms[i])) throw std::bad_alloc();
+        if (!given.data || !HaveSameCounts(given.data[i], histograms[i])) throw std::bad_alloc();
     const std::size_t before = typed.GetHistograms().shape.elements;
     Store([&] {
         typed.SetHistograms(given);

@@ -144,6 +144,7 @@ std::intmax_t NextSigned(Length length, Arguments& arguments) {
             return va_arg(arguments.list, long);
         case Length::LongLong:
             return va_arg(arguments.list, long long);
+        // NOLINTNEXTLINE(bugprone-branch-clone): the types differ.
         case Length::Max:
             return va_arg(arguments.list, std::intmax_t);
         case Length::Size:
@@ -164,6 +165,7 @@ std::uintmax_t NextUnsigned(Length length, Arguments& arguments) {
             return va_arg(arguments.list, unsigned long);
         case Length::LongLong:
             return va_arg(arguments.list, unsigned long long);
+        // NOLINTNEXTLINE(bugprone-branch-clone): the types differ.
         case Length::Max:
             return va_arg(arguments.list, std::uintmax_t);
         case Length::Size:
@@ -201,6 +203,7 @@ void PutPointer(Output<Unit>& out, const Conversion& item, const void* pointer) 
 
 template <class Unit>
 void PutString(Output<Unit>& out, const Conversion& item, bool narrow, Arguments& arguments) {
+    // NOLINTNEXTLINE(bugprone-branch-clone): the types differ.
     if (narrow)
         out.PutText(va_arg(arguments.list, const char*), item);
     else
@@ -313,6 +316,7 @@ std::size_t FormatWideV(char16_t* buffer, std::size_t capacity, const char16_t* 
     return FormatCopied(buffer, capacity, format, arguments);
 }
 
+// NOLINTNEXTLINE(cert-dcl50-cpp): printf by another name.
 std::size_t FormatWide(wchar_t* buffer, std::size_t capacity, const wchar_t* format, ...) {
     std::va_list arguments;
     va_start(arguments, format);
@@ -321,6 +325,7 @@ std::size_t FormatWide(wchar_t* buffer, std::size_t capacity, const wchar_t* for
     return units;
 }
 
+// NOLINTNEXTLINE(cert-dcl50-cpp): likewise.
 std::size_t FormatWide(char16_t* buffer, std::size_t capacity, const char16_t* format, ...) {
     std::va_list arguments;
     va_start(arguments, format);
