@@ -29,7 +29,7 @@ const char* NarrowText(const String& value) {
 // Tells numbers below the range of a double from those above it: by the power of ten that the first
 // digit other than 0 stands for. The number lies in a zero-terminated text.
 bool IsTiny(std::string_view number) {
-    constexpr long long kFar = 1ll << 40;  // longer than any text, and far from overflow
+    constexpr long long kFar = 1LL << 40;  // longer than any text, and far from overflow
     const std::size_t mark = std::min(number.find_first_of("eE"), number.size());
     const std::string_view digits = number.substr(0, mark);
     const std::size_t point = std::min(digits.find('.'), digits.size());
@@ -178,6 +178,7 @@ bool ExtractConnectionParameters(const Array<String>& connection, Array<String>&
     if (!ReserveStrings(out, count)) return true;
     std::uint32_t next = 0;
     for (std::uint32_t i = 0; i < connection.shape.elements; ++i)
+        // NOLINTNEXTLINE(clang-analyzer-core.CallAndMessage): there is room for as many.
         if (!FindFormat(connection.data[i])) out.data[next++] = connection.data[i];
     return true;
 }

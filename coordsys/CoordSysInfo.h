@@ -11,6 +11,7 @@
 
 namespace zelm {
 
+// NOLINTNEXTLINE(bugprone-reserved-identifier): of the loop that a compiler copies arrays in.
 struct CoordSysInfo {
     String firstText;
     std::int64_t firstValue = 0;

@@ -24,7 +24,8 @@ constexpr std::size_t kControlLineLength = 19;
 std::atomic_ref<CoordSysLog*> Instance() { return std::atomic_ref(gpCoordSysLogInstance); }
 
 struct StreamCloser {
-    void operator()(std::FILE* stream) const { std::fclose(stream); }
+    // What is written through a holder, the notes, are lost on a full disk without a word.
+    void operator()(std::FILE* stream) const { static_cast<void>(std::fclose(stream)); }
 };
 using StreamHolder = std::unique_ptr<std::FILE, StreamCloser>;
 
@@ -46,7 +47,8 @@ bool IsControlLine(const char* line) {
 
 void WriteNotes(const String& path) {
     if (const StreamHolder file = OpenControlFile(path, "w+"))
-        std::fwrite(kCoordSysLogNotes, 1, sizeof kCoordSysLogNotes - 1, file.get());
+        static_cast<void>(
+            std::fwrite(kCoordSysLogNotes, 1, sizeof kCoordSysLogNotes - 1, file.get()));
 }
 
 // A position counts by its low 32 bits, signed, so a file beyond 2 GiB is not full. Only a file
@@ -131,7 +133,8 @@ String CoordSysLog::PathOf(const char* name) const {
 }
 
 void CoordSysLog::CloseStream() {
-    if (stream) std::fclose(stream);
+    // Every line was written out by itself.
+    if (stream) static_cast<void>(std::fclose(stream));
     stream = nullptr;
 }
 
@@ -166,6 +169,7 @@ void CoordSysLog::ApplyControlLine(const char* line) {
     levelMask = toDebugger != 0 || toFile != 0 ? bits & 0x3FFF : 0;
 }
 
+// NOLINTNEXTLINE(cert-dcl50-cpp): its callers give printf arguments.
 void CoordSysLog::LogMessage(std::uint32_t level, const WideChar* format, ...) {
     CoordSysLog* const log = Instance().load(std::memory_order_acquire);
     if (!log || (log->levelMask & level) == 0) return;
@@ -201,8 +205,12 @@ void CoordSysLog::WriteLine(const WideChar* message) {
     WideChar line[kTextCapacity];
     platform::FormatWide(line, kTextCapacity, u"%hs, %5d, %5d, %s \n", now, 0, ++sequence, message);
     const String text(line);
-    if (const char* utf8 = text.GetUtf8()) std::fwrite(utf8, 1, std::strlen(utf8), stream);
-    RotateIfFull();
+    const char* const utf8 = text.GetUtf8();
+    // What is longer than the stream's buffer passes it by, and a flush has nothing to fail on.
+    if (utf8 && std::fputs(utf8, stream) < 0)
+        CloseStream();
+    else
+        RotateIfFull();
 }
 
 // Moving to the end also writes the line out, so that a crash loses nothing and a full disk shows.

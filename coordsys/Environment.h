@@ -11,6 +11,7 @@ namespace zelm {
 
 class Environment : public Object {
 public:
+    // cppcheck-suppress duplInheritedMember ; each class has a code of its own by this name
     static const std::uint32_t typeCode;
 
     bool IsKindOf(std::uint32_t code) const override {

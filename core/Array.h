@@ -21,6 +21,7 @@ template <class T>
 class Array : public Object {
 public:
     // Every instance draws a code of its own for the word "Array".
+    // cppcheck-suppress duplInheritedMember ; each class has a code of its own by this name
     static const std::uint32_t typeCode;
 
     T* data = nullptr;

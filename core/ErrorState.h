@@ -54,6 +54,7 @@ public:
     ErrorState() = default;
     // A copy starts healthy, and assignment leaves the target's state: records are not copied.
     ErrorState(const ErrorState&) : error() {}
+    // NOLINTNEXTLINE(cert-oop54-cpp): there is nothing that assigning to itself could break.
     ErrorState& operator=(const ErrorState&) { return *this; }
     virtual ~ErrorState() = default;
 

@@ -13,8 +13,9 @@ String Object::ToString() const { return MakeObjectUrl("Object", this); }
 
 String MakeObjectUrl(const char* word, const void* object) {
     char address[24];
-    std::snprintf(address, sizeof address, "}@%" PRIx64,
-                  static_cast<std::uint64_t>(reinterpret_cast<std::uintptr_t>(object)));
+    static_cast<void>(
+        std::snprintf(address, sizeof address, "}@%" PRIx64,
+                      static_cast<std::uint64_t>(reinterpret_cast<std::uintptr_t>(object))));
     return String("{") + String(word) + String(address);
 }
 

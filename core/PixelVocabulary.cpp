@@ -1,5 +1,6 @@
 #include "core/PixelVocabulary.h"
 
+#include <cstring>
 #include <istream>
 #include <string>
 #include <string_view>
@@ -57,7 +58,8 @@ Code CodeOf(const Word<Code> (&words)[N], std::string_view token, Code unknown) 
 std::string ReadToken(std::istream& stream) {
     std::string token;
     stream >> token;
-    return token.c_str();
+    token.resize(std::strlen(token.c_str()));  // a word ends at a zero
+    return token;
 }
 
 }  // namespace

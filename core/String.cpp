@@ -10,11 +10,12 @@
 namespace zelm {
 namespace {
 
+// An empty text with room for `units`; false, and null, where there is no memory.
 template <class Unit>
-Unit* AllocateText(std::size_t units) {
-    Unit* text = new (std::nothrow) Unit[units + 1];
+bool AllocateText(Unit*& text, std::size_t units) {
+    text = new (std::nothrow) Unit[units + 1];
     if (text) text[0] = Unit{0};
-    return text;
+    return text != nullptr;
 }
 
 const char16_t* AsUtf16(const WideChar* text) { return reinterpret_cast<const char16_t*>(text); }
@@ -30,8 +31,8 @@ char* MakeNarrow(const WideChar* text, NarrowConversion convert) {
     const std::size_t units = Units(text);
     std::size_t bytes = convert(AsUtf16(text), units, nullptr, 0);
     if (bytes == platform::kConversionFailed) bytes = 0;
-    char* narrow = AllocateText<char>(bytes);
-    if (!narrow) return nullptr;
+    char* narrow = nullptr;
+    if (!AllocateText(narrow, bytes)) return nullptr;
     if (bytes != 0) {
         convert(AsUtf16(text), units, narrow, bytes);
         narrow[bytes] = '\0';
@@ -57,6 +58,7 @@ String::String(const String& other) {
 
 String::~String() { Free(); }
 
+// NOLINTNEXTLINE(cert-oop54-cpp): a string that is assigned to itself ends as null.
 String& String::operator=(const String& other) {
     Free();
     if (other.wide) {
@@ -98,8 +100,8 @@ String& String::Append(const String& other) {
     const std::size_t ownUnits = wide ? Units(wide) : 0;
     const std::size_t otherUnits = Units(other.wide);
     const std::uint32_t otherLength = other.length;
-    WideChar* joined = AllocateText<WideChar>(ownUnits + otherUnits);
-    if (joined) {
+    WideChar* joined = nullptr;
+    if (AllocateText(joined, ownUnits + otherUnits)) {
         if (wide) std::copy_n(wide, ownUnits, joined);
         std::copy_n(other.wide, otherUnits, joined + ownUnits);
         joined[ownUnits + otherUnits] = 0;
@@ -118,8 +120,8 @@ void String::Substring(std::uint32_t start, std::uint32_t count, String& out) co
     const std::size_t begin = std::min<std::size_t>(start, available);
     const std::size_t copied = std::min<std::size_t>(units, available - begin);
     out.Free();
-    WideChar* text = AllocateText<WideChar>(copied);
-    if (!text) return;
+    WideChar* text = nullptr;
+    if (!AllocateText(text, copied)) return;
     if (copied != 0) std::copy_n(wide + begin, copied, text);
     text[copied] = 0;
     out.wide = text;
@@ -180,8 +182,7 @@ void String::FreeCaches() const {
 }
 
 void String::CopyUnits(const WideChar* text, std::size_t units) {
-    wide = AllocateText<WideChar>(units);
-    if (!wide) return;
+    if (!AllocateText(wide, units)) return;
     std::copy_n(text, units + 1, wide);
     length = static_cast<std::uint32_t>(units);
 }
@@ -190,8 +191,7 @@ void String::CopyUnits(const WideChar* text, std::size_t units) {
 // it is how the length of narrow text is defined throughout the object model.
 void String::ConvertFromUtf8(const char* text, std::size_t bytes) {
     length = static_cast<std::uint32_t>(bytes);
-    wide = AllocateText<WideChar>(bytes);
-    if (!wide) return;
+    if (!AllocateText(wide, bytes)) return;
     const std::size_t units = platform::Utf8ToUtf16(text, bytes, AsUtf16(wide), bytes);
     wide[units == platform::kConversionFailed ? 0 : std::min(units, bytes)] = 0;
 }

@@ -57,13 +57,15 @@ public:
     // The pointer of element type T, which is empty unless T is the pixel type.
     template <class T>
     const RasterReaderPtr<T>& As() const {
-#define ZMC_X(type, name, code) \
-    if constexpr (std::is_same_v<T, type>) return reader##name;
-        ZMC_ELEMENT_TYPES(ZMC_X)
-#undef ZMC_X
+        return Member(std::type_identity<T>{});
     }
 
 private:
+#define ZMC_X(type, name, code) \
+    const RasterReaderPtr<type>& Member(std::type_identity<type>) const { return reader##name; }
+    ZMC_ELEMENT_TYPES(ZMC_X)
+#undef ZMC_X
+
     void ResetReaders();
     template <class T>
     void Bind(RasterReaderPtr<T>& member, RasterReaderPtr<T> reader);

@@ -47,12 +47,14 @@ double Shade(const Heights& h, std::uint32_t x, std::uint32_t y) {
 }  // namespace
 
 void Fail(const std::string& text) {
-    std::fprintf(stderr, "%s\n", text.c_str());
+    static_cast<void>(std::fprintf(stderr, "%s\n", text.c_str()));
+    // NOLINTNEXTLINE(concurrency-mt-unsafe): the examples have one thread.
     std::exit(1);
 }
 
 Host::Host(const char* modulePath, const char* kind) {
     void* module = dlopen(modulePath, RTLD_NOW | RTLD_LOCAL);
+    // NOLINTNEXTLINE(concurrency-mt-unsafe): likewise.
     if (!module) Fail(dlerror());
     const auto create = reinterpret_cast<decltype(&CreateDataConnectionFactory)>(
         dlsym(module, "CreateDataConnectionFactory"));
@@ -112,9 +114,10 @@ void WriteShadedPicture(const std::string& file, const Heights& heights) {
             const auto lit = [shade](unsigned char component) {
                 return static_cast<unsigned char>(std::min(255.0, component * shade));
             };
-            row[x * 3] = lit(c.red);
-            row[x * 3 + 1] = lit(c.green);
-            row[x * 3 + 2] = lit(c.blue);
+            const std::size_t pixel = std::size_t{x} * 3;
+            row[pixel] = lit(c.red);
+            row[pixel + 1] = lit(c.green);
+            row[pixel + 2] = lit(c.blue);
         }
         if (picture->RasterIO(GF_Write, 0, static_cast<int>(y), width, 1, row.data(), width, 1,
                               GDT_Byte, 3, nullptr, 3, 0, 1) != CE_None)

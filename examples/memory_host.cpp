@@ -50,12 +50,12 @@ std::vector<float> MakeBands(const Heights& heights, std::int32_t interleave) {
 // owns the buffer, and must never be taken from outside it.
 String DescribeRaster(const Heights& heights, std::int32_t interleave, float* pixels) {
     char text[256];
-    std::snprintf(text, sizeof text,
-                  "SAMPLES=%" PRIu32 ";LINES=%" PRIu32 ";BANDS=%" PRIu32
-                  ";INTERLEAVE=%d;PIXELTYPE=%" PRIu32
-                  ";PIXELSIZE=0.25,0.25;TIEPTMAP=-180.125,90.125;NAME=geoid;PIXELDATA=%p",
-                  heights.width, heights.height, kBands, interleave, PixelTypeCode::Single,
-                  static_cast<void*>(pixels));
+    static_cast<void>(std::snprintf(
+        text, sizeof text,
+        "SAMPLES=%" PRIu32 ";LINES=%" PRIu32 ";BANDS=%" PRIu32 ";INTERLEAVE=%d;PIXELTYPE=%" PRIu32
+        ";PIXELSIZE=0.25,0.25;TIEPTMAP=-180.125,90.125;NAME=geoid;PIXELDATA=%p",
+        heights.width, heights.height, kBands, interleave, PixelTypeCode::Single,
+        static_cast<void*>(pixels)));
     return String(text);
 }
 
@@ -100,7 +100,7 @@ Summary ReadHeightBand(RasterReader<float>& reader, std::vector<float>& values) 
 // Reads one window with the band list (2, 0); its checksum does not depend on the interleave.
 double WindowChecksum(RasterReader<float>& reader) {
     constexpr std::uint32_t width = 300, height = 200;
-    std::vector<float> tile(width * height * 2);
+    std::vector<float> tile(std::size_t{width} * height * 2);
     std::vector<unsigned char> mask(tile.size(), 0);
     if (!reader.ReadTile(500, 250, width, height, BandList{2, 0}, 0, tile.data(), mask.data()))
         Fail("the window cannot be read");
@@ -117,7 +117,7 @@ double WindowChecksum(RasterReader<float>& reader) {
 // that were out.
 std::uint64_t MaskOutAndRestore(RasterReader<float>& reader, std::vector<float>& values) {
     constexpr std::uint32_t width = 64, height = 32;
-    std::vector<float> before(width * height), stamped;
+    std::vector<float> before(std::size_t{width} * height), stamped;
     std::vector<unsigned char> mask(before.size(), 0);
     reader.ReadTile(100, 100, width, height, BandList{0}, 0, before.data(), mask.data());
     const std::uint64_t full = ReadHeightBand(reader, values).valid;

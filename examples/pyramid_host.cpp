@@ -33,9 +33,9 @@ Heights HalfSize(const Heights& fine) {
     coarse.height = fine.height / 2;
     coarse.values.resize(std::size_t{coarse.width} * coarse.height);
     for (std::uint32_t y = 0; y < coarse.height; ++y) {
-        const float* upper = &fine.values[std::size_t{2 * y} * fine.width];
+        const float* upper = &fine.values[std::size_t{y} * 2 * fine.width];
         const float* lower = upper + fine.width;
-        for (std::uint32_t x = 0; x < coarse.width; ++x)
+        for (std::size_t x = 0; x < coarse.width; ++x)
             coarse.values[std::size_t{y} * coarse.width + x] =
                 (upper[2 * x] + upper[2 * x + 1] + lower[2 * x] + lower[2 * x + 1]) / 4;
     }
@@ -58,7 +58,7 @@ RasterReader<float>& ReaderOf(const DataConnectionPtr& connection) {
 
 // Writes one level tile by tile: whole tiles are what every ordering takes.
 void WriteLevel(RasterReader<float>& reader, const Heights& level, int number) {
-    std::vector<float> tile(kTile * kTile);
+    std::vector<float> tile(std::size_t{kTile} * kTile);
     std::vector<unsigned char> mask(tile.size(), 0);
     for (std::uint32_t y = 0; y < level.height; y += kTile) {
         for (std::uint32_t x = 0; x < level.width; x += kTile) {
@@ -158,7 +158,7 @@ std::uint64_t TileDataStart(const char* file) {
     std::FILE* stream = std::fopen(file, "rb");
     if (!stream || std::fread(head, 1, sizeof head, stream) != sizeof head)
         Fail(std::string(file) + ": cannot be read");
-    std::fclose(stream);
+    static_cast<void>(std::fclose(stream));
     std::uint64_t start = 0;
     for (int i = 11; i >= 4; --i) start = start << 8 | head[i];
     return start;

@@ -85,11 +85,11 @@ public:
     ErrorCapture& operator=(const ErrorCapture&) = delete;
     ~ErrorCapture() {
         stderr = before;
-        std::fclose(stream);
+        static_cast<void>(std::fclose(stream));
         std::free(text);
     }
     std::string Text() {
-        std::fflush(stream);
+        static_cast<void>(std::fflush(stream));
         return {text, size};
     }
 
@@ -117,7 +117,7 @@ public:
     void Write(const std::string& bytes) const {
         std::FILE* const file = std::fopen(Control().c_str(), "wb");
         ZMC_EXPECT(file && std::fwrite(bytes.data(), 1, bytes.size(), file) == bytes.size());
-        std::fclose(file);
+        ZMC_EXPECT(std::fclose(file) == 0);
     }
     static std::string Read(const std::string& name) {
         std::string bytes;
@@ -125,7 +125,7 @@ public:
             char block[4096];
             while (const std::size_t n = std::fread(block, 1, sizeof block, file))
                 bytes.append(block, n);
-            std::fclose(file);
+            static_cast<void>(std::fclose(file));
         }
         return bytes;
     }
@@ -151,7 +151,7 @@ public:
         if (std::filesystem::is_directory(name, ignored)) std::filesystem::remove(name, ignored);
         if (std::FILE* const file = std::fopen(name.c_str(), "wb")) {
             ZMC_EXPECT(ftruncate(fileno(file), static_cast<off_t>(kSizes[kind % 8])) == 0);
-            std::fclose(file);
+            static_cast<void>(std::fclose(file));
         }
     }
 
@@ -165,7 +165,7 @@ public:
         std::error_code ignored;
         if (kind % 8 >= 5) {
             std::filesystem::remove_all(Logs(), ignored);
-            if (kind % 8 == 7) std::fclose(std::fopen(Logs().c_str(), "wb"));
+            if (kind % 8 == 7) ZMC_EXPECT(std::fclose(std::fopen(Logs().c_str(), "wb")) == 0);
             if (kind % 8 == 5) std::filesystem::create_symlink("nothing", Logs(), ignored);
             return;
         }
@@ -256,7 +256,7 @@ constexpr std::size_t kTimeLength = 24;
 // A line without its time.
 std::u16string LineOf(std::uint32_t sequence, const std::u16string& message) {
     char numbers[32];
-    std::snprintf(numbers, sizeof numbers, ", %5d, %5u, ", 0, sequence);
+    static_cast<void>(std::snprintf(numbers, sizeof numbers, ", %5d, %5u, ", 0, sequence));
     std::u16string line = zmcfuzz::Utf16Of(numbers) + message + u" \n";
     line.resize(std::min(line.size(), kLongest - kTimeLength));
     return line;

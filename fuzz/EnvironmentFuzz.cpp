@@ -77,10 +77,8 @@ struct Variable {
         return variable;
     }
     void Export(const char* name) const {
-        if (set)
-            setenv(name, value.c_str(), 1);
-        else
-            unsetenv(name);
+        // NOLINTNEXTLINE(concurrency-mt-unsafe): this program has one thread.
+        ZMC_EXPECT((set ? setenv(name, value.c_str(), 1) : unsetenv(name)) == 0);
     }
     bool IsEmpty() const { return !set || value.empty(); }
 };
@@ -107,7 +105,7 @@ std::string ReadAll(const std::string& name) {
         char block[4096];
         while (const std::size_t n = std::fread(block, 1, sizeof block, file))
             bytes.append(block, n);
-        std::fclose(file);
+        static_cast<void>(std::fclose(file));
     }
     return bytes;
 }
@@ -253,7 +251,7 @@ std::string FolderOfNoEngine() {
         const String name = (path + "/").c_str() + zelm::CoordSysFuncPtrs::EngineFileName();
         std::FILE* const file = std::fopen(name.GetUtf8(), "wb");
         ZMC_EXPECT(file && std::fputs("not a library", file) >= 0);
-        std::fclose(file);
+        ZMC_EXPECT(std::fclose(file) == 0);
         return path;
     }();
     return folder;
@@ -295,7 +293,7 @@ void RunFactory(InputBytes& input) {
                                     : pe.empty()  ? pe
                                                   : Scratch().Path() + "/none/" + pe;
     if (kind % 16 == 8) bin = FolderOfNoEngine();
-    if (bin.find('/') == 0 && kind % 16 != 8) bin.erase(0, 1);
+    if (bin.starts_with('/') && kind % 16 != 8) bin.erase(0, 1);
     environment.GetSetting(zelm::EnvironmentKeys::kBinDirectory) = bin.c_str();
     environment.GetSetting(zelm::EnvironmentKeys::kPeDirectory) = peDirectory.c_str();
     if (kind % 3 != 0) environment.GetSetting(zelm::EnvironmentKeys::kGdalDirectory) = gdal.c_str();

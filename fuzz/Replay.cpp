@@ -41,7 +41,7 @@ int main(int count, char** arguments) {
     for (const std::filesystem::path& input : inputs) {
         const std::vector<char> bytes = Bytes(input);
         std::printf("%s\n", input.c_str());
-        std::fflush(stdout);
+        static_cast<void>(std::fflush(stdout));
         LLVMFuzzerTestOneInput(reinterpret_cast<const std::uint8_t*>(bytes.data()), bytes.size());
     }
     std::printf("replayed %zu inputs\n", inputs.size());

@@ -32,6 +32,7 @@ struct Model {
 };
 
 Model OfWide(const std::u16string& text) {
+    // cppcheck-suppress stlcstrConstructor ; it ends at the first zero
     const std::u16string cut(text.c_str());
     return {false, cut, static_cast<std::uint32_t>(cut.size())};
 }
@@ -57,6 +58,7 @@ bool localeIsUtf8 = false;
 
 void ChooseLocale(bool utf8) {
     if (utf8 == localeIsUtf8) return;
+    // NOLINTNEXTLINE(concurrency-mt-unsafe): this program has one thread.
     localeIsUtf8 = std::setlocale(LC_CTYPE, utf8 ? "C.UTF-8" : "C") && utf8;
 }
 

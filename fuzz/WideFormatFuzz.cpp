@@ -217,7 +217,7 @@ private:
         const auto address = static_cast<std::uintptr_t>(input.Size());
         void* const pointer = reinterpret_cast<void*>(address);
         char text[32];
-        std::snprintf(text, sizeof text, "%p", pointer);
+        static_cast<void>(std::snprintf(text, sizeof text, "%p", pointer));
         ExpectPadded(Widened(text), pointer, pointer);
     }
 
@@ -262,7 +262,7 @@ private:
         // Where the precision ends the text, nothing behind it belongs to it.
         const std::size_t most = MostUnits();
         const bool cut = most <= text.size();
-        text = text.substr(0, most);
+        text.resize(std::min(most, text.size()));
         std::vector<char> bytes;
         std::vector<wchar_t> wide;
         std::vector<char16_t> shorter;

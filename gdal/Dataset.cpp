@@ -59,6 +59,7 @@ Dataset::Dataset(std::shared_ptr<OpenFile> openFile, std::uint32_t levelShown, G
 }
 
 Dataset::~Dataset() {
+    // NOLINTNEXTLINE(bugprone-parent-virtual-call): the pixels, and the sidecar not yet.
     GDALDataset::FlushCache(true);
     if (creation) creation->Finish(*this);
     GDALPamDataset::FlushCache(true);

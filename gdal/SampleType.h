@@ -20,6 +20,7 @@ enum class SignedByteAs { Int16, FlaggedByte };
 
 template <class T>
 constexpr GDALDataType GdalTypeOf() {
+    constexpr bool isSigned = std::is_signed_v<T>;
     if constexpr (zelm::kIsComplex<T>)
         return sizeof(T) == 8 ? GDT_CFloat32 : GDT_CFloat64;
     else if constexpr (std::is_floating_point_v<T>)
@@ -33,11 +34,11 @@ constexpr GDALDataType GdalTypeOf() {
     else if constexpr (sizeof(T) == 1)
         return GDT_Byte;
     else if constexpr (sizeof(T) == 2)
-        return std::is_signed_v<T> ? GDT_Int16 : GDT_UInt16;
+        return isSigned ? GDT_Int16 : GDT_UInt16;
     else if constexpr (sizeof(T) == 4)
-        return std::is_signed_v<T> ? GDT_Int32 : GDT_UInt32;
+        return isSigned ? GDT_Int32 : GDT_UInt32;
     else
-        return std::is_signed_v<T> ? GDT_Int64 : GDT_UInt64;
+        return isSigned ? GDT_Int64 : GDT_UInt64;
 }
 
 // GDT_Unknown for a code that has no reader.

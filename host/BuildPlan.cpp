@@ -80,11 +80,11 @@ std::uint32_t DefaultMaxLevel(std::uint32_t width, std::uint32_t height, std::ui
 std::uint64_t StripMemory(std::uint64_t width, std::uint32_t levels, std::uint32_t halo,
                           std::uint64_t pixelBytes, std::uint32_t stripsAhead) {
     const std::uint64_t keptRows = halo == 0 ? 0 : 2 * halo + 2;
-    std::uint64_t rows = stripsAhead * kTileSide + (levels == 0 ? 0 : keptRows);
+    std::uint64_t rows = std::uint64_t{stripsAhead} * kTileSide + (levels == 0 ? 0 : keptRows);
     std::uint64_t bytes = rows * width * pixelBytes;
     // A coarser level has the strip that is being made and the one that is being written.
     for (std::uint32_t level = 1; level <= levels; ++level) {
-        rows = 2 * kTileSide + (level == levels ? 0 : keptRows);
+        rows = std::uint64_t{2} * kTileSide + (level == levels ? 0 : keptRows);
         bytes += rows * (width >> level) * pixelBytes;
     }
     return bytes;

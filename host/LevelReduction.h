@@ -47,7 +47,8 @@ public:
         masks.clear();
         const std::size_t stride = std::size_t{source.width} * bands;
         const std::int64_t first = (std::int64_t{window.y} + row) * 2 - halo - source.y;
-        for (std::int64_t y = first; y < first + 2 + 2 * std::int64_t{halo}; ++y) {
+        const std::int64_t end = first + 2 + 2 * std::int64_t{halo};
+        for (std::int64_t y = first; y < end; ++y) {
             const bool inside = y >= 0 && y < source.height;
             const std::size_t at = inside ? static_cast<std::size_t>(y) * stride : 0;
             rows.push_back(inside ? fine.data() + at : nullptr);
@@ -55,7 +56,8 @@ public:
         }
         ReduceRow<T>(method, bands, source.width, {rows.data(), masks.data()}, rules.data(),
                      line.data(), nullptr);
-        return line.data() + std::size_t{window.x - source.x / 2} * bands;
+        const std::size_t skipped = window.x - source.x / 2;
+        return line.data() + skipped * bands;
     }
 
 private:
@@ -82,7 +84,7 @@ private:
         const std::uint32_t first = start > kMargin ? start - kMargin : 0;
         const std::uint64_t end =
             std::min<std::uint64_t>((std::uint64_t{start} + extent + kMargin) * 2, limit);
-        return {first * 2, static_cast<std::uint32_t>(end - first * 2)};
+        return {first * 2, static_cast<std::uint32_t>(end - std::uint64_t{first} * 2)};
     }
 };
 

@@ -48,6 +48,7 @@ ModulePtr Module::Load(const std::string& path) {
 }
 
 std::string Module::DefaultPath() {
+    // NOLINTNEXTLINE(concurrency-mt-unsafe): nothing of ours changes the environment.
     if (const char* const set = std::getenv("ZMCRASTER_MODULE"); set && *set) return set;
     const std::string name = ModuleFileName();
     const std::string here = platform::FolderOf(

@@ -226,6 +226,7 @@ private:
             target.Visit([this]<class U>(zelm::RasterReader<U>& typed) {
                 if constexpr (std::is_same_v<T, U>) reader = &typed;
             });
+        if (!reader) throw Error(target.Name(), "build it", "it is of another pixel type");
         return *reader;
     }
 

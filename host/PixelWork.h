@@ -68,7 +68,8 @@ struct PixelWorkSetup {
 
 class Raster;
 
-// The work on the type of `target`, which outlives it.
+// The work on the type of `target`, which outlives it. Where the properties tell another type than
+// the raster's, moving tiles throws.
 std::unique_ptr<PixelWork> MakePixelWork(Raster& target, const PixelWorkSetup& setup);
 
 }  // namespace zmchost

@@ -378,7 +378,7 @@ void Raster::Write(std::uint32_t level, const Window& window, std::span<const st
     const auto* const given = static_cast<const unsigned char*>(pixels);
     std::vector<unsigned char> samples(given, given + count * bands.size() * SampleSize());
     if (mask)
-        Visit([&]<class T>(zelm::RasterReader<T>&) {
+        zelm::VisitElementType(props.pixelType, [&]<class T>(std::type_identity<T>) {
             StampSamples(props, bands, count, mask,
                          static_cast<T*>(static_cast<void*>(samples.data())));
         });
@@ -468,7 +468,7 @@ void Raster::SetHistograms(const std::vector<zelm::RasterBandHistogram<T>>& hist
     CheckWritable("store histograms");
     const zelm::Array<zelm::RasterBandHistogram<T>> given = ToArray(histograms);
     for (std::size_t i = 0; i < histograms.size(); ++i)
-        if (!HaveSameCounts(given.data[i], histograms[i])) throw std::bad_alloc();
+        if (!given.data || !HaveSameCounts(given.data[i], histograms[i])) throw std::bad_alloc();
     const std::size_t before = typed.GetHistograms().shape.elements;
     Store([&] {
         typed.SetHistograms(given);

@@ -13,6 +13,7 @@ namespace zelm {
 
 class Metadata : public Object {
 public:
+    // cppcheck-suppress duplInheritedMember ; each class has a code of its own by this name
     static const std::uint32_t typeCode;
 
     LockableMetadataImplPtr impl;  // holds no object if memory ran out

@@ -25,6 +25,7 @@ constexpr wchar_t kFileName[] = L"metadata_parse_log.log";
 // gives them back, whatever the charset.
 std::wstring ReadVariable(const char* name) {
     std::wstring wide;
+    // NOLINTNEXTLINE(concurrency-mt-unsafe): nothing of ours changes the environment.
     if (const char* value = std::getenv(name))
         for (; *value; ++value) wide += static_cast<wchar_t>(static_cast<signed char>(*value));
     return wide;
@@ -82,6 +83,7 @@ bool CanEncode(const Facet& facet, wchar_t unit) {
 bool CLocaleCanEncode(wchar_t unit) {
     std::mbstate_t state{};
     char bytes[MB_LEN_MAX];
+    // NOLINTNEXTLINE(concurrency-mt-unsafe): the state is this call's own.
     return std::wcrtomb(bytes, unit, &state) != static_cast<std::size_t>(-1);
 }
 
@@ -191,6 +193,7 @@ void MetadataParseLog::WriteHeader() {
     Log(1, header.c_str());  // serves as its own format: neither time nor number has a percent sign
 }
 
+// NOLINTNEXTLINE(cert-dcl50-cpp): its callers give printf arguments.
 void MetadataParseLog::Log(std::uint32_t messageLevel, const wchar_t* format, ...) {
     MetadataParseLog* const log = Instance().load(std::memory_order_acquire);
     if (!log || messageLevel > Load(log->level)) return;

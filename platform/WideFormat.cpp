@@ -144,6 +144,7 @@ std::intmax_t NextSigned(Length length, Arguments& arguments) {
             return va_arg(arguments.list, long);
         case Length::LongLong:
             return va_arg(arguments.list, long long);
+        // NOLINTNEXTLINE(bugprone-branch-clone): the types differ.
         case Length::Max:
             return va_arg(arguments.list, std::intmax_t);
         case Length::Size:
@@ -164,6 +165,7 @@ std::uintmax_t NextUnsigned(Length length, Arguments& arguments) {
             return va_arg(arguments.list, unsigned long);
         case Length::LongLong:
             return va_arg(arguments.list, unsigned long long);
+        // NOLINTNEXTLINE(bugprone-branch-clone): the types differ.
         case Length::Max:
             return va_arg(arguments.list, std::uintmax_t);
         case Length::Size:
@@ -181,8 +183,8 @@ std::uintmax_t NextUnsigned(Length length, Arguments& arguments) {
 template <class Unit, class Number>
 void PutNumber(Output<Unit>& out, const Conversion& item, const char* length, Number number) {
     char format[32];
-    std::snprintf(format, sizeof format, "%%%s%s*.*%s%c", item.flags, item.left ? "-" : "", length,
-                  item.conversion);
+    static_cast<void>(std::snprintf(format, sizeof format, "%%%s%s*.*%s%c", item.flags,
+                                    item.left ? "-" : "", length, item.conversion));
     char digits[kLongestNumber + 1];
     if (std::snprintf(digits, sizeof digits, format, item.width, item.precision, number) < 0)
         return;
@@ -192,7 +194,7 @@ void PutNumber(Output<Unit>& out, const Conversion& item, const char* length, Nu
 template <class Unit>
 void PutPointer(Output<Unit>& out, const Conversion& item, const void* pointer) {
     char digits[32];
-    std::snprintf(digits, sizeof digits, "%p", pointer);
+    static_cast<void>(std::snprintf(digits, sizeof digits, "%p", pointer));
     Conversion text = item;
     text.precision = -1;
     out.PutText(static_cast<const char*>(digits), text);
@@ -201,6 +203,7 @@ void PutPointer(Output<Unit>& out, const Conversion& item, const void* pointer) 
 
 template <class Unit>
 void PutString(Output<Unit>& out, const Conversion& item, bool narrow, Arguments& arguments) {
+    // NOLINTNEXTLINE(bugprone-branch-clone): the types differ.
     if (narrow)
         out.PutText(va_arg(arguments.list, const char*), item);
     else
@@ -313,6 +316,7 @@ std::size_t FormatWideV(char16_t* buffer, std::size_t capacity, const char16_t* 
     return FormatCopied(buffer, capacity, format, arguments);
 }
 
+// NOLINTNEXTLINE(cert-dcl50-cpp): printf by another name.
 std::size_t FormatWide(wchar_t* buffer, std::size_t capacity, const wchar_t* format, ...) {
     std::va_list arguments;
     va_start(arguments, format);
@@ -321,6 +325,7 @@ std::size_t FormatWide(wchar_t* buffer, std::size_t capacity, const wchar_t* for
     return units;
 }
 
+// NOLINTNEXTLINE(cert-dcl50-cpp): likewise.
 std::size_t FormatWide(char16_t* buffer, std::size_t capacity, const char16_t* format, ...) {
     std::va_list arguments;
     va_start(arguments, format);

@@ -65,6 +65,7 @@ enum class ElementName : int {
 
 inline constexpr std::u16string_view kElementNames[] = {
 #define ZMC_X(name) u"" #name,
+    // NOLINTNEXTLINE(bugprone-suspicious-missing-comma): a text of two pieces each.
     ZMC_ELEMENT_NAMES(ZMC_X)
 #undef ZMC_X
 };

@@ -39,6 +39,7 @@ std::uint32_t OrderingFor(const RasterProps& props) {
 
 }  // namespace
 
+// cppcheck-suppress passedByValue ; hosts call this form
 PyramidDataset::PyramidDataset(String fileName, RasterProps props)
     : BandCount(props.bands),
       Samples(props.samples),
@@ -51,6 +52,7 @@ PyramidDataset::PyramidDataset(String fileName, RasterProps props)
       BytesPerSample(PixelSize(props.pixelType)),
       Parser(MakeDocumentParser()) {}
 
+// cppcheck-suppress passedByValue ; likewise
 PyramidDataset::PyramidDataset(String fileName)
     : FileName(fileName), SourceName(fileName), Parser(MakeDocumentParser()) {}
 

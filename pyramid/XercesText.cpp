@@ -21,8 +21,8 @@ void NarrowAscii(std::u16string_view text, std::string& out) {
 }
 
 void PrintError(const std::string& text) {
-    std::fwrite(text.data(), 1, text.size(), stderr);
-    std::fflush(stderr);
+    static_cast<void>(std::fwrite(text.data(), 1, text.size(), stderr));
+    static_cast<void>(std::fflush(stderr));
 }
 
 }  // namespace zelm

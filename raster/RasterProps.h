@@ -20,6 +20,7 @@ namespace zelm {
 
 class RasterProps {
 public:
+    // cppcheck-suppress duplInheritedMember ; each class has a code of its own by this name
     static const std::uint32_t typeCode;
 
     std::map<std::uint32_t, double> noDataValues;  // by band; a band without an entry has none

@@ -152,7 +152,7 @@ std::string Text(const Json& value) {
     if (value.is_string()) return value.get<std::string>();
     if (!value.is_number_float()) return value.dump();
     char text[40];
-    std::snprintf(text, sizeof text, "%.10g", value.get<double>());
+    static_cast<void>(std::snprintf(text, sizeof text, "%.10g", value.get<double>()));
     return text;
 }
 

@@ -17,7 +17,7 @@ constexpr double kSingleError = 1e-5;
 
 std::string Digits(double value) {
     char text[40];
-    std::snprintf(text, sizeof text, "%.15g", value);
+    static_cast<void>(std::snprintf(text, sizeof text, "%.15g", value));
     return text;
 }
 

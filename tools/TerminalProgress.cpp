@@ -22,10 +22,10 @@ std::string Clock(double seconds) {
     const auto whole = static_cast<unsigned long>(std::clamp(seconds, 0.0, 3.5e6) + 0.5);
     char text[32];
     if (whole >= 3600)
-        std::snprintf(text, sizeof text, "%lu:%02lu:%02lu", whole / 3600, whole / 60 % 60,
-                      whole % 60);
+        static_cast<void>(std::snprintf(text, sizeof text, "%lu:%02lu:%02lu", whole / 3600,
+                                        whole / 60 % 60, whole % 60));
     else
-        std::snprintf(text, sizeof text, "%lu:%02lu", whole / 60, whole % 60);
+        static_cast<void>(std::snprintf(text, sizeof text, "%lu:%02lu", whole / 60, whole % 60));
     return text;
 }
 
@@ -63,7 +63,8 @@ void TerminalProgress::Draw(double share, double pixels) {
     int length = std::snprintf(tail, sizeof tail, "] %3.0f %%", std::floor(share * 100));
     std::string after(tail, static_cast<std::size_t>(length));
     if (pixels > 0 && seconds > 0) {
-        std::snprintf(tail, sizeof tail, "  %.1f Mpixel/s", pixels / seconds / 1e6);
+        static_cast<void>(
+            std::snprintf(tail, sizeof tail, "  %.1f Mpixel/s", pixels / seconds / 1e6));
         after += tail;
     }
     if (share > 0) after += "  " + zmctools::Clock(seconds / share - seconds) + " left";

@@ -64,8 +64,8 @@ inline Wide TileTableBytes(const zelm::PyramidHeaderRecord& header) {
                                                        : TilesOver(extent, header.tileSize);
     };
     const Wide tiles = over(header.width) * over(header.height);
-    return std::max<Wide>(tiles, 1) * std::max(header.bandCount, 1u) * (Wide{header.levelMax} + 1) *
-           8;
+    const Wide levels = Wide{header.levelMax} + 1;
+    return std::max<Wide>(tiles, 1) * std::max(header.bandCount, 1u) * levels * 8;
 }
 inline Wide TileTableBytes(const zelm::PyramidDataset& dataset) {
     return TileTableBytes(HeaderOf(dataset));

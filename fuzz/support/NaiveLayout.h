@@ -75,7 +75,8 @@ public:
     // Of all levels from `above` + 1 on.
     Wide BytesAbove(std::uint32_t above) const {
         Wide total = 0;
-        for (std::uint64_t level = std::uint64_t{above} + 1; level <= fields.levelMax; ++level)
+        const std::uint64_t first = std::uint64_t{above} + 1;
+        for (std::uint64_t level = first; level <= fields.levelMax; ++level)
             total += LevelBytes(static_cast<std::uint32_t>(level));
         return total;
     }

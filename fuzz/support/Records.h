@@ -29,6 +29,7 @@ bool SameValue(const T& a, const T& b) {
     if constexpr (zelm::kIsComplex<T>)
         return SameValue(a.re, b.re) && SameValue(a.im, b.im);
     else if constexpr (std::is_floating_point_v<T>)
+        // NOLINTNEXTLINE(bugprone-suspicious-memory-comparison): zeros differ by their sign.
         return std::isnan(a) ? std::isnan(b) : std::memcmp(&a, &b, sizeof a) == 0;
     else
         return a == b;
@@ -223,7 +224,7 @@ inline void TakePalette(InputBytes& input, zelm::Palette& palette) {
 // The number that is read where this one was written.
 inline double StoredReal(double value, int digits) {
     char text[64];
-    std::snprintf(text, sizeof text, "%.*g", digits, value);
+    static_cast<void>(std::snprintf(text, sizeof text, "%.*g", digits, value));
     return std::strtod(text, nullptr);
 }
 

@@ -17,7 +17,7 @@ void WriteDebugOutput(const char16_t* text) {
         if (splitsPair) --units;
         const std::size_t size = Utf16ToUtf8(text, units, bytes, sizeof bytes);
         if (size == kConversionFailed) return;
-        std::fwrite(bytes, 1, size, stderr);
+        static_cast<void>(std::fwrite(bytes, 1, size, stderr));
         text += units;
         left -= units;
     }

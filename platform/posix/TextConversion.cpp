@@ -64,8 +64,9 @@ std::size_t Utf16ToLocale(const char16_t* text, std::size_t length, char* out,
                           std::size_t capacity) {
     if (!FitsIcu(length) || !FitsIcu(capacity)) return kConversionFailed;
     UErrorCode status = U_ZERO_ERROR;
-    std::unique_ptr<UConverter, ConverterCloser> converter(
-        ucnv_open(nl_langinfo(CODESET), &status));
+    // NOLINTNEXTLINE(concurrency-mt-unsafe): it minds setlocale alone, which is the host's to call.
+    const char* const charset = nl_langinfo(CODESET);
+    std::unique_ptr<UConverter, ConverterCloser> converter(ucnv_open(charset, &status));
     if (!converter) return kConversionFailed;
     ucnv_setFromUCallBack(converter.get(), Substitute, nullptr, nullptr, nullptr, &status);
     const int32_t needed = ucnv_fromUChars(converter.get(), out, static_cast<int32_t>(capacity),

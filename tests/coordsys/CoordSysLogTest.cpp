@@ -333,6 +333,16 @@ TEST_F(CoordSysLogRun, FullDiskEndsTheLoggingToFiles) {
     EXPECT_LE(First().size(), 65536u);
 }
 
+// A line that is larger than the stream's buffer is written past it, and leaves nothing behind that
+// a later flush could fail on.
+TEST_F(CoordSysLogRun, LongLineOnAFullDiskEndsTheLoggingToFiles) {
+    std::filesystem::create_directory(scratch / "logs");
+    std::filesystem::create_symlink("/dev/full", scratch / kFirst);
+    WriteControlLine(scratch, "0110,0000,0000,0001");
+    const ChildResult result = RunProbe({"log", scratch.String(), "3", "1", "4000", "8364"});
+    EXPECT_THAT(result.err, HasSubstr("file=1 open=0 current=1 sequence=1"));
+}
+
 // A control file that is a pipe holds the creation up until a line is written into it.
 TEST_F(CoordSysLogRun, IsSeenByOthersOnlyWhenItIsReady) {
     ASSERT_EQ(mkfifo((scratch / "pelog.txt").c_str(), 0600), 0);

@@ -1,7 +1,8 @@
 // A process of its own for what happens once in a process: the settings of the projection log, the
 // loading of the engine, the first release. Reports go to the standard error stream.
 //
-//   coordsys_probe log DIR COUNT LEVEL LENGTH  logs COUNT messages of LENGTH units
+//   coordsys_probe log DIR COUNT LEVEL LENGTH  logs COUNT messages of LENGTH units x
+//   coordsys_probe log DIR COUNT LEVEL LENGTH UNIT  the same, of units of that number
 //   coordsys_probe threads DIR COUNT           two threads with COUNT messages each
 //   coordsys_probe factory BIN PE GDAL         makes the factory; "-" leaves a setting out
 //   coordsys_probe twice BIN PE                loads the entry points twice
@@ -70,8 +71,9 @@ void Log(const std::vector<std::string>& words) {
     CoordSysLog* const made = CoordSysLog::CreateInstance(words.at(1).c_str());
     if (made != gpCoordSysLogInstance) std::fprintf(stderr, "another log\n");
     ReportLog();
+    const auto unit = static_cast<char16_t>(words.size() > 5 ? std::stoi(words[5]) : 'x');
     LogMany(static_cast<std::uint32_t>(std::stoul(words.at(3))), std::stoi(words.at(2)),
-            std::u16string(std::stoul(words.at(4)), u'x'));
+            std::u16string(std::stoul(words.at(4)), unit));
     ReportLog();
     DropLog();
 }

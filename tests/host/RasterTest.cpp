@@ -11,6 +11,7 @@
 #include <filesystem>
 
 #include "core/PixelVocabulary.h"
+#include "host/PixelWork.h"
 #include "host/PyramidBuilder.h"
 #include "tests/support/MemorySource.h"
 #include "tests/support/ScratchDirectory.h"
@@ -247,6 +248,16 @@ TEST(Raster, MemoryRasterWorksInTheCallersBuffer) {
     raster.Write<float>(0, {1, 1, 1, 1}, {4.0f, 5.0f});
     EXPECT_EQ(source.pixels[(6 + 1) * 2 + 1], 5.0f);
     EXPECT_THROW(raster.Header(), Error);
+}
+
+TEST(PixelWork, MovesNoTilesOfAnotherType) {
+    const ScratchDirectory folder;
+    Raster raster = Raster::Create(TestModule(), folder / "a.zmc", PropsOf<short>(5, 5, 1), 0);
+    PixelWorkSetup setup;
+    setup.props = PropsOf<float>(5, 5, 1);
+    const std::unique_ptr<PixelWork> work = MakePixelWork(raster, setup);
+    std::byte pixels[100] = {};
+    EXPECT_THROW(work->ReadTile(0, {0, 0, 5, 5}, pixels), Error);
 }
 
 }  // namespace
