@@ -205,53 +205,6 @@ TEST_P(PyramidFaultsTest, ReadingAndMergingOnAFailingDisk) {
     }
 }
 
-// Rows and pixels that are too long for the work space move in runs, which need memory too.
-TEST_P(PyramidFaultsTest, MovingLongRowsWithoutMemory) {
-    if (GetParam() >= 2) GTEST_SKIP() << "tiles of one band have no long rows";
-    for (const std::uint32_t bands : {20000u, 140000u}) {
-        PyramidDescription d = Description(bands);
-        d.samples = d.lines = 9;
-        auto made = Create(d);
-        const unsigned char last = 0;
-        made->File->WriteAt(made->TileDataEnd - 1, &last, 1);
-        made.reset();
-        before = support::ReadText(path.string());
-        const BandList some({static_cast<int>(bands) - 1, 0});
-        std::size_t refusedReads = 0, refusedWrites = 0;
-        // Two parts of tiles, and a list of some bands that fills its tile.
-        for (const std::uint32_t at : {3u, 8u}) {
-            const std::uint32_t side = at == 3 ? 2 : 1;
-            ForEachAllocationFailing([&](AllocationFaults& faults) {
-                faults.Disarm();
-                Restore();
-                const auto dataset = Open();
-                Bytes pixels(std::size_t{side} * side * 2, 5);
-                faults.Rearm();
-                const bool read =
-                    dataset->ReadTile(at, at, side, side, some.View(), 0, pixels.data());
-                faults.Disarm();
-                refusedReads += !read;
-                if (read) {
-                    EXPECT_EQ(pixels, Bytes(pixels.size(), 0));
-                }
-            });
-            ForEachAllocationFailing([&](AllocationFaults& faults) {
-                faults.Disarm();
-                Restore();
-                const auto dataset = Open();
-                const Bytes pixels(std::size_t{side} * side * 2, 5);
-                faults.Rearm();
-                const bool wrote = dataset->WriteTileInterleaved(at, at, side, side, some.View(), 0,
-                                                                 pixels.data());
-                faults.Disarm();
-                refusedWrites += !wrote;
-                EXPECT_EQ(support::ReadText(path.string()) == before, !wrote);
-            });
-        }
-        EXPECT_GT(refusedReads + refusedWrites, 0U);
-    }
-}
-
 // Reading reports a failing disk, and tells zeros of nothing that the file holds.
 TEST_P(PyramidFaultsTest, AFailingReadIsToldForEveryRectangle) {
     Make(Description());

@@ -134,12 +134,6 @@ TEST_F(RefusalTest, TheTableOfTilesThatCannotBe) {
     // Room, but nothing in it.
     EXPECT_TRUE(built(16, 8, 8, 0));
     EXPECT_TRUE(built(0, 8, 8, 2));
-    unsigned char sample = 7;
-    dataset->TileOffsets.Clear();
-    dataset->LevelMax = zelm::PyramidLimits::kMaxLevel + 1;
-    EXPECT_FALSE(dataset->WriteTileMorton(0, 0, 1, 1, BandList({0}).View(), 0, &sample))
-        << "no table, no tile";
-    dataset->LevelMax = 1;
     dataset->LevelMin = dataset->LevelMax + 1;
     EXPECT_TRUE(built(16, 8, 8, 2));
     EXPECT_EQ(dataset->TileOffsets.data[0], 0U);
@@ -228,38 +222,6 @@ TEST_F(RefusalTest, ATreeThatIsNotThere) {
     auto dataset = Create(Plain());
     EXPECT_FALSE(document.SerializeDocument(*dataset->File, 0));
     EXPECT_FALSE(document.WritePaletteElement(0, zelm::Palette()));
-}
-
-// A text of 64 MiB, each byte of which takes four when it is written.
-TEST_F(RefusalTest, TreesThatAreTooLargeToBeWritten) {
-    std::string text = "<DATASET><NOTE>";
-    text.append((std::size_t{64} << 20) + 1, '>');
-    text += "</NOTE></DATASET>";
-    const xercesc::MemBufInputSource source(reinterpret_cast<const XMLByte*>(text.data()),
-                                            text.size(), "text");
-    zelm::PyramidXMLDocument document;
-    ASSERT_TRUE(document.ParseTree(source));
-    auto dataset = Create(Plain());
-    const std::uint64_t size = FileSize();
-    EXPECT_FALSE(document.SerializeDocument(*dataset->File, size));
-    EXPECT_EQ(FileSize(), size);
-}
-
-// A document that came into the file after it had been opened, and that a fetch has loaded.
-TEST_F(RefusalTest, AStoreKeepsWhatAFetchHasFound) {
-    Create(Plain());
-    auto dataset = Open();
-    auto other = Open();
-    zelm::RasterBandStats<unsigned char> record;
-    record.flags = zelm::StatsFlag::Minimum;
-    Array<zelm::RasterBandStats<unsigned char>> records, found;
-    ASSERT_TRUE(records.Append(record));
-    ASSERT_TRUE(other->SetBandStats(records));
-    ASSERT_TRUE(dataset->LoadBandStats(found));
-    EXPECT_EQ(found.shape.elements, 1U);
-    ASSERT_TRUE(dataset->SetBandStats(records));
-    ASSERT_TRUE(Open()->LoadBandStats(found));
-    EXPECT_EQ(found.shape.elements, 2U);
 }
 
 TEST_F(RefusalTest, PaletteEntriesWithoutAColour) {
