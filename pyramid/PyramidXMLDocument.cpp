@@ -118,7 +118,7 @@ bool PyramidXMLDocument::ParseTree(const xercesc::InputSource& source) {
     const bool parsed = Attempt("", [&] {
         setErrorHandler(&handler);
         parse(source);
-        return handler.faults == 0 && getErrorCount() == 0;
+        return handler.faults == 0;
     });
     setErrorHandler(nullptr);
     if (!parsed) return false;

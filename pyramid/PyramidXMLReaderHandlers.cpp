@@ -80,7 +80,7 @@ void AppendGrowing(Array<T>& array, const T& value) {
         const std::unique_ptr<T[]> old(array.data);
         if (!array.Reserve(std::max(8u, count * 2))) throw std::bad_alloc();
     }
-    if (!array.Append(value)) throw std::bad_alloc();
+    if (!array.Append(value)) throw std::bad_alloc();  // unreachable: there is room now
 }
 
 }  // namespace
@@ -164,7 +164,7 @@ void PyramidXMLReaderCore::TakeHeaderText(ElementName name, std::string_view tex
         case HEADER_PIXEL_TYPE:
             header.pixelType = ReadWord(ParsePixelType, text);
             break;
-        default:
+        default:  // unreachable: characters() sends these names alone
             break;
     }
 }
@@ -175,7 +175,8 @@ void PyramidXMLReaderCore::TakePaletteText(ElementName name, std::string_view te
     } else if (name == PALETTE_COUNT) {
         // Sets no length: the colours are counted. The lookup leaves a null colour behind.
         currentPalette.GetColor(ReadInteger(text));
-    } else if (name == PALETTE_RGBA) {
+    } else {
+        // PALETTE_RGBA, the last of all names.
         unsigned char channels[4] = {};
         std::string_view token;
         bool more = true;

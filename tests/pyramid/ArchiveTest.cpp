@@ -99,6 +99,22 @@ TEST_F(ArchiveTest, FileWithoutDocument) {
     EXPECT_TRUE(palette->colors.empty());
 }
 
+// Opened before there was a document, and storing after another has stored and this one has seen
+// it.
+TEST_F(ArchiveTest, ARecordJoinsTheDocumentThatWasFetched) {
+    Make();
+    std::filesystem::resize_file(name, Open()->MetaDocumentOffset);
+    const auto early = Open();
+    EXPECT_TRUE(Open()->SetBandStats(ArrayOf({StatsOf<T>(1, 2.5)})));
+    EXPECT_TRUE(early->HasBandStats<T>(1));
+    Palette palette;
+    palette.AddColor(ColorOf(1, 2, 3, 4));
+    EXPECT_TRUE(early->SetPalette(0, palette));
+    const auto later = Open();
+    EXPECT_TRUE(later->HasBandStats<T>(1));
+    EXPECT_EQ(later->GetPalette<T>(0)->nextIndex, 1u);
+}
+
 TEST_F(ArchiveTest, AnswersWithoutADocumentDiffer) {
     const auto dataset = Make();
     Array<RasterBandStats<T>> stats;

@@ -46,7 +46,7 @@ public:
         return count;
     }
     bool Truncate(std::uint64_t size) {
-        if (Allow(1) == 0) return false;
+        if (Allow(1) == 0 || cutsFail) return false;
         changes.push_back({true, size, ""});
         Apply(bytes, changes.back(), 1);
         return true;
@@ -66,6 +66,7 @@ public:
     std::string bytes;
     std::vector<Change> changes;
     int calls = 0;
+    bool cutsFail = false;
     // What a call may move at most, by its number from 0 and the size asked for.
     std::function<std::size_t(int, std::size_t)> limit;
 
@@ -292,6 +293,86 @@ TEST(DocumentStoreTest, EveryPrefixOfTakingBackIsOldOrRefused) {
             }
         }
     }
+}
+
+// The end that a store has grown cannot be cut off: it is blanked, and the old document stands.
+TEST(DocumentStoreTest, AnEndThatCannotBeCutIsBlanked) {
+    const Case c = Cases()[2];
+    RecordedFile file(c.before);
+    file.cutsFail = true;
+    bool marked = false;
+    file.limit = [&](int, std::size_t size) {
+        const bool refuse =
+            !marked && file.bytes[kOffset] == static_cast<char>(kUnfinishedDocument);
+        marked |= refuse;
+        return refuse ? size / 2 : size;
+    };
+    EXPECT_FALSE(Store(file, c.text));
+    EXPECT_TRUE(marked);
+    EXPECT_GT(file.bytes.size(), c.before.size());
+    file.bytes.resize(std::max(file.bytes.find_last_not_of('\n') + 1, c.before.size()));
+    EXPECT_EQ(file.bytes, c.before);
+}
+
+// Neither the store nor what takes it back goes through, in every pair of places.
+TEST(DocumentStoreTest, AStoreThatIsTakenBackInPartIsRefused) {
+    for (const Case& c : Cases()) {
+        RecordedFile whole(c.before);
+        ASSERT_TRUE(Store(whole, c.text));
+        for (const bool cutsFail : {false, true})
+            for (int first = 0; first < whole.calls; ++first)
+                for (int second = first + 1; second < first + 8; ++second) {
+                    SCOPED_TRACE(std::string(c.what) + ", calls " + std::to_string(first) +
+                                 " and " + std::to_string(second));
+                    RecordedFile file(c.before);
+                    file.cutsFail = cutsFail;
+                    file.limit = [&](int number, std::size_t size) {
+                        return number == first || number == second ? size / 2 : size;
+                    };
+                    Store(file, c.text);
+                    ExpectNoMixture(c, whole.bytes, file.bytes);
+                    if (HasFatalFailure()) return;
+                }
+    }
+}
+
+// A file whose old document is longer than any that is kept; it remembers the first byte alone.
+class VastFile {
+public:
+    bool TellSize(std::uint64_t& size) const {
+        size = kOffset + kMaxDocumentBytes + 1;
+        return true;
+    }
+    std::size_t ReadAt(std::uint64_t, void*, std::size_t) {
+        ++reads;
+        return 0;
+    }
+    std::size_t WriteAt(std::uint64_t offset, const void* buffer, std::size_t size) {
+        if (offset >= firstFailing) return 0;
+        if (offset == kOffset) firstByte = *static_cast<const unsigned char*>(buffer);
+        written += size;
+        return size;
+    }
+    bool Truncate(std::uint64_t) { return false; }
+
+    std::uint64_t firstFailing = ~std::uint64_t{0};
+    std::uint64_t written = 0;
+    int reads = 0;
+    unsigned char firstByte = '<';
+};
+
+TEST(DocumentStoreTest, AnOldTextBeyondTheLimitIsReplacedAndNotKept) {
+    const unsigned char text[] = {'<', 'A', '/', '>'};
+    VastFile file;
+    EXPECT_TRUE(DocumentStore<VastFile>(file, kOffset).Write(text, sizeof text));
+    EXPECT_EQ(file.reads, 0);
+    EXPECT_EQ(file.firstByte, '<');
+    EXPECT_EQ(file.written, kMaxDocumentBytes + 2) << "the mark, and every byte once";
+    VastFile failing;
+    failing.firstFailing = kOffset + 1000000;
+    EXPECT_FALSE(DocumentStore<VastFile>(failing, kOffset).Write(text, sizeof text));
+    EXPECT_EQ(failing.reads, 0);
+    EXPECT_EQ(failing.firstByte, kUnfinishedDocument) << "nothing is there to take back";
 }
 
 TEST(DocumentStoreTest, AFullDiskIsMetBeforeTheOldDocumentIsTouched) {

@@ -98,6 +98,8 @@ bool IsOneOf(const std::string& text) {
     return std::find(kDocuments.begin(), kDocuments.end(), trimmed) != kDocuments.end();
 }
 
+TEST(DocumentTextTest, NothingIsNotUnfinished) { EXPECT_FALSE(DocumentText().IsUnfinished()); }
+
 TEST(DocumentTextTest, AtRestItIsReadTwice) {
     const std::vector<std::string> states = {"tile<D/>"};
     ChangingFile file(states, [] { return 0; });

@@ -4,6 +4,7 @@
 
 #include <limits>
 
+#include <xercesc/dom/DOM.hpp>
 #include <xercesc/framework/MemBufInputSource.hpp>
 
 #include "core/PixelVocabulary.h"
@@ -312,6 +313,26 @@ TEST_F(XmlDocumentTest, TreesAreBoundedInDepthAndNames) {
     EXPECT_TRUE(Parse(parsed, wide + "</DATASET>"));
     for (int i = 0; i < 300; ++i) wide += "<N" + std::to_string(i) + "/>";
     EXPECT_FALSE(Parse(parsed, wide + "</DATASET>"));
+}
+
+TEST_F(XmlDocumentTest, LeavingMoreThanWasEnteredStaysOutside) {
+    DocumentLimits limits;
+    limits.LeaveElement();
+    EXPECT_EQ(limits.depth, 0u);
+    EXPECT_EQ(limits.EnterElement(u"A", 0), nullptr);
+    EXPECT_EQ(limits.depth, 1u);
+}
+
+// Each of these characters takes two bytes in the tree and five in the text.
+TEST_F(XmlDocumentTest, ATextBeyondTheLimitIsNotWritten) {
+    const std::u16string text(kMaxDocumentBytes / 5, u'&');
+    document.document->getDocumentElement()->appendChild(
+        document.document->createTextNode(text.c_str()));
+    const std::string name = (folder / "document");
+    const String wide(name.c_str());
+    const auto file = platform::File::Open(wide.wide, platform::File::Mode::Create);
+    EXPECT_FALSE(document.SerializeDocument(*file, 7));
+    EXPECT_EQ(file->Size(), 0u);
 }
 
 TEST_F(XmlDocumentTest, TreesAreBoundedInNodes) {

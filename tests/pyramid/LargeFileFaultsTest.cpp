@@ -1,0 +1,100 @@
+// Requests that need more work space or a larger table than there is memory for: refused whole, and
+// answered as soon as there is.
+#include <gtest/gtest.h>
+
+#include "tests/support/AllocationFaults.h"
+#include "tests/support/PyramidFileTest.h"
+#include "tests/support/PyramidFiles.h"
+#include "tests/support/PyramidModel.h"
+#include "tests/support/ScratchDirectory.h"
+
+namespace zmctest {
+namespace {
+
+using testsupport::AllocationFaults;
+using testsupport::FaultMode;
+
+class LargeFileFaultsTest : public PyramidFileTest {
+protected:
+    // Pixels of so many bands that a row of a tile does not fit in the work space, or a pixel.
+    static PyramidDescription Wide(std::uint32_t bands) {
+        PyramidDescription d;
+        d.samples = 9;
+        d.lines = 7;
+        d.bands = bands;
+        d.tile = 4;
+        d.type = 12;
+        d.ordering = 1;
+        return d;
+    }
+    // Runs `call` while no memory can be had.
+    template <class Call>
+    static bool WithoutMemory(Call&& call) {
+        AllocationFaults faults(1, FaultMode::FromThenOn);
+        const bool result = call();
+        faults.Disarm();
+        EXPECT_NE(faults.Failed(), 0u);
+        return result;
+    }
+};
+
+TEST_F(LargeFileFaultsTest, RowsBeyondTheWorkSpace) {
+    for (const std::uint32_t bands : {20000u, 70000u}) {
+        PyramidModel model(Wide(bands));
+        model.StoreAllImages();
+        model.Save(path);
+        const std::string before = support::ReadText(path.string());
+        const int list[] = {5, 2};
+        const zelm::Array<int> some(const_cast<int*>(list), zelm::ArrayShape(2));
+        std::uint16_t pixels[14] = {1, 2, 3, 4, 5, 6, 7, 8, 9, 10, 11, 12, 13, 14};
+        const auto dataset = Open();
+        ASSERT_TRUE(dataset);
+        // Merged into a tile, and on the path of a last row.
+        const auto merge = [&] {
+            return dataset->WriteTileInterleaved(1, 1, 2, 1, some, 0, pixels);
+        };
+        const auto last = [&] {
+            return dataset->WriteTileInterleaved(2, 0, 1, 7, some, 0, pixels);
+        };
+        if (bands == 20000) {
+            EXPECT_FALSE(WithoutMemory(merge));
+        } else {
+            EXPECT_FALSE(WithoutMemory(last));
+        }
+        EXPECT_TRUE(support::ReadText(path.string()) == before);
+        if (bands == 20000) {
+            EXPECT_FALSE(
+                WithoutMemory([&] { return dataset->ReadTile(1, 1, 2, 1, some, 0, pixels); }));
+            EXPECT_EQ(pixels[0], 1);
+        }
+        EXPECT_TRUE(merge());
+        std::uint16_t read[4] = {};
+        EXPECT_TRUE(dataset->ReadTile(1, 1, 2, 1, some, 0, read));
+        EXPECT_TRUE(std::equal(read, read + 4, pixels));
+    }
+}
+
+// The table of a large grid is made at the first request for a tile.
+TEST_F(LargeFileFaultsTest, ATileTableWithoutMemory) {
+    PyramidDescription d;
+    d.samples = d.lines = 128;
+    d.bands = d.tile = 1;
+    d.type = 1;
+    d.ordering = 2;
+    PyramidModel model(d);
+    model.StoreAllImages();
+    model.Save(path);
+    const BandList band({0});
+    const auto dataset = Open();
+    ASSERT_TRUE(dataset);
+    ASSERT_EQ(dataset->TileOffsets.data, nullptr);
+    unsigned char pixel = 0xA5;
+    const auto read = [&] { return dataset->ReadTile(127, 5, 1, 1, band.View(), 0, &pixel); };
+    EXPECT_FALSE(WithoutMemory(read));
+    EXPECT_EQ(pixel, 0xA5);
+    EXPECT_TRUE(read());
+    EXPECT_EQ(Bytes{pixel}, model.ReadTile(127, 5, 1, 1, {0}, 0));
+}
+
+}  // namespace
+}  // namespace zmctest
