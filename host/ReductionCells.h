@@ -45,6 +45,7 @@ Rounded<P> MeanOf(SumOf<P> sum, int count) {
         // A division by multiplication: exact, since the sum has no more than 19 bits.
         constexpr std::uint64_t kReciprocals[5] = {0, 0x80000000, 0x40000000, 0x2AAAAAAB,
                                                    0x20000000};
+        // NOLINTNEXTLINE(bugprone-misplaced-widening-cast): likewise, 20 bits fit.
         const auto doubled = static_cast<std::uint64_t>(2 * (sum < 0 ? -sum : sum) + count);
         const auto magnitude = static_cast<std::int32_t>(doubled * kReciprocals[count] >> 32);
         const std::int32_t mean = sum < 0 ? -magnitude : magnitude;

@@ -25,12 +25,9 @@ Metadata::Metadata() {
     impl.Reset(tree);
 }
 
-Metadata::Metadata(const Metadata& other) : Object(), impl(other.impl) {}
+Metadata::Metadata(const Metadata& other) = default;
 
-Metadata& Metadata::operator=(const Metadata& other) {
-    impl = other.impl;
-    return *this;
-}
+Metadata& Metadata::operator=(const Metadata& other) = default;
 
 Metadata::~Metadata() = default;
 

@@ -93,6 +93,7 @@ std::vector<std::string> ListFolder(const std::string& folder) {
     std::vector<std::string> names;
     const std::unique_ptr<DIR, int (*)(DIR*)> stream(::opendir(folder.c_str()), ::closedir);
     if (!stream) return names;
+    // NOLINTNEXTLINE(concurrency-mt-unsafe): the stream is this call's own.
     while (const dirent* entry = ::readdir(stream.get())) names.emplace_back(entry->d_name);
     return names;
 }
