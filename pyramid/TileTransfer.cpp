@@ -279,7 +279,7 @@ private:
         const std::uint64_t start = (std::uint64_t{piece.firstRow} + row) * rowBytes;
         for (std::uint32_t i = 0; i < count; ++i)
             if (!ReadOrZero(PlaneStart(first + i, piece.tileX, piece.tileY) + start,
-                            work + i * rows * rowBytes, rows * rowBytes))
+                            work + std::uint64_t{i} * rows * rowBytes, rows * rowBytes))
                 return false;
         return true;
     }
