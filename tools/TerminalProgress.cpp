@@ -19,7 +19,7 @@ std::size_t TerminalWidth() {
 }
 
 std::string Clock(double seconds) {
-    const auto whole = static_cast<unsigned long>(std::clamp(seconds, 0.0, 3.5e6) + 0.5);
+    const auto whole = static_cast<unsigned long>(std::lround(std::clamp(seconds, 0.0, 3.5e6)));
     char text[32];
     if (whole >= 3600)
         static_cast<void>(std::snprintf(text, sizeof text, "%lu:%02lu:%02lu", whole / 3600,

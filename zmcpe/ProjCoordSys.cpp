@@ -68,9 +68,11 @@ std::size_t ProjCoordSys::Transform(const CoordSysImpl& target, std::size_t coun
         if (pj && IsFinite(point)) point = proj_trans(pj, PJ_FWD, point);
         const bool good = pj && IsFinite(point);
         if (good) ++done;
+        // NOLINTBEGIN(bugprone-narrowing-conversions): it holds infinity for no double.
         x[i] = good ? point.xyz.x : kInfinite;
         y[i] = good ? point.xyz.y : kInfinite;
         if (z) z[i] = good ? point.xyz.z : kInfinite;
+        // NOLINTEND(bugprone-narrowing-conversions)
     }
     return done;
 }
