@@ -72,18 +72,22 @@ TEST(WideFormat, LengthsThatFewNumbersHave) {
 }
 
 TEST(WideFormat, EveryConversionOfReals) {
-    for (const char conversion : {'a', 'A', 'e', 'E', 'f', 'F', 'g', 'G'})
-        for (const double value :
-             {0.1, -1e300, 12345.678, std::numeric_limits<double>::infinity()}) {
-            const char narrow[] = {'%', '.', '4', conversion, '\0'};
-            const wchar_t wide[] = {L'%', L'.', L'4', static_cast<wchar_t>(conversion), L'\0'};
-            const char16_t units[] = {u'%', u'.', u'4', static_cast<char16_t>(conversion), u'\0'};
-            char text[512];
-            const int length = std::snprintf(text, sizeof text, narrow, value);
+    for (const double value : {0.1, -1e300, 12345.678, std::numeric_limits<double>::infinity()}) {
+        char text[512];
+        const auto expect = [&](int length, const wchar_t* wide, const char16_t* units) {
             const int shown = std::min(length, 255);
             EXPECT_EQ(Wide(wide, value), std::wstring(text, text + shown));
             EXPECT_EQ(Units(units, value), std::u16string(text, text + shown));
-        }
+        };
+        expect(std::snprintf(text, sizeof text, "%.4a", value), L"%.4a", u"%.4a");
+        expect(std::snprintf(text, sizeof text, "%.4A", value), L"%.4A", u"%.4A");
+        expect(std::snprintf(text, sizeof text, "%.4e", value), L"%.4e", u"%.4e");
+        expect(std::snprintf(text, sizeof text, "%.4E", value), L"%.4E", u"%.4E");
+        expect(std::snprintf(text, sizeof text, "%.4f", value), L"%.4f", u"%.4f");
+        expect(std::snprintf(text, sizeof text, "%.4F", value), L"%.4F", u"%.4F");
+        expect(std::snprintf(text, sizeof text, "%.4g", value), L"%.4g", u"%.4g");
+        expect(std::snprintf(text, sizeof text, "%.4G", value), L"%.4G", u"%.4G");
+    }
 }
 
 TEST(WideFormat, CharactersOfBothKinds) {
