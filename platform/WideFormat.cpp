@@ -186,8 +186,9 @@ void PutNumber(Output<Unit>& out, const Conversion& item, const char* length, Nu
     static_cast<void>(std::snprintf(format, sizeof format, "%%%s%s*.*%s%c", item.flags,
                                     item.left ? "-" : "", length, item.conversion));
     char digits[kLongestNumber + 1];
+    // unreachable: widths and precisions are bounded, and digits need no encoding
     if (std::snprintf(digits, sizeof digits, format, item.width, item.precision, number) < 0)
-        return;
+        return;  // unreachable: as above
     out.PutText(static_cast<const char*>(digits), Conversion{});
 }
 

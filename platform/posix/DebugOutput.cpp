@@ -16,7 +16,7 @@ void WriteDebugOutput(const char16_t* text) {
         const bool splitsPair = units < left && (text[units - 1] & 0xFC00) == 0xD800;
         if (splitsPair) --units;
         const std::size_t size = Utf16ToUtf8(text, units, bytes, sizeof bytes);
-        if (size == kConversionFailed) return;
+        if (size == kConversionFailed) return;  // unreachable: the bytes have room for all units
         static_cast<void>(std::fwrite(bytes, 1, size, stderr));
         text += units;
         left -= units;

@@ -76,6 +76,7 @@ std::size_t Utf16ToLocale(const char16_t* text, std::size_t length, char* out,
 
 char16_t ToLowerUnit(char16_t unit) {
     const UChar32 lower = u_tolower(unit);
+    // unreachable: no letter's lower case needs two units where the letter itself does not
     return lower <= 0xFFFF ? static_cast<char16_t>(lower) : unit;
 }
 

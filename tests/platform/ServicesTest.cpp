@@ -3,10 +3,15 @@
 #include <gtest/gtest.h>
 #include <unistd.h>
 
+#include <cstdint>
+#include <limits>
+#include <string>
+
 #include "platform/DebugOutput.h"
 #include "platform/Directory.h"
 #include "platform/LoadableLibrary.h"
 #include "platform/LocalTime.h"
+#include "platform/TextConversion.h"
 #include "platform/TextStream.h"
 #include "tests/support/ScratchDirectory.h"
 
@@ -73,6 +78,26 @@ TEST(LoadableLibrary, RefusesAFileThatIsNoLibrary) {
     const ScratchDirectory scratch;
     support::WriteText(scratch / "libx.so", "not a library");
     EXPECT_EQ(LoadLibraryFile(Wide(scratch / "libx.so").c_str()), nullptr);
+}
+
+// Lengths that the conversions cannot count in, refused before a unit is touched.
+TEST(TextConversion, LongerTextsAreRefused) {
+    constexpr std::size_t most = std::size_t{std::numeric_limits<std::int32_t>::max()};
+    char narrow[4];
+    char16_t wide[4];
+    EXPECT_EQ(Utf8ToUtf16("text", most + 1, wide, 4), kConversionFailed);
+    EXPECT_EQ(Utf8ToUtf16("text", 4, wide, most + 1), kConversionFailed);
+    EXPECT_EQ(Utf16ToUtf8(u"text", most + 1, narrow, 4), kConversionFailed);
+    EXPECT_EQ(Utf16ToUtf8(u"text", 4, narrow, most + 1), kConversionFailed);
+    EXPECT_EQ(Utf16ToLocale(u"text", most + 1, narrow, 4), kConversionFailed);
+    EXPECT_EQ(Utf16ToLocale(u"text", 4, narrow, most + 1), kConversionFailed);
+    EXPECT_EQ(Utf16ToLocale(u"text", 4, narrow, 4), 4u);
+}
+
+TEST(TextConversion, LowerCaseOfAUnitIsAUnit) {
+    EXPECT_EQ(ToLowerUnit(u'\u00c4'), u'\u00e4');
+    EXPECT_EQ(ToLowerUnit(u'\u0130'), u'i');
+    EXPECT_EQ(ToLowerUnit(char16_t{0xD801}), char16_t{0xD801});
 }
 
 TEST(DebugOutput, LongTextsComeThroughWhole) {

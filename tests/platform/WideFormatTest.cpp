@@ -3,8 +3,10 @@
 #include <gtest/gtest.h>
 #include <rapidcheck/gtest.h>
 
+#include <algorithm>
 #include <cstdint>
 #include <cstdio>
+#include <limits>
 #include <string>
 
 namespace platform {
@@ -60,6 +62,49 @@ TEST(WideFormat, NumbersOfEveryLength) {
               L"1.00 1.234568e+04 0.5 2.2");
 }
 
+TEST(WideFormat, LengthsThatFewNumbersHave) {
+    const std::ptrdiff_t small = -7;
+    EXPECT_EQ(Wide(L"%zd %wd %i %zi", small, -8l, -9, small), L"-7 -8 -9 -7");
+    EXPECT_EQ(
+        Wide(L"%ju %tu %wx %hu %hhX", std::uintmax_t{6}, std::size_t{7}, 0xABul, 65537u, 0x1FFu),
+        L"6 7 ab 1 FF");
+    EXPECT_EQ(Units(u"%zd %ju %i", small, std::uintmax_t{6}, -9), u"-7 6 -9");
+}
+
+TEST(WideFormat, EveryConversionOfReals) {
+    for (const double value : {0.1, -1e300, 12345.678, std::numeric_limits<double>::infinity()}) {
+        char text[512];
+        const auto expect = [&](int length, const wchar_t* wide, const char16_t* units) {
+            const int shown = std::min(length, 255);
+            EXPECT_EQ(Wide(wide, value), std::wstring(text, text + shown));
+            EXPECT_EQ(Units(units, value), std::u16string(text, text + shown));
+        };
+        expect(std::snprintf(text, sizeof text, "%.4a", value), L"%.4a", u"%.4a");
+        expect(std::snprintf(text, sizeof text, "%.4A", value), L"%.4A", u"%.4A");
+        expect(std::snprintf(text, sizeof text, "%.4e", value), L"%.4e", u"%.4e");
+        expect(std::snprintf(text, sizeof text, "%.4E", value), L"%.4E", u"%.4E");
+        expect(std::snprintf(text, sizeof text, "%.4f", value), L"%.4f", u"%.4f");
+        expect(std::snprintf(text, sizeof text, "%.4F", value), L"%.4F", u"%.4F");
+        expect(std::snprintf(text, sizeof text, "%.4g", value), L"%.4g", u"%.4g");
+        expect(std::snprintf(text, sizeof text, "%.4G", value), L"%.4G", u"%.4G");
+    }
+}
+
+TEST(WideFormat, CharactersOfBothKinds) {
+    EXPECT_EQ(Wide(L"%c%C%lC%hc", L'\u00e4', 'b', L'\u00e5', 'd'), L"\u00e4b\u00e5d");
+    EXPECT_EQ(Units(u"%c%C%lC|%-3c|%3C|", u'\u00e4', 'b', u'\u00e5', u'e', 'f'),
+              u"\u00e4b\u00e5|e  |  f|");
+    EXPECT_EQ(Wide(L"%lS|%hS", L"wide", "narrow"), L"wide|narrow");
+}
+
+// More flags than the longest sensible format has, and a letter that no conversion is.
+TEST(WideFormat, FlagsWithoutEnd) {
+    EXPECT_EQ(Wide(L"%++++++++++++++++++++5d|", 42), L"  +42|");
+    EXPECT_EQ(Wide(L"%--------------------5d|", 42), L"42   |");
+    EXPECT_EQ(Wide(L"%\u00e4%d", 5), L"%\u00e45");
+    EXPECT_EQ(Units(u"%5\u00e4%d", 5), u"%5\u00e45");
+}
+
 TEST(WideFormat, OddFormats) {
     EXPECT_EQ(Wide(L"100%%"), L"100%");
     EXPECT_EQ(Wide(L"end %"), L"end %");
@@ -74,8 +119,12 @@ TEST(WideFormat, CutsAtTheBuffer) {
     wchar_t buffer[8];
     EXPECT_EQ(FormatWide(buffer, 8, L"%s", L"0123456789"), 7u);
     EXPECT_STREQ(buffer, L"0123456");
-    EXPECT_EQ(FormatWide(buffer, 8, L"%20d", 5), 7u);
-    EXPECT_STREQ(buffer, L"       ");
+    for (const wchar_t* const format : {L"%20d", L"%20c"}) {
+        EXPECT_EQ(FormatWide(buffer, 8, format, 5), 7u);
+        EXPECT_STREQ(buffer, L"       ");
+    }
+    EXPECT_EQ(FormatWide(buffer, 8, L"012345%10y"), 7u);
+    EXPECT_STREQ(buffer, L"012345%");
     EXPECT_EQ(FormatWide(buffer, 8, L"0123456789%s", static_cast<const wchar_t*>(nullptr)), 7u);
     EXPECT_EQ(FormatWide(buffer, 1, L"x"), 0u);
     EXPECT_STREQ(buffer, L"");

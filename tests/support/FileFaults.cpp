@@ -312,6 +312,9 @@ ZMC_CALL(kResizeCall, fallocate64, file, (int file, int mode, off64_t at, off64_
 ZMC_CALL(kSyncCall, fsync, file, (int file), (file), )
 ZMC_CALL(kSyncCall, fdatasync, file, (int file), (file), )
 ZMC_CALL(kRenameCall, rename, to, (const char* from, const char* to), (from, to), noexcept)
+ZMC_CALL(kRenameCall, renameat2, to,
+         (int fromFolder, const char* from, int toFolder, const char* to, unsigned flags),
+         (fromFolder, from, toFolder, to, flags), noexcept)
 ZMC_CALL(kRenameCall, link, to, (const char* from, const char* to), (from, to), noexcept)
 ZMC_CALL(kRemoveCall, unlink, path, (const char* path), (path), noexcept)
 ZMC_CALL(kRemoveCall, remove, path, (const char* path), (path), noexcept)
