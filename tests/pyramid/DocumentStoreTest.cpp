@@ -311,5 +311,40 @@ TEST(DocumentStoreTest, NothingIsNoDocument) {
     EXPECT_EQ(file.calls, 0);
 }
 
+// A file with an old document of any length, of which only the first and the last bytes are real;
+// every change of the body fails.
+class LongFile {
+public:
+    explicit LongFile(std::uint64_t length) : size(kOffset + length) {}
+    bool TellSize(std::uint64_t& answer) const {
+        answer = size;
+        return true;
+    }
+    std::size_t ReadAt(std::uint64_t, void*, std::size_t count) const { return count; }
+    std::size_t WriteAt(std::uint64_t offset, const void*, std::size_t count) {
+        if (offset == kOffset) ++marks;
+        if (offset == kOffset + 1) lengths.push_back(count);
+        return offset == kOffset + 1 && lengths.size() == 1 ? 0 : count;
+    }
+    bool Truncate(std::uint64_t) { return true; }
+
+    std::uint64_t size;
+    int marks = 0;                     // writes of the first byte alone
+    std::vector<std::size_t> lengths;  // of what was written behind it
+};
+
+// The longest document that is read is also taken back whole; a longer one nobody ever read.
+TEST(DocumentStoreTest, OldTextOfTheGreatestLengthComesBack) {
+    const unsigned char text[] = "<D/>";
+    for (const std::uint64_t length : {kMaxDocumentBytes, kMaxDocumentBytes + 1}) {
+        LongFile file(length);
+        EXPECT_FALSE(DocumentStore<LongFile>(file, kOffset).Write(text, 4));
+        const bool back = length == kMaxDocumentBytes;
+        EXPECT_EQ(file.marks, back ? 2 : 1);
+        ASSERT_EQ(file.lengths.size(), back ? 2u : 1u);
+        EXPECT_EQ(file.lengths.back(), back ? length - 1 : 3u);
+    }
+}
+
 }  // namespace
 }  // namespace zelm::test

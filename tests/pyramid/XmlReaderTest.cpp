@@ -506,6 +506,19 @@ TEST_F(HostileDocumentTest, NestOfEntities) {
     ::testing::internal::GetCapturedStderr();
 }
 
+// The list of one histogram may lack 1,048,576 bins, and not one more.
+TEST_F(XmlReaderTest, SpareBinsEndAtTheirLimit) {
+    for (const std::uint32_t bins : {1048578u, 1048579u}) {
+        PyramidXMLReaderHandlers<int> handlers;
+        ParseRecords(Histogram("<HIST_BINCOUNT>" + std::to_string(bins) +
+                               "</HIST_BINCOUNT><HIST_COUNTS>3|4</HIST_COUNTS>"),
+                     handlers);
+        const auto& histogram = handlers.histograms.data[0];
+        EXPECT_EQ(histogram.binCount, bins);
+        EXPECT_EQ(histogram.counts.shape.elements, bins == 1048578 ? bins : 0u);
+    }
+}
+
 TEST_F(HostileDocumentTest, DeepNesting) {
     std::string text;
     for (int i = 0; i < 200000; ++i) text += "<A>";
