@@ -5,6 +5,7 @@
 #include <functional>
 #include <random>
 #include <string>
+#include <utility>
 #include <vector>
 #include <xercesc/framework/MemBufInputSource.hpp>
 
@@ -309,6 +310,19 @@ TEST(DocumentStoreTest, NothingIsNoDocument) {
     RecordedFile file(std::string(50, 'x'));
     EXPECT_FALSE(Store(file, ""));
     EXPECT_EQ(file.calls, 0);
+}
+
+TEST(DocumentStoreTest, AnOldTextOfOneByteComesBack) {
+    const std::string before = std::string(kOffset, 'p') + "o";
+    RecordedFile file(before);
+    bool failed = false;
+    // Of the new text only the mark reaches the file.
+    file.limit = [&](int, std::size_t size) {
+        return size == 3 && !std::exchange(failed, true) ? 0 : size;
+    };
+    EXPECT_FALSE(Store(file, "<D/>"));
+    EXPECT_TRUE(failed);
+    EXPECT_EQ(file.bytes, before);
 }
 
 // A file with an old document of any length, of which only the first and the last bytes are real;
