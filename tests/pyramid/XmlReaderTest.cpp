@@ -111,6 +111,18 @@ TEST_F(XmlReaderTest, LaterPaletteOfABandWins) {
     EXPECT_EQ(handlers.palettes[0].GetColor(0)->blue, 5);
 }
 
+TEST_F(XmlReaderTest, ColoursOutsideAPaletteAreNotKept) {
+    const std::string colour = "<PALETTE_RGBA>1|2|3|4</PALETTE_RGBA>";
+    PyramidXMLReaderHandlers<int> handlers;
+    ParseRecords(colour, handlers);
+    EXPECT_EQ(handlers.currentPalette.nextIndex, 0u);
+    ParseRecords("<PALETTE>" + colour + "<PALETTE>" + colour + "</PALETTE>" + colour + "</PALETTE>",
+                 handlers);
+    EXPECT_EQ(handlers.palettes[0].nextIndex, 2u) << "those since the last beginning";
+    ParseRecords(colour + colour, handlers);
+    EXPECT_EQ(handlers.currentPalette.nextIndex, 2u);
+}
+
 TEST_F(XmlReaderTest, EveryStatisticHasItsFieldAndFlag) {
     PyramidXMLReaderHandlers<short> handlers;
     ParseRecords(Stats("<RSTC_RMS>7</RSTC_RMS><RSTC_SUM2>6</RSTC_SUM2><RSTC_SUM>5</RSTC_SUM>"
