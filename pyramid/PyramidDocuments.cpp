@@ -86,7 +86,9 @@ int Parse(xercesc::SAXParser& parser, xercesc::HandlerBase* handlers,
     } catch (const std::bad_alloc&) {
         return PrintOutOfMemory();
     } catch (const xercesc::XMLException& exception) {
-        PrintError("\nAn error occurred\n Error: " + ToNarrow(exception.getMessage()) + "\n\n");
+        PrintError("\nAn error occurred\n Error: ");
+        PrintError(exception.getMessage());
+        PrintError("\n\n");
         return PyramidDataset::kParseError;
     } catch (const DocumentRefused&) {
         return PyramidDataset::kParseError;  // reported where it was found
@@ -145,7 +147,7 @@ int PyramidDataset::ParseDocument(xercesc::HandlerBase* handlers,
     try {
         result = Parse(*Parser, handlers, *source, thrown);
     } catch (...) {
-        // Nothing else is thrown on purpose; a message that found no memory ends here.
+        // Nothing else is thrown on purpose.
     }
     if (thrown) {
         // Out of memory leaves a parser that takes itself to be at work for good.

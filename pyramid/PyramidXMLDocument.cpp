@@ -44,7 +44,9 @@ bool Attempt(const char* heading, Step step) {
     try {
         return step();
     } catch (const xercesc::XMLException& exception) {
-        PrintError(std::string(heading) + " Exception message:" + ToNarrow(exception.getMessage()));
+        PrintError(heading);
+        PrintError(" Exception message:");
+        PrintError(exception.getMessage());
     } catch (...) {
         // Memory ran out, or the DOM was asked for something impossible: no text tells which.
     }
@@ -87,8 +89,8 @@ std::unique_ptr<PyramidXMLDocument> PyramidXMLDocument::Make() {
     try {
         return std::make_unique<PyramidXMLDocument>();
     } catch (const xercesc::XMLException& exception) {
-        PrintError("Error during Xerces-c Initialization.\n Exception message:" +
-                   ToNarrow(exception.getMessage()));
+        PrintError("Error during Xerces-c Initialization.\n Exception message:");
+        PrintError(exception.getMessage());
     } catch (...) {
         // Out of memory.
     }

@@ -20,9 +20,14 @@ void NarrowAscii(std::u16string_view text, std::string& out) {
         out[i] = text[i] < 0x80 ? static_cast<char>(text[i]) : '?';
 }
 
-void PrintError(const std::string& text) {
+void PrintError(std::string_view text) noexcept {
     static_cast<void>(std::fwrite(text.data(), 1, text.size(), stderr));
     static_cast<void>(std::fflush(stderr));
+}
+
+void PrintError(const XMLCh* text) noexcept {
+    const String message(text);
+    if (const char* narrow = message.GetUtf8()) PrintError(std::string_view(narrow));
 }
 
 }  // namespace zelm

@@ -16,8 +16,10 @@ std::string ToNarrow(const XMLCh* text);
 // The same length, for numbers and words: what is not ASCII becomes '?', which is in neither.
 void NarrowAscii(std::u16string_view text, std::string& out);
 
-// Writes to the standard error stream as it stands, and flushes.
-void PrintError(const std::string& text);
+// Write to the standard error stream as it stands, and flush. Messages of exceptions are printed
+// while memory may be out, so these throw nothing; a wide text, zero-terminated, falls away there.
+void PrintError(std::string_view text) noexcept;
+void PrintError(const XMLCh* text) noexcept;
 
 }  // namespace zelm
 

@@ -34,6 +34,21 @@ TEST_F(DatasetFileTest, DescribedDatasetOpensNothing) {
     EXPECT_TRUE(dataset->SourceName.IsEmpty());
 }
 
+TEST_F(DatasetFileTest, NamedDatasetHasNoLayout) {
+    const zelm::PyramidDataset dataset{zelm::String(path.c_str())};
+    EXPECT_FALSE(dataset.File);
+    EXPECT_FALSE(dataset.Writable);
+    EXPECT_FALSE(dataset.HasPyramid);
+    for (const std::uint32_t field :
+         {dataset.VersionMajor, dataset.VersionMinor, dataset.BandCount, dataset.Samples,
+          dataset.Lines, dataset.TileSize, dataset.LevelCount, dataset.LevelMin, dataset.LevelMax,
+          dataset.PixelType, dataset.TileOrdering})
+        EXPECT_EQ(field, 0u);
+    EXPECT_EQ(dataset.Interleave, -1);
+    EXPECT_EQ(dataset.BytesPerSample, 1u);
+    EXPECT_EQ(dataset.TileDataStart + dataset.TileDataEnd + dataset.MetaDocumentOffset, 0u);
+}
+
 TEST_F(DatasetFileTest, OrderingFollowsBandsThenTileLines) {
     zelm::RasterProps props;
     props.bands = 8;

@@ -142,5 +142,29 @@ TEST_F(DiskFailureTest, HeaderThatCouldNotBeWrittenIsRefused) {
     }
 }
 
+// Rows come and go in runs as long as the work space, whatever part of them is wanted.
+TEST_F(DiskFailureTest, RowsOfATileTakeFewCalls) {
+    Make(256);
+    PyramidDataset dataset{String(name.c_str())};
+    ASSERT_FALSE(dataset.ReadHeader());
+    for (const std::vector<int>& list : {std::vector<int>{0, 1}, {1}}) {
+        Array<int> bands;
+        for (const int band : list) bands.Append(band);
+        std::vector<unsigned char> pixels(std::size_t{200} * 200 * list.size(), 8);
+        const auto calls = [&](unsigned kind, bool write) {
+            const FileFaults faults = Fail(kind, 0);
+            if (write)
+                EXPECT_TRUE(dataset.WriteTileInterleaved(5, 5, 200, 200, bands, 0, pixels.data()));
+            else
+                EXPECT_TRUE(dataset.ReadTile(5, 5, 200, 200, bands, 0, pixels.data()));
+            return faults.Count();
+        };
+        // 200 rows of 512 bytes are less than 128 KiB.
+        EXPECT_EQ(calls(testsupport::kReadCall, false), 1u);
+        EXPECT_EQ(calls(testsupport::kReadCall, true), 1u);
+        EXPECT_EQ(calls(testsupport::kWriteCall, true), 1u);
+    }
+}
+
 }  // namespace
 }  // namespace zelm::test

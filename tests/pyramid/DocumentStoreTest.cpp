@@ -5,6 +5,7 @@
 #include <functional>
 #include <random>
 #include <string>
+#include <utility>
 #include <vector>
 #include <xercesc/framework/MemBufInputSource.hpp>
 
@@ -390,6 +391,54 @@ TEST(DocumentStoreTest, NothingIsNoDocument) {
     RecordedFile file(std::string(50, 'x'));
     EXPECT_FALSE(Store(file, ""));
     EXPECT_EQ(file.calls, 0);
+}
+
+TEST(DocumentStoreTest, AnOldTextOfOneByteComesBack) {
+    const std::string before = std::string(kOffset, 'p') + "o";
+    RecordedFile file(before);
+    bool failed = false;
+    // Of the new text only the mark reaches the file.
+    file.limit = [&](int, std::size_t size) {
+        return size == 3 && !std::exchange(failed, true) ? 0 : size;
+    };
+    EXPECT_FALSE(Store(file, "<D/>"));
+    EXPECT_TRUE(failed);
+    EXPECT_EQ(file.bytes, before);
+}
+
+// A file with an old document of any length, of which only the first and the last bytes are real;
+// every change of the body fails.
+class LongFile {
+public:
+    explicit LongFile(std::uint64_t length) : size(kOffset + length) {}
+    bool TellSize(std::uint64_t& answer) const {
+        answer = size;
+        return true;
+    }
+    std::size_t ReadAt(std::uint64_t, void*, std::size_t count) const { return count; }
+    std::size_t WriteAt(std::uint64_t offset, const void*, std::size_t count) {
+        if (offset == kOffset) ++marks;
+        if (offset == kOffset + 1) lengths.push_back(count);
+        return offset == kOffset + 1 && lengths.size() == 1 ? 0 : count;
+    }
+    bool Truncate(std::uint64_t) { return true; }
+
+    std::uint64_t size;
+    int marks = 0;                     // writes of the first byte alone
+    std::vector<std::size_t> lengths;  // of what was written behind it
+};
+
+// The longest document that is read is also taken back whole; a longer one nobody ever read.
+TEST(DocumentStoreTest, OldTextOfTheGreatestLengthComesBack) {
+    const unsigned char text[] = "<D/>";
+    for (const std::uint64_t length : {kMaxDocumentBytes, kMaxDocumentBytes + 1}) {
+        LongFile file(length);
+        EXPECT_FALSE(DocumentStore<LongFile>(file, kOffset).Write(text, 4));
+        const bool back = length == kMaxDocumentBytes;
+        EXPECT_EQ(file.marks, back ? 2 : 1);
+        ASSERT_EQ(file.lengths.size(), back ? 2u : 1u);
+        EXPECT_EQ(file.lengths.back(), back ? length - 1 : 3u);
+    }
 }
 
 }  // namespace

@@ -137,6 +137,7 @@ TEST(DocumentTextTest, AMarkThatStaysIsAnAnswer) {
               "\x1A"
               "D/>");
     EXPECT_TRUE(text.IsUnfinished());
+    EXPECT_EQ(file.reads, 8) << "four looks, of two readings each";
 }
 
 TEST(DocumentTextTest, ATextThatNeverRestsIsNone) {

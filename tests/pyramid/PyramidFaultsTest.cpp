@@ -284,6 +284,28 @@ TEST_P(PyramidFaultsTest, StoringOnAFailingDisk) {
     });
 }
 
+using WorkSpaceTest = PyramidFileTest;
+
+// A work space that could not be had does not stand in the way of later ones.
+TEST_F(WorkSpaceTest, MemoryThatComesBackServes) {
+    PyramidDescription d;
+    d.samples = d.lines = 9;
+    d.tile = 8;
+    d.ordering = 2;
+    const auto dataset = Create(d);
+    const BandList list({0});
+    unsigned char pixel = 77;
+    ReadRect(*dataset, 0, 0, 8, 8, list, 0);  // the table is there, and no work space yet
+    {
+        AllocationFaults faults(1, testsupport::FaultMode::FromThenOn);
+        const bool wrote = dataset->WriteTileMorton(8, 8, 1, 1, list.View(), 0, &pixel);
+        faults.Disarm();
+        EXPECT_FALSE(wrote);
+    }
+    EXPECT_TRUE(dataset->WriteTileMorton(8, 8, 1, 1, list.View(), 0, &pixel));
+    EXPECT_EQ(ReadRect(*dataset, 8, 8, 1, 1, list, 0), Bytes(1, 77));
+}
+
 INSTANTIATE_TEST_SUITE_P(Orderings, PyramidFaultsTest, testing::Values(0u, 1u, 2u));
 
 }  // namespace

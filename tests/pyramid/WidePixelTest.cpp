@@ -135,5 +135,27 @@ TEST_F(WidePixelTest, WritingSomeBandsOfAWidePixelTakesLittle) {
     EXPECT_LT(PeakOf([&] { dataset->WriteTileInterleaved(2, 0, 1, 7, band, 0, pixels); }), kLittle);
 }
 
+// A tile of a megabyte goes out through a work space of its usual size.
+TEST_F(WidePixelTest, WritingALargeTileByPlanesTakesLittle) {
+    PyramidDescription d;
+    d.samples = d.lines = 2048;
+    d.tile = 1024;
+    d.bands = 3;
+    d.ordering = 2;
+    const auto dataset = Create(d);
+    const BandList list({2, 0, 1});
+    Bytes pixels(std::size_t{1024} * 1024 * 3);
+    std::mt19937 random(1);
+    for (unsigned char& byte : pixels) byte = static_cast<unsigned char>(random());
+    bool wrote = false;
+    EXPECT_LT(PeakOf([&] {
+                  wrote =
+                      dataset->WriteTileMorton(1024, 0, 1024, 1024, list.View(), 0, pixels.data());
+              }),
+              std::int64_t{256} << 10);
+    EXPECT_TRUE(wrote);
+    EXPECT_TRUE(ReadRect(*dataset, 1024, 0, 1024, 1024, list, 0) == pixels);
+}
+
 }  // namespace
 }  // namespace zmctest

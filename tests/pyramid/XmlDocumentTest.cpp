@@ -344,5 +344,25 @@ TEST_F(XmlDocumentTest, TreesAreBoundedInNodes) {
     }
 }
 
+TEST_F(XmlDocumentTest, RecordsFillATreeToItsLastElement) {
+    constexpr std::uint32_t kHeader = 12, kEmptyPalette = 3;  // elements that each takes
+    std::string text = "<DATASET>";
+    for (std::uint32_t i = 1; i < kMaxDocumentNodes - 2 * kHeader - kEmptyPalette; ++i)
+        text += "<A/>";
+    PyramidXMLDocument parsed;
+    ASSERT_TRUE(Parse(parsed, text + "</DATASET>"));
+    EXPECT_TRUE(parsed.WriteHeaderElement(PyramidHeaderRecord()));
+    EXPECT_TRUE(parsed.WriteHeaderElement(PyramidHeaderRecord()));
+    EXPECT_TRUE(parsed.WritePaletteElement(0, Palette()));
+    EXPECT_FALSE(parsed.WritePaletteElement(0, Palette()));
+    // What is taken back makes room for as much.
+    parsed.RemoveFrom(parsed.RecordCount() - 2);
+    EXPECT_FALSE(parsed.WriteHistogramElement(RasterBandHistogram<int>()) &&
+                 parsed.WriteHeaderElement(PyramidHeaderRecord()));
+    EXPECT_TRUE(parsed.WritePaletteElement(0, Palette()));
+    EXPECT_TRUE(parsed.WritePaletteElement(0, Palette()));
+    EXPECT_FALSE(parsed.WritePaletteElement(0, Palette()));
+}
+
 }  // namespace
 }  // namespace zelm::test

@@ -111,6 +111,18 @@ TEST_F(XmlReaderTest, LaterPaletteOfABandWins) {
     EXPECT_EQ(handlers.palettes[0].GetColor(0)->blue, 5);
 }
 
+TEST_F(XmlReaderTest, ColoursOutsideAPaletteAreNotKept) {
+    const std::string colour = "<PALETTE_RGBA>1|2|3|4</PALETTE_RGBA>";
+    PyramidXMLReaderHandlers<int> handlers;
+    ParseRecords(colour, handlers);
+    EXPECT_EQ(handlers.currentPalette.nextIndex, 0u);
+    ParseRecords("<PALETTE>" + colour + "<PALETTE>" + colour + "</PALETTE>" + colour + "</PALETTE>",
+                 handlers);
+    EXPECT_EQ(handlers.palettes[0].nextIndex, 2u) << "those since the last beginning";
+    ParseRecords(colour + colour, handlers);
+    EXPECT_EQ(handlers.currentPalette.nextIndex, 2u);
+}
+
 TEST_F(XmlReaderTest, EveryStatisticHasItsFieldAndFlag) {
     PyramidXMLReaderHandlers<short> handlers;
     ParseRecords(Stats("<RSTC_RMS>7</RSTC_RMS><RSTC_SUM2>6</RSTC_SUM2><RSTC_SUM>5</RSTC_SUM>"
@@ -504,6 +516,19 @@ TEST_F(HostileDocumentTest, NestOfEntities) {
     ::testing::internal::CaptureStderr();
     EXPECT_EQ(Parse(text + "]><DATASET>&e29;</DATASET>", &handlers), 4);
     ::testing::internal::GetCapturedStderr();
+}
+
+// The list of one histogram may lack 1,048,576 bins, and not one more.
+TEST_F(XmlReaderTest, SpareBinsEndAtTheirLimit) {
+    for (const std::uint32_t bins : {1048578u, 1048579u}) {
+        PyramidXMLReaderHandlers<int> handlers;
+        ParseRecords(Histogram("<HIST_BINCOUNT>" + std::to_string(bins) +
+                               "</HIST_BINCOUNT><HIST_COUNTS>3|4</HIST_COUNTS>"),
+                     handlers);
+        const auto& histogram = handlers.histograms.data[0];
+        EXPECT_EQ(histogram.binCount, bins);
+        EXPECT_EQ(histogram.counts.shape.elements, bins == 1048578 ? bins : 0u);
+    }
 }
 
 TEST_F(HostileDocumentTest, DeepNesting) {
