@@ -109,6 +109,7 @@ void Raster::TakeReader() {
     props.metadata = zelm::Metadata();
 }
 
+// Here and below the caller's hold on the module outlasts the connection, whatever is thrown.
 Raster Raster::Open(ModulePtr module, const std::string& file) {
     const platform::FileStatus status = platform::StatusOf(file);
     if (!status.exists) throw Error(file, "open the raster", "there is no such file");
@@ -117,7 +118,7 @@ Raster Raster::Open(ModulePtr module, const std::string& file) {
     PyramidHeader header = PyramidHeader::Read(file);
     zelm::RasterDataConnectionPtr connection = module->OpenPyramid(file);
     if (!connection) throw Error(file, "open the raster", "the module refuses it");
-    Raster raster(std::move(module), file, connection);
+    Raster raster(module, file, connection);
     raster.TakeReader();
     raster.header = header;
     raster.minLevel = header.minLevel;
@@ -136,7 +137,7 @@ Raster Raster::Create(ModulePtr module, const std::string& file, zelm::RasterPro
                     status.isRegular ? "the file is read-only" : "it is not a file");
     const zelm::RasterDataConnectionPtr connection = module->CreatePyramid(file, props);
     if (!connection) throw Error(file, "create the raster", "the module refuses it");
-    Raster raster(std::move(module), file, connection);
+    Raster raster(module, file, connection);
     raster.TakeReader();
     bool built = false;
     const std::int32_t pair[] = {2, 2};
@@ -161,7 +162,7 @@ Raster Raster::OfMemory(ModulePtr module, void* samples, const zelm::RasterProps
     const zelm::RasterDataConnectionPtr connection =
         module->OpenMemoryRaster(MemoryParameters(samples, props));
     if (!connection) throw Error(name, "open the raster", "the module refuses its description");
-    Raster raster(std::move(module), name, connection);
+    Raster raster(module, name, connection);
     raster.TakeReader();
     raster.SetNoDataValues(props.noDataValues);
     return raster;

@@ -1,0 +1,278 @@
+// What rasters and builds answer to callers that ask for what is not there, and to a disk that does
+// not take what it is given.
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+
+#include <cerrno>
+
+#include "core/PixelVocabulary.h"
+#include "host/PyramidBuilder.h"
+#include "host/Raster.h"
+#include "tests/support/FileFaults.h"
+#include "tests/support/MemorySource.h"
+#include "tests/support/PyramidFiles.h"
+#include "tests/support/ScratchDirectory.h"
+
+namespace zmchost {
+namespace {
+
+using support::MemorySource;
+using support::TestModule;
+using testing::HasSubstr;
+using testsupport::FileFault;
+using testsupport::FileFaults;
+using Pixel = unsigned char;
+
+template <class Action>
+std::string FailureOf(Action&& action) {
+    try {
+        action();
+        return "no failure";
+    } catch (const Error& error) {
+        return error.what();
+    }
+}
+
+class HostRefusal : public testing::Test {
+protected:
+    // A file of 20 x 10 pixels of value 7.
+    Raster Make(std::uint32_t bands = 1) {
+        const MemorySource<Pixel> source(20, 10, bands);
+        Raster raster = Raster::Create(TestModule(), file, source.props, 0);
+        raster.Write<Pixel>(0, {0, 0, 20, 10}, std::vector<Pixel>(200 * bands, 7));
+        return raster;
+    }
+    // The failure of `action` while every call of that kind on the folder fails, or the first
+    // alone.
+    template <class Action>
+    std::string FailureWith(unsigned calls, Action&& action, bool fromThenOn = true) {
+        FileFault fault;
+        fault.folder = folder.String();
+        fault.calls = calls;
+        fault.n = 1;
+        fault.fromThenOn = fromThenOn;
+        fault.error = EIO;
+        FileFaults faults(fault);
+        const std::string failure = FailureOf(action);
+        faults.Disarm();
+        EXPECT_NE(faults.Failed(), 0U);
+        return failure;
+    }
+    static zelm::RasterBandStats<Pixel> Mean(std::uint32_t band, double mean) {
+        zelm::RasterBandStats<Pixel> stats;
+        stats.band = band;
+        stats.flags = zelm::StatsFlag::Mean;
+        stats.mean = mean;
+        return stats;
+    }
+
+    support::ScratchDirectory folder;
+    const std::string file = folder / "a.pyr";
+};
+
+TEST_F(HostRefusal, FilesThatCannotBeMade) {
+    const zelm::RasterProps props = MemorySource<Pixel>(20, 10, 1).props;
+    const auto create = [&](const std::string& name, std::uint32_t level = 0) {
+        return FailureOf([&] { Raster::Create(TestModule(), name, props, level); });
+    };
+    EXPECT_THAT(create(folder.String()), HasSubstr("it is not a file"));
+    EXPECT_THAT(create(folder / "no/such.pyr"), HasSubstr("such.pyr"));
+    support::WriteText(file, "text");
+    ASSERT_EQ(chmod(file.c_str(), 0444), 0);
+    EXPECT_THAT(create(file), HasSubstr("the file is read-only"));
+    EXPECT_EQ(support::ReadText(file), "text");
+    ASSERT_EQ(chmod(file.c_str(), 0644), 0);
+    EXPECT_THAT(create(file, 70), HasSubstr("its levels are 0 to 70"));
+}
+
+// The module gives a file that it cannot make for one that it has opened.
+TEST_F(HostRefusal, OlderFilesAreNotTakenForNewOnes) {
+    Make();
+    const std::string before = support::ReadText(file);
+    const auto create = [&](std::uint32_t samples, std::uint32_t lines, std::uint32_t bands,
+                            std::uint32_t level) {
+        const zelm::RasterProps props = MemorySource<Pixel>(samples, lines, bands).props;
+        return FailureWith(
+            testsupport::kOpenCall, [&] { Raster::Create(TestModule(), file, props, level); },
+            false);
+    };
+    EXPECT_THAT(create(21, 10, 1, 0), HasSubstr("an older file stands in its place"));
+    EXPECT_THAT(create(20, 11, 1, 0), HasSubstr("an older file stands in its place"));
+    EXPECT_THAT(create(20, 10, 2, 0), HasSubstr("an older file stands in its place"));
+    EXPECT_THAT(create(20, 10, 1, 1), HasSubstr("an older file stands in its place"));
+    EXPECT_EQ(support::ReadText(file), before);
+}
+
+TEST_F(HostRefusal, MemoryThatIsNoRaster) {
+    zelm::RasterProps props = MemorySource<Pixel>(4, 3, 2).props;
+    props.interleave = zelm::Interleave::BIP;
+    std::vector<Pixel> samples(24, 5);
+    const auto wrap = [&](void* pixels) {
+        return FailureOf([&] { Raster::OfMemory(TestModule(), pixels, props); });
+    };
+    EXPECT_EQ(wrap(samples.data()), "no failure");
+    EXPECT_THAT(wrap(nullptr), HasSubstr("it has no samples"));
+    props.pixelType = 77;
+    EXPECT_NE(wrap(samples.data()), "no failure");
+}
+
+TEST_F(HostRefusal, MemoryRastersTakePartsAndNothing) {
+    zelm::RasterProps props = MemorySource<Pixel>(4, 3, 2).props;
+    props.interleave = zelm::Interleave::BIP;
+    std::vector<Pixel> samples(24, 5);
+    Raster raster = Raster::OfMemory(TestModule(), samples.data(), props);
+    EXPECT_TRUE(raster.IsComplete());
+    EXPECT_THAT(FailureOf([&] { raster.Header(); }), HasSubstr("it is no pyramid file"));
+    EXPECT_EQ(raster.TileSide(), 4U);
+    Pixel pixel = 9;
+    const std::uint32_t second[] = {1};
+    raster.Write(0, {1, 1, 0, 1}, second, &pixel);
+    raster.Write(0, {1, 1, 1, 0}, second, &pixel);
+    raster.Write(0, {1, 1, 1, 1}, {}, &pixel);
+    EXPECT_EQ(samples, std::vector<Pixel>(24, 5));
+    raster.Write(0, {1, 1, 1, 1}, second, &pixel);
+    EXPECT_EQ(samples[2 * (4 + 1) + 1], 9);
+    raster.Read(0, {0, 0, 0, 1}, second, nullptr);
+    raster.Read(0, {0, 0, 1, 0}, second, nullptr);
+    raster.Read(0, {0, 0, 1, 1}, {}, nullptr);
+    EXPECT_NE(FailureOf([&] { raster.Read<Pixel>(1, {0, 0, 1, 1}); }), "no failure");
+}
+
+TEST_F(HostRefusal, LevelsBelowTheFirst) {
+    zelm::test::HeaderText header;
+    header.levelMin = 1;
+    header.levelMax = 2;
+    support::WriteText(file, header.File());
+    Raster raster = Raster::Open(TestModule(), file);
+    EXPECT_EQ(raster.Width(1), 5U);
+    EXPECT_THAT(FailureOf([&] { raster.Width(0); }), HasSubstr("it has the levels 1 to 2"));
+    EXPECT_THAT(FailureOf([&] { raster.Tile(1, 0, 1); }), HasSubstr("no such tile"));
+    EXPECT_THAT(FailureOf([&] { raster.Tile(1, 1, 0); }), HasSubstr("no such tile"));
+}
+
+TEST_F(HostRefusal, ADiskThatDoesNotRead) {
+    Raster raster = Make();
+    EXPECT_THAT(FailureWith(testsupport::kReadCall,
+                            [&] {
+                                raster.Read<Pixel>(0, {0, 0, 20, 10});
+                            }),
+                HasSubstr("the module refuses"));
+    EXPECT_EQ(raster.Read<Pixel>(0, {3, 4, 1, 1})[0], 7);
+}
+
+TEST_F(HostRefusal, ADiskThatTakesNothing) {
+    Raster raster = Make();
+    const auto failure = [&](auto&& action) {
+        return FailureWith(testsupport::kWriteCall, action);
+    };
+    const std::string before = support::ReadText(file);
+    EXPECT_THAT(failure([&] {
+                    raster.Write<Pixel>(0, {0, 0, 20, 10}, std::vector<Pixel>(200, 9));
+                }),
+                HasSubstr("did not reach the file"));
+    EXPECT_THAT(failure([&] { raster.SetStatistics<Pixel>({Mean(0, 7)}); }),
+                HasSubstr("did not reach the file"));
+    zelm::RasterBandHistogram<Pixel> histogram;
+    histogram.binCount = 2;
+    ASSERT_TRUE(histogram.counts.Append(1));
+    ASSERT_TRUE(histogram.counts.Append(2));
+    EXPECT_THAT(failure([&] { raster.SetHistograms<Pixel>({histogram}); }),
+                HasSubstr("did not reach the file"));
+    zelm::Palette palette;
+    palette.AddColor(zelm::Color());
+    EXPECT_THAT(failure([&] { raster.SetBandPalette(0, palette); }),
+                HasSubstr("did not reach the file"));
+    EXPECT_EQ(support::ReadText(file), before);
+    EXPECT_FALSE(raster.BandPalette(0));
+}
+
+TEST_F(HostRefusal, RecordsOfOtherBands) {
+    Raster raster = Make(2);
+    EXPECT_THAT(FailureOf([&] { raster.SetStatistics<Pixel>({Mean(0, 7)}); }),
+                HasSubstr("not those of all bands"));
+    EXPECT_THAT(FailureOf([&] {
+                    raster.SetStatistics<Pixel>({Mean(1, 7), Mean(0, 7)});
+                }),
+                HasSubstr("not those of all bands"));
+    EXPECT_THAT(FailureOf([&] { raster.SetBandPalette(2, zelm::Palette()); }),
+                HasSubstr("there is no such band"));
+    EXPECT_THAT(FailureOf([&] { raster.Statistics<Pixel>(0); }), HasSubstr("the file has none"));
+    EXPECT_NE(FailureOf([&] { raster.Statistics<float>(0); }), "no failure");
+}
+
+// The module fetches by place; a file that was written band by band has its records in any order.
+TEST_F(HostRefusal, RecordsInAnyOrder) {
+    Make(2);
+    const auto record = [](int band, int mean) {
+        return "<BANDSTATISTICS><RSTC_BAND>" + std::to_string(band) + "</RSTC_BAND><RSTC_MEAN>" +
+               std::to_string(mean) + "</RSTC_MEAN></BANDSTATISTICS>";
+    };
+    const std::string front = support::ReadText(file);
+    support::WriteText(file, front + "<DATASET>" + record(1, 10) + record(0, 20) + "</DATASET>");
+    Raster raster = Raster::Open(TestModule(), file);
+    EXPECT_EQ(raster.Statistics<Pixel>(0).mean, 20);
+    EXPECT_EQ(raster.Statistics<Pixel>(1).mean, 10);
+    // A record that stands behind those of as many places as there are bands is not found.
+    support::WriteText(
+        file, front + "<DATASET>" + record(1, 10) + record(1, 11) + record(0, 20) + "</DATASET>");
+    Raster other = Raster::Open(TestModule(), file);
+    EXPECT_THAT(FailureOf([&] { other.Statistics<Pixel>(0); }), HasSubstr("does not find"));
+}
+
+TEST_F(HostRefusal, SourcesWithoutPixels) {
+    const auto build = [&](auto change) {
+        MemorySource<Pixel> source(20, 10, 1);
+        BuildOptions options;
+        change(source, options);
+        return FailureOf([&] { PyramidBuilder(TestModule()).Build(source, file, options); });
+    };
+    EXPECT_THAT(build([](auto& source, auto&) { source.props.samples = 0; }),
+                HasSubstr("it has no pixels"));
+    EXPECT_THAT(build([](auto& source, auto&) { source.props.lines = 0; }),
+                HasSubstr("it has no pixels"));
+    EXPECT_THAT(build([](auto& source, auto&) { source.props.bands = 0; }),
+                HasSubstr("it has no pixels"));
+    EXPECT_THAT(build([](auto& source, auto&) { source.props.pixelType = 77; }),
+                HasSubstr("has no reader"));
+    EXPECT_THAT(build([](auto&, auto& options) { options.bands = {1}; }), HasSubstr("it has 1"));
+    EXPECT_EQ(build([](auto&, auto&) {}), "no failure");
+}
+
+// A palette of complex values is kept, and reduced by what complex values have.
+TEST_F(HostRefusal, PalettesOfComplexPixels) {
+    MemorySource<zelm::Complex<float>> source(600, 520, 1);
+    source.FillWithNoise(3);
+    zelm::PalettePtr palette(new zelm::Palette);
+    palette->AddColor(zelm::Color());
+    source.palettes[0] = palette;
+    const BuildReport report = PyramidBuilder(TestModule()).Build(source, file);
+    EXPECT_TRUE(SupportsElementType(report.resampling, source.props.pixelType));
+    // One without colours is none.
+    source.palettes[0].Reset(new zelm::Palette);
+    BuildOptions options;
+    options.overwrite = true;
+    EXPECT_EQ(PyramidBuilder(TestModule()).Build(source, file, options).resampling,
+              Resampling::Average);
+    EXPECT_FALSE(Raster::Open(TestModule(), file).BandPalette(0));
+}
+
+TEST_F(HostRefusal, DisksThatFailABuild) {
+    Make();
+    const std::string before = support::ReadText(file);
+    MemorySource<Pixel> source(300, 300, 1);
+    source.FillWithNoise(5);
+    BuildOptions options;
+    options.overwrite = true;
+    options.threads = 1;
+    for (const unsigned calls : {testsupport::kWriteCall, testsupport::kSyncCall,
+                                 testsupport::kRenameCall, testsupport::kReadCall}) {
+        const std::string failure =
+            FailureWith(calls, [&] { PyramidBuilder(TestModule()).Build(source, file, options); });
+        EXPECT_THAT(failure, HasSubstr("a.pyr")) << calls;
+        EXPECT_EQ(support::ReadText(file), before);
+    }
+}
+
+}  // namespace
+}  // namespace zmchost
