@@ -302,6 +302,38 @@ TEST(MoveSamplesEdges, AnyStepsMoveTheSameSamples) {
                     }
 }
 
+// Planes into pixels and pixels into planes, where either side may name its bands.
+TEST(MoveSamplesEdges, ListedBandsKeepTheirPlaces) {
+    const std::uint32_t columns = 11, bands = 9, listed = 8;
+    const int list[] = {8, 0, 7, 1, 6, 2, 5, 3};
+    for (const std::uint32_t bytes : {1u, 2u, 4u, 8u, 16u})
+        for (const bool interleaves : {false, true})
+            for (const int* const fromList : {static_cast<const int*>(nullptr), list})
+                for (const int* const toList : {static_cast<const int*>(nullptr), list}) {
+                    const std::size_t inPlanes[] = {bytes, std::size_t{columns} * bytes};
+                    const std::size_t inPixels[] = {std::size_t{bands} * bytes, bytes};
+                    const auto& from = interleaves ? inPlanes : inPixels;
+                    const auto& to = interleaves ? inPixels : inPlanes;
+                    Bytes source(std::size_t{columns} * bands * bytes), moved(source.size(), 1);
+                    for (std::size_t i = 0; i < source.size(); ++i)
+                        source[i] = static_cast<unsigned char>(i * 7 + i / 251);
+                    Bytes expected = moved;
+                    for (std::uint32_t x = 0; x < columns; ++x)
+                        for (std::uint32_t i = 0; i < listed; ++i) {
+                            const auto at = [&](const int* names) {
+                                return names ? static_cast<std::size_t>(names[i]) : i;
+                            };
+                            std::copy_n(source.data() + x * from[0] + at(fromList) * from[1], bytes,
+                                        expected.data() + x * to[0] + at(toList) * to[1]);
+                        }
+                    zelm::MoveSamples({source.data(), 0, from[0], from[1], fromList},
+                                      {moved.data(), 0, to[0], to[1], toList}, 1, columns, listed,
+                                      bytes);
+                    EXPECT_EQ(moved, expected) << bytes << ' ' << interleaves << ' '
+                                               << (fromList != nullptr) << (toList != nullptr);
+                }
+}
+
 TEST(MoveSamplesEdges, NoSampleHasThreeBytes) {
     const Bytes source(32, 5);
     Bytes target(32, 1);
