@@ -14,11 +14,6 @@
 #include "tests/support/AllocationFaults.h"
 #include "tests/support/CampaignLength.h"
 
-// The parser library gives up its buffers without freeing them when its own memory runs out in the
-// middle of a parse; nobody but it knows them. Leaks of ours are still reported.
-extern "C" __attribute__((visibility("default"))) const char* __lsan_default_suppressions();
-extern "C" const char* __lsan_default_suppressions() { return "leak:libxerces-c\n"; }
-
 namespace campaigns {
 namespace {
 

@@ -15,11 +15,6 @@
 #include "tests/support/MemorySource.h"
 #include "tests/support/ScratchDirectory.h"
 
-// The parser library gives up its buffers without freeing them when its own memory runs out in the
-// middle of a parse; nobody but it knows them. Leaks of ours are still reported.
-extern "C" __attribute__((visibility("default"))) const char* __lsan_default_suppressions();
-extern "C" const char* __lsan_default_suppressions() { return "leak:libxerces-c\n"; }
-
 namespace zmchost {
 namespace {
 
