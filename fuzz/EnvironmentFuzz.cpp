@@ -11,6 +11,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <filesystem>
+#include <fstream>
 #include <iostream>
 #include <map>
 #include <memory>
@@ -243,22 +244,35 @@ std::string Held(const std::string& text) { return zmcfuzz::Utf8Of(zmcfuzz::Utf1
 
 std::string OrNotSet(const std::string& text) { return text.empty() ? "Not Set" : Held(text); }
 
-// A folder with what is no engine in it.
-std::string FolderOfNoEngine() {
-    static const std::string folder = [] {
-        const std::string path = Scratch() / "no-engine";
-        std::filesystem::create_directory(path);
+// What stands under the name of the engine.
+enum class Engine { None, NoLibrary, OtherLibrary, Real };
+
+// A folder with that in it. The engine is held for good: a fuzzer that loses a library that it
+// counts in loses its way.
+std::string FolderOf(Engine engine) {
+    static const platform::LibraryHandle held =
+        platform::LoadLibraryFile(String(ZMC_ENGINE_PATH).wide);
+    ZMC_EXPECT(held);
+    const std::string path = Scratch() / ("engine-" + std::to_string(static_cast<int>(engine)));
+    if (std::filesystem::create_directory(path)) {
         const String name = (path + "/").c_str() + zelm::CoordSysFuncPtrs::EngineFileName();
-        std::FILE* const file = std::fopen(name.GetUtf8(), "wb");
-        ZMC_EXPECT(file && std::fputs("not a library", file) >= 0);
-        ZMC_EXPECT(std::fclose(file) == 0);
-        return path;
-    }();
-    return folder;
+        if (engine == Engine::NoLibrary)
+            std::ofstream(name.GetUtf8()) << "not a library";
+        else
+            std::filesystem::create_symlink(
+                engine == Engine::Real ? ZMC_ENGINE_PATH : ZMC_SIBLING_PATH, name.GetUtf8());
+    }
+    return path;
+}
+
+Engine EngineOf(std::uint8_t kind) {
+    if (kind % 16 != 8) return Engine::None;
+    return kind < 128 ? Engine::NoLibrary : kind < 192 ? Engine::OtherLibrary : Engine::Real;
 }
 
 void RunTable(InputBytes& input) {
     const zelm::Environment environment;
+    ZMC_EXPECT(environment.ToString().Find("{Environment}@") == 0);
     auto& settings = GetGlobalEnvironmentImpl().settings;
     settings.clear();
     std::map<std::u16string, std::u16string> model;
@@ -292,22 +306,29 @@ void RunFactory(InputBytes& input) {
     const std::string peDirectory = kind % 4 == 0 ? Scratch().Path()
                                     : pe.empty()  ? pe
                                                   : Scratch().Path() + "/none/" + pe;
-    if (kind % 16 == 8) bin = FolderOfNoEngine();
-    if (bin.starts_with('/') && kind % 16 != 8) bin.erase(0, 1);
+    const Engine engine = EngineOf(kind);
+    if (engine != Engine::None)
+        bin = FolderOf(engine);
+    else if (bin.starts_with('/'))
+        bin.erase(0, 1);
     environment.GetSetting(zelm::EnvironmentKeys::kBinDirectory) = bin.c_str();
     environment.GetSetting(zelm::EnvironmentKeys::kPeDirectory) = peDirectory.c_str();
     if (kind % 3 != 0) environment.GetSetting(zelm::EnvironmentKeys::kGdalDirectory) = gdal.c_str();
-    // Loading a library that is none clears the entry point that was not found; the rest stand.
+    // A library sets the entry points, or clears the first that it has not.
+    const bool loaded = engine == Engine::OtherLibrary || engine == Engine::Real;
     fp_Esri_Pe_Initialize = &TakeInitialisation;
     toldPeDirectory = toldGdalDirectory = "nothing";
     {
         const std::unique_ptr<zelm::CoordSysFactory> factory(zelm::CoordSysFactory::GetInstance());
         ZMC_EXPECT(factory && factory.get() == zelm::CoordSysFactory::GetInstance());
-        ZMC_EXPECT(!factory->funcPtrs.module);
+        ZMC_EXPECT((factory->funcPtrs.module != nullptr) == loaded);
+        ZMC_EXPECT((fp_Esri_Pe_Release != nullptr) == (engine == Engine::Real));
         gpCoordSysFactoryInstance = nullptr;
     }
-    ZMC_EXPECT(toldPeDirectory == OrNotSet(peDirectory));
-    ZMC_EXPECT(toldGdalDirectory == (kind % 3 != 0 ? OrNotSet(gdal) : "Not Set"));
+    ZMC_EXPECT(toldPeDirectory == (loaded ? "nothing" : OrNotSet(peDirectory)));
+    ZMC_EXPECT(toldGdalDirectory == (loaded          ? "nothing"
+                                     : kind % 3 != 0 ? OrNotSet(gdal)
+                                                     : "Not Set"));
     ZMC_EXPECT((gpCoordSysLogInstance != nullptr) == (kind % 4 == 0));
     delete gpCoordSysLogInstance;
     gpCoordSysLogInstance = nullptr;

@@ -3,7 +3,8 @@
 // that counts in 128 bits.
 //
 // An input tells the fields of a header, then a tile, a window of a level and a list of bands.
-// Small layouts go on to a file of known bytes, through which tiles are read and written.
+// Small layouts, and those of few rows that are long, go on to a file of known bytes, through which
+// tiles are read and written.
 #include <algorithm>
 #include <cstddef>
 #include <cstdint>
@@ -269,34 +270,43 @@ Array<int> ListOf(const std::vector<int>& bands) {
     return list;
 }
 
-// What all inputs share: a file of known bytes, and a name for files that inputs make.
-class World {
+// A file whose bytes are known, for the layouts of all inputs in turn.
+class KnownFile {
 public:
-    static constexpr std::size_t kFileBytes = 1 << 15;
-    static constexpr std::uint64_t kTileDataStart = 100;
-
-    World() {
-        xercesc::XMLPlatformUtils::Initialize();
-        known.resize(kFileBytes);
-        for (std::size_t i = 0; i < known.size(); ++i)
-            known[i] = static_cast<unsigned char>(i * 31 + (i >> 8) * 7 + 1);
-        const auto file = platform::File::Open(TilesName().wide, platform::File::Mode::Create);
-        ZMC_EXPECT(file && file->WriteAt(0, known.data(), known.size()) == known.size());
+    KnownFile(const std::string& path, std::size_t size) : name(path.c_str()), bytes(size) {
+        for (std::size_t i = 0; i < bytes.size(); ++i)
+            bytes[i] = static_cast<unsigned char>(i * 31 + (i >> 8) * 7 + 1);
+        const auto file = platform::File::Open(name.wide, platform::File::Mode::Create);
+        ZMC_EXPECT(file && file->WriteAt(0, bytes.data(), bytes.size()) == bytes.size());
     }
 
-    zelm::String TilesName() const { return (scratch / "tiles").c_str(); }
-    const Bytes& Known() const { return known; }
-
-    // An open dataset for all that moves no tiles.
-    PyramidDataset& Dataset() {
-        static PyramidDataset dataset(TilesName());
-        if (!dataset.File) dataset.OpenFile(false);
+    // An open dataset whose work space is no larger than it need be.
+    std::unique_ptr<PyramidDataset> Open() const {
+        auto dataset = std::make_unique<PyramidDataset>(name);
+        dataset->OpenFile(false);
         return dataset;
     }
 
-private:
-    zmcfuzz::ScratchFolder scratch;
-    Bytes known;
+    const zelm::String name;
+    Bytes bytes;
+};
+
+constexpr std::uint64_t kTileDataStart = 100;
+
+// What all inputs share.
+struct World {
+    static constexpr std::size_t kSmallBytes = std::size_t{1} << 15;
+    static constexpr std::size_t kLargeBytes = std::size_t{1} << 22;
+
+    World() {
+        xercesc::XMLPlatformUtils::Initialize();
+        dataset = small.Open();
+    }
+
+    const zmcfuzz::ScratchFolder scratch;
+    const KnownFile small{scratch / "small", kSmallBytes};
+    const KnownFile large{scratch / "large", kLargeBytes};
+    std::unique_ptr<PyramidDataset> dataset;  // of the small file; for all that moves no tiles, too
 };
 
 World& TheWorld() {
@@ -318,12 +328,12 @@ public:
         dataset.PixelType = f.pixelType;
         dataset.TileOrdering = f.ordering;
         dataset.BytesPerSample = zelm::PixelSize(f.pixelType);
-        dataset.TileDataStart = World::kTileDataStart;
+        dataset.TileDataStart = kTileDataStart;
         dataset.TileOffsets.Clear();
         dataset.LevelOffsets.reset();
         if (!layout.IsAllowed()) return;
         dataset.LevelOffsets.reset(new std::uint64_t[f.levelMax + 1u]());
-        Wide offset = World::kTileDataStart;
+        Wide offset = kTileDataStart;
         for (std::uint32_t above = f.levelMax + 1u; above > f.levelMin; --above) {
             dataset.LevelOffsets[above - 1u] = static_cast<std::uint64_t>(offset);
             offset += layout.LevelBytes(above - 1u);
@@ -351,47 +361,50 @@ public:
     PyramidDataset& dataset;
 };
 
-// Where the samples of a small layout lie, by the letter.
+// Where the samples of one level of a small layout lie, by the letter.
 class SampleMap {
 public:
-    explicit SampleMap(const NaiveLayout& naive) : layout(naive) {
-        if (layout.IsPlanar()) morton.emplace(layout, World::kTileDataStart);
+    SampleMap(const NaiveLayout& naive, std::uint32_t atLevel)
+        : layout(naive), level(atLevel), levelStart(kTileDataStart + layout.BytesAbove(level)) {
+        if (layout.IsPlanar()) morton.emplace(layout, kTileDataStart);
     }
 
-    std::size_t TileStart(std::uint32_t level, Wide tileX, Wide tileY, int band) const {
+    std::size_t TileStart(Wide tileX, Wide tileY, int band) const {
         if (!layout.IsPlanar())
-            return static_cast<std::size_t>(World::kTileDataStart + layout.BytesAbove(level) +
-                                            layout.TileOffset(level, tileX, tileY));
+            return static_cast<std::size_t>(levelStart + layout.TileOffset(level, tileX, tileY));
         const Wide place = morton->Offset(level, static_cast<std::uint32_t>(band), tileX, tileY);
         ZMC_EXPECT(place != NaiveMorton::kNoPlace);
         return static_cast<std::size_t>(place);
     }
 
-    std::size_t SampleStart(std::uint32_t level, std::uint32_t x, std::uint32_t y, int band) const {
+    std::size_t SampleStart(std::uint32_t x, std::uint32_t y, int band) const {
         const NaiveAxis across = layout.Across(level);
         const Wide tileX = x / across.tile;
         const Wide tileY = y / across.tile;
         const Wide pixel = (y % across.tile) * across.TileExtent(tileX) + x % across.tile;
         const Wide sample =
             layout.IsPlanar() ? pixel : pixel * layout.fields.bands + static_cast<Wide>(band);
-        return TileStart(level, tileX, tileY, band) +
+        return TileStart(tileX, tileY, band) +
                static_cast<std::size_t>(sample * layout.sampleBytes);
     }
 
 private:
     const NaiveLayout& layout;
+    const std::uint32_t level;
+    const Wide levelStart;
     std::optional<NaiveMorton> morton;
 };
 
-// Tiles of a small layout, read from and written to the file of known bytes.
+// Tiles of a small layout, read from and written to a file of known bytes.
 class Transfers {
 public:
-    Transfers(LaidOut& laidOut, const Window& asked)
+    Transfers(LaidOut& laidOut, const Window& asked, const KnownFile& file)
         : layout(laidOut.layout),
+          known(file.bytes),
           dataset(laidOut.dataset),
           window(asked),
           level(static_cast<std::uint32_t>(asked.level)),
-          map(layout),
+          map(layout, level),
           list(ListOf(asked.bands)),
           bands(asked.bands),
           sampleBytes(static_cast<std::size_t>(layout.sampleBytes)) {
@@ -403,7 +416,6 @@ public:
     void Read() {
         Bytes buffer(BufferBytes(), 0xEE);
         ZMC_EXPECT(Move(buffer, false));
-        const Bytes& known = TheWorld().Known();
         ForEachSample([&](std::size_t inBuffer, std::size_t inFile) {
             ZMC_EXPECT(
                 std::equal(&buffer[inBuffer], &buffer[inBuffer] + sampleBytes, &known.at(inFile)));
@@ -414,14 +426,13 @@ public:
         Bytes buffer(BufferBytes());
         for (std::size_t i = 0; i < buffer.size(); ++i)
             buffer[i] = static_cast<unsigned char>(seed + i * 13);
-        Bytes expected = TheWorld().Known();
+        Bytes expected = known;
         WriteModel(buffer, expected);
         ZMC_EXPECT(Move(buffer, true));
         Bytes found(expected.size());
         ZMC_EXPECT(dataset.File->Size() == expected.size());
         ZMC_EXPECT(dataset.File->ReadAt(0, found.data(), found.size()) == found.size());
         ZMC_EXPECT(found == expected);
-        const Bytes& known = TheWorld().Known();
         dataset.File->WriteAt(0, known.data(), known.size());
     }
 
@@ -466,11 +477,11 @@ private:
 
     bool Move(Bytes& buffer, bool write) {
         bool done = false;
-        const bool known = zelm::VisitElementType(layout.fields.pixelType, [&](auto type) {
+        const bool named = zelm::VisitElementType(layout.fields.pixelType, [&](auto type) {
             using T = typename decltype(type)::type;
             done = MoveAs(reinterpret_cast<T*>(buffer.data()), write);
         });
-        return known ? done : MoveAs(buffer.data(), write);
+        return named ? done : MoveAs(buffer.data(), write);
     }
 
     template <class Visit>
@@ -479,8 +490,7 @@ private:
         for (std::uint32_t row = 0; row < window.height; ++row)
             for (std::uint32_t column = 0; column < window.width; ++column)
                 for (const int band : bands) {
-                    visit(inBuffer,
-                          map.SampleStart(level, window.x + column, window.y + row, band));
+                    visit(inBuffer, map.SampleStart(window.x + column, window.y + row, band));
                     inBuffer += sampleBytes;
                 }
     }
@@ -520,8 +530,7 @@ private:
         if (layout.IsPlanar()) {
             if (!IsDirect() || !IsOneTile()) return;
             for (std::size_t i = 0; i < bands.size(); ++i) {
-                const std::size_t start =
-                    map.TileStart(level, window.x / t, window.y / t, bands[i]);
+                const std::size_t start = map.TileStart(window.x / t, window.y / t, bands[i]);
                 for (std::size_t p = 0; p < pixels; ++p)
                     std::copy_n(&buffer[(p * bands.size() + i) * sampleBytes], sampleBytes,
                                 &file.at(start + p * sampleBytes));
@@ -534,7 +543,7 @@ private:
             });
             return;
         }
-        const std::size_t start = map.TileStart(level, window.x / t, window.y / t, 0);
+        const std::size_t start = map.TileStart(window.x / t, window.y / t, 0);
         if (AllInOrder()) {
             std::copy(buffer.begin(), buffer.end(), &file.at(start));
             return;
@@ -551,6 +560,7 @@ private:
     }
 
     const NaiveLayout& layout;
+    const Bytes& known;
     PyramidDataset& dataset;
     const Window& window;
     const std::uint32_t level;
@@ -589,10 +599,20 @@ void ExpectTable(LaidOut& laidOut, std::uint32_t tileHeight, std::uint64_t start
     dataset.TileOffsets.Clear();
 }
 
-// Small enough for the file of known bytes, with room behind for what is written there.
-bool HasSmallFile(const NaiveLayout& layout) {
-    return layout.IsAllowed() && layout.TileDataBytes() <= World::kFileBytes / 8 &&
+// Small enough for the small file, with room behind for what is written there.
+bool IsSmall(const NaiveLayout& layout) {
+    return layout.TileDataBytes() <= World::kSmallBytes / 8 &&
            (!layout.IsPlanar() || layout.TableBytes() / 8 <= kMostEntries);
+}
+
+// A tile row is longer than what the module moves at once, and the large file holds the tiles
+// with room behind.
+bool IsLong(const NaiveLayout& layout) {
+    constexpr Wide kRunBytes = 128 << 10;
+    const Wide pixels =
+        std::min<Wide>(layout.fields.tile, layout.Across(layout.fields.levelMin).extent);
+    return !layout.IsPlanar() && pixels * layout.TilePixelBytes() > kRunBytes &&
+           layout.TileDataBytes() <= World::kLargeBytes / 4;
 }
 
 // Blocks of samples of any layout, moved between rooms of their very sizes.
@@ -674,26 +694,24 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     ExpectTile(layout, layout.fields.levelMin, tileX, tileY);
     ExpectTile(layout, layout.fields.levelMax, tileX, tileY);
     const Window window = TakeWindow(input, layout);
-    LaidOut laidOut(layout, TheWorld().Dataset());
+    LaidOut laidOut(layout, *TheWorld().dataset);
     laidOut.ExpectAcceptance(window);
     laidOut.ExpectTileOffset(layout.fields.levelMin, tileX, tileY);
     ExpectTable(laidOut, (kind & 15) == 0 ? tileX : layout.fields.tile, std::uint64_t{level} << 20);
     const bool empty = window.width == 0 || window.height == 0;
     if (!empty && layout.IsAllowed() && IsAccepted(layout, window)) {
         ExpectWalk(layout, window, input.UpTo(255));
-        if (HasSmallFile(layout)) {
-            // Now and then a dataset of its own, whose work space is no larger than it need be.
-            std::unique_ptr<PyramidDataset> own;
-            if (input.UpTo(15) == 15) {
-                own = std::make_unique<PyramidDataset>(TheWorld().TilesName());
-                own->OpenFile(false);
-            }
-            LaidOut small(layout, own ? *own : TheWorld().Dataset());
-            Transfers transfers(small, window);
-            transfers.Read();
-            if (input.Flag()) transfers.Write(input.Byte());
-            if (input.Flag()) transfers.ExpectRefusalOfOtherTypes();
-        }
+        const bool small = IsSmall(layout);
+        if (!small && !IsLong(layout)) return 0;
+        const KnownFile& file = small ? TheWorld().small : TheWorld().large;
+        // Now and then a dataset of its own for small layouts as well.
+        std::unique_ptr<PyramidDataset> own;
+        if (input.UpTo(15) == 15 || !small) own = file.Open();
+        LaidOut withFile(layout, own ? *own : *TheWorld().dataset);
+        Transfers transfers(withFile, window, file);
+        transfers.Read();
+        if (input.Flag()) transfers.Write(input.Byte());
+        if (input.Flag()) transfers.ExpectRefusalOfOtherTypes();
     }
     return 0;
 }

@@ -118,6 +118,12 @@ def layout_seeds():
             yield f"small-{name}-{kind}-{list_kind}", b"\xf0" + fields + b"\1\1\0" + window + rest
         above = bytes([fields[5] + fields[4] + 1])
         yield f"above-{name}", b"\xf0" + fields + b"\1\1\0" + b"\x09" + above + b"\0\0\1\1\1"
+    # Rows and pixels that no run of a transfer holds: in part and as a whole, all bands and some.
+    for name, fields in (("row", (3, 2, 4100, 3, 0, 0)), ("pixel", (2, 2, 8193, 2, 0, 0))):
+        header = b"\x21" + b"".join(map(size, fields)) + b"\x0b\0" + b"\0\0\0"
+        for part, window in (("part", b"\1\0\1\0\1\1"), ("whole", b"\5\0\0\0")):
+            for bands, numbers in (("all", b"\0"), ("some", b"\x0a\x03\xff\0\x10\0\0")):
+                yield f"long-{name}-{part}-{bands}", header + window + numbers + b"\xff\0\1\7\1"
     # As many bytes as a transfer may have, and one more.
     whole = b"\x21" + b"".join(map(size, (65536, 65536, 1, 256, 0, 0))) + b"\0\0\0\0\0\1\0\0\0"
     yield "transfer-limit", whole + size(65536) + size(65536) + b"\0\xff"
@@ -179,7 +185,7 @@ def environment_seeds():
     yield "log-unset-level", b"\2" + variable(b"a") + unset
     yield "log-unset-console", b"\2" + variable(b"a") + variable(b"3") + unset + b"\1\1\0\0"
     yield "table", b"\0\5\1a\1\1b\1a\1\1c\1A\0\0\1\2de\1a\0"
-    for kind in (0, 1, 4, 8, 13):
+    for kind in (0, 1, 4, 8, 13, 136, 200):
         yield f"factory-{kind}", b"\1" + bytes([kind]) + b"\3bin\2pe\4gdal"
 
 
@@ -278,6 +284,8 @@ def file_seeds():
             yield f"wide-{name}-{number}", front + script + bytes([len(script)])
     yield "old-version", with_script(pyramid_file(version=(1, 0)), 2)
     yield "large-tile", with_script(pyramid_file(tile=4096), 2)
+    yield "other-kind", with_script(b"II*\0" + bytes(40), 0)
+    yield "no-bytes", with_script(b"", 0)
     yield "malformed", with_script(pyramid_file(metadata[:-12]), 2)
     yield "no-type", with_script(pyramid_file().replace(b">Byte<", b">Quad<"), 2)
 
@@ -335,6 +343,10 @@ def metadata_seeds():
     yield "type", b"<!DOCTYPE d [<!ENTITY e 'x'>]><DATASET>&e;</DATASET>"
     yield "deep", b"<A>" * 70 + b"</A>" * 70
     yield "names", b"<A>" + b"".join(b"<a%d/>" % i for i in range(300)) + b"</A>"
+    # From a third of the text on it tells what to store: a histogram, and one that is refused.
+    refused = b"<DATASET><!--aaaaaaa!aaaZg--></DATASET>"
+    for length in range(3):
+        yield f"refused-{length}", refused + b"\n" * length
     yield "wide-text", metadata_document(statistics(0)).decode().encode("utf-16")
 
 
