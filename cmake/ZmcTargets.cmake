@@ -28,7 +28,9 @@ endif()
 # Counted in the source, not in the machine code: a branch is a condition that somebody wrote, and
 # not the way that an exception might take out of every call.
 if(ZMC_COVERAGE)
-    list(APPEND ZMC_INSTRUMENT_FLAGS -fprofile-instr-generate -fcoverage-mapping)
+    # One way of a branch is told from the counts of the other and of both, which threads must not lose.
+    list(APPEND ZMC_INSTRUMENT_FLAGS -fprofile-instr-generate -fcoverage-mapping
+         -fprofile-update=atomic)
 endif()
 
 # The module works inside somebody else's process on files from anywhere: what the compiler, the C
