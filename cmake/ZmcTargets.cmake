@@ -28,7 +28,7 @@ endif()
 # Counted in the source, not in the machine code: a branch is a condition that somebody wrote, and
 # not the way that an exception might take out of every call.
 if(ZMC_COVERAGE)
-    # One way of a branch is told from the counts of the other and of both, which threads must not lose.
+    # One way of a branch is told from the counts of the other and of both: threads may lose none.
     list(APPEND ZMC_INSTRUMENT_FLAGS -fprofile-instr-generate -fcoverage-mapping
          -fprofile-update=atomic)
 endif()
