@@ -257,7 +257,7 @@ std::string FolderOf(Engine engine) {
     if (std::filesystem::create_directory(path)) {
         const String name = (path + "/").c_str() + zelm::CoordSysFuncPtrs::EngineFileName();
         if (engine == Engine::NoLibrary)
-            std::ofstream(name.GetUtf8()) << "not a library";
+            ZMC_EXPECT(std::ofstream(name.GetUtf8()) << "not a library" << std::flush);
         else
             std::filesystem::create_symlink(
                 engine == Engine::Real ? ZMC_ENGINE_PATH : ZMC_SIBLING_PATH, name.GetUtf8());
