@@ -15,7 +15,7 @@
 #include <string>
 #include <vector>
 
-#include "host/PyramidBuilder.h"
+#include "host/build/PyramidBuilder.h"
 
 namespace {
 

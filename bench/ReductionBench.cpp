@@ -6,10 +6,10 @@
 #include <random>
 #include <vector>
 
-#include "host/BandStatistics.h"
-#include "host/Histogram.h"
-#include "host/Reduction.h"
-#include "host/ValueCounter.h"
+#include "host/reduce/Reduction.h"
+#include "host/statistics/BandStatistics.h"
+#include "host/statistics/Histogram.h"
+#include "host/statistics/ValueCounter.h"
 
 namespace {
 

@@ -9,7 +9,7 @@
 #include "gdal/Dataset.h"
 #include "gdal/GdalRasterSource.h"
 #include "gdal/Sidecar.h"
-#include "host/PyramidBuilder.h"
+#include "host/build/PyramidBuilder.h"
 
 namespace zmcgdal {
 namespace {

@@ -15,7 +15,7 @@
 #include <vector>
 
 #include "gdal/Options.h"
-#include "host/BuildFile.h"
+#include "host/build/BuildFile.h"
 
 namespace zmcgdal {
 

@@ -18,7 +18,7 @@
 #include "gdal/LazyRaster.h"
 #include "gdal/Options.h"
 #include "gdal/TileReader.h"
-#include "host/PyramidFileInfo.h"
+#include "host/file/PyramidFileInfo.h"
 
 namespace zmcgdal {
 

@@ -8,9 +8,9 @@
 #include "gdal/Create.h"
 #include "gdal/Dataset.h"
 #include "gdal/Options.h"
-#include "host/MetadataCopy.h"
-#include "host/PyramidFileInfo.h"
-#include "host/Xerces.h"
+#include "host/base/Xerces.h"
+#include "host/file/PyramidFileInfo.h"
+#include "host/journal/MetadataJournal.h"
 
 namespace zmcgdal {
 namespace {

@@ -5,7 +5,7 @@
 #include "core/PixelVocabulary.h"
 #include "gdal/NoDataValues.h"
 #include "gdal/SampleType.h"
-#include "host/Error.h"
+#include "host/base/Error.h"
 
 namespace zmcgdal {
 namespace {

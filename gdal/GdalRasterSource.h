@@ -10,7 +10,7 @@
 #include <string>
 #include <vector>
 
-#include "host/RasterSource.h"
+#include "host/raster/RasterSource.h"
 
 namespace zmcgdal {
 

@@ -12,7 +12,7 @@
 #include <string>
 #include <utility>
 
-#include "host/Raster.h"
+#include "host/raster/Raster.h"
 
 namespace zmcgdal {
 

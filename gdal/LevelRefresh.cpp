@@ -8,7 +8,7 @@
 
 #include "gdal/NoDataValues.h"
 #include "gdal/Options.h"
-#include "host/LevelReduction.h"
+#include "host/build/LevelReduction.h"
 
 namespace zmcgdal {
 namespace {

@@ -5,7 +5,7 @@
 #include "core/ElementTypes.h"
 #include "dispatch/NoDataRule.h"
 #include "gdal/SampleType.h"
-#include "host/NoData.h"
+#include "host/raster/NoData.h"
 
 namespace zmcgdal {
 namespace {

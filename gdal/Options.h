@@ -8,7 +8,7 @@
 #include <string>
 
 #include "gdal/SampleType.h"
-#include "host/PyramidBuilder.h"
+#include "host/build/PyramidBuilder.h"
 
 namespace zmcgdal {
 

@@ -13,7 +13,7 @@
 #include <vector>
 
 #include "gdal/LazyRaster.h"
-#include "host/PyramidFileInfo.h"
+#include "host/file/PyramidFileInfo.h"
 
 namespace zmcgdal {
 

@@ -9,7 +9,7 @@
 #include <string>
 #include <vector>
 
-#include "host/RasterSource.h"
+#include "host/raster/RasterSource.h"
 
 namespace zmctools {
 

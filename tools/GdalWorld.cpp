@@ -7,7 +7,7 @@
 #include <mutex>
 
 #include "gdal/Driver.h"
-#include "host/Xerces.h"
+#include "host/base/Xerces.h"
 #include "tools/Message.h"
 
 namespace zmctools {

@@ -3,8 +3,8 @@
 #include <cstdio>
 
 #include "core/PixelVocabulary.h"
-#include "host/MetadataDocument.h"
-#include "host/PyramidFileInfo.h"
+#include "host/file/MetadataDocument.h"
+#include "host/file/PyramidFileInfo.h"
 #include "tools/Command.h"
 #include "tools/HistogramBars.h"
 #include "tools/RasterView.h"

@@ -1,7 +1,7 @@
 #include <algorithm>
 #include <cstring>
 
-#include "host/LevelReduction.h"
+#include "host/build/LevelReduction.h"
 #include "tools/Interrupt.h"
 #include "tools/Message.h"
 #include "tools/SampleDifferences.h"

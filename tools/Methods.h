@@ -5,7 +5,7 @@
 #include <string>
 #include <vector>
 
-#include "host/Reduction.h"
+#include "host/reduce/Reduction.h"
 
 namespace zmctools {
 

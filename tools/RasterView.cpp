@@ -8,7 +8,7 @@
 #include "core/PixelVocabulary.h"
 #include "gdal/Dataset.h"
 #include "gdal/GdalRasterSource.h"
-#include "host/MetadataCopy.h"
+#include "host/journal/MetadataJournal.h"
 #include "tools/GdalWorld.h"
 #include "tools/Interrupt.h"
 #include "tools/Message.h"

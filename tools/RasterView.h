@@ -14,8 +14,8 @@
 #include <string>
 #include <vector>
 
-#include "host/PyramidFileInfo.h"
-#include "host/Raster.h"
+#include "host/file/PyramidFileInfo.h"
+#include "host/raster/Raster.h"
 #include "tools/TerminalProgress.h"
 
 namespace zmctools {

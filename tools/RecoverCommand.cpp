@@ -1,7 +1,7 @@
 #include <cstdio>
 
-#include "host/MetadataCopy.h"
-#include "host/MetadataDocument.h"
+#include "host/file/MetadataDocument.h"
+#include "host/journal/MetadataJournal.h"
 #include "tools/Command.h"
 #include "tools/RasterView.h"
 

@@ -2,8 +2,8 @@
 #include <cmath>
 #include <limits>
 
-#include "host/BandStatistics.h"
-#include "host/Histogram.h"
+#include "host/statistics/BandStatistics.h"
+#include "host/statistics/Histogram.h"
 #include "tools/Interrupt.h"
 #include "tools/Message.h"
 #include "tools/Verification.h"

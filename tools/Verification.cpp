@@ -1,7 +1,7 @@
 #include "tools/Verification.h"
 
 #include "core/PixelVocabulary.h"
-#include "host/MetadataDocument.h"
+#include "host/file/MetadataDocument.h"
 #include "tools/Interrupt.h"
 #include "tools/Message.h"
 #include "tools/SampleDifferences.h"

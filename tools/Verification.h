@@ -10,9 +10,9 @@
 #include <string>
 #include <vector>
 
-#include "host/PyramidFileInfo.h"
-#include "host/Raster.h"
-#include "host/Reduction.h"
+#include "host/file/PyramidFileInfo.h"
+#include "host/raster/Raster.h"
+#include "host/reduce/Reduction.h"
 #include "tools/RasterView.h"
 
 namespace zmctools {

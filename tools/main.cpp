@@ -5,7 +5,7 @@
 #include <new>
 #include <xercesc/util/XercesVersion.hpp>
 
-#include "host/Error.h"
+#include "host/base/Error.h"
 #include "tools/Command.h"
 #include "tools/GdalWorld.h"
 #include "tools/Generate.h"

@@ -9,7 +9,7 @@
 #include <stdexcept>
 #include <string>
 
-#include "host/PyramidBuilder.h"
+#include "host/build/PyramidBuilder.h"
 #include "tests/campaigns/HostSession.h"
 #include "tests/support/MemorySource.h"
 

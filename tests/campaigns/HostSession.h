@@ -9,7 +9,7 @@
 #include <string>
 #include <vector>
 
-#include "host/Module.h"
+#include "host/raster/Module.h"
 #include "tests/support/ScratchDirectory.h"
 
 namespace campaigns {

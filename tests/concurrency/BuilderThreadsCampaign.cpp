@@ -7,7 +7,7 @@
 #include <cstdio>
 #include <thread>
 
-#include "host/PyramidBuilder.h"
+#include "host/build/PyramidBuilder.h"
 #include "tests/support/CampaignLength.h"
 #include "tests/support/MemorySource.h"
 #include "tests/support/ScratchDirectory.h"

@@ -11,7 +11,7 @@
 #include <string>
 #include <vector>
 
-#include "host/Module.h"
+#include "host/raster/Module.h"
 #include "raster/RasterReader.h"
 
 namespace zmctest {

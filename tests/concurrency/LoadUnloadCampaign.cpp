@@ -13,7 +13,7 @@
 #include <optional>
 
 #include "connection/DataConnectionFactory.h"
-#include "host/Raster.h"
+#include "host/raster/Raster.h"
 #include "tests/support/CampaignLength.h"
 #include "tests/support/ChildProcess.h"
 #include "tests/support/CountingGeoRef.h"

@@ -17,8 +17,8 @@
 #include <vector>
 
 #include "gdal/SampleType.h"
-#include "host/MetadataCopy.h"
-#include "host/PyramidHeader.h"
+#include "host/file/PyramidHeader.h"
+#include "host/journal/MetadataJournal.h"
 #include "tests/support/ScratchDirectory.h"
 
 namespace zmcgdal {
@@ -254,11 +254,11 @@ TEST_F(DriverTest, StoreThatWasCutOffIsPutInOrder) {
     const std::uint64_t document = zmchost::PyramidHeader::Read(name).tileDataEnd;
     const pid_t child = fork();
     if (child == 0) {
-        const auto* const left = new zmchost::MetadataCopy(name);
+        const auto* const left = new zmchost::MetadataJournal(name);
         _exit(left ? 0 : 1);
     }
     waitpid(child, nullptr, 0);
-    ASSERT_TRUE(fs::exists(zmchost::MetadataCopy::PathFor(name)));
+    ASSERT_TRUE(fs::exists(zmchost::MetadataJournal::PathFor(name)));
     std::fstream(name, std::ios::in | std::ios::out | std::ios::binary)
             .seekp(static_cast<std::streamoff>(document))
         << '\x1A';
@@ -267,7 +267,7 @@ TEST_F(DriverTest, StoreThatWasCutOffIsPutInOrder) {
     EXPECT_NE(std::string(CPLGetLastErrorMsg()).find("again the one of before"), std::string::npos);
     CPLPopErrorHandler();
     EXPECT_EQ(MeanOf(*opened), mean);
-    EXPECT_FALSE(fs::exists(zmchost::MetadataCopy::PathFor(name)));
+    EXPECT_FALSE(fs::exists(zmchost::MetadataJournal::PathFor(name)));
 }
 
 }  // namespace

@@ -1,4 +1,4 @@
-#include "host/BandStatistics.h"
+#include "host/statistics/BandStatistics.h"
 
 #include <gtest/gtest.h>
 #include <rapidcheck/gtest.h>

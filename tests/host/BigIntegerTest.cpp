@@ -1,4 +1,4 @@
-#include "host/BigInteger.h"
+#include "host/base/BigInteger.h"
 
 #include <gtest/gtest.h>
 #include <rapidcheck/gtest.h>

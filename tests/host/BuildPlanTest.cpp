@@ -1,5 +1,5 @@
 // The arithmetic of a build, with a pencil.
-#include "host/BuildPlan.h"
+#include "host/build/BuildPlan.h"
 
 #include <gtest/gtest.h>
 #include <rapidcheck.h>

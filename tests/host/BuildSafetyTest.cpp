@@ -10,10 +10,10 @@
 #include <filesystem>
 #include <stdexcept>
 
-#include "host/BuildFile.h"
-#include "host/PyramidBuilder.h"
-#include "host/Raster.h"
-#include "host/TileStore.h"
+#include "host/build/BuildFile.h"
+#include "host/build/PyramidBuilder.h"
+#include "host/build/TileStore.h"
+#include "host/raster/Raster.h"
 #include "tests/support/MemorySource.h"
 #include "tests/support/ScratchDirectory.h"
 

@@ -1,5 +1,5 @@
 // Pyramids as the builder makes them, held against levels made the simple way.
-#include "host/PyramidBuilder.h"
+#include "host/build/PyramidBuilder.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -10,8 +10,8 @@
 #include <limits>
 
 #include "core/PixelVocabulary.h"
-#include "host/BandStatistics.h"
-#include "host/Raster.h"
+#include "host/raster/Raster.h"
+#include "host/statistics/BandStatistics.h"
 #include "tests/host/NaivePyramid.h"
 #include "tests/support/MemorySource.h"
 #include "tests/support/ScratchDirectory.h"

@@ -1,4 +1,4 @@
-#include "host/Histogram.h"
+#include "host/statistics/Histogram.h"
 
 #include <gtest/gtest.h>
 #include <rapidcheck/gtest.h>
@@ -10,8 +10,8 @@
 #include <random>
 #include <vector>
 
-#include "host/Int128.h"
-#include "host/ValueCounter.h"
+#include "host/base/Int128.h"
+#include "host/statistics/ValueCounter.h"
 
 namespace {
 

@@ -6,11 +6,11 @@
 #include <new>
 #include <optional>
 
-#include "host/Error.h"
-#include "host/MetadataDocument.h"
-#include "host/Raster.h"
-#include "host/Strip.h"
-#include "host/Text.h"
+#include "host/base/Error.h"
+#include "host/base/Text.h"
+#include "host/build/Strip.h"
+#include "host/file/MetadataDocument.h"
+#include "host/raster/Raster.h"
 #include "tests/support/AllocationFaults.h"
 #include "tests/support/MemorySource.h"
 #include "tests/support/ScratchDirectory.h"

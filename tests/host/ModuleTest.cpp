@@ -1,5 +1,5 @@
 // Loading the module.
-#include "host/Module.h"
+#include "host/raster/Module.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -8,9 +8,9 @@
 #include <thread>
 #include <vector>
 
-#include "host/Error.h"
-#include "host/Raster.h"
-#include "host/Xerces.h"
+#include "host/base/Error.h"
+#include "host/base/Xerces.h"
+#include "host/raster/Raster.h"
 #include "tests/support/MemorySource.h"
 #include "tests/support/ScratchDirectory.h"
 

@@ -6,8 +6,8 @@
 #include <cstdint>
 #include <vector>
 
-#include "host/NoData.h"
-#include "host/Reduction.h"
+#include "host/raster/NoData.h"
+#include "host/reduce/Reduction.h"
 
 namespace support {
 

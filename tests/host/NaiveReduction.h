@@ -13,8 +13,8 @@
 #include <utility>
 #include <vector>
 
-#include "host/Int128.h"
-#include "host/Reduction.h"
+#include "host/base/Int128.h"
+#include "host/reduce/Reduction.h"
 
 namespace naive {
 

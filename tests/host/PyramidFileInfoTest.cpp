@@ -1,4 +1,4 @@
-#include "host/PyramidFileInfo.h"
+#include "host/file/PyramidFileInfo.h"
 
 #include <gtest/gtest.h>
 
@@ -6,8 +6,8 @@
 #include <fstream>
 #include <stdexcept>
 
-#include "host/Error.h"
-#include "host/HeaderScanner.h"
+#include "host/base/Error.h"
+#include "host/file/HeaderScanner.h"
 
 namespace zmchost {
 namespace {

@@ -1,5 +1,5 @@
 // Rasters through the host's side, and what it makes of the module's silence.
-#include "host/Raster.h"
+#include "host/raster/Raster.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -11,8 +11,8 @@
 #include <filesystem>
 
 #include "core/PixelVocabulary.h"
-#include "host/PixelWork.h"
-#include "host/PyramidBuilder.h"
+#include "host/build/PixelWork.h"
+#include "host/build/PyramidBuilder.h"
 #include "tests/support/MemorySource.h"
 #include "tests/support/ScratchDirectory.h"
 

@@ -1,4 +1,4 @@
-#include "host/Reduction.h"
+#include "host/reduce/Reduction.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -10,7 +10,7 @@
 #include <vector>
 
 #include "core/ElementTypes.h"
-#include "host/ReductionWindow.h"
+#include "host/reduce/ReductionWindow.h"
 #include "tests/host/NaiveReduction.h"
 
 namespace {

@@ -7,8 +7,8 @@
 #include <cerrno>
 
 #include "core/PixelVocabulary.h"
-#include "host/PyramidBuilder.h"
-#include "host/Raster.h"
+#include "host/build/PyramidBuilder.h"
+#include "host/raster/Raster.h"
 #include "tests/support/FileFaults.h"
 #include "tests/support/MemorySource.h"
 #include "tests/support/PyramidFiles.h"

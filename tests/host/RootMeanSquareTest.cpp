@@ -1,4 +1,4 @@
-#include "host/RootMeanSquare.h"
+#include "host/reduce/RootMeanSquare.h"
 
 #include <gtest/gtest.h>
 
@@ -9,8 +9,8 @@
 #include <vector>
 
 #include "core/ElementTypes.h"
-#include "host/BigInteger.h"
-#include "host/Int128.h"
+#include "host/base/BigInteger.h"
+#include "host/base/Int128.h"
 
 namespace {
 

@@ -12,8 +12,8 @@
 #include <vector>
 
 #include "core/ElementTypes.h"
-#include "host/Module.h"
-#include "host/RasterSource.h"
+#include "host/raster/Module.h"
+#include "host/raster/RasterSource.h"
 
 namespace support {
 

@@ -1,0 +1,20 @@
+// RunWithThreads: work on a given number of threads, none of which stays behind.
+#ifndef ZMC_HOST_BASE_THREADS_H
+#define ZMC_HOST_BASE_THREADS_H
+
+#include <cstdint>
+#include <functional>
+
+namespace zmchost {
+
+// Processors of this machine that the process may use, at least 1.
+std::uint32_t AvailableThreads();
+
+// Runs `task` in a task arena of that many threads, the caller's among them, and waits for the
+// other threads to end, unless somebody else in the process is using them. Exceptions of the task
+// come out.
+void RunWithThreads(std::uint32_t threads, const std::function<void()>& task);
+
+}  // namespace zmchost
+
+#endif

@@ -1,0 +1,48 @@
+// BuildFile: the temporary file in which a pyramid grows, beside the name that it is to bear.
+//
+// The file is called ".NAME.zmcbuild-PROCESS-RANDOM.tmp". Commit flushes it to disk and gives it
+// the name in one step, so that others see the old file or the finished one and nothing between.
+// Without Commit the destructor removes it. What a killed process left is removed by the next build
+// of the same target.
+#ifndef ZMC_HOST_BUILD_BUILDFILE_H
+#define ZMC_HOST_BUILD_BUILDFILE_H
+
+#include <cstdint>
+#include <string>
+
+namespace zmchost {
+
+class BuildFile {
+public:
+    // Refuses a target that is a folder, is read-only, or exists without `overwrite`; removes stale
+    // temporary files of the target; makes an empty temporary file. Throws Error.
+    BuildFile(const std::string& target, bool overwrite);
+    ~BuildFile();
+    BuildFile(const BuildFile&) = delete;
+    BuildFile& operator=(const BuildFile&) = delete;
+
+    const std::string& Path() const { return path; }
+
+    // Throws Error if the disk has no room for `size` bytes.
+    void CheckSpace(std::uint64_t size) const;
+    // Takes them, once the file has its beginning; the module would not tell that they ran out.
+    void Reserve(std::uint64_t size) const;
+
+    // Waits until the file is on the disk, giving back what was reserved and not used.
+    void Flush() const;
+    // Gives the file its name. A target that came into being meanwhile is refused as at the start.
+    void Commit();
+
+private:
+    void CheckTarget() const;
+
+    std::string given;  // the target as the caller named it, for messages
+    bool overwrite;
+    std::string target;  // where links led
+    std::string path;
+    bool committed = false;
+};
+
+}  // namespace zmchost
+
+#endif

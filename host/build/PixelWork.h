@@ -1,0 +1,77 @@
+// PixelWork: what a build does with samples and needs their type for. The builder itself moves
+// bytes; one object of this class, made for the raster's type, does the rest.
+//
+// Rows are pixel-interleaved, with the mask byte of a sample at the sample's place. Operations on
+// different rows may run on several threads; those of one lane, and those that use the reader,
+// must not overlap.
+#ifndef ZMC_HOST_BUILD_PIXELWORK_H
+#define ZMC_HOST_BUILD_PIXELWORK_H
+
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+
+#include "host/raster/RasterSource.h"
+#include "host/reduce/Reduction.h"
+#include "raster/RasterProps.h"
+
+namespace zmchost {
+
+// The rows of a level that a coarser row is made of, null where the level ends.
+struct RowWindow {
+    static constexpr std::uint32_t kMaxRows = 12;
+    const std::byte* rows[kMaxRows] = {};
+    const unsigned char* masks[kMaxRows] = {};
+    bool anyMask = false;
+};
+
+class PixelWork {
+public:
+    virtual ~PixelWork() = default;
+
+    // Whether samples can be invalid at all: a band has a no-data value, or values may be infinite.
+    virtual bool NeedsMasks() const = 0;
+    // Sets every byte of a row's mask to 1 for a sample that is not valid, else 0; true if there
+    // is one that is not.
+    virtual bool MarkRow(const std::byte* row, unsigned char* mask, std::uint32_t width) const = 0;
+
+    virtual void ReduceRow(const RowWindow& source, std::uint32_t sourceWidth, std::byte* row,
+                           unsigned char* mask) const = 0;
+
+    // Gathers the statistics of a row of level 0; the mask may be null.
+    virtual void TakeStatistics(std::uint32_t lane, const std::byte* row, const unsigned char* mask,
+                                std::uint32_t width) = 0;
+    // Whether histograms need level 0 once more, and the same for that second walk.
+    virtual bool NeedsSecondWalk() const = 0;
+    virtual void BeginSecondWalk() = 0;
+    virtual void TakeCounts(std::uint32_t lane, const std::byte* row, const unsigned char* mask,
+                            std::uint32_t width) = 0;
+
+    // Whole tiles with all bands, through the module's reader. False if the module says so.
+    virtual bool ReadTile(std::uint32_t level, const Window& tile, std::byte* pixels) = 0;
+    virtual bool WriteTile(std::uint32_t level, const Window& tile, std::byte* pixels,
+                           unsigned char* cleanMask) = 0;
+
+    // Hands statistics and histograms to the module.
+    virtual void StoreStatistics() = 0;
+    virtual std::uint64_t StatisticsMemory() const = 0;
+};
+
+struct PixelWorkSetup {
+    zelm::RasterProps props;  // of the target: bands, pixel type, no-data values
+    Resampling resampling = Resampling::Average;
+    std::uint32_t lanes = 1;
+    std::uint32_t bins = 256;
+    bool statistics = true;
+    std::uint64_t countersBudget = 0;  // bytes that tables of every value may take
+};
+
+class Raster;
+
+// The work on the type of `target`, which outlives it. Where the properties tell another type than
+// the raster's, moving tiles throws.
+std::unique_ptr<PixelWork> MakePixelWork(Raster& target, const PixelWorkSetup& setup);
+
+}  // namespace zmchost
+
+#endif

@@ -1,0 +1,91 @@
+// PyramidBuilder: from any raster to a finished pyramid file, in one pass over the source.
+//
+// Lines are read one row of tiles at a time; as soon as the rows of a level that a coarser row
+// depends on are there, that row is made, so all levels grow together. Reading, reduction and
+// writing overlap on as many threads as asked for, and none of these threads is left behind. The
+// result depends on neither their number nor the budget, bit for bit.
+//
+// The memory that pixels, masks and counts are held in keeps below the budget, whatever the size of
+// the raster: a raster too wide for it is walked through in columns (see host/build/BuildPlan.h).
+// The least budget is about four rows of tiles of 512 pixels' width; a smaller one is refused, and
+// the text says how much is needed. The module's own tables, 8 bytes for each tile, level and band,
+// come on top, and so does what the source holds.
+//
+// The file is built under a temporary name, flushed, opened again and checked, and only then
+// renamed: whatever happens, the target's name shows the old file or the new one, whole.
+#ifndef ZMC_HOST_BUILD_PYRAMIDBUILDER_H
+#define ZMC_HOST_BUILD_PYRAMIDBUILDER_H
+
+#include <cstdint>
+#include <functional>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "host/base/Error.h"
+#include "host/raster/Module.h"
+#include "host/raster/RasterSource.h"
+#include "host/reduce/Reduction.h"
+
+namespace zmchost {
+
+// How tiles lie in the file. Files of more than eight bands are in Morton order, others never.
+enum class Ordering { Auto, Scanline, Blocked, Morton };
+
+// How far a build is, in pixels of all that has to be passed over.
+struct BuildProgress {
+    std::uint64_t done = 0;
+    std::uint64_t total = 0;
+};
+
+struct BuildOptions {
+    // The coarsest level; without a value the first that fits one tile. Not beyond the last level
+    // that has a pixel, nor beyond 8 in the Morton ordering.
+    std::optional<std::uint32_t> levels;
+    // Without a value Mode for a source with a palette and Average for others.
+    std::optional<Resampling> resampling;
+    Ordering ordering = Ordering::Auto;
+    // Replaces the no-data values of the source where it has a value: `noData` for all bands, or
+    // none at all if that is empty.
+    struct NoData {
+        std::optional<double> value;
+    };
+    std::optional<NoData> noData;
+    std::vector<std::uint32_t> bands;  // of the source, from 0, in the order wanted; empty: all
+    std::uint32_t bins = 256;          // of a histogram; one per value for 8-bit types
+    bool statistics = true;            // statistics and histograms, which complex types never get
+    std::uint32_t threads = 0;         // 0: as many as the machine has processors
+    std::uint64_t memory = std::uint64_t{256} << 20;  // budget in bytes
+    bool overwrite = false;
+    // Called now and then, one call at a time, on one of the build's threads; false cancels.
+    std::function<bool(const BuildProgress&)> progress;
+};
+
+struct BuildReport {
+    std::uint32_t width = 0;
+    std::uint32_t height = 0;
+    std::uint32_t bands = 0;
+    std::uint32_t maxLevel = 0;
+    Resampling resampling = Resampling::Average;
+    std::uint32_t tileOrdering = 0;  // code
+    std::uint64_t fileSize = 0;
+    std::uint64_t peakMemory = 0;  // most bytes that strips, tiles and counts held at one time
+    double seconds = 0;
+};
+
+class PyramidBuilder {
+public:
+    explicit PyramidBuilder(ModulePtr loadedModule) : module(std::move(loadedModule)) {}
+
+    // Builds `target` from `source`. Throws Error, Cancelled, or what the source threw; the target
+    // is then what it was, and no temporary file stays. Builds may run on several threads.
+    BuildReport Build(RasterSource& source, const std::string& target,
+                      const BuildOptions& options = {}) const;
+
+private:
+    ModulePtr module;
+};
+
+}  // namespace zmchost
+
+#endif

@@ -1,0 +1,103 @@
+#include "host/build/TileStore.h"
+
+#include <algorithm>
+#include <cstring>
+
+#include "host/base/Error.h"
+#include "host/build/BuildPlan.h"
+
+namespace zmchost {
+namespace {
+
+constexpr std::size_t kTilePixels = std::size_t{kTileSide} * kTileSide;
+
+// Bytes of which none is what it should be, for a read that may not reach all of them.
+void Spoil(std::byte* bytes, const std::byte* expected, std::size_t size) {
+    for (std::size_t i = 0; i < size; ++i) bytes[i] = ~expected[i];
+}
+
+void CopyLines(std::byte* to, std::size_t toStride, const std::byte* from, std::size_t fromStride,
+               std::size_t bytes, std::uint32_t lines) {
+    for (std::uint32_t line = 0; line < lines; ++line, to += toStride, from += fromStride)
+        std::memcpy(to, from, bytes);
+}
+
+}  // namespace
+
+TileStore::TileStore(TileStoreSetup storeSetup, PixelWork& pixelWork, MemoryMeter& meter)
+    : setup(std::move(storeSetup)),
+      work(pixelWork),
+      buffer(meter, kTilePixels * setup.pixelBytes),
+      readBack(meter, kTilePixels * setup.pixelBytes),
+      cleanMask(kTilePixels * setup.bands) {
+    meter.Add(cleanMask.size());
+}
+
+std::uint64_t TileStore::WorkMemory(const TileStoreSetup& setup) {
+    return kTilePixels * (2 * std::uint64_t{setup.pixelBytes} + setup.bands);
+}
+
+std::uint32_t TileStore::TilesAcross(std::uint32_t level) const {
+    return TilesAlong(setup.width >> level);
+}
+
+std::uint32_t TileStore::TilesDown(std::uint32_t level) const {
+    return TilesAlong(setup.height >> level);
+}
+
+Window TileStore::Tile(std::uint32_t level, std::uint32_t column, std::uint32_t row) const {
+    const std::uint32_t x = column * kTileSide;
+    const std::uint32_t y = row * kTileSide;
+    return {x, y, std::min(kTileSide, (setup.width >> level) - x),
+            std::min(kTileSide, (setup.height >> level) - y)};
+}
+
+void TileStore::Write(const Strip& strip, std::uint32_t stripBegin, std::uint32_t begin,
+                      std::uint32_t end) {
+    const std::lock_guard<std::mutex> lock(mutex);
+    const std::uint32_t row = strip.firstLine / kTileSide;
+    for (std::uint32_t column = begin / kTileSide; column < TilesAlong(end); ++column)
+        WriteTile(strip, stripBegin, column, row);
+}
+
+void TileStore::WriteTile(const Strip& strip, std::uint32_t stripBegin, std::uint32_t column,
+                          std::uint32_t row) {
+    const Window tile = Tile(strip.level, column, row);
+    const std::size_t lineBytes = std::size_t{tile.width} * setup.pixelBytes;
+    const std::byte* from =
+        strip.Row(strip.firstLine) + std::size_t{tile.x - stripBegin} * setup.pixelBytes;
+    CopyLines(buffer.Data(), lineBytes, from, strip.RowBytes(), lineBytes, tile.height);
+    if (!work.WriteTile(strip.level, tile, buffer.Data(), cleanMask.data()))
+        throw Error(setup.name, "write a tile", "the module refuses");
+    const std::size_t size = lineBytes * tile.height;
+    Spoil(readBack.Data(), buffer.Data(), size);
+    if (!work.ReadTile(strip.level, tile, readBack.Data()) ||
+        std::memcmp(readBack.Data(), buffer.Data(), size) != 0)
+        throw Error(setup.name, "write a tile",
+                    "the disk did not take one of level " + std::to_string(strip.level));
+}
+
+void TileStore::ReadTile(std::uint32_t level, const Window& tile, std::byte* pixels) {
+    const std::lock_guard<std::mutex> lock(mutex);
+    if (!work.ReadTile(level, tile, pixels))
+        throw Error(setup.name, "read a tile back", "the module refuses");
+}
+
+void TileStore::Read(std::uint32_t level, const Window& window, std::byte* pixels) {
+    const std::lock_guard<std::mutex> lock(mutex);
+    const std::size_t windowStride = std::size_t{window.width} * setup.pixelBytes;
+    const std::uint32_t right = window.x + window.width;
+    for (std::uint32_t column = window.x / kTileSide; column < TilesAlong(right); ++column) {
+        const Window tile = Tile(level, column, window.y / kTileSide);
+        if (!work.ReadTile(level, tile, buffer.Data()))
+            throw Error(setup.name, "read a tile back", "the module refuses");
+        const std::uint32_t begin = std::max(tile.x, window.x);
+        const std::uint32_t end = std::min(tile.x + tile.width, right);
+        CopyLines(pixels + std::size_t{begin - window.x} * setup.pixelBytes, windowStride,
+                  buffer.Data() + std::size_t{begin - tile.x} * setup.pixelBytes,
+                  std::size_t{tile.width} * setup.pixelBytes,
+                  std::size_t{end - begin} * setup.pixelBytes, window.height);
+    }
+}
+
+}  // namespace zmchost

@@ -1,0 +1,65 @@
+// TileStore: the tiles of the file that is being built.
+//
+// Writes rows of tiles from strips and reads windows of finished levels back. The module says true
+// for a write that the disk refused, so every tile is read back at once, while the system still
+// holds it in memory, and compared. Reads and writes may come from several threads; one at a time
+// goes on, as the module wants it.
+#ifndef ZMC_HOST_BUILD_TILESTORE_H
+#define ZMC_HOST_BUILD_TILESTORE_H
+
+#include <cstdint>
+#include <mutex>
+#include <string>
+#include <vector>
+
+#include "host/build/PixelWork.h"
+#include "host/build/Strip.h"
+
+namespace zmchost {
+
+struct TileStoreSetup {
+    std::string name;         // of the target, for messages
+    std::uint32_t width = 0;  // of level 0
+    std::uint32_t height = 0;
+    std::uint32_t maxLevel = 0;
+    std::uint32_t pixelBytes = 0;
+    std::uint32_t bands = 0;
+};
+
+class TileStore {
+public:
+    TileStore(TileStoreSetup storeSetup, PixelWork& pixelWork, MemoryMeter& meter);
+
+    // Bytes that an object holds.
+    static std::uint64_t WorkMemory(const TileStoreSetup& setup);
+
+    // Writes the tiles of columns [begin, end) of the strip's level, which the strip holds from
+    // column `stripBegin` on. Its lines are whole rows of tiles, and so are the columns. Throws
+    // Error for a tile that is not in the file afterwards.
+    void Write(const Strip& strip, std::uint32_t stripBegin, std::uint32_t begin,
+               std::uint32_t end);
+
+    // Reads a window of a level whose tiles were all written.
+    void Read(std::uint32_t level, const Window& window, std::byte* pixels);
+
+    // Reads one whole tile; the buffer has room for a full one.
+    void ReadTile(std::uint32_t level, const Window& tile, std::byte* pixels);
+
+    Window Tile(std::uint32_t level, std::uint32_t column, std::uint32_t row) const;
+    std::uint32_t TilesAcross(std::uint32_t level) const;
+    std::uint32_t TilesDown(std::uint32_t level) const;
+
+private:
+    void WriteTile(const Strip& strip, std::uint32_t stripBegin, std::uint32_t column,
+                   std::uint32_t row);
+
+    TileStoreSetup setup;
+    PixelWork& work;
+    std::mutex mutex;
+    MeteredBytes buffer, readBack;
+    std::vector<unsigned char> cleanMask;
+};
+
+}  // namespace zmchost
+
+#endif

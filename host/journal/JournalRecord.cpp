@@ -1,0 +1,71 @@
+#include "host/journal/JournalRecord.h"
+
+#include "host/base/Checksum.h"
+
+namespace zmchost {
+namespace {
+
+constexpr std::string_view kMagic = "ZMCMETA1";
+constexpr std::size_t kNumber = 8;
+
+void Append(std::string& bytes, std::uint64_t number) {
+    for (unsigned i = 0; i < kNumber; ++i) bytes += static_cast<char>(number >> (8 * i));
+}
+
+// Takes pieces off the front of some bytes; `good` tells whether there were enough so far.
+class Scanner {
+public:
+    explicit Scanner(std::string_view bytes) : rest(bytes) {}
+    std::string_view Text(std::uint64_t size) {
+        good = good && size <= rest.size();
+        const std::string_view text = rest.substr(0, good ? static_cast<std::size_t>(size) : 0);
+        rest.remove_prefix(text.size());
+        return text;
+    }
+    std::uint64_t Number() {
+        std::uint64_t number = 0;
+        unsigned shift = 0;
+        for (const char c : Text(kNumber)) {
+            number |= std::uint64_t{static_cast<unsigned char>(c)} << shift;
+            shift += 8;
+        }
+        return number;
+    }
+    bool AtEnd() const { return good && rest.empty(); }
+
+private:
+    std::string_view rest;
+    bool good = true;
+};
+
+}  // namespace
+
+std::string JournalRecord::Encode() const {
+    std::string bytes(kMagic);
+    for (const std::uint64_t number : {offset, fileSize, fileNumber, frontSize, frontSum,
+                                       std::uint64_t{systemRun.size()}, std::uint64_t{text.size()}})
+        Append(bytes, number);
+    bytes += systemRun;
+    bytes += text;
+    Append(bytes, Checksum(bytes));
+    return bytes;
+}
+
+std::optional<JournalRecord> JournalRecord::Decode(std::string_view bytes) {
+    if (bytes.size() < kMagic.size() + kNumber || !bytes.starts_with(kMagic)) return std::nullopt;
+    const std::string_view summed = bytes.substr(0, bytes.size() - kNumber);
+    if (Scanner(bytes.substr(summed.size())).Number() != Checksum(summed)) return std::nullopt;
+    Scanner scanner(summed.substr(kMagic.size()));
+    JournalRecord record;
+    for (std::uint64_t* number : {&record.offset, &record.fileSize, &record.fileNumber,
+                                  &record.frontSize, &record.frontSum})
+        *number = scanner.Number();
+    const std::uint64_t runSize = scanner.Number();
+    const std::uint64_t textSize = scanner.Number();
+    record.systemRun = scanner.Text(runSize);
+    record.text = scanner.Text(textSize);
+    if (!scanner.AtEnd()) return std::nullopt;
+    return record;
+}
+
+}  // namespace zmchost

@@ -1,0 +1,516 @@
+#include "host/raster/Raster.h"
+
+#include <algorithm>
+#include <cstring>
+#include <sstream>
+
+#include "core/PixelVocabulary.h"
+#include "host/base/Text.h"
+#include "host/journal/MetadataJournal.h"
+#include "host/raster/NoData.h"
+#include "platform/FileSystem.h"
+
+namespace zmchost {
+namespace {
+
+zelm::Array<int> BandList(std::span<const std::uint32_t> bands) {
+    zelm::Array<int> list;
+    if (!list.SetShape(zelm::ArrayShape(static_cast<std::uint32_t>(bands.size()))))
+        throw std::bad_alloc();
+    std::transform(bands.begin(), bands.end(), list.data,
+                   [](std::uint32_t band) { return static_cast<int>(band); });
+    return list;
+}
+
+Window Intersection(const Window& a, const Window& b) {
+    const std::uint32_t x = std::max(a.x, b.x);
+    const std::uint32_t y = std::max(a.y, b.y);
+    return {x, y, std::min(a.x + a.width, b.x + b.width) - x,
+            std::min(a.y + a.height, b.y + b.height) - y};
+}
+
+bool Same(const Window& a, const Window& b) {
+    return a.x == b.x && a.y == b.y && a.width == b.width && a.height == b.height;
+}
+
+std::string Describe(const Window& window) {
+    std::ostringstream text;
+    text << window.width << " x " << window.height << " pixels at (" << window.x << ", " << window.y
+         << ")";
+    return text.str();
+}
+
+// Byte offset of the first sample of `part` in a buffer that holds `whole`.
+std::size_t OffsetIn(const Window& whole, const Window& part, std::size_t pixelBytes) {
+    return (std::size_t{part.y - whole.y} * whole.width + (part.x - whole.x)) * pixelBytes;
+}
+
+// A sample of floating type is marked without a no-data value too, if it is not finite.
+template <class T>
+void MarkSamples(const zelm::RasterProps& props, std::span<const std::uint32_t> bands,
+                 std::uint64_t pixels, const T* samples, unsigned char* mask) {
+    std::vector<zelm::NoDataRule<T>> rules;
+    for (const std::uint32_t band : bands) rules.push_back(RuleOfBand<T>(props, band));
+    for (std::uint64_t i = 0; i < pixels; ++i)
+        for (const auto& rule : rules) {
+            const unsigned char bit = rule.Marks(*samples++) ? 1 : 0;
+            *mask = static_cast<unsigned char>((*mask & 0xFE) | bit);
+            ++mask;
+        }
+}
+
+template <class T>
+void StampSamples(const zelm::RasterProps& props, std::span<const std::uint32_t> bands,
+                  std::uint64_t pixels, const unsigned char* mask, T* samples) {
+    for (std::uint64_t i = 0; i < pixels * bands.size(); ++i) {
+        const auto rule = RuleOfBand<T>(props, bands[i % bands.size()]);
+        if ((mask[i] & 1) != 0 && rule.hasValue) samples[i] = rule.value;
+    }
+}
+
+template <class Record>
+zelm::Array<Record> ToArray(const std::vector<Record>& records) {
+    zelm::Array<Record> array;
+    for (const Record& record : records)
+        if (!array.Append(record)) throw std::bad_alloc();
+    return array;
+}
+
+// Without memory the copy of a list is empty, and the module takes the counts that are not there
+// for zeros.
+template <class T>
+bool HaveSameCounts(const zelm::RasterBandHistogram<T>& histogram,
+                    const zelm::RasterBandHistogram<T>& given) {
+    const zelm::Array<std::uint64_t>& counts = given.counts;
+    return counts.shape.elements == given.binCount && histogram.binCount == given.binCount &&
+           histogram.counts.shape.elements == given.binCount &&
+           std::equal(counts.data, counts.data + given.binCount, histogram.counts.data);
+}
+
+std::string MemoryParameters(const void* samples, const zelm::RasterProps& props) {
+    std::ostringstream text;
+    text << "SAMPLES=" << props.samples << ";LINES=" << props.lines << ";BANDS=" << props.bands
+         << ";INTERLEAVE=" << props.interleave << ";PIXELTYPE=" << props.pixelType
+         << ";PIXELSIZE=1,1;TIEPTMAP=0,0;NAME=memory;PIXELDATA=" << samples;
+    return text.str();
+}
+
+}  // namespace
+
+Raster::Raster(ModulePtr holder, std::string rasterName, zelm::RasterDataConnectionPtr opened)
+    : module(std::move(holder)), name(std::move(rasterName)), connection(std::move(opened)) {}
+
+void Raster::TakeReader() {
+    reader = connection->GetReader();
+    if (!reader || reader->pixelType == 0)
+        throw Error(name, "open the raster", "the module gives no reader for it");
+    Visit([this](auto& typed) { props = typed.GetRasterProps(); });
+    // The tree is the module's, and copies of the record must be able to outlive it.
+    props.metadata = zelm::Metadata();
+}
+
+// Here and below the caller's hold on the module outlasts the connection, whatever is thrown.
+Raster Raster::Open(ModulePtr module, const std::string& file) {
+    const platform::FileStatus status = platform::StatusOf(file);
+    if (!status.exists) throw Error(file, "open the raster", "there is no such file");
+    if (!status.isRegular) throw Error(file, "open the raster", "it is not a file");
+    const Recovery recovery = RecoverMetadata(file);
+    PyramidHeader header = PyramidHeader::Read(file);
+    zelm::RasterDataConnectionPtr connection = module->OpenPyramid(file);
+    if (!connection) throw Error(file, "open the raster", "the module refuses it");
+    Raster raster(module, file, connection);
+    raster.TakeReader();
+    raster.header = header;
+    raster.minLevel = header.minLevel;
+    raster.maxLevel = header.maxLevel;
+    raster.recoveryNote = recovery.text;
+    return raster;
+}
+
+Raster Raster::Create(ModulePtr module, const std::string& file, zelm::RasterProps props,
+                      std::uint32_t maxLevel) {
+    props.interleave = zelm::Interleave::BIP;
+    const auto noData = props.noDataValues;
+    const platform::FileStatus status = platform::StatusOf(file);
+    if (status.exists && (status.readOnly || !status.isRegular))
+        throw Error(file, "create the raster",
+                    status.isRegular ? "the file is read-only" : "it is not a file");
+    const zelm::RasterDataConnectionPtr connection = module->CreatePyramid(file, props);
+    if (!connection) throw Error(file, "create the raster", "the module refuses it");
+    Raster raster(module, file, connection);
+    raster.TakeReader();
+    bool built = false;
+    const std::int32_t pair[] = {2, 2};
+    raster.Visit([&](auto& typed) {
+        built = typed.BuildPyramid(0, static_cast<std::int32_t>(maxLevel), 0, pair);
+    });
+    if (!built) throw Error(file, "lay out the raster", "the module refuses it");
+    // The module says so too where the file could not be made, so the file is looked at.
+    raster.header = PyramidHeader::Read(file);
+    raster.maxLevel = maxLevel;
+    if (raster.header->maxLevel != maxLevel || raster.header->width != props.samples ||
+        raster.header->height != props.lines || raster.header->bands != props.bands)
+        throw Error(file, "lay out the raster", "an older file stands in its place");
+    platform::RemoveEntry(MetadataJournal::PathFor(file));
+    raster.SetNoDataValues(noData);
+    return raster;
+}
+
+Raster Raster::OfMemory(ModulePtr module, void* samples, const zelm::RasterProps& props) {
+    const std::string name = "memory raster";
+    if (!samples) throw Error(name, "open the raster", "it has no samples");
+    const zelm::RasterDataConnectionPtr connection =
+        module->OpenMemoryRaster(MemoryParameters(samples, props));
+    if (!connection) throw Error(name, "open the raster", "the module refuses its description");
+    Raster raster(module, name, connection);
+    raster.TakeReader();
+    raster.SetNoDataValues(props.noDataValues);
+    return raster;
+}
+
+std::uint32_t Raster::SampleSize() const { return zelm::PixelSize(props.pixelType); }
+
+// The module's own sizes ignore the level as long as a file is incomplete.
+std::uint32_t Raster::Width(std::uint32_t level) const {
+    CheckLevel(level);
+    return props.samples >> level;
+}
+
+std::uint32_t Raster::Height(std::uint32_t level) const {
+    CheckLevel(level);
+    return props.lines >> level;
+}
+
+const PyramidHeader& Raster::Header() const {
+    if (!header) throw Error(name, "tell the header", "it is no pyramid file");
+    return *header;
+}
+
+std::uint32_t Raster::TileSide() const {
+    return header ? header->tileSize : std::max({props.samples, props.lines, 1u});
+}
+
+std::uint32_t Raster::TilesAcross(std::uint32_t level) const {
+    return static_cast<std::uint32_t>((std::uint64_t{Width(level)} + TileSide() - 1) / TileSide());
+}
+
+std::uint32_t Raster::TilesDown(std::uint32_t level) const {
+    return static_cast<std::uint32_t>((std::uint64_t{Height(level)} + TileSide() - 1) / TileSide());
+}
+
+Window Raster::Tile(std::uint32_t level, std::uint32_t column, std::uint32_t row) const {
+    if (column >= TilesAcross(level) || row >= TilesDown(level))
+        throw Error(name, "find a tile", "the level has no such tile");
+    const std::uint32_t side = TileSide();
+    return {column * side, row * side, std::min(side, Width(level) - column * side),
+            std::min(side, Height(level) - row * side)};
+}
+
+bool Raster::IsComplete() {
+    if (!header) return true;
+    bool complete = false;
+    Visit([&](auto& typed) {
+        typed.RefreshPyramidState();
+        complete = typed.HasPyramid();
+    });
+    header->fileSize = platform::StatusOf(name).size;
+    return complete;
+}
+
+bool Raster::IsWritable() const { return !header || !platform::StatusOf(name).readOnly; }
+
+std::optional<double> Raster::NoDataValue(std::uint32_t band) const {
+    if (!props.HasNoDataValue(band)) return std::nullopt;
+    return props.GetNoDataValue(band);
+}
+
+void Raster::SetNoDataValues(const std::map<std::uint32_t, double>& values) {
+    props.noDataValues = values;
+    Visit([&](auto& typed) { typed.SetNoDataValues(props); });
+}
+
+std::vector<std::uint32_t> Raster::AllBands() const {
+    std::vector<std::uint32_t> bands(Bands());
+    for (std::uint32_t band = 0; band < Bands(); ++band) bands[band] = band;
+    return bands;
+}
+
+void Raster::CheckType(std::uint32_t pixelType) const {
+    if (pixelType != props.pixelType)
+        throw Error(name, "move samples",
+                    std::string("they are ") + zelm::PixelTypeName(pixelType) +
+                        ", and those of the raster " + zelm::PixelTypeName(props.pixelType));
+}
+
+void Raster::CheckLevel(std::uint32_t level) const {
+    if (level < minLevel || level > maxLevel)
+        throw Error(
+            name, "use level " + std::to_string(level),
+            "it has the levels " + std::to_string(minLevel) + " to " + std::to_string(maxLevel));
+}
+
+void Raster::CheckWindow(const char* operation, std::uint32_t level, const Window& window,
+                         std::span<const std::uint32_t> bands) const {
+    const bool fits = window.x <= Width(level) && window.width <= Width(level) - window.x &&
+                      window.y <= Height(level) && window.height <= Height(level) - window.y;
+    if (!fits)
+        throw Error(name, operation + (' ' + Describe(window)),
+                    "level " + std::to_string(level) + " has " + std::to_string(Width(level)) +
+                        " x " + std::to_string(Height(level)));
+    for (const std::uint32_t band : bands)
+        if (band >= Bands())
+            throw Error(name, std::string(operation) + " band " + std::to_string(band),
+                        "it has " + std::to_string(Bands()) + " bands");
+}
+
+void Raster::CheckWritable(const char* operation) const {
+    if (!IsWritable()) throw Error(name, operation, "the file is read-only");
+}
+
+void Raster::ReadTile(std::uint32_t level, const Window& window,
+                      std::span<const std::uint32_t> bands, void* pixels) const {
+    const zelm::Array<int> list = BandList(bands);
+    bool read = false;
+    Visit([&]<class T>(zelm::RasterReader<T>& typed) {
+        read =
+            typed.ReadTile(static_cast<std::int32_t>(window.x), static_cast<std::int32_t>(window.y),
+                           window.width, window.height, list, static_cast<std::int32_t>(level),
+                           static_cast<T*>(pixels), nullptr);
+    });
+    if (!read) throw Error(name, "read " + Describe(window), "the module refuses");
+}
+
+// Tile by tile, so that the module's 32-bit sizes and its work memory stay small.
+void Raster::ReadTiles(std::uint32_t level, const Window& window,
+                       std::span<const std::uint32_t> bands, unsigned char* pixels) const {
+    const std::size_t pixelBytes = bands.size() * SampleSize();
+    const std::uint32_t side = TileSide();
+    std::vector<unsigned char> part;
+    for (std::uint32_t row = window.y / side; row * std::uint64_t{side} < window.y + window.height;
+         ++row)
+        for (std::uint32_t column = window.x / side;
+             column * std::uint64_t{side} < window.x + window.width; ++column) {
+            const Window piece = Intersection(Tile(level, column, row), window);
+            if (Same(piece, window)) return ReadTile(level, window, bands, pixels);
+            const std::size_t rowBytes = piece.width * pixelBytes;
+            part.resize(rowBytes * piece.height);
+            ReadTile(level, piece, bands, part.data());
+            unsigned char* to = pixels + OffsetIn(window, piece, pixelBytes);
+            for (std::uint32_t line = 0; line < piece.height; ++line)
+                std::memcpy(to + std::size_t{line} * window.width * pixelBytes,
+                            part.data() + line * rowBytes, rowBytes);
+        }
+}
+
+void Raster::Read(std::uint32_t level, const Window& window, std::span<const std::uint32_t> bands,
+                  void* pixels, unsigned char* mask) {
+    CheckWindow("read", level, window, bands);
+    if (window.width == 0 || window.height == 0 || bands.empty()) return;
+    if (!IsComplete())
+        throw Error(name, "read " + Describe(window),
+                    "the file is incomplete, " + std::to_string(Header().BytesMissing()) +
+                        " bytes are missing");
+    if (!header) {
+        bool read = false;
+        const zelm::Array<int> list = BandList(bands);
+        Visit([&]<class T>(zelm::RasterReader<T>& typed) {
+            read = typed.ReadTile(static_cast<std::int32_t>(window.x),
+                                  static_cast<std::int32_t>(window.y), window.width, window.height,
+                                  list, 0, static_cast<T*>(pixels), mask);
+        });
+        if (!read) throw Error(name, "read " + Describe(window), "the module refuses");
+        return;
+    }
+    ReadTiles(level, window, bands, static_cast<unsigned char*>(pixels));
+    if (!mask) return;
+    // The module's masks go by a band's place in the list and by an interleave that its tiles do
+    // not have; these go by the band.
+    Visit([&]<class T>(zelm::RasterReader<T>&) {
+        MarkSamples(props, bands, std::uint64_t{window.width} * window.height,
+                    static_cast<const T*>(pixels), mask);
+    });
+}
+
+void Raster::WriteTile(std::uint32_t level, const Window& window,
+                       std::vector<unsigned char>& pixels) {
+    const zelm::Array<int> list = BandList(AllBands());
+    std::vector<unsigned char> mask(pixels.size() / SampleSize());
+    bool written = false;
+    Visit([&]<class T>(zelm::RasterReader<T>& typed) {
+        written = typed.WriteTile(static_cast<std::int32_t>(window.x),
+                                  static_cast<std::int32_t>(window.y), window.width, window.height,
+                                  list, static_cast<std::int32_t>(level),
+                                  static_cast<T*>(static_cast<void*>(pixels.data())), mask.data());
+    });
+    std::vector<unsigned char> stored(pixels.size());
+    if (written) ReadTile(level, window, AllBands(), stored.data());
+    if (!written || stored != pixels)
+        throw Error(name, "write " + Describe(window), "it did not reach the file (disk full?)");
+}
+
+void Raster::MergeTile(std::uint32_t level, const Window& tile, const Window& window,
+                       std::span<const std::uint32_t> bands, const unsigned char* pixels) {
+    const std::size_t size = SampleSize();
+    const std::size_t tilePixel = Bands() * size;
+    const std::size_t windowPixel = bands.size() * size;
+    std::vector<unsigned char> whole(std::size_t{tile.width} * tile.height * tilePixel);
+    const Window piece = Intersection(tile, window);
+    if (!Same(piece, tile) || bands.size() != Bands())
+        ReadTile(level, tile, AllBands(), whole.data());
+    for (std::uint32_t line = 0; line < piece.height; ++line) {
+        const Window row{piece.x, piece.y + line, piece.width, 1};
+        unsigned char* to = whole.data() + OffsetIn(tile, row, tilePixel);
+        const unsigned char* from = pixels + OffsetIn(window, row, windowPixel);
+        for (std::uint32_t i = 0; i < piece.width; ++i, to += tilePixel)
+            for (const std::uint32_t band : bands) {
+                std::memcpy(to + band * size, from, size);
+                from += size;
+            }
+    }
+    WriteTile(level, tile, whole);
+}
+
+void Raster::Write(std::uint32_t level, const Window& window, std::span<const std::uint32_t> bands,
+                   const void* pixels, const unsigned char* mask) {
+    CheckWindow("write", level, window, bands);
+    CheckWritable("write pixels");
+    if (window.width == 0 || window.height == 0 || bands.empty()) return;
+    const std::size_t count = std::size_t{window.width} * window.height;
+    const auto* const given = static_cast<const unsigned char*>(pixels);
+    std::vector<unsigned char> samples(given, given + count * bands.size() * SampleSize());
+    if (mask)
+        zelm::VisitElementType(props.pixelType, [&]<class T>(std::type_identity<T>) {
+            StampSamples(props, bands, count, mask,
+                         static_cast<T*>(static_cast<void*>(samples.data())));
+        });
+    if (!header) {
+        std::vector<unsigned char> none(count * bands.size());
+        Visit([&]<class T>(zelm::RasterReader<T>& typed) {
+            typed.WriteTile(static_cast<std::int32_t>(window.x),
+                            static_cast<std::int32_t>(window.y), window.width, window.height,
+                            BandList(bands), 0, static_cast<T*>(static_cast<void*>(samples.data())),
+                            none.data());
+        });
+        return;
+    }
+    const std::uint32_t side = TileSide();
+    for (std::uint32_t row = window.y / side; row * std::uint64_t{side} < window.y + window.height;
+         ++row)
+        for (std::uint32_t column = window.x / side;
+             column * std::uint64_t{side} < window.x + window.width; ++column)
+            MergeTile(level, Tile(level, column, row), window, bands, samples.data());
+}
+
+bool Raster::HasStatistics(std::uint32_t band) const {
+    bool has = false;
+    Visit([&](auto& typed) { has = typed.HasBandStats(band); });
+    return has;
+}
+
+template <class T>
+zelm::RasterReader<T>& Raster::Typed() const {
+    CheckType(zelm::ElementTraits<T>::code);
+    return *reader->template As<T>();
+}
+
+// The module fetches by the place of the record in the file, and tells by number whether there is
+// one; a file that was written band by band has them in another order.
+template <class T>
+zelm::RasterBandStats<T> Raster::Statistics(std::uint32_t band) const {
+    zelm::RasterReader<T>& typed = Typed<T>();
+    if (!typed.HasBandStats(band))
+        throw Error(name, "read the statistics of band " + std::to_string(band),
+                    "the file has none");
+    zelm::RasterBandStats<T> record = typed.GetBandStats(band);
+    for (std::uint32_t place = 0; record.band != band && place < Bands(); ++place)
+        record = typed.GetBandStats(place);
+    if (record.band != band)
+        throw Error(name, "read the statistics of band " + std::to_string(band),
+                    "the module does not find the record that the file has");
+    return record;
+}
+
+void Raster::Store(const std::function<void()>& action) {
+    if (!keepsCopies || !header) {
+        action();
+        return;
+    }
+    MetadataJournal copy(name);
+    action();
+    copy.Finish();
+}
+
+template <class T>
+void Raster::SetStatistics(const std::vector<zelm::RasterBandStats<T>>& records) {
+    zelm::RasterReader<T>& typed = Typed<T>();
+    CheckWritable("store statistics");
+    for (std::uint32_t band = 0; band < records.size(); ++band)
+        if (records[band].band != band || records.size() != Bands())
+            throw Error(name, "store statistics", "they are not those of all bands in order");
+    if (HasStatistics(0))
+        throw Error(name, "store statistics", "it has some already, and a file keeps the oldest");
+    Store([&] {
+        typed.SetBandStats(ToArray(records));
+        bool has = true;
+        for (std::uint32_t band = 0; has && band < Bands(); ++band) has = HasStatistics(band);
+        if (!has) throw Error(name, "store statistics", "they did not reach the file (disk full?)");
+    });
+}
+
+template <class T>
+std::vector<zelm::RasterBandHistogram<T>> Raster::Histograms() const {
+    const zelm::Array<zelm::RasterBandHistogram<T>> stored = Typed<T>().GetHistograms();
+    return {stored.data, stored.data + stored.shape.elements};
+}
+
+template <class T>
+void Raster::SetHistograms(const std::vector<zelm::RasterBandHistogram<T>>& histograms) {
+    zelm::RasterReader<T>& typed = Typed<T>();
+    CheckWritable("store histograms");
+    const zelm::Array<zelm::RasterBandHistogram<T>> given = ToArray(histograms);
+    for (std::size_t i = 0; i < histograms.size(); ++i)
+        if (!given.data || !HaveSameCounts(given.data[i], histograms[i])) throw std::bad_alloc();
+    const std::size_t before = typed.GetHistograms().shape.elements;
+    Store([&] {
+        typed.SetHistograms(given);
+        const zelm::Array<zelm::RasterBandHistogram<T>> stored = typed.GetHistograms();
+        bool same = stored.shape.elements == before + histograms.size();
+        for (std::size_t i = 0; same && i < histograms.size(); ++i)
+            same = HaveSameCounts(stored.data[before + i], histograms[i]);
+        if (!same)
+            throw Error(name, "store histograms", "they did not reach the file (disk full?)");
+    });
+}
+
+// A copy of this library's making: the module's own palette must not outlive the module.
+zelm::PalettePtr Raster::BandPalette(std::uint32_t band) const {
+    zelm::PalettePtr palette;
+    Visit([&](auto& typed) {
+        if (!typed.HasPalette(band)) return;
+        const zelm::PalettePtr stored = typed.GetPalette(band);
+        palette.Reset(new zelm::Palette);
+        stored->CopyTo(*palette);
+    });
+    return palette;
+}
+
+void Raster::SetBandPalette(std::uint32_t band, const zelm::Palette& palette) {
+    CheckWritable("store a palette");
+    if (band >= Bands()) throw Error(name, "store a palette", "there is no such band");
+    Store([&] {
+        Visit([&](auto& typed) { typed.SetPalette(band, palette); });
+        const zelm::PalettePtr stored = BandPalette(band);
+        if ((stored ? stored->nextIndex : 0) != palette.nextIndex)
+            throw Error(name, "store a palette", "it did not reach the file (disk full?)");
+    });
+}
+
+#define ZMC_X(type, word, code)                                                           \
+    template zelm::RasterBandStats<type> Raster::Statistics(std::uint32_t) const;         \
+    template void Raster::SetStatistics(const std::vector<zelm::RasterBandStats<type>>&); \
+    template std::vector<zelm::RasterBandHistogram<type>> Raster::Histograms() const;     \
+    template void Raster::SetHistograms(const std::vector<zelm::RasterBandHistogram<type>>&);
+ZMC_ELEMENT_TYPES(ZMC_X)
+#undef ZMC_X
+
+}  // namespace zmchost

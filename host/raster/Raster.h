@@ -1,0 +1,176 @@
+// Raster: one raster of the module, pyramid file or memory, with errors instead of silence.
+//
+// The module answers true where nothing was stored, drops writes that its layout does not take, and
+// reads what is not in the file as whatever was in the buffer. This class looks: it refuses what
+// the module would drop, reads back what it wrote, and throws Error with the reason.
+//
+// Levels count from 0, the finest; bands from 0. Samples of a pyramid are pixel-interleaved: lines
+// from the top, each pixel the samples of the bands asked for, in that order. A memory raster moves
+// them in its own interleave. Masks have one byte per sample in the same shape; bit 0 marks a
+// sample that is not valid, the other bits are left alone. One thread at a time; a Raster may be
+// moved, and outlives its Module's other users.
+#ifndef ZMC_HOST_RASTER_RASTER_H
+#define ZMC_HOST_RASTER_RASTER_H
+
+#include <cstdint>
+#include <functional>
+#include <map>
+#include <optional>
+#include <span>
+#include <string>
+#include <vector>
+
+#include "host/base/Error.h"
+#include "host/file/PyramidHeader.h"
+#include "host/raster/Module.h"
+#include "host/raster/RasterSource.h"
+
+namespace zmchost {
+
+class Raster {
+public:
+    // Opens a pyramid file, for writing too where the file allows it. What a store with a copy
+    // (KeepCopies) left behind when it was cut off is put in order first; RecoveryNote tells of it.
+    static Raster Open(ModulePtr module, const std::string& file);
+
+    // Lays out a new pyramid with the levels from 0 to maxLevel, replacing a file of that name. Of
+    // `props` the size, bands, pixel type, tileLines (above 1: ordering Blocked) and no-data values
+    // count; the file is always pixel-interleaved. Nothing protects the old file: to replace one
+    // safely, build beside it, as PyramidBuilder does.
+    static Raster Create(ModulePtr module, const std::string& file, zelm::RasterProps props,
+                         std::uint32_t maxLevel);
+
+    // Wraps the caller's samples, which live as long as the Raster. `props` tells size, bands,
+    // interleave and pixel type.
+    static Raster OfMemory(ModulePtr module, void* samples, const zelm::RasterProps& props);
+
+    const std::string& Name() const { return name; }
+    // What opening found of a store that was cut off, for people; empty as a rule.
+    const std::string& RecoveryNote() const { return recoveryNote; }
+    const zelm::RasterProps& Props() const { return props; }
+    std::uint32_t Bands() const { return props.bands; }
+    std::uint32_t PixelType() const { return props.pixelType; }
+    std::uint32_t SampleSize() const;
+
+    std::uint32_t MinLevel() const { return minLevel; }
+    std::uint32_t MaxLevel() const { return maxLevel; }
+    // Size of a level. Throws for a level that the raster does not have.
+    std::uint32_t Width(std::uint32_t level = 0) const;
+    std::uint32_t Height(std::uint32_t level = 0) const;
+
+    bool IsPyramid() const { return header.has_value(); }
+    // The header of a pyramid; throws for a memory raster.
+    const PyramidHeader& Header() const;
+    // Side of the square tiles; the greater side of a memory raster, which is one tile.
+    std::uint32_t TileSide() const;
+    std::uint32_t TilesAcross(std::uint32_t level = 0) const;
+    std::uint32_t TilesDown(std::uint32_t level = 0) const;
+    // The pixels of a tile, those of the last column and row with their true size.
+    Window Tile(std::uint32_t level, std::uint32_t column, std::uint32_t row) const;
+
+    // Whether all levels are in the file, looked at anew. A memory raster is always complete.
+    bool IsComplete();
+    bool IsWritable() const;
+
+    std::optional<double> NoDataValue(std::uint32_t band) const;
+    // By band; they live in this object, since files have no place for them. A value that the pixel
+    // type cannot hold marks nothing.
+    void SetNoDataValues(const std::map<std::uint32_t, double>& values);
+
+    // Reads a window of a level. The window lies within the level, and the file is complete.
+    // `pixels` has room for all samples, `mask` too unless it is null.
+    void Read(std::uint32_t level, const Window& window, std::span<const std::uint32_t> bands,
+              void* pixels, unsigned char* mask = nullptr);
+
+    // Writes a window of a level, whatever its place: tiles that it covers in part are read and
+    // written whole. Marked samples become the band's no-data value, if it has one. What was
+    // written is read back and compared.
+    void Write(std::uint32_t level, const Window& window, std::span<const std::uint32_t> bands,
+               const void* pixels, const unsigned char* mask = nullptr);
+
+    // The same for a known type, all bands: checks that T is the raster's type.
+    template <class T>
+    std::vector<T> Read(std::uint32_t level, const Window& window) {
+        CheckType(zelm::ElementTraits<T>::code);
+        std::vector<T> pixels(std::size_t{window.width} * window.height * Bands());
+        Read(level, window, AllBands(), pixels.data());
+        return pixels;
+    }
+    template <class T>
+    void Write(std::uint32_t level, const Window& window, const std::vector<T>& pixels) {
+        CheckType(zelm::ElementTraits<T>::code);
+        if (pixels.size() != std::size_t{window.width} * window.height * Bands())
+            throw Error(name, "write pixels", "their number is not that of the window");
+        Write(level, window, AllBands(), pixels.data());
+    }
+
+    // From now on each of the four stores below keeps a copy of what was stored before in a file
+    // beside the pyramid (MetadataJournal.h) until it has reached the disk, and returns only then.
+    // A process that dies or a power failure then loses nothing of the old statistics. Off at
+    // first: it costs some flushes of the disk for each store.
+    void KeepCopies(bool keep) { keepsCopies = keep; }
+    // Runs `action`, which stores through the module's reader, and throws where it has failed.
+    void Store(const std::function<void()>& action);
+
+    bool HasStatistics(std::uint32_t band) const;
+    // The record of a band. Throws if there is none.
+    template <class T>
+    zelm::RasterBandStats<T> Statistics(std::uint32_t band) const;
+    // Stores the records of all bands, in order and once: a file keeps every record, and answers
+    // with the oldest.
+    template <class T>
+    void SetStatistics(const std::vector<zelm::RasterBandStats<T>>& records);
+
+    // All histograms, in the order of their storing.
+    template <class T>
+    std::vector<zelm::RasterBandHistogram<T>> Histograms() const;
+    template <class T>
+    void SetHistograms(const std::vector<zelm::RasterBandHistogram<T>>& histograms);
+
+    // The palette of a band, or an empty pointer.
+    zelm::PalettePtr BandPalette(std::uint32_t band) const;
+    void SetBandPalette(std::uint32_t band, const zelm::Palette& palette);
+
+    std::vector<std::uint32_t> AllBands() const;
+
+    // Calls visit(zelm::RasterReader<T>&) with the module's own reader.
+    template <class Visitor>
+    void Visit(Visitor&& visit) const {
+        if (!reader->Visit(std::forward<Visitor>(visit)))
+            throw Error(name, "use the raster", "the module has no reader for its pixel type");
+    }
+
+private:
+    Raster(ModulePtr holder, std::string rasterName, zelm::RasterDataConnectionPtr opened);
+    void TakeReader();
+    void CheckType(std::uint32_t pixelType) const;
+    void CheckLevel(std::uint32_t level) const;
+    void CheckWindow(const char* operation, std::uint32_t level, const Window& window,
+                     std::span<const std::uint32_t> bands) const;
+    void CheckWritable(const char* operation) const;
+    void ReadTile(std::uint32_t level, const Window& window, std::span<const std::uint32_t> bands,
+                  void* pixels) const;
+    void WriteTile(std::uint32_t level, const Window& window, std::vector<unsigned char>& pixels);
+    void ReadTiles(std::uint32_t level, const Window& window, std::span<const std::uint32_t> bands,
+                   unsigned char* pixels) const;
+    void MergeTile(std::uint32_t level, const Window& tile, const Window& window,
+                   std::span<const std::uint32_t> bands, const unsigned char* pixels);
+    template <class T>
+    zelm::RasterReader<T>& Typed() const;
+
+    // In this order: the module goes last.
+    ModulePtr module;
+    std::string name;
+    zelm::RasterDataConnectionPtr connection;
+    zelm::RasterReaderDispatchPtr reader;
+    zelm::RasterProps props;
+    std::optional<PyramidHeader> header;
+    std::uint32_t minLevel = 0;
+    std::uint32_t maxLevel = 0;
+    std::string recoveryNote;
+    bool keepsCopies = false;
+};
+
+}  // namespace zmchost
+
+#endif

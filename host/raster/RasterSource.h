@@ -1,0 +1,52 @@
+// RasterSource: where a builder takes its pixels from.
+//
+// Anything that can describe itself and fill a buffer with a rectangle of itself. All operations
+// are called by one thread at a time, though not always by the same one, and may throw: a builder
+// then leaves nothing behind and lets the exception through.
+#ifndef ZMC_HOST_RASTER_RASTERSOURCE_H
+#define ZMC_HOST_RASTER_RASTERSOURCE_H
+
+#include <cstdint>
+#include <span>
+#include <string>
+
+#include "colour/Palette.h"
+#include "raster/RasterProps.h"
+
+namespace zmchost {
+
+// A rectangle of pixels: columns [x, x + width) and lines [y, y + height).
+struct Window {
+    std::uint32_t x = 0;
+    std::uint32_t y = 0;
+    std::uint32_t width = 0;
+    std::uint32_t height = 0;
+};
+
+class RasterSource {
+public:
+    virtual ~RasterSource() = default;
+
+    // Name for messages, a file name as a rule.
+    virtual std::string Name() const = 0;
+
+    // Size, bands, pixel type and no-data values; what else the record holds is not looked at.
+    virtual zelm::RasterProps Props() const = 0;
+
+    // The palette of a band, or an empty pointer.
+    virtual zelm::PalettePtr BandPalette(std::uint32_t band) const {
+        static_cast<void>(band);
+        return zelm::PalettePtr();
+    }
+
+    // Fills `pixels` with the window: its lines from the top, without gaps, each pixel the samples
+    // of `bands` in that order (pixel-interleaved), in the source's pixel type. The window lies
+    // within the raster and holds whole lines, from the top, each once; only where a raster is too
+    // wide for the memory of a build it is asked for column by column, each from the top, and
+    // kernels that look beyond a column have its edges asked for twice.
+    virtual void Read(const Window& window, std::span<const std::uint32_t> bands, void* pixels) = 0;
+};
+
+}  // namespace zmchost
+
+#endif

@@ -1,0 +1,301 @@
+#include <algorithm>
+#include <cstddef>
+#include <cstring>
+
+#include "core/ElementTypes.h"
+#include "host/reduce/AverageRow.h"
+#include "host/reduce/Reduction.h"
+#include "host/reduce/ReductionCells.h"
+#include "host/reduce/ReductionWindow.h"
+
+namespace zmchost {
+namespace {
+
+// Whether the masks of some rows mark none, or all, of the bytes [first, first + count). A null
+// mask marks nothing.
+bool NoneMarked(const unsigned char* const* masks, std::size_t rows, std::size_t first,
+                std::size_t count) {
+    unsigned char any = 0;
+    for (std::size_t r = 0; r < rows; ++r) {
+        if (!masks[r]) continue;
+        for (std::size_t i = first; i < first + count; ++i) any |= masks[r][i];
+    }
+    return (any & 1) == 0;
+}
+
+bool AllMarked(const unsigned char* const* masks, std::size_t rows, std::size_t first,
+               std::size_t count) {
+    unsigned char all = 1;
+    for (std::size_t r = 0; r < rows; ++r) {
+        if (!masks[r]) return false;
+        for (std::size_t i = first; i < first + count; ++i) all &= masks[r][i];
+    }
+    return all != 0;
+}
+
+template <class T>
+struct PartOf {
+    using Type = T;
+    static constexpr std::size_t kCount = 1;
+};
+template <class P>
+struct PartOf<zelm::Complex<P>> {
+    using Type = P;
+    static constexpr std::size_t kCount = 2;
+};
+
+// One call of ReduceRow. Runs of cells without a marked sample take loops over whole rows, runs
+// without a valid one are filled, and only what lies between is done cell by cell.
+template <class T>
+class RowReducer {
+    using Part = typename PartOf<T>::Type;
+    static constexpr std::size_t kParts = PartOf<T>::kCount;
+    static constexpr std::size_t kBlock = 512;      // cells that are judged together,
+    static constexpr std::size_t kShortBlock = 32;  // and if they differ, these
+
+public:
+    RowReducer(std::uint32_t bands, std::uint32_t width, const ReductionRows<T>& source,
+               const zelm::NoDataRule<T>* noData, T* out, unsigned char* outMask)
+        : bands_(bands),
+          width_(width),
+          cells_(width / 2),
+          source_(source),
+          noData_(noData),
+          out_(out),
+          outMask_(outMask) {}
+
+    template <Resampling method>
+    void Cells() {
+        const T* const* const pair = source_.rows;
+        const bool bothRows = pair[0] && pair[1];
+        const auto run = [this](std::size_t x, std::size_t n) { CellRun<method>(x, n); };
+        const auto one = [](const Cell<T>& cell, std::size_t, std::uint32_t) {
+            return ReduceCell<method>(cell);
+        };
+        Reduce(0, cells_, 2, 0, bothRows, run, one);
+    }
+
+    template <class Kernel>
+    void Window() {
+        constexpr std::size_t rows = 2 * Kernel::kReach;
+        center_ = Kernel::kReach - 1;
+        const Part* parts[rows];
+        for (std::size_t r = 0; r < rows; ++r)
+            parts[r] = reinterpret_cast<const Part*>(source_.rows[r]);
+        const PartRows<Part> window{parts, source_.masks, kParts * bands_, bands_, width_};
+        const auto run = [&](std::size_t x, std::size_t n) {
+            for (std::size_t p = 0; p < window.stride; ++p)
+                WindowRun<Kernel>(window, p, static_cast<std::uint32_t>(x), n,
+                                  reinterpret_cast<Part*>(out_ + x * bands_));
+        };
+        const auto one = [&](const Cell<T>& cell, std::size_t x, std::uint32_t band) {
+            return WindowCell<Kernel>(window, cell, static_cast<std::uint32_t>(x), band);
+        };
+        // Cells whose taps all lie inside the level.
+        const std::size_t from = std::min<std::size_t>(cells_, Kernel::kReach / 2);
+        const std::size_t beyond = width_ > Kernel::kReach ? (width_ - Kernel::kReach + 1) / 2 : 0;
+        const std::size_t to = std::clamp<std::size_t>(beyond, from, cells_);
+        const bool allRows = std::all_of(parts, parts + rows, [](const Part* r) { return r; });
+        Reduce(0, from, rows, 0, false, run, one);
+        Reduce(from, to, rows, Kernel::kReach - 1, allRows, run, one);
+        Reduce(to, cells_, rows, 0, false, run, one);
+    }
+
+private:
+    // Cells [from, to). run(x, n) fills cells that are valid with all samples up to `halo` columns
+    // and rows around them, where runs are possible at all; one(cell, x, band) computes any.
+    template <class Run, class One>
+    void Reduce(std::size_t from, std::size_t to, std::size_t rows, std::size_t halo, bool runs,
+                Run run, One one) {
+        if (!source_.masks && runs) return ReduceRun(from, to - from, run, one);
+        for (std::size_t x = from; x < to; x += kBlock) {
+            const std::size_t n = std::min(kBlock, to - x);
+            if (runs && Full(x, n, rows, halo))
+                ReduceRun(x, n, run, one);
+            else
+                ReduceMixed(x, n, rows, halo, runs, run, one);
+        }
+    }
+
+    // A long run that is not wholly valid, in short ones.
+    template <class Run, class One>
+    void ReduceMixed(std::size_t from, std::size_t cells, std::size_t rows, std::size_t halo,
+                     bool runs, Run run, One one) {
+        for (std::size_t x = from; x < from + cells; x += kShortBlock) {
+            const std::size_t n = std::min(kShortBlock, from + cells - x);
+            if (Empty(x, n))
+                FillInvalid(x, n);
+            else if (runs && Full(x, n, rows, halo))
+                ReduceRun(x, n, run, one);
+            else
+                ReduceEach(x, n, one);
+        }
+    }
+
+    bool Empty(std::size_t x, std::size_t n) const {
+        return source_.masks &&
+               AllMarked(source_.masks + center_, 2, 2 * x * bands_, 2 * n * bands_);
+    }
+
+    bool Full(std::size_t x, std::size_t n, std::size_t rows, std::size_t halo) const {
+        return !source_.masks ||
+               NoneMarked(source_.masks, rows, (2 * x - halo) * bands_, 2 * (n + halo) * bands_);
+    }
+
+    template <class Run, class One>
+    void ReduceRun(std::size_t x, std::size_t n, Run run, One one) {
+        if (n == 0) return;
+        run(x, n);
+        if (outMask_) std::memset(outMask_ + x * bands_, 0, n * bands_);
+        for (std::uint32_t band = 0; noData_ && band < bands_; ++band) {
+            if (noData_[band].hasValue) MoveOffNoData(x, n, band, one);
+        }
+    }
+
+    // Results that read as no data are rare: they are looked for in a loop of its own, and computed
+    // again for the side on which the exact result lies.
+    template <class One>
+    void MoveOffNoData(std::size_t x, std::size_t n, std::uint32_t band, One one) {
+        const zelm::NoDataRule<T>& rule = noData_[band];
+        const T* const results = out_ + x * bands_ + band;
+        bool found = false;
+        for (std::size_t i = 0; i < n; ++i) found |= results[i * bands_] == rule.value;
+        if (!found) return;
+        for (std::size_t i = x; i < x + n; ++i) {
+            T& result = out_[i * bands_ + band];
+            if (result == rule.value) result = KeptValid(one(ValidSamples(i, band), i, band), rule);
+        }
+    }
+
+    template <class One>
+    void ReduceEach(std::size_t x, std::size_t n, One one) {
+        for (std::size_t i = x; i < x + n; ++i) {
+            for (std::uint32_t band = 0; band < bands_; ++band) {
+                const Cell<T> cell = ValidSamples(i, band);
+                const std::size_t at = i * bands_ + band;
+                out_[at] = cell.count == 0 ? InvalidValue(Rule(band))
+                                           : KeptValid(one(cell, i, band), Rule(band));
+                if (outMask_) outMask_[at] = cell.count == 0 ? 1 : 0;
+            }
+        }
+    }
+
+    void FillInvalid(std::size_t x, std::size_t n) {
+        for (std::size_t i = x; i < x + n; ++i) {
+            for (std::uint32_t band = 0; band < bands_; ++band)
+                out_[i * bands_ + band] = InvalidValue(Rule(band));
+        }
+        if (outMask_) std::memset(outMask_ + x * bands_, 1, n * bands_);
+    }
+
+    // The cell's valid samples in reading order, without a branch per sample.
+    Cell<T> ValidSamples(std::size_t x, std::uint32_t band) const {
+        Cell<T> cell;
+        const std::size_t left = 2 * x * bands_ + band;
+        for (std::size_t r = center_; r < center_ + 2; ++r) {
+            const T* const row = source_.rows[r];
+            if (!row) continue;
+            const unsigned char* const mask = source_.masks ? source_.masks[r] : nullptr;
+            cell.values[cell.count] = row[left];
+            cell.count += mask ? 1 - (mask[left] & 1) : 1;
+            cell.values[cell.count] = row[left + bands_];
+            cell.count += mask ? 1 - (mask[left + bands_] & 1) : 1;
+        }
+        return cell;
+    }
+
+    template <Resampling method>
+    void CellRun(std::size_t x, std::size_t n) {
+        const std::size_t first = 2 * x * bands_;
+        const T* const upper = source_.rows[0] + first;
+        const T* const lower = source_.rows[1] + first;
+        T* const out = out_ + x * bands_;
+        if constexpr (method == Resampling::Average) {
+            AverageRow(reinterpret_cast<const Part*>(upper), reinterpret_cast<const Part*>(lower),
+                       kParts * bands_, n, reinterpret_cast<Part*>(out));
+        } else {
+            for (std::size_t i = 0; i < n; ++i) {
+                for (std::size_t band = 0; band < bands_; ++band) {
+                    const std::size_t a = 2 * i * bands_ + band;
+                    const std::size_t b = a + bands_;
+                    const Cell<T> cell{{upper[a], upper[b], lower[a], lower[b]}, 4};
+                    out[i * bands_ + band] = ReduceCell<method>(cell).value;
+                }
+            }
+        }
+    }
+
+    template <class Kernel>
+    static Rounded<T> WindowCell(const PartRows<Part>& window, const Cell<T>& cell, std::uint32_t x,
+                                 std::uint32_t band) {
+        if constexpr (zelm::kIsComplex<T>)
+            return Joined(
+                WindowPart<Kernel>(window, 2 * std::size_t{band}, band, x, cell.values[0].re),
+                WindowPart<Kernel>(window, 2 * std::size_t{band} + 1, band, x, cell.values[0].im));
+        else
+            return WindowPart<Kernel>(window, band, band, x, cell.values[0]);
+    }
+
+    zelm::NoDataRule<T> Rule(std::uint32_t band) const {
+        return noData_ ? noData_[band] : zelm::NoDataRule<T>{};
+    }
+
+    const std::size_t bands_;
+    const std::uint32_t width_;
+    const std::size_t cells_;
+    const ReductionRows<T>& source_;
+    const zelm::NoDataRule<T>* const noData_;
+    T* const out_;
+    unsigned char* const outMask_;
+    std::size_t center_ = 0;  // the first row of the pair
+};
+
+// The methods that need an order, or a root of squares.
+template <class T>
+void ReduceOrdered(Resampling method, RowReducer<T>& reducer) {
+    switch (method) {
+        case Resampling::Rms:
+            return reducer.template Cells<Resampling::Rms>();
+        case Resampling::Mode:
+            return reducer.template Cells<Resampling::Mode>();
+        case Resampling::Minimum:
+            return reducer.template Cells<Resampling::Minimum>();
+        case Resampling::Maximum:
+            return reducer.template Cells<Resampling::Maximum>();
+        case Resampling::Median:
+            return reducer.template Cells<Resampling::Median>();
+        default:
+            return;
+    }
+}
+
+}  // namespace
+
+template <class T>
+void ReduceRow(Resampling method, std::uint32_t bands, std::uint32_t sourceWidth,
+               const ReductionRows<T>& source, const zelm::NoDataRule<T>* noData, T* out,
+               unsigned char* outMask) {
+    RowReducer<T> reducer(bands, sourceWidth, source, noData, out, outMask);
+    switch (method) {
+        case Resampling::Nearest:
+            return reducer.template Cells<Resampling::Nearest>();
+        case Resampling::Average:
+            return reducer.template Cells<Resampling::Average>();
+        case Resampling::Bilinear:
+            return reducer.template Window<BilinearKernel>();
+        case Resampling::Cubic:
+            return reducer.template Window<CubicKernel>();
+        case Resampling::Lanczos:
+            return reducer.template Window<LanczosKernel>();
+        default:
+            if constexpr (!zelm::kIsComplex<T>) ReduceOrdered(method, reducer);
+    }
+}
+
+#define ZMC_X(type, name, code)                                                                   \
+    template void ReduceRow(Resampling, std::uint32_t, std::uint32_t, const ReductionRows<type>&, \
+                            const zelm::NoDataRule<type>*, type*, unsigned char*);
+ZMC_ELEMENT_TYPES(ZMC_X)
+#undef ZMC_X
+
+}  // namespace zmchost

@@ -1,0 +1,54 @@
+#include "host/reduce/Reduction.h"
+
+#include <array>
+
+#include "core/ElementTypes.h"
+
+namespace zmchost {
+namespace {
+
+// Of each method: its word, the rows that it needs above and below a pair, and whether it is
+// defined for values without an order. In the order of the enumeration.
+struct MethodTraits {
+    Resampling method;
+    const char* word;
+    std::uint32_t halo;
+    bool forComplex;
+};
+constexpr std::array<MethodTraits, 10> kMethods = {{
+    {Resampling::Nearest, "nearest", 0, true},
+    {Resampling::Average, "average", 0, true},
+    {Resampling::Rms, "rms", 0, false},
+    {Resampling::Mode, "mode", 0, false},
+    {Resampling::Minimum, "minimum", 0, false},
+    {Resampling::Maximum, "maximum", 0, false},
+    {Resampling::Median, "median", 0, false},
+    {Resampling::Bilinear, "bilinear", 1, true},
+    {Resampling::Cubic, "cubic", 3, true},
+    {Resampling::Lanczos, "lanczos", 5, true},
+}};
+
+const MethodTraits& Traits(Resampling method) { return kMethods[static_cast<std::size_t>(method)]; }
+
+}  // namespace
+
+std::optional<Resampling> ParseResampling(std::string_view word) {
+    for (const MethodTraits& traits : kMethods) {
+        if (word == traits.word) return traits.method;
+    }
+    return std::nullopt;
+}
+
+const char* ResamplingName(Resampling method) { return Traits(method).word; }
+
+bool SupportsElementType(Resampling method, std::uint32_t pixelType) {
+    bool supported = false;
+    zelm::VisitElementType(pixelType, [&]<class T>(std::type_identity<T>) {
+        supported = !zelm::kIsComplex<T> || Traits(method).forComplex;
+    });
+    return supported;
+}
+
+std::uint32_t ReductionHalo(Resampling method) { return Traits(method).halo; }
+
+}  // namespace zmchost

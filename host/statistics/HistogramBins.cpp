@@ -1,0 +1,81 @@
+#include "host/statistics/HistogramBins.h"
+
+#include <algorithm>
+#include <cmath>
+#include <limits>
+#include <type_traits>
+
+#include "host/base/Int128.h"
+
+namespace zmchost {
+namespace {
+
+// maximum - minimum + 1: the width of an integer band, up to 2 to the 64.
+template <class T>
+UInt128 IntegerWidth(T minimum, T maximum) {
+    if (maximum < minimum) return 1;
+    return static_cast<UInt128>(static_cast<Int128>(maximum) - static_cast<Int128>(minimum) + 1);
+}
+
+// The distance as double, of values that a factor has brought into range.
+template <class T>
+double Distance(T from, T to, double factor) {
+    return static_cast<double>(to) * factor - static_cast<double>(from) * factor;
+}
+
+}  // namespace
+
+template <class T>
+HistogramBins<T>::HistogramBins(T minimum, T maximum, std::uint32_t binCount)
+    : minimum_(minimum), maximum_(maximum), count_(std::max<std::uint32_t>(binCount, 1)) {
+    if constexpr (std::is_integral_v<T>) {
+        size_ =
+            static_cast<double>(static_cast<long double>(IntegerWidth(minimum, maximum)) / count_);
+    } else if constexpr (std::is_floating_point_v<T>) {
+        constexpr double kLarge = 1e300;
+        constexpr double kSmall = 1e-290;
+        double width = Distance(minimum, maximum, 0.5);
+        if (width > kLarge)
+            factor_ = 0.5;
+        else if (width > 0 && width < kSmall)
+            factor_ = std::ldexp(1.0, 600);
+        width = maximum > minimum ? Distance(minimum, maximum, factor_) : factor_;
+        size_ = width / count_ / factor_;
+        scale_ = count_ / width;
+    }
+}
+
+template <class T>
+HistogramBins<T> HistogramBins<T>::ForBand(T minimum, T maximum, std::uint32_t binCount) {
+    if constexpr (sizeof(T) == 1)
+        return HistogramBins(std::numeric_limits<T>::min(), std::numeric_limits<T>::max(), 256);
+    else
+        return HistogramBins(minimum, maximum, binCount);
+}
+
+template <class T>
+std::uint32_t HistogramBins<T>::Index(T value) const {
+    if constexpr (zelm::kIsComplex<T>) {
+        return kOutside;
+    } else {
+        if (!(value >= minimum_ && value <= maximum_)) return kOutside;
+        if constexpr (std::is_floating_point_v<T>) {
+            const double bin = Distance(minimum_, value, factor_) * scale_;
+            return bin < count_ ? static_cast<std::uint32_t>(bin) : count_ - 1;
+        } else if constexpr (sizeof(T) <= 4) {
+            const std::int64_t low = minimum_;
+            const auto offset = static_cast<std::uint64_t>(value - low);
+            const auto width = static_cast<std::uint64_t>(maximum_ - low) + 1;
+            return static_cast<std::uint32_t>(offset * count_ / width);
+        } else {
+            const auto offset = static_cast<UInt128>(static_cast<Int128>(value) - minimum_);
+            return static_cast<std::uint32_t>(offset * count_ / IntegerWidth(minimum_, maximum_));
+        }
+    }
+}
+
+#define ZMC_X(type, name, code) template class HistogramBins<type>;
+ZMC_ELEMENT_TYPES(ZMC_X)
+#undef ZMC_X
+
+}  // namespace zmchost
