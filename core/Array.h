@@ -13,7 +13,7 @@
 
 #include "core/ArrayShape.h"
 #include "core/Object.h"
-#include "zmcg/zmcg.h"
+#include "core/ObjectCodes.h"
 
 namespace zelm {
 

@@ -1,6 +1,6 @@
 #include "core/ErrorState.h"
 
-#include "zmcg/zmcg.h"
+#include "core/ObjectCodes.h"
 
 namespace zelm {
 

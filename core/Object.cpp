@@ -3,7 +3,7 @@
 #include <cinttypes>
 #include <cstdio>
 
-#include "zmcg/zmcg.h"
+#include "core/ObjectCodes.h"
 
 namespace zelm {
 

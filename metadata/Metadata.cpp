@@ -2,8 +2,8 @@
 
 #include <new>
 
+#include "core/ObjectCodes.h"
 #include "metadata/MetadataParseLog.h"
-#include "zmcg/zmcg.h"
 
 namespace zelm {
 namespace {

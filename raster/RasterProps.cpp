@@ -2,7 +2,7 @@
 
 #include <algorithm>
 
-#include "zmcg/zmcg.h"
+#include "core/ObjectCodes.h"
 
 namespace zelm {
 

@@ -13,6 +13,7 @@
 
 #include <cstdint>
 
+#include "core/ObjectCodes.h"  // two of the names
 #include "core/String.h"
 #include "zmcg/EnvironmentImpl.h"
 #include "zmcg/FormatRecord.h"
@@ -24,18 +25,6 @@ class CoordSysFactory;
 class CoordSysImpl;
 class CoordSysLog;
 }  // namespace zelm
-
-#if defined(_WIN32)
-#define ZMCG_SYMBOL extern "C" __declspec(dllimport)
-#else
-#define ZMCG_SYMBOL extern "C" __attribute__((visibility("default")))
-#endif
-
-// A number for a class word, never 0; equal for equal words, stable for the life of the process.
-// Where memory runs out the number is still one that no other word has, and goes unremembered.
-ZMCG_SYMBOL unsigned GloballyUniqueObjectTypeCode(const zelm::String& name);
-// A number that no earlier call has returned, never 0.
-ZMCG_SYMBOL unsigned GloballyUniqueObjectErrorCode();
 
 // The formats that datasets can have; read-only for every user.
 ZMCG_SYMBOL FormatRecord gCdfFormatRecords[];

@@ -5,8 +5,8 @@
 #include <algorithm>
 #include <iterator>
 
+#include "core/ObjectCodes.h"
 #include "tests/support/CountingGeoRef.h"
-#include "zmcg/zmcg.h"
 
 namespace zelm {
 namespace {
