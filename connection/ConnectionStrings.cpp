@@ -1,15 +1,11 @@
 #include "connection/ConnectionStrings.h"
 
 #include <algorithm>
-#include <charconv>
 #include <cstdio>
-#include <cstdlib>
-#include <cstring>
-#include <limits>
 #include <string_view>
-#include <system_error>
 
 #include "core/PixelVocabulary.h"
+#include "platform/ParseNumber.h"
 #include "zmcg/zmcg.h"
 
 namespace zelm {
@@ -24,32 +20,6 @@ constexpr WideChar kPairEnd = ';';
 const char* NarrowText(const String& value) {
     const char* text = value.GetUtf8();
     return text ? text : "";
-}
-
-// Tells numbers below the range of a double from those above it: by the power of ten that the first
-// digit other than 0 stands for. The number lies in a zero-terminated text.
-bool IsTiny(std::string_view number) {
-    constexpr long long kFar = 1LL << 40;  // longer than any text, and far from overflow
-    const std::size_t mark = std::min(number.find_first_of("eE"), number.size());
-    const std::string_view digits = number.substr(0, mark);
-    const std::size_t point = std::min(digits.find('.'), digits.size());
-    const std::size_t first = std::min(digits.find_first_of("123456789"), digits.size());
-    const long long scale =
-        mark == number.size() ? 0 : std::strtoll(number.data() + mark + 1, nullptr, 10);
-    return static_cast<long long>(point) + std::clamp(scale, -kFar, kFar) <
-           static_cast<long long>(first);
-}
-
-// Reads a double as far as it goes, whatever the locale says of decimal points.
-double ParseDouble(const char* text) {
-    text += std::strspn(text, " \t\n\v\f\r");
-    if (text[0] == '+' && text[1] != '-') ++text;
-    double value = 0;
-    const auto [end, error] = std::from_chars(text, text + std::strlen(text), value);
-    if (error != std::errc::result_out_of_range) return value;
-    const std::string_view number(text, static_cast<std::size_t>(end - text));
-    const double nearest = IsTiny(number) ? 0.0 : std::numeric_limits<double>::infinity();
-    return number[0] == '-' ? -nearest : nearest;
 }
 
 // Calls visit(start, count) for the stretches of `source` that are not empty.
@@ -99,21 +69,16 @@ bool FindParameterValue(const String& source, const String& key, String& value) 
 }
 
 bool ReadUnsignedParameter(const String& source, const String& key, std::uint32_t& value) {
-    constexpr auto highest = std::numeric_limits<std::uint32_t>::max();
     String text;
     if (!FindParameterValue(source, key, text)) return false;
-    const long long number = std::strtoll(NarrowText(text), nullptr, 0);
-    const bool fits = number <= highest && number >= -static_cast<long long>(highest);
-    value = fits ? static_cast<std::uint32_t>(number) : highest;
+    value = platform::ParseUnsigned32(NarrowText(text));
     return true;
 }
 
 bool ReadSignedParameter(const String& source, const String& key, std::int32_t& value) {
-    using Limits = std::numeric_limits<std::int32_t>;
     String text;
     if (!FindParameterValue(source, key, text)) return false;
-    const long long number = std::strtoll(NarrowText(text), nullptr, 0);
-    value = static_cast<std::int32_t>(std::clamp<long long>(number, Limits::min(), Limits::max()));
+    value = platform::ParseSigned32(NarrowText(text));
     return true;
 }
 
@@ -133,8 +98,8 @@ bool ReadDoublePairParameter(const String& source, const String& key, double& fi
     Array<String> tokens;
     if (!SplitString(text, ",", tokens) || tokens.shape.elements != 2) return false;
     if (tokens.data[0].IsEmpty() || tokens.data[1].IsEmpty()) return false;
-    first = ParseDouble(NarrowText(tokens.data[0]));
-    second = ParseDouble(NarrowText(tokens.data[1]));
+    first = platform::ParseReal(NarrowText(tokens.data[0]));
+    second = platform::ParseReal(NarrowText(tokens.data[1]));
     return true;
 }
 

@@ -22,16 +22,17 @@ namespace zelm {
 // nothing behind it, or an empty source or key.
 bool FindParameterValue(const String& source, const String& key, String& value);
 
-// Whole numbers: "0x" introduces hexadecimal, a leading "0" octal. Numbers have 32 bits, as `long`
-// had where these strings come from: what lies beyond takes the nearest value, and a minus sign in
-// front of an unsigned number wraps it.
+// Whole numbers: "0x" introduces hexadecimal, a leading "0" octal. The fields that they fill have
+// 32 bits, and so have the numbers on every platform: what lies beyond takes the highest value, or
+// the lowest of a signed one, and a minus sign in front of an unsigned number wraps it.
 bool ReadUnsignedParameter(const String& source, const String& key, std::uint32_t& value);
 bool ReadSignedParameter(const String& source, const String& key, std::int32_t& value);
 
 // The number of a pixel type that has a reader; false for any other.
 bool ReadPixelTypeParameter(const String& source, const String& key, std::uint32_t& code);
 
-// Exactly two numbers, separated by ","; empty ones do not count. The decimal point is ".".
+// Exactly two numbers, separated by ","; empty ones do not count. They are decimal or "0x"
+// hexadecimal, with an exponent or without, and the point is ".".
 bool ReadDoublePairParameter(const String& source, const String& key, double& first,
                              double& second);
 

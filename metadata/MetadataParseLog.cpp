@@ -6,13 +6,13 @@
 #include <cstdlib>
 #include <cwchar>
 #include <iostream>
-#include <limits>
 #include <locale>
 #include <memory>
 #include <new>
 
 #include "platform/Directory.h"
 #include "platform/LocalTime.h"
+#include "platform/ParseNumber.h"
 #include "platform/WideFormat.h"
 #include "zmcg/zmcg.h"
 
@@ -37,13 +37,8 @@ std::string NarrowToBytes(const std::wstring& wide) {
     return bytes;
 }
 
-// Reads 32 bits as a 32-bit wcstoul does: too large a number is the largest, a small negative one
-// wraps.
 std::uint32_t ParseNumber(const std::wstring& text) {
-    constexpr unsigned long kLargest = std::numeric_limits<std::uint32_t>::max();
-    const unsigned long value = std::wcstoul(text.c_str(), nullptr, 0);
-    const bool fits = value <= kLargest || 0ul - value <= kLargest;
-    return static_cast<std::uint32_t>(fits ? value : kLargest);
+    return platform::ParseUnsigned32(NarrowToBytes(text).c_str());
 }
 
 // The two settings are plain words of a shared record that any thread may read while the first

@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 #include <rapidcheck/gtest.h>
 
+#include <cmath>
 #include <limits>
 #include <string>
 #include <vector>
@@ -110,6 +111,8 @@ TEST(ReadUnsignedParameter, ReadsAsFarAsItGoes) {
     EXPECT_EQ(Unsigned("089"), 0u);
     EXPECT_EQ(Unsigned("7\xC3\xBC"), 7u);
     EXPECT_EQ(Unsigned("--1"), 0u);
+    EXPECT_EQ(Unsigned("0b11"), 0u);
+    EXPECT_EQ(Unsigned("0x"), 0u);
 }
 
 TEST(ReadUnsignedParameter, HasThirtyTwoBits) {
@@ -120,6 +123,8 @@ TEST(ReadUnsignedParameter, HasThirtyTwoBits) {
     EXPECT_EQ(Unsigned("-4294967295"), 1u);
     EXPECT_EQ(Unsigned("-4294967296"), 4294967295u);
     EXPECT_EQ(Unsigned("-99999999999999999999999"), 4294967295u);
+    EXPECT_EQ(Unsigned("18446744069414584321"), 4294967295u);
+    EXPECT_EQ(Unsigned("-18446744073709551615"), 4294967295u);
 }
 
 TEST(ReadUnsignedParameter, MissingKeyLeavesTheValueAlone) {
@@ -202,6 +207,38 @@ TEST(ReadDoublePairParameter, NumbersOutOfRangeGoToTheEndThatTheyPass) {
     EXPECT_EQ(Double("0001e400"), infinity);
     EXPECT_EQ(Double("1e99999999999999999999"), infinity);
     EXPECT_EQ(Double("1e-99999999999999999999"), 0);
+}
+
+TEST(ReadDoublePairParameter, ReadsHexadecimals) {
+    double first = 8, second = 9;
+    ASSERT_TRUE(Pair("0x10,0x1p-3", first, second));
+    EXPECT_EQ(first, 16);
+    EXPECT_EQ(second, 0.125);
+    EXPECT_EQ(Double("0x.8"), 0.5);
+    EXPECT_EQ(Double(" -0X1.8P+1z"), -3);
+    EXPECT_EQ(Double("0x"), 0);
+    EXPECT_EQ(Double("0xg"), 0);
+    EXPECT_EQ(Double("0x1p-2000"), 0);
+    EXPECT_EQ(Double("-0x1p2000"), -std::numeric_limits<double>::infinity());
+}
+
+// The nearest to a number that is too small for all bits of a double still has some of them.
+TEST(ReadDoublePairParameter, SmallestNumbersKeepTheBitsThatTheyHave) {
+    EXPECT_EQ(Double("5e-324"), std::numeric_limits<double>::denorm_min());
+    EXPECT_EQ(Double("1e-310"), 1e-310);
+    EXPECT_EQ(Double("0x1p-1074"), std::numeric_limits<double>::denorm_min());
+}
+
+TEST(ReadDoublePairParameter, ReadsInfinitiesAndWhatIsNoNumber) {
+    EXPECT_EQ(Double("-inf"), -std::numeric_limits<double>::infinity());
+    EXPECT_EQ(Double("INFINITYx"), std::numeric_limits<double>::infinity());
+    EXPECT_TRUE(std::isnan(Double("nan(1)")));
+    for (const char* none : {"-x", "x", "-", ".", "e5",
+                             "\xC2\xA0"
+                             "1"}) {
+        EXPECT_EQ(Double(none), 0) << none;
+        EXPECT_FALSE(std::signbit(Double(none))) << none;
+    }
 }
 
 TEST(ReadDoublePairParameter, AMegabyteOfTokensIsRefusedAtOnce) {

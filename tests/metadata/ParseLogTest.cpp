@@ -98,6 +98,16 @@ TEST_F(ParseLog, LevelsHaveThirtyTwoBits) {
     EXPECT_THAT(Run(Here(), "-2", "0").err, HasSubstr("level=4294967294 "));
 }
 
+// Whose low bits look like a small level is as far out of range as any other.
+TEST_F(ParseLog, LevelsBeyondSixtyFourBitsAreTheHighestToo) {
+    for (const char* text : {"18446744069414584321", "18446744073709551615", "18446744073709551616",
+                             "-18446744073709551615", "-18446744073709551600",
+                             "-0xFFFFFFFF00000001", "-4294967296", "99999999999999999999999"})
+        EXPECT_THAT(Run(Here(), text, "0").err, HasSubstr("level=4294967295 ")) << text;
+    EXPECT_THAT(Run(Here(), "1", "18446744069414584321").err, HasSubstr("console=4294967295 "));
+    EXPECT_THAT(Run(Here(), "-4294967295", "0").err, HasSubstr("level=1 "));
+}
+
 TEST_F(ParseLog, MakesTheLastComponentOfTheDirectory) {
     EXPECT_THAT(Run(scratch / "new", "1", "0").err, HasSubstr("level=1 "));
     EXPECT_THAT(ReadText(scratch / ("new/" + kFile)), HasSubstr(kHeaderText));
