@@ -1,5 +1,6 @@
 #include "pyramid/NumberText.h"
 
+#include <algorithm>
 #include <limits>
 #include <locale>
 #include <sstream>
@@ -22,8 +23,33 @@ bool TakeSign(std::string_view& text) {
 
 bool StartsHexadecimal(std::string_view text) {
     constexpr std::string_view digits = "0123456789abcdefABCDEF";
-    return text.size() > 2 && text[0] == '0' && (text[1] == 'x' || text[1] == 'X') &&
-           digits.find(text[2]) != std::string_view::npos;
+    if (text.size() < 3 || text[0] != '0' || (text[1] != 'x' && text[1] != 'X')) return false;
+    const std::size_t first = text[2] == '.' ? 3 : 2;
+    return first < text.size() && digits.find(text[first]) != std::string_view::npos;
+}
+
+// The whole number at the front, which ends at those of 64 bits.
+std::int64_t ReadWhole(std::string_view text) {
+    const bool negative = TakeSign(text);
+    constexpr std::uint64_t most = std::numeric_limits<std::int64_t>::max();
+    std::uint64_t magnitude = 0;
+    const auto end = std::from_chars(text.data(), text.data() + text.size(), magnitude);
+    if (end.ec == std::errc::result_out_of_range || magnitude > most)
+        return negative ? std::numeric_limits<std::int64_t>::min()
+                        : std::numeric_limits<std::int64_t>::max();
+    return negative ? -static_cast<std::int64_t>(magnitude) : static_cast<std::int64_t>(magnitude);
+}
+
+// A hexadecimal number without its prefix, whose value no double holds: infinity, or nothing. It is
+// hundreds of binary places away from 1, so the place of its first digit tells which.
+double HexadecimalOutOfRange(std::string_view text) {
+    const std::size_t mark = text.find_first_of("pP");
+    const std::string_view digits = text.substr(0, mark);
+    const auto point = static_cast<std::int64_t>(std::min(digits.find('.'), digits.size()));
+    const auto first = static_cast<std::int64_t>(digits.find_first_not_of("0."));
+    const std::int64_t power =
+        mark == std::string_view::npos ? 0 : ReadWhole(text.substr(mark + 1));
+    return point - first + power / 4 > 0 ? std::numeric_limits<double>::infinity() : 0;
 }
 
 // A decimal whose value no double holds: infinity, or the nearest to nothing.
@@ -36,19 +62,20 @@ double ReadOutOfRange(std::string_view text) {
                                                        : value;
 }
 
-double ReadMagnitude(std::string_view text) {
+// False if the text does not begin with a number.
+bool ReadMagnitude(std::string_view text, double& value) {
     // The numbers that from_chars reads have a sign of their own.
-    if (text.empty() || text[0] == '-') return 0;
+    if (text.empty() || text[0] == '-') return false;
     const bool hexadecimal = StartsHexadecimal(text);
     if (hexadecimal) text.remove_prefix(2);
-    double value = 0;
     const auto end =
         std::from_chars(text.data(), text.data() + text.size(), value,
                         hexadecimal ? std::chars_format::hex : std::chars_format::general);
-    if (end.ec != std::errc::result_out_of_range) return value;
-    const auto length = static_cast<std::size_t>(end.ptr - text.data());
-    return hexadecimal ? std::numeric_limits<double>::infinity()
-                       : ReadOutOfRange(text.substr(0, length));
+    if (end.ec == std::errc::result_out_of_range) {
+        text = text.substr(0, static_cast<std::size_t>(end.ptr - text.data()));
+        value = hexadecimal ? HexadecimalOutOfRange(text) : ReadOutOfRange(text);
+    }
+    return end.ec != std::errc::invalid_argument;
 }
 
 }  // namespace
@@ -63,17 +90,14 @@ std::string FormatReal(double value, int digits) {
 double ReadReal(std::string_view text) {
     text = SkipSpace(text);
     const bool negative = TakeSign(text);
-    const double magnitude = ReadMagnitude(text);
+    double magnitude = 0;
+    // What is no number is no negative zero either.
+    if (!ReadMagnitude(text, magnitude)) return 0;
     return negative ? -magnitude : magnitude;
 }
 
 std::uint32_t ReadInteger(std::string_view text) {
-    text = SkipSpace(text);
-    const bool negative = TakeSign(text);
-    std::uint64_t magnitude = 0;
-    const auto end = std::from_chars(text.data(), text.data() + text.size(), magnitude);
-    if (end.ec == std::errc::result_out_of_range) magnitude = 0x7fffffffffffffff;
-    return static_cast<std::uint32_t>(negative ? 0 - magnitude : magnitude);
+    return static_cast<std::uint32_t>(ReadWhole(SkipSpace(text)));
 }
 
 }  // namespace zelm

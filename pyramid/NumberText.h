@@ -1,7 +1,8 @@
 // Numbers as the documents of a pyramid file spell them, whatever the process's locale is.
 //
 // Reading takes the number at the start of a text, after white space, and ignores what follows; a
-// text without one is 0.
+// text without one is 0. Numbers are those of the C library's atof and atoi in its own locale:
+// hexadecimal reals, `inf` and `nan` as well.
 #ifndef ZMC_PYRAMID_NUMBERTEXT_H
 #define ZMC_PYRAMID_NUMBERTEXT_H
 
@@ -42,8 +43,9 @@ std::string FormatPixel(const T& value) {
         return FormatDecimal(value);
 }
 
+// Beyond the range of a double: infinity, or the nearest to nothing.
 double ReadReal(std::string_view text);
-// A signed or unsigned decimal, cut to 32 bits.
+// A decimal with or without a sign, which ends at the numbers of 64 bits and is then cut to 32.
 std::uint32_t ReadInteger(std::string_view text);
 
 }  // namespace zelm

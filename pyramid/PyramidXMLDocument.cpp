@@ -66,6 +66,11 @@ void Serialize(const xercesc::DOMDocument& document, xercesc::MemBufFormatTarget
     complete = writer->write(&document, output.get());
 }
 
+// A record and its children, which have none of their own.
+std::uint64_t ElementsOf(const xercesc::DOMElement& record) {
+    return 1 + std::uint64_t{record.getChildElementCount()};
+}
+
 std::string FormatColor(const Color& color) {
     return FormatDecimal(color.red) + '|' + FormatDecimal(color.green) + '|' +
            FormatDecimal(color.blue) + '|' + FormatDecimal(color.alpha);
@@ -145,20 +150,25 @@ void PyramidXMLDocument::AppendValueElement(xercesc::DOMElement& parent, Element
 
 // The children are built aside, so that a record is appended whole or not at all.
 template <class Build>
-bool PyramidXMLDocument::AppendRecord(ElementName name, std::uint64_t children, Build build) {
-    if (!document || elementCount + children + 1 > kMaxDocumentNodes) return false;
+bool PyramidXMLDocument::AppendRecord(ElementName name, Build build) {
+    if (!document) return false;
     return Attempt("", [&] {
         xercesc::DOMElement* record =
             document->createElement(kElementNames[static_cast<int>(name)].data());
         build(*record);
+        const std::uint64_t count = ElementsOf(*record);
+        if (elementCount + count > kMaxDocumentNodes) {
+            record->release();
+            return false;
+        }
         document->getDocumentElement()->appendChild(record);
-        elementCount += children + 1;
+        elementCount += count;
         return true;
     });
 }
 
 bool PyramidXMLDocument::WriteHeaderElement(const PyramidHeaderRecord& header) {
-    return AppendRecord(ElementName::HEADER, 11, [&](xercesc::DOMElement& record) {
+    return AppendRecord(ElementName::HEADER, [&](xercesc::DOMElement& record) {
         const auto number = [&](ElementName name, std::uint32_t value) {
             AppendValueElement(record, name, FormatDecimal(value));
         };
@@ -180,7 +190,7 @@ bool PyramidXMLDocument::WriteHeaderElement(const PyramidHeaderRecord& header) {
 
 template <class T>
 bool PyramidXMLDocument::WriteBandStatsElement(const RasterBandStats<T>& stats) {
-    return AppendRecord(ElementName::BANDSTATISTICS, 9, [&](xercesc::DOMElement& record) {
+    return AppendRecord(ElementName::BANDSTATISTICS, [&](xercesc::DOMElement& record) {
         const auto present = [&](std::uint32_t flag, ElementName name, const std::string& text) {
             if (stats.flags & flag) AppendValueElement(record, name, text);
         };
@@ -203,10 +213,10 @@ template <class T>
 bool PyramidXMLDocument::WriteHistogramElement(const RasterBandHistogram<T>& histogram) {
     // Each bin takes two characters at least.
     if (histogram.binCount > kMaxDocumentBytes / 2) return false;
-    return AppendRecord(ElementName::HISTOGRAMS, 8, [&](xercesc::DOMElement& record) {
+    return AppendRecord(ElementName::HISTOGRAMS, [&](xercesc::DOMElement& record) {
         AppendValueElement(record, ElementName::HIST_BAND, FormatDecimal(histogram.band));
         AppendValueElement(record, ElementName::HIST_LEVEL, FormatDecimal(histogram.level));
-        // Whatever the record says: readers have only ever met this word.
+        // Whatever the record says: the word for histograms that a pyramid file keeps.
         AppendValueElement(record, ElementName::HIST_SOURCE, "ORVA");
         AppendValueElement(record, ElementName::HIST_BINCOUNT, FormatDecimal(histogram.binCount));
         AppendValueElement(record, ElementName::HIST_BINSIZE,
@@ -218,8 +228,9 @@ bool PyramidXMLDocument::WriteHistogramElement(const RasterBandHistogram<T>& his
 }
 
 bool PyramidXMLDocument::WritePaletteElement(std::uint32_t band, const Palette& palette) {
-    const std::uint64_t children = std::uint64_t{palette.nextIndex} + 2;
-    return AppendRecord(ElementName::PALETTE, children, [&](xercesc::DOMElement& record) {
+    // Each colour is an element.
+    if (palette.nextIndex > kMaxDocumentNodes) return false;
+    return AppendRecord(ElementName::PALETTE, [&](xercesc::DOMElement& record) {
         AppendValueElement(record, ElementName::PALETTE_BAND, FormatDecimal(band));
         AppendValueElement(record, ElementName::PALETTE_COUNT, FormatDecimal(palette.nextIndex));
         const Color nullColor;
@@ -255,8 +266,8 @@ void PyramidXMLDocument::RemoveFrom(std::uint32_t position) {
     xercesc::DOMElement* root = document->getDocumentElement();
     for (std::uint32_t count = RecordCount(); count > position; --count) {
         xercesc::DOMElement* last = root->getLastElementChild();
-        elementCount -= 1 + last->getChildElementCount();
         xercesc::DOMNode* const removed = root->removeChild(last);
+        elementCount -= ElementsOf(*last);
         try {
             removed->release();
         } catch (...) {

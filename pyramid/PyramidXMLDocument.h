@@ -76,7 +76,7 @@ public:
 
 private:
     template <class Build>
-    bool AppendRecord(ElementName name, std::uint64_t children, Build build);
+    bool AppendRecord(ElementName name, Build build);
 
     std::uint64_t elementCount = 0;  // elements of the tree, the root included
 };

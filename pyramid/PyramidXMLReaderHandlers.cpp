@@ -83,7 +83,47 @@ void AppendGrowing(Array<T>& array, const T& value) {
     if (!array.Append(value)) throw std::bad_alloc();  // unreachable: there is room now
 }
 
+// Gives an array that owns its elements `count` of them, the new ones 0.
+void Extend(Array<std::uint64_t>& array, std::uint32_t count) {
+    const std::uint32_t before = array.shape.elements;
+    if (count <= before) return;
+    if (!array.SetShape(ArrayShape(count))) throw std::bad_alloc();
+    std::fill(array.data + before, array.data + count, 0);
+}
+
 }  // namespace
+
+void CountList::Begin() {
+    binCount = 0;
+    entries = 0;
+}
+
+void CountList::Take(std::string_view text, std::uint32_t bins, Array<std::uint64_t>& counts) {
+    if (bins == 0) return;
+    const auto bars = static_cast<std::uint64_t>(std::count(text.begin(), text.end(), '|'));
+    // The first entry of a later piece is the rest of the last one before, or a list of its own.
+    if (binCount == 0) {
+        binCount = bins;
+        entries = 1;
+    }
+    entries += bars;
+    // A later piece may come under another number of bins.
+    const auto end =
+        static_cast<std::uint32_t>(std::min<std::uint64_t>(std::min(bins, binCount), bars + 1));
+    Extend(counts, end);
+    std::string_view token;
+    for (std::uint32_t i = 0; i < end; ++i) {
+        TakeToken(text, token);
+        counts.data[i] = ToUint64(ReadReal(token));
+    }
+}
+
+void CountList::End(std::uint64_t& spareBins, Array<std::uint64_t>& counts) const {
+    const std::uint64_t spare = binCount > entries ? binCount - entries : 0;
+    if (spare > spareBins) return counts.Clear();
+    spareBins -= spare;
+    Extend(counts, binCount);
+}
 
 void PyramidXMLReaderCore::startElement(const XMLCh* const name, xercesc::AttributeList&) {
     const std::int32_t state = StateOf(FindElementName(View(name)));
@@ -94,8 +134,6 @@ void PyramidXMLReaderCore::startElement(const XMLCh* const name, xercesc::Attrib
         BeginHistogram();
     } else if (state == StateOf(PALETTE)) {
         currentPalette.Clear();
-        paletteBand = 0;
-        ++openPalettes;
     }
 }
 
@@ -109,7 +147,6 @@ void PyramidXMLReaderCore::endElement(const XMLCh* const) {
         EndHistogram();
     } else if (state == StateOf(PALETTE)) {
         currentPalette.CopyTo(palettes[paletteBand]);
-        --openPalettes;
     }
 }
 
@@ -125,7 +162,7 @@ void PyramidXMLReaderCore::characters(const XMLCh* const text, const XMLSize_t l
         TakeHistogramText(name, narrow);
     else if (name < PALETTE_BAND)
         TakeHeaderText(name, narrow);
-    else if (openPalettes != 0)
+    else
         TakePaletteText(name, narrow);
 }
 
@@ -189,28 +226,6 @@ void PyramidXMLReaderCore::TakePaletteText(ElementName name, std::string_view te
     }
 }
 
-void PyramidXMLReaderCore::ReadCounts(std::string_view text, std::uint32_t binCount,
-                                      Array<std::uint64_t>& counts) {
-    if (binCount == 0) return;
-    if (!counts.data) {
-        const auto tokens =
-            static_cast<std::uint64_t>(std::count(text.begin(), text.end(), '|')) + 1;
-        const std::uint64_t spare = binCount > tokens ? binCount - tokens : 0;
-        if (spare > spareBins) return;
-        spareBins -= spare;
-        if (!counts.SetShape(ArrayShape(binCount))) throw std::bad_alloc();
-        std::fill_n(counts.data, binCount, 0);
-    }
-    // A later piece may come under another number of bins.
-    const std::uint32_t end = std::min(binCount, counts.shape.elements);
-    std::string_view token;
-    bool more = true;
-    for (std::uint32_t i = 0; more && i < end; ++i) {
-        more = TakeToken(text, token);
-        counts.data[i] = ToUint64(ReadReal(token));
-    }
-}
-
 void PyramidXMLReaderCore::warning(const xercesc::SAXParseException& exception) {
     PrintMessage("\nWarning at file ", exception);
 }
@@ -240,11 +255,15 @@ template <class T>
 void PyramidXMLReaderHandlers<T>::BeginHistogram() {
     pendingHistogram = std::make_unique<RasterBandHistogram<T>>();
     pendingHistogram->band = initialBand;
+    countList.Begin();
 }
 
 template <class T>
 void PyramidXMLReaderHandlers<T>::EndHistogram() {
-    if (pendingHistogram) AppendGrowing(histograms, *pendingHistogram);
+    if (pendingHistogram) {
+        countList.End(spareBins, pendingHistogram->counts);
+        AppendGrowing(histograms, *pendingHistogram);
+    }
     pendingHistogram.reset();
 }
 
@@ -313,7 +332,7 @@ void PyramidXMLReaderHandlers<T>::TakeHistogramText(ElementName name, std::strin
             histogram.maximum = ToPixel<T>(ReadReal(text));
             break;
         case HIST_COUNTS:
-            ReadCounts(text, histogram.binCount, histogram.counts);
+            countList.Take(text, histogram.binCount, histogram.counts);
             break;
         default:
             break;

@@ -8,7 +8,7 @@
 // The parser may deliver a text in pieces. Each piece is taken for a whole value: of a number the
 // last piece counts, and in a list each piece starts again from the first entry.
 //
-// Nothing here allocates by a number from the file: see kSpareBins.
+// Nothing here allocates by a number from the file: see CountList.
 #ifndef ZMC_PYRAMID_PYRAMIDXMLREADERHANDLERS_H
 #define ZMC_PYRAMID_PYRAMIDXMLREADERHANDLERS_H
 
@@ -43,6 +43,23 @@ constexpr std::int32_t StateOf(ElementName name) { return StateOf(static_cast<in
 // together. A histogram that would take more keeps no counts: it claims what its text cannot hold.
 inline constexpr std::uint64_t kSpareBins = 1u << 20;
 
+// Reads the counts of the histogram in hand. They grow with the pieces of the list, and take their
+// full number when its end has been seen: before that, nobody can tell what the text lacks. May
+// throw bad_alloc.
+class CountList {
+public:
+    // Of a new histogram.
+    void Begin();
+    // Takes a piece of a list under this number of bins; the first piece tells how many there are.
+    void Take(std::string_view text, std::uint32_t bins, Array<std::uint64_t>& counts);
+    // Fills up with zeros, or drops the counts if they lack more than there are `spareBins` left.
+    void End(std::uint64_t& spareBins, Array<std::uint64_t>& counts) const;
+
+private:
+    std::uint32_t binCount = 0;  // 0 before the first piece
+    std::uint64_t entries = 0;   // of all pieces together
+};
+
 // The part that does not depend on the element type.
 class PyramidXMLReaderCore : public xercesc::HandlerBase {
 public:
@@ -53,7 +70,7 @@ public:
     Palette currentPalette;
     std::map<std::uint32_t, Palette> palettes;  // finished palettes, by band
     std::deque<std::int32_t> stateStack;
-    std::uint32_t paletteBand = 0;
+    std::uint32_t paletteBand = 0;  // the last one told, in whatever element
 
     void startElement(const XMLCh* const name, xercesc::AttributeList& attributes) override;
     void endElement(const XMLCh* const name) override;
@@ -72,15 +89,13 @@ protected:
     virtual void TakeStatsText(ElementName name, std::string_view text) = 0;
     virtual void TakeHistogramText(ElementName name, std::string_view text) = 0;
 
-    // Reads a list of counts into `counts`, which takes the length `binCount` from the first piece.
-    void ReadCounts(std::string_view text, std::uint32_t binCount, Array<std::uint64_t>& counts);
+    CountList countList;
+    std::uint64_t spareBins = kSpareBins;
 
 private:
     void TakeHeaderText(ElementName name, std::string_view text);
     void TakePaletteText(ElementName name, std::string_view text);
 
-    std::uint64_t spareBins = kSpareBins;
-    std::uint32_t openPalettes = 0;
     std::string narrow;  // the piece of text in hand
 };
 

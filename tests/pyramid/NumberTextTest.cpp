@@ -13,7 +13,15 @@
 namespace zelm {
 namespace {
 
-bool SameReal(double a, double b) { return a == b || (std::isnan(a) && std::isnan(b)); }
+// The sign of a zero counts as well.
+bool SameReal(double a, double b) {
+    return (a == b && std::signbit(a) == std::signbit(b)) || (std::isnan(a) && std::isnan(b));
+}
+double LibraryReal(const std::string& text) { return std::strtod(text.c_str(), nullptr); }
+// strtol has 64 bits here, as the integers of documents do before they are cut.
+std::uint32_t LibraryInteger(const std::string& text) {
+    return static_cast<std::uint32_t>(std::strtol(text.c_str(), nullptr, 10));
+}
 
 RC_GTEST_PROP(NumberText, RealsAreWrittenAsPrintfDoes, (double value)) {
     char text[64];
@@ -26,7 +34,18 @@ RC_GTEST_PROP(NumberText, RealsAreWrittenAsPrintfDoes, (double value)) {
 RC_GTEST_PROP(NumberText, RealsAreReadAsTheLibraryDoes, ()) {
     const auto text = *rc::gen::container<std::string>(
         rc::gen::elementOf(std::string(" \t+-..0011223789eExXinfaNp,")));
-    RC_ASSERT(SameReal(ReadReal(text), std::strtod(text.c_str(), nullptr)));
+    RC_ASSERT(SameReal(ReadReal(text), LibraryReal(text)));
+}
+
+RC_GTEST_PROP(NumberText, HexadecimalRealsAreReadAsTheLibraryDoes,
+              (bool negative, int exponent, bool bare)) {
+    const auto digits = *rc::gen::container<std::string>(
+        rc::gen::elementOf(std::string("0000123456789abcdefABCDEF..")));
+    const auto tail =
+        *rc::gen::container<std::string>(rc::gen::elementOf(std::string("pP+-.x 0123")));
+    const std::string text = std::string(negative ? "-" : "") + (exponent % 2 ? "0x" : "0X") +
+                             digits + (bare ? tail : "p" + std::to_string(exponent % 1200));
+    RC_ASSERT(SameReal(ReadReal(text), LibraryReal(text)));
 }
 
 RC_GTEST_PROP(NumberText, WhatWasWrittenIsReadBack, (double value, std::int64_t integer)) {
@@ -37,10 +56,13 @@ RC_GTEST_PROP(NumberText, WhatWasWrittenIsReadBack, (double value, std::int64_t 
 RC_GTEST_PROP(NumberText, IntegersAreReadAsTheLibraryDoes, ()) {
     const auto text =
         *rc::gen::container<std::string>(rc::gen::elementOf(std::string(" \t+--0123456789ax.")));
-    errno = 0;
-    const long expected = std::strtol(text.c_str(), nullptr, 10);
-    RC_PRE(errno == 0);
-    RC_ASSERT(ReadInteger(text) == static_cast<std::uint32_t>(expected));
+    RC_ASSERT(ReadInteger(text) == LibraryInteger(text));
+}
+
+RC_GTEST_PROP(NumberText, LongIntegersAreReadAsTheLibraryDoes, (bool negative, std::uint64_t a)) {
+    const auto more = *rc::gen::container<std::string>(rc::gen::elementOf(std::string("059")));
+    const std::string text = (negative ? "-" : "") + std::to_string(a) + more.substr(0, 3);
+    RC_ASSERT(ReadInteger(text) == LibraryInteger(text));
 }
 
 TEST(NumberText, EdgesOfReals) {
@@ -56,6 +78,73 @@ TEST(NumberText, EdgesOfReals) {
     EXPECT_EQ(ReadReal("0x10"), 16);
     EXPECT_TRUE(std::isnan(ReadReal("-nan")));
     EXPECT_EQ(ReadReal("inf"), std::numeric_limits<double>::infinity());
+}
+
+// Hexadecimal reals: a fraction alone, a binary exponent, and values that no double holds.
+TEST(NumberText, EdgesOfHexadecimalReals) {
+    for (const char* text : {"0x.8",
+                             "0X.8p1",
+                             "0x1.8",
+                             "0x1.",
+                             "0x.",
+                             "0x",
+                             "0xg",
+                             "0x.g",
+                             "0x-1",
+                             "0x+1",
+                             "0x 1",
+                             "0xp1",
+                             "0x1p",
+                             "0x1p+",
+                             "0x1p-",
+                             "0x1px",
+                             "0x1p4",
+                             "0x1P-4",
+                             "0x1p0x1",
+                             "-0x1",
+                             "-0x0",
+                             "0x0p99999",
+                             "0x1p-2000",
+                             "-0x1p-2000",
+                             "0x1p2000",
+                             "-0x1p2000",
+                             "0x1p-1074",
+                             "0x1p-1075",
+                             "0x1.8p-1075",
+                             "0x1.8p-1074",
+                             "0x1.00000000000008p0",
+                             "0x1.000000000000080000001p0",
+                             "0x1.fffffffffffff8p1023",
+                             "0x1.fffffffffffff7p1023",
+                             "0x1.fffffffffffff7p-1023",
+                             "0x123456789abcdef0123456789",
+                             "0x0000000000000000000000000001",
+                             "0x.00000000000000000000000000001p+200",
+                             "0x1p99999999999999999999",
+                             "0x1p-99999999999999999999",
+                             "0x0.0000000000000000000000000000000p-99999999999999999999"})
+        EXPECT_TRUE(SameReal(ReadReal(text), LibraryReal(text)))
+            << text << ": " << ReadReal(text) << " for " << LibraryReal(text);
+}
+
+// A sign makes a number negative, and where there is none it means nothing.
+TEST(NumberText, TextsWithoutANumberAreZeroWithoutASign) {
+    for (const char* text : {"-x", "-", "-.", "-e5", "--1", "-+1", " -abc"}) {
+        EXPECT_EQ(ReadReal(text), 0) << text;
+        EXPECT_FALSE(std::signbit(ReadReal(text))) << text;
+    }
+    EXPECT_TRUE(std::signbit(ReadReal("-0")));
+}
+
+TEST(NumberText, IntegersEndAtThoseOfSixtyFourBits) {
+    EXPECT_EQ(ReadInteger("9223372036854775807"), 0xFFFFFFFFu);
+    EXPECT_EQ(ReadInteger("9223372036854775808"), 0xFFFFFFFFu);
+    EXPECT_EQ(ReadInteger("18446744073709551615"), 0xFFFFFFFFu);
+    EXPECT_EQ(ReadInteger("12345678901234567890"), 0xFFFFFFFFu);
+    EXPECT_EQ(ReadInteger("-9223372036854775808"), 0u);
+    EXPECT_EQ(ReadInteger("-9223372036854775809"), 0u);
+    EXPECT_EQ(ReadInteger("-99999999999999999999999999"), 0u);
+    EXPECT_EQ(ReadInteger("-4294967297"), 0xFFFFFFFFu);
 }
 
 TEST(NumberText, EdgesOfIntegers) {

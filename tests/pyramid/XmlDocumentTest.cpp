@@ -344,6 +344,36 @@ TEST_F(XmlDocumentTest, TreesAreBoundedInNodes) {
     }
 }
 
+// A record counts for the children that it has, and no flags means two of them.
+TEST_F(XmlDocumentTest, StatisticsCountForTheChildrenThatTheyHave) {
+    std::string text = "<DATASET>";
+    for (std::uint32_t i = 1; i < kMaxDocumentNodes - 3 - 10; ++i) text += "<A/>";
+    PyramidXMLDocument parsed;
+    ASSERT_TRUE(Parse(parsed, text + "</DATASET>"));
+    RasterBandStats<int> stats;
+    EXPECT_TRUE(parsed.WriteBandStatsElement(stats)) << "13 elements of room";
+    stats.flags = StatsFlag::All;
+    EXPECT_TRUE(parsed.WriteBandStatsElement(stats)) << "10 elements of room";
+    EXPECT_FALSE(parsed.WriteBandStatsElement(RasterBandStats<int>()));
+    parsed.RemoveFrom(parsed.RecordCount() - 1);
+    for (int i = 0; i < 3; ++i) {
+        stats.flags = i == 0 ? StatsFlag::Mean | StatsFlag::Sum : 0;
+        EXPECT_EQ(parsed.WriteBandStatsElement(stats), i < 2) << "10, 5 and 2 elements of room";
+    }
+}
+
+TEST_F(XmlDocumentTest, ManyRecordsWithoutFlagsAreTakenAndReadAgain) {
+    for (std::uint32_t band = 0; band < 105000; ++band) {
+        RasterBandStats<int> stats;
+        stats.band = band;
+        ASSERT_TRUE(document.WriteBandStatsElement(stats)) << band;
+    }
+    EXPECT_EQ(ValuesOf(Text(), "RSTC_BAND").size(), 105000u);
+    const std::string text = Raw();
+    PyramidXMLDocument parsed;
+    EXPECT_TRUE(Parse(parsed, text));
+}
+
 TEST_F(XmlDocumentTest, RecordsFillATreeToItsLastElement) {
     constexpr std::uint32_t kHeader = 12, kEmptyPalette = 3;  // elements that each takes
     std::string text = "<DATASET>";

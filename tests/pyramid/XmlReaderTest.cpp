@@ -111,16 +111,38 @@ TEST_F(XmlReaderTest, LaterPaletteOfABandWins) {
     EXPECT_EQ(handlers.palettes[0].GetColor(0)->blue, 5);
 }
 
-TEST_F(XmlReaderTest, ColoursOutsideAPaletteAreNotKept) {
+TEST_F(XmlReaderTest, ColoursCountFromTheLastBeginningOfAPalette) {
     const std::string colour = "<PALETTE_RGBA>1|2|3|4</PALETTE_RGBA>";
     PyramidXMLReaderHandlers<int> handlers;
-    ParseRecords(colour, handlers);
-    EXPECT_EQ(handlers.currentPalette.nextIndex, 0u);
+    ParseRecords(colour + "<PALETTE/>", handlers);
+    EXPECT_EQ(handlers.palettes[0].nextIndex, 0u);
     ParseRecords("<PALETTE>" + colour + "<PALETTE>" + colour + "</PALETTE>" + colour + "</PALETTE>",
                  handlers);
-    EXPECT_EQ(handlers.palettes[0].nextIndex, 2u) << "those since the last beginning";
+    EXPECT_EQ(handlers.palettes[0].nextIndex, 2u);
+    // No element has to stand in its parent.
     ParseRecords(colour + colour, handlers);
-    EXPECT_EQ(handlers.currentPalette.nextIndex, 2u);
+    EXPECT_EQ(handlers.currentPalette.nextIndex, 4u);
+    EXPECT_EQ(handlers.palettes[0].nextIndex, 2u);
+}
+
+// A PALETTE without a number takes that of the one before, wherever that stood.
+TEST_F(XmlReaderTest, BandOfAPaletteIsTheLastOneTold) {
+    const auto palette = [](const std::string& children) {
+        return "<PALETTE>" + children + "</PALETTE>";
+    };
+    const auto colours = [](std::size_t count) {
+        std::string text;
+        for (; count > 0; --count) text += "<PALETTE_RGBA>1|2|3|4</PALETTE_RGBA>";
+        return text;
+    };
+    PyramidXMLReaderHandlers<int> handlers;
+    ParseRecords(palette(colours(1)) + palette("<PALETTE_BAND>3</PALETTE_BAND>" + colours(2)) +
+                     palette(colours(3)) + "<PALETTE_BAND>5</PALETTE_BAND>" + palette(colours(4)),
+                 handlers);
+    ASSERT_EQ(handlers.palettes.size(), 3u);
+    EXPECT_EQ(handlers.palettes[0].nextIndex, 1u);
+    EXPECT_EQ(handlers.palettes[3].nextIndex, 3u) << "the later one of that band";
+    EXPECT_EQ(handlers.palettes[5].nextIndex, 4u) << "told outside of any palette";
 }
 
 TEST_F(XmlReaderTest, EveryStatisticHasItsFieldAndFlag) {
@@ -299,7 +321,7 @@ TEST_F(XmlReaderTest, ColourChannels) {
     EXPECT_EQ(cut.alpha, 0);
 }
 
-TEST_F(XmlReaderTest, ValuesOutsideTheirParentsAreDropped) {
+TEST_F(XmlReaderTest, ValuesOutsideTheirParentsMakeNoRecords) {
     PyramidXMLReaderHandlers<int> handlers;
     EXPECT_EQ(ParseRecords("<RSTC_MEAN>1</RSTC_MEAN><RSTC_BAND>1</RSTC_BAND>"
                            "<HIST_BINCOUNT>3</HIST_BINCOUNT><HIST_COUNTS>1|2|3</HIST_COUNTS>"
@@ -310,7 +332,8 @@ TEST_F(XmlReaderTest, ValuesOutsideTheirParentsAreDropped) {
     EXPECT_EQ(handlers.bandStats.shape.elements, 0u);
     EXPECT_EQ(handlers.histograms.shape.elements, 0u);
     ASSERT_EQ(handlers.palettes.size(), 1u);
-    EXPECT_TRUE(handlers.palettes[0].colors.empty());
+    ASSERT_EQ(handlers.palettes.count(6), 1u);
+    EXPECT_TRUE(handlers.palettes[6].colors.empty()) << "but the number of a band counts anywhere";
 }
 
 TEST_F(XmlReaderTest, RecordsWithinRecordsDoNotCrash) {
@@ -528,6 +551,41 @@ TEST_F(XmlReaderTest, SpareBinsEndAtTheirLimit) {
         const auto& histogram = handlers.histograms.data[0];
         EXPECT_EQ(histogram.binCount, bins);
         EXPECT_EQ(histogram.counts.shape.elements, bins == 1048578 ? bins : 0u);
+    }
+}
+
+// The parser hands over a text in pieces of about a million characters, and every piece of a list
+// begins again with the first bin.
+TEST_F(XmlReaderTest, LongListsKeepTheirBinsAndMixTheirCounts) {
+    for (const std::uint32_t bins : {500000u, 600000u, 1700000u}) {
+        std::vector<std::uint64_t> written;
+        std::string list;
+        for (std::uint32_t i = 0; i < bins; ++i) {
+            written.push_back(i % 9 + 1);
+            list += (i == 0 ? "" : "|") + std::to_string(written.back());
+        }
+        PyramidXMLReaderHandlers<int> handlers;
+        ParseRecords(Histogram("<HIST_BINCOUNT>" + std::to_string(bins) +
+                               "</HIST_BINCOUNT><HIST_COUNTS>" + list + "</HIST_COUNTS>"),
+                     handlers);
+        ASSERT_EQ(handlers.histograms.shape.elements, 1u);
+        EXPECT_EQ(handlers.histograms.data[0].binCount, bins);
+        const std::vector<std::uint64_t> counts = CountsOf(handlers.histograms.data[0]);
+        ASSERT_EQ(counts.size(), bins);
+        EXPECT_EQ(counts == written, bins == 500000);
+        EXPECT_EQ(counts.back() != 0, bins == 500000) << "behind the longest piece are zeros";
+    }
+}
+
+// All pieces of a list count for its entries, wherever they begin.
+TEST_F(XmlReaderTest, SpareBinsAreCountedOverTheWholeList) {
+    for (const std::uint64_t bins : {kSpareBins + 4, kSpareBins + 5}) {
+        PyramidXMLReaderHandlers<int> handlers;
+        ParseRecords(Histogram("<HIST_BINCOUNT>" + std::to_string(bins) +
+                               "</HIST_BINCOUNT><HIST_COUNTS>3<!-- -->|4<A/>|5|6</HIST_COUNTS>"),
+                     handlers);
+        EXPECT_EQ(handlers.histograms.data[0].counts.shape.elements,
+                  bins == kSpareBins + 4 ? bins : 0u);
     }
 }
 
