@@ -2,9 +2,9 @@
 
 #include <algorithm>
 #include <cmath>
-#include <limits>
 
 #include "core/ElementTypes.h"
+#include "gdal/NearestValue.h"
 
 namespace zmcgdal {
 namespace {
@@ -19,21 +19,6 @@ double ToDouble(const T& value) {
         return static_cast<double>(value.re);
     else
         return static_cast<double>(value);
-}
-
-// The nearest value of T; the double next to the largest 64-bit integer lies above it.
-template <class T>
-T FromDouble(double value) {
-    if constexpr (zelm::kIsComplex<T>) {
-        return T(static_cast<decltype(T::re)>(value), 0);
-    } else if constexpr (std::is_floating_point_v<T>) {
-        return static_cast<T>(value);
-    } else {
-        using Limits = std::numeric_limits<T>;
-        if (!(value > static_cast<double>(Limits::min()))) return Limits::min();
-        if (value >= static_cast<double>(Limits::max())) return Limits::max();
-        return static_cast<T>(std::round(value));
-    }
 }
 
 template <class T>
@@ -74,8 +59,8 @@ void Fill(zelm::RasterBandHistogram<T>& record, const StoredHistogram& histogram
     record.binSize = (histogram.upper - histogram.lower) / count;
     // The first and the last integer inside.
     const bool whole = kIsInteger<T>;
-    record.minimum = FromDouble<T>(whole ? std::ceil(histogram.lower) : histogram.lower);
-    record.maximum = FromDouble<T>(whole ? std::ceil(histogram.upper) - 1 : histogram.upper);
+    record.minimum = NearestValue<T>(whole ? std::ceil(histogram.lower) : histogram.lower);
+    record.maximum = NearestValue<T>(whole ? std::ceil(histogram.upper) - 1 : histogram.upper);
     record.counts.SetShape(zelm::ArrayShape(count));
     if (record.counts.data)
         std::copy(histogram.counts.begin(), histogram.counts.end(), record.counts.data);
@@ -105,8 +90,8 @@ Archive::Archive(LazyRaster& pyramid, bool hasDocument)
 
 const StoredStatistics* Archive::Statistics(std::uint32_t band) {
     if (!documentExists) return nullptr;
-    auto found = statistics_.find(band);
-    if (found == statistics_.end()) found = statistics_.emplace(band, FetchStatistics(band)).first;
+    auto found = statistics.find(band);
+    if (found == statistics.end()) found = statistics.emplace(band, FetchStatistics(band)).first;
     return found->second ? &*found->second : nullptr;
 }
 
@@ -143,11 +128,11 @@ std::vector<StoredHistogram> Archive::FetchHistograms() const {
 
 const StoredHistogram* Archive::Histogram(std::uint32_t band, std::uint32_t level) {
     if (!documentExists) return nullptr;
-    if (!histograms_) histograms_ = FetchHistograms();
-    const auto newest = std::find_if(histograms_->rbegin(), histograms_->rend(), [&](auto& each) {
+    if (!histograms) histograms = FetchHistograms();
+    const auto newest = std::find_if(histograms->rbegin(), histograms->rend(), [&](auto& each) {
         return each.band == band && each.level == level && !each.counts.empty();
     });
-    return newest == histograms_->rend() ? nullptr : &*newest;
+    return newest == histograms->rend() ? nullptr : &*newest;
 }
 
 GDALColorTable* Archive::ColorTable(std::uint32_t band) {
@@ -186,20 +171,20 @@ bool Archive::Store(Setter&& setter) {
     return stored;
 }
 
-bool Archive::StoreStatistics(std::uint32_t band, const StoredStatistics& statistics) {
+bool Archive::StoreStatistics(std::uint32_t band, const StoredStatistics& given) {
     const bool stored = Store([&]<class T>(zelm::RasterReader<T>& reader) {
         zelm::RasterBandStats<T> record;
         record.band = band;
-        record.flags = statistics.flags;
-        record.minimum = FromDouble<T>(statistics.minimum);
-        record.maximum = FromDouble<T>(statistics.maximum);
-        record.mean = statistics.mean;
-        record.standardDeviation = statistics.standardDeviation;
+        record.flags = given.flags;
+        record.minimum = NearestValue<T>(given.minimum);
+        record.maximum = NearestValue<T>(given.maximum);
+        record.mean = given.mean;
+        record.standardDeviation = given.standardDeviation;
         zelm::Array<zelm::RasterBandStats<T>> records;
         return records.Append(record) && reader.SetBandStats(records);
     });
     severalSets.reset();
-    statistics_.clear();
+    statistics.clear();
     return stored;
 }
 
@@ -211,7 +196,7 @@ bool Archive::StoreHistogram(const StoredHistogram& histogram) {
         zelm::Array<zelm::RasterBandHistogram<T>> records;
         return record.counts.data && records.Append(record) && reader.SetHistograms(records);
     });
-    histograms_.reset();
+    histograms.reset();
     return stored;
 }
 

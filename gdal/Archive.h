@@ -58,9 +58,9 @@ public:
 private:
     LazyRaster& raster;
     bool documentExists;
-    std::map<std::uint32_t, std::optional<StoredStatistics>> statistics_;
+    std::map<std::uint32_t, std::optional<StoredStatistics>> statistics;
     std::optional<bool> severalSets;
-    std::optional<std::vector<StoredHistogram>> histograms_;
+    std::optional<std::vector<StoredHistogram>> histograms;
     std::map<std::uint32_t, std::unique_ptr<GDALColorTable>> colorTables;
 
     // Lets `setter(reader)` store; false where the file cannot be written or it answers false.

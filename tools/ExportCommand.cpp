@@ -4,10 +4,12 @@
 #include <cstdio>
 #include <filesystem>
 
+#include "platform/Interrupts.h"
 #include "tools/Arguments.h"
 #include "tools/Command.h"
 #include "tools/GdalWorld.h"
 #include "tools/Interrupt.h"
+#include "tools/PartOptions.h"
 #include "tools/RasterView.h"
 
 namespace zmctools {
@@ -25,14 +27,12 @@ public:
 private:
     std::string file;
     std::string target;
-    std::string level = "0";
-    std::string window;
-    std::string bands;
+    PartOptions part;
     std::string format;
     std::vector<std::string> creationOptions;
 
     DatasetPtr OpenLevel(std::uint32_t wanted) const;
-    std::vector<std::string> Arguments(GDALDataset& raster, zmchost::Window& part) const;
+    std::vector<std::string> Arguments(GDALDataset& raster, zmchost::Window& area) const;
     void Translate(GDALDataset& dataset, const std::vector<std::string>& arguments) const;
 };
 
@@ -40,12 +40,7 @@ void ExportCommand::Describe(CLI::App& app) {
     app.add_option("FILE", file, "Pyramid to read")->required();
     app.add_option("TARGET", target, "Raster to write; a file of that name is replaced")
         ->required();
-    app.add_option("--level", level, "Level, counted from 0, the finest (default 0)")
-        ->type_name("N");
-    app.add_option("--window", window, "Part of the level, in its pixels (default all)")
-        ->type_name("X,Y,W,H");
-    app.add_option("--bands", bands, "Bands in the order wanted, counted from 1 (default all)")
-        ->type_name("3,2,1");
+    part.Describe(app);
     app.add_option("--format", format,
                    "GDAL's short name of the format (default: what the ending of TARGET tells)")
         ->type_name("NAME");
@@ -76,18 +71,18 @@ DatasetPtr ExportCommand::OpenLevel(std::uint32_t wanted) const {
 }
 
 std::vector<std::string> ExportCommand::Arguments(GDALDataset& raster,
-                                                  zmchost::Window& part) const {
-    part = ParseWindow(window, static_cast<std::uint32_t>(raster.GetRasterXSize()),
+                                                  zmchost::Window& area) const {
+    area = ParseWindow(part.window, static_cast<std::uint32_t>(raster.GetRasterXSize()),
                        static_cast<std::uint32_t>(raster.GetRasterYSize()));
     std::vector<std::string> arguments;
-    if (!window.empty()) {
+    if (!part.window.empty()) {
         arguments.push_back("-srcwin");
-        for (const std::uint32_t number : {part.x, part.y, part.width, part.height})
+        for (const std::uint32_t number : {area.x, area.y, area.width, area.height})
             arguments.push_back(std::to_string(number));
     }
-    if (!bands.empty())
+    if (!part.bands.empty())
         for (const std::uint32_t band :
-             ParseBands(bands, static_cast<std::uint32_t>(raster.GetRasterCount())))
+             ParseBands(part.bands, static_cast<std::uint32_t>(raster.GetRasterCount())))
             arguments.insert(arguments.end(), {"-b", std::to_string(band + 1)});
     if (!format.empty()) {
         if (!GetGDALDriverManager()->GetDriverByName(format.c_str()))
@@ -139,17 +134,17 @@ void ExportCommand::Translate(GDALDataset& dataset,
     if (made) written->FlushCache(true);
     written.reset();
     const std::string reason = TakeGdalError(target);
-    if (made && reason.empty() && !IsInterrupted()) return;
+    if (made && reason.empty() && !platform::IsInterrupted()) return;
     if (StampOf(target) != before) RemoveFiles(target);
     CheckInterrupt(target);
     throw Failure(target, reason.empty() ? "GDAL does not write it and gives no reason" : reason);
 }
 
 ExitStatus ExportCommand::Run() {
-    const auto wanted = static_cast<std::uint32_t>(ParseCount("--level", level, 63));
+    const auto wanted = part.Level();
     const DatasetPtr dataset = OpenLevel(wanted);
-    zmchost::Window part;
-    const std::vector<std::string> arguments = Arguments(*dataset, part);
+    zmchost::Window area;
+    const std::vector<std::string> arguments = Arguments(*dataset, area);
     std::error_code ignored;
     if (fs::is_directory(target, ignored))
         throw Failure(target, "it is a folder; name a file in it");
@@ -161,10 +156,10 @@ ExitStatus ExportCommand::Run() {
                        {"file", file},
                        {"target", target},
                        {"level", wanted},
-                       {"window", {part.x, part.y, part.width, part.height}}});
+                       {"window", {area.x, area.y, area.width, area.height}}});
     else if (!quiet)
         std::printf("%s: level %u of %s, %u x %u pixels from %u,%u\n", target.c_str(), wanted,
-                    file.c_str(), part.width, part.height, part.x, part.y);
+                    file.c_str(), area.width, area.height, area.x, area.y);
     return ExitStatus::Done;
 }
 

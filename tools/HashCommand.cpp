@@ -4,6 +4,7 @@
 #include "core/PixelVocabulary.h"
 #include "tools/Arguments.h"
 #include "tools/Command.h"
+#include "tools/PartOptions.h"
 #include "tools/RasterView.h"
 #include "tools/Sha256.h"
 
@@ -21,19 +22,12 @@ public:
 
 private:
     std::string file;
-    std::string level = "0";
-    std::string window;
-    std::string bands;
+    PartOptions part;
 };
 
 void HashCommand::Describe(CLI::App& app) {
     app.add_option("FILE", file, "Pyramid, or any other raster that GDAL reads")->required();
-    app.add_option("--level", level, "Level, counted from 0, the finest (default 0)")
-        ->type_name("N");
-    app.add_option("--window", window, "Part of the level, in its pixels (default all)")
-        ->type_name("X,Y,W,H");
-    app.add_option("--bands", bands, "Bands in the order wanted, counted from 1 (default all)")
-        ->type_name("3,2,1");
+    part.Describe(app);
     app.footer(
         "Examples:\n"
         "  zmcraster hash scene.pyr\n"
@@ -47,11 +41,11 @@ void HashCommand::Describe(CLI::App& app) {
 ExitStatus HashCommand::Run() {
     const auto view = OpenView(file);
     Selection selection;
-    selection.level = static_cast<std::uint32_t>(ParseCount("--level", level, 63));
+    selection.level = part.Level();
     view->CheckLevel(selection.level);
     selection.window =
-        ParseWindow(window, view->Width(selection.level), view->Height(selection.level));
-    selection.bands = ParseBands(bands, view->Bands());
+        ParseWindow(part.window, view->Width(selection.level), view->Height(selection.level));
+    selection.bands = ParseBands(part.bands, view->Bands());
 
     Sha256 sha;
     std::uint64_t bytes = 0;
@@ -69,11 +63,11 @@ ExitStatus HashCommand::Run() {
     if (json) {
         Json numbers = Json::array();
         for (const std::uint32_t band : selection.bands) numbers.push_back(band + 1);
-        const zmchost::Window& part = selection.window;
+        const zmchost::Window& area = selection.window;
         PrintDocument({{"schema", kSchema},
                        {"file", file},
                        {"level", selection.level},
-                       {"window", {part.x, part.y, part.width, part.height}},
+                       {"window", {area.x, area.y, area.width, area.height}},
                        {"bands", numbers},
                        {"pixelType", zelm::PixelTypeName(view->PixelType())},
                        {"bytes", JsonNumber(bytes)},

@@ -1,10 +1,9 @@
-#include <unistd.h>
-
 #include <cstdio>
 
 #include "core/PixelVocabulary.h"
 #include "host/file/MetadataDocument.h"
 #include "host/file/PyramidFileInfo.h"
+#include "platform/Terminal.h"
 #include "tools/Command.h"
 #include "tools/HistogramBars.h"
 #include "tools/RasterView.h"
@@ -181,7 +180,7 @@ void PrintHistograms(const Json& document) {
                     Text(histogram["band"]).c_str(), Text(histogram["level"]).c_str(),
                     Text(histogram["binCount"]).c_str(), Text(histogram["binSize"]).c_str(),
                     Text(histogram["minimum"]).c_str(), Text(histogram["maximum"]).c_str());
-        if (isatty(STDOUT_FILENO) != 1) continue;
+        if (!platform::IsTerminal(platform::StandardStream::Output)) continue;
         std::vector<double> counts;
         for (const Json& count : histogram["counts"])
             counts.push_back(count.is_string() ? std::stod(count.get<std::string>())
@@ -194,7 +193,7 @@ void PrintPalettes(const Json& document) {
     for (const Json& palette : document["palettes"]) {
         std::printf("palette of band %s: %zu colors\n", Text(palette["band"]).c_str(),
                     palette["colors"].size());
-        if (isatty(STDOUT_FILENO) != 1) continue;
+        if (!platform::IsTerminal(platform::StandardStream::Output)) continue;
         std::printf("  ");
         for (std::size_t i = 0; i < palette["colors"].size() && i < 64; ++i) {
             const Json& color = palette["colors"][i];

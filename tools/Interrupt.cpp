@@ -1,34 +1,12 @@
 #include "tools/Interrupt.h"
 
-#include <csignal>
-
+#include "platform/Interrupts.h"
 #include "tools/Message.h"
 
 namespace zmctools {
-namespace {
-
-volatile std::sig_atomic_t interrupted = 0;
-
-extern "C" void TakeSignal(int) { interrupted = 1; }
-
-}  // namespace
-
-void CatchInterrupts() {
-    for (const int signal : {SIGINT, SIGTERM, SIGHUP}) {
-        struct sigaction before = {};
-        // A signal that the caller ignores, as nohup does, stays ignored.
-        if (sigaction(signal, nullptr, &before) == 0 && before.sa_handler == SIG_IGN) continue;
-        struct sigaction action = {};
-        action.sa_handler = TakeSignal;
-        action.sa_flags = static_cast<int>(SA_RESTART | SA_RESETHAND);
-        sigaction(signal, &action, nullptr);
-    }
-}
-
-bool IsInterrupted() { return interrupted != 0; }
 
 void CheckInterrupt(const std::string& file) {
-    if (IsInterrupted()) throw Interruption(file);
+    if (platform::IsInterrupted()) throw Interruption(file);
 }
 
 }  // namespace zmctools

@@ -1,5 +1,4 @@
-// Interruption by signals: SIGINT, SIGTERM and SIGHUP ask for an end, and the work looks now and
-// then whether one was asked for. A second signal of the same kind ends the process at once.
+// A command that was asked to end leaves its work by an exception; main catches the signals.
 #ifndef ZMC_TOOLS_INTERRUPT_H
 #define ZMC_TOOLS_INTERRUPT_H
 
@@ -7,9 +6,7 @@
 
 namespace zmctools {
 
-void CatchInterrupts();
-bool IsInterrupted();
-// Throws Interruption if an end was asked for.
+// Throws Interruption, while at work on `file`, if an end was asked for.
 void CheckInterrupt(const std::string& file);
 
 }  // namespace zmctools

@@ -1,8 +1,8 @@
 #include "tools/Message.h"
 
-#include <unistd.h>
-
 #include <atomic>
+
+#include "platform/Terminal.h"
 
 namespace zmctools {
 namespace {
@@ -20,8 +20,7 @@ void Say(const std::string& text) {
             line += ' ';
     while (line.back() == ' ') line.pop_back();
     line += '\n';
-    // One call, so that lines of several threads or processes do not mix.
-    [[maybe_unused]] const auto written = write(STDERR_FILENO, line.data(), line.size());
+    platform::WriteAtOnce(platform::StandardStream::Errors, line);
 }
 
 void Warn(const std::string& text) {

@@ -1,22 +1,16 @@
 #include "tools/TerminalProgress.h"
 
-#include <sys/ioctl.h>
-#include <unistd.h>
-
 #include <algorithm>
 #include <cmath>
 #include <cstdio>
 
-#include "tools/Interrupt.h"
+#include "platform/Interrupts.h"
+#include "platform/Terminal.h"
 
 namespace zmctools {
 namespace {
 
-std::size_t TerminalWidth() {
-    winsize size = {};
-    if (ioctl(STDERR_FILENO, TIOCGWINSZ, &size) != 0 || size.ws_col == 0) return 80;
-    return size.ws_col;
-}
+constexpr auto kStream = platform::StandardStream::Errors;
 
 std::string Clock(double seconds) {
     const auto whole = static_cast<unsigned long>(std::lround(std::clamp(seconds, 0.0, 3.5e6)));
@@ -29,28 +23,24 @@ std::string Clock(double seconds) {
     return text;
 }
 
-void Write(const std::string& text) {
-    [[maybe_unused]] const auto written = write(STDERR_FILENO, text.data(), text.size());
-}
-
 }  // namespace
 
 TerminalProgress::TerminalProgress(std::string labelText, bool wanted)
-    : label(std::move(labelText)), enabled(wanted && isatty(STDERR_FILENO) == 1) {}
+    : label(std::move(labelText)), enabled(wanted && platform::IsTerminal(kStream)) {}
 
 TerminalProgress::~TerminalProgress() {
-    if (drawn) Write("\r\x1b[K");
+    if (drawn) platform::WriteAtOnce(kStream, "\r\x1b[K");
 }
 
 bool TerminalProgress::Show(std::uint64_t done, std::uint64_t total) {
     const double all = static_cast<double>(std::max<std::uint64_t>(total, 1));
     Draw(static_cast<double>(done) / all, static_cast<double>(done));
-    return !IsInterrupted();
+    return !platform::IsInterrupted();
 }
 
 bool TerminalProgress::ShowShare(double share) {
     Draw(share, 0);
-    return !IsInterrupted();
+    return !platform::IsInterrupted();
 }
 
 void TerminalProgress::Draw(double share, double pixels) {
@@ -70,12 +60,12 @@ void TerminalProgress::Draw(double share, double pixels) {
     if (share > 0) after += "  " + zmctools::Clock(seconds / share - seconds) + " left";
     std::string before = label.size() > 30 ? label.substr(0, 27) + "..." : label;
     before += " [";
-    const std::size_t width = TerminalWidth();
+    const std::size_t width = platform::TerminalColumns(kStream, 80);
     const std::size_t taken = before.size() + after.size() + 1;
     const std::size_t room = width > taken + 10 ? width - taken : 10;
     const auto full = static_cast<std::size_t>(share * static_cast<double>(room));
-    Write("\r" + before + std::string(full, '#') + std::string(room - full, '.') + after +
-          "\x1b[K");
+    platform::WriteAtOnce(kStream, "\r" + before + std::string(full, '#') +
+                                       std::string(room - full, '.') + after + "\x1b[K");
     drawn = true;
 }
 

@@ -6,10 +6,10 @@
 #include <xercesc/util/XercesVersion.hpp>
 
 #include "host/base/Error.h"
+#include "platform/Interrupts.h"
 #include "tools/Command.h"
 #include "tools/GdalWorld.h"
 #include "tools/Generate.h"
-#include "tools/Interrupt.h"
 
 namespace zmctools {
 namespace {
@@ -82,7 +82,7 @@ ExitStatus Program::RunChosen() {
     for (std::size_t i = 0; i < parts.size(); ++i) {
         if (!parts[i]->parsed()) continue;
         SetQuiet(commands[i]->quiet);
-        CatchInterrupts();
+        platform::CatchInterrupts();
         StartGdal();
         const ExitStatus status = commands[i]->Run();
         if (std::fflush(stdout) != 0) throw Failure("standard output", "it cannot be written");

@@ -5,19 +5,19 @@
 
 namespace zmchost {
 
-BigInteger::BigInteger(UInt128 magnitude, bool negative, std::uint32_t shift)
-    : negative_(negative) {
-    limbs_.assign(shift / 32, 0);
+BigInteger::BigInteger(UInt128 magnitude, bool isNegative, std::uint32_t shift)
+    : negative(isNegative) {
+    limbs.assign(shift / 32, 0);
     const std::uint32_t bits = shift % 32;
     std::uint64_t carry = 0;
     for (; magnitude != 0 || carry != 0; magnitude >>= 32) {
         const std::uint64_t low = static_cast<std::uint32_t>(magnitude);
         carry |= low << bits;
-        limbs_.push_back(static_cast<std::uint32_t>(carry));
+        limbs.push_back(static_cast<std::uint32_t>(carry));
         carry >>= 32;
     }
-    Trim(limbs_);
-    if (limbs_.empty()) negative_ = false;
+    Trim(limbs);
+    if (limbs.empty()) negative = false;
 }
 
 BigInteger BigInteger::Signed(Int128 value, std::uint32_t shift) {
@@ -26,61 +26,61 @@ BigInteger BigInteger::Signed(Int128 value, std::uint32_t shift) {
 }
 
 BigInteger& BigInteger::operator+=(const BigInteger& other) {
-    if (negative_ == other.negative_) {
-        limbs_ = Sum(limbs_, other.limbs_);
-    } else if (const int order = Compare(limbs_, other.limbs_); order >= 0) {
-        limbs_ = Difference(limbs_, other.limbs_);
+    if (negative == other.negative) {
+        limbs = Sum(limbs, other.limbs);
+    } else if (const int order = Compare(limbs, other.limbs); order >= 0) {
+        limbs = Difference(limbs, other.limbs);
     } else {
-        limbs_ = Difference(other.limbs_, limbs_);
-        negative_ = other.negative_;
+        limbs = Difference(other.limbs, limbs);
+        negative = other.negative;
     }
-    if (limbs_.empty()) negative_ = false;
+    if (limbs.empty()) negative = false;
     return *this;
 }
 
 BigInteger BigInteger::operator-(const BigInteger& other) const {
     BigInteger result = other;
-    result.negative_ = !other.negative_ && !other.Zero();
+    result.negative = !other.negative && !other.Zero();
     result += *this;
     return result;
 }
 
 BigInteger BigInteger::operator*(const BigInteger& other) const {
     BigInteger product;
-    product.limbs_.assign(limbs_.size() + other.limbs_.size(), 0);
-    for (std::size_t i = 0; i < limbs_.size(); ++i) {
+    product.limbs.assign(limbs.size() + other.limbs.size(), 0);
+    for (std::size_t i = 0; i < limbs.size(); ++i) {
         std::uint64_t carry = 0;
-        for (std::size_t j = 0; j < other.limbs_.size(); ++j) {
-            carry += std::uint64_t{limbs_[i]} * other.limbs_[j] + product.limbs_[i + j];
-            product.limbs_[i + j] = static_cast<std::uint32_t>(carry);
+        for (std::size_t j = 0; j < other.limbs.size(); ++j) {
+            carry += std::uint64_t{limbs[i]} * other.limbs[j] + product.limbs[i + j];
+            product.limbs[i + j] = static_cast<std::uint32_t>(carry);
             carry >>= 32;
         }
-        product.limbs_[i + other.limbs_.size()] = static_cast<std::uint32_t>(carry);
+        product.limbs[i + other.limbs.size()] = static_cast<std::uint32_t>(carry);
     }
-    Trim(product.limbs_);
-    product.negative_ = negative_ != other.negative_ && !product.Zero();
+    Trim(product.limbs);
+    product.negative = negative != other.negative && !product.Zero();
     return product;
 }
 
 long double BigInteger::Split(std::int64_t& exponent) const {
     exponent = 0;
-    if (limbs_.empty()) return 0;
+    if (limbs.empty()) return 0;
     const auto limb = [this](std::size_t fromTop) -> std::uint64_t {
-        return fromTop < limbs_.size() ? limbs_[limbs_.size() - 1 - fromTop] : 0;
+        return fromTop < limbs.size() ? limbs[limbs.size() - 1 - fromTop] : 0;
     };
-    const int unused = std::countl_zero(limbs_.back());
+    const int unused = std::countl_zero(limbs.back());
     UInt128 top = 0;
     for (std::size_t i = 0; i < 4; ++i) top = top << 32 | limb(i);
     top <<= unused;
     // What lies below 128 bits can only tip a tie: one bit stands for it.
-    for (std::size_t i = 4; i < limbs_.size(); ++i) {
+    for (std::size_t i = 4; i < limbs.size(); ++i) {
         if (limb(i) == 0) continue;
         top |= 1;
         break;
     }
-    exponent = static_cast<std::int64_t>(limbs_.size()) * 32 - unused;
+    exponent = static_cast<std::int64_t>(limbs.size()) * 32 - unused;
     const long double significand = std::ldexp(static_cast<long double>(top), -128);
-    return negative_ ? -significand : significand;
+    return negative ? -significand : significand;
 }
 
 int BigInteger::Compare(const Limbs& a, const Limbs& b) {
@@ -117,8 +117,8 @@ BigInteger::Limbs BigInteger::Difference(const Limbs& larger, const Limbs& small
     return difference;
 }
 
-void BigInteger::Trim(Limbs& limbs) {
-    while (!limbs.empty() && limbs.back() == 0) limbs.pop_back();
+void BigInteger::Trim(Limbs& number) {
+    while (!number.empty() && number.back() == 0) number.pop_back();
 }
 
 }  // namespace zmchost

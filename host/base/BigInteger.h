@@ -16,7 +16,7 @@ public:
     BigInteger() = default;
 
     // magnitude * 2 to the shift, negated where told.
-    explicit BigInteger(UInt128 magnitude, bool negative = false, std::uint32_t shift = 0);
+    explicit BigInteger(UInt128 magnitude, bool isNegative = false, std::uint32_t shift = 0);
 
     static BigInteger Signed(Int128 value, std::uint32_t shift = 0);
 
@@ -24,8 +24,8 @@ public:
     BigInteger operator-(const BigInteger& other) const;
     BigInteger operator*(const BigInteger& other) const;
 
-    bool Negative() const { return negative_; }
-    bool Zero() const { return limbs_.empty(); }
+    bool Negative() const { return negative; }
+    bool Zero() const { return limbs.empty(); }
 
     // significand and exponent with the value rounded to 64 bits = significand * 2 to the exponent;
     // the significand is 0, or at least 1/2 and at most 1 by its magnitude.
@@ -37,10 +37,10 @@ private:
     static int Compare(const Limbs& a, const Limbs& b);
     static Limbs Sum(const Limbs& a, const Limbs& b);
     static Limbs Difference(const Limbs& larger, const Limbs& smaller);
-    static void Trim(Limbs& limbs);
+    static void Trim(Limbs& number);
 
-    Limbs limbs_;
-    bool negative_ = false;
+    Limbs limbs;
+    bool negative = false;
 };
 
 }  // namespace zmchost

@@ -1,13 +1,416 @@
 #include "host/build/PyramidBuilder.h"
 
-#include "host/build/PyramidBuild.h"
+#include <oneapi/tbb/parallel_pipeline.h>
+
+#include <algorithm>
+#include <chrono>
+#include <memory>
+#include <optional>
+
+#include "core/PixelVocabulary.h"
+#include "host/base/Lanes.h"
+#include "host/base/Threads.h"
+#include "host/build/BuildFile.h"
+#include "host/build/BuildPlan.h"
+#include "host/build/LevelCascade.h"
+#include "host/build/PixelWork.h"
+#include "host/build/TileStore.h"
+#include "host/raster/Raster.h"
 
 namespace zmchost {
+namespace {
+
+namespace tbb = oneapi::tbb;
+
+// Bytes of tiles that the second walk over level 0 reads at a time: well below the least budget.
+constexpr std::size_t kChunkBytes = std::size_t{4} << 20;
+
+// One run of a builder, step by step. Made for one source and one target, used once.
+class BuildRun {
+public:
+    // Settles what is to be built; nothing is touched yet. Throws Error for options that do not fit
+    // the source.
+    BuildRun(ModulePtr loadedModule, RasterSource& rasterSource, std::string targetName,
+             const BuildOptions& buildOptions);
+
+    BuildReport Run();
+
+private:
+    // A strip on its way through the pipeline, and what it completes.
+    struct Job {
+        StripStore::Loan base;
+        std::vector<StripStore::Loan> finished;
+    };
+
+    void SettleBands();
+    void SettleNoData();
+    void SettleLevels();
+    void SettleOrdering();
+    void SettleResampling();
+    void Plan();
+
+    void LayOut();
+    void Fill();
+    void WalkPass(const Pass& pass);
+    void WalkColumn(const Pass& pass, const Column& column, StripStore& store);
+    void ReadStrip(const Pass& pass, const Column& column, Strip& strip);
+    void LookAtStrip(const Pass& pass, const Column& column, Strip& strip);
+    void WriteStrip(const Pass& pass, const Column& column, const Strip& strip);
+    void CountLevel0();
+    void StoreRecords();
+    void Check();
+    void Advance(std::uint64_t pixels);
+
+    TileStoreSetup StoreSetup() const;
+    PixelWorkSetup WorkSetup() const;
+    std::uint64_t MetadataBound() const;
+
+    ModulePtr module;
+    RasterSource& source;
+    std::string name;
+    BuildOptions options;
+    std::uint32_t threads = 1;
+    std::uint32_t lanes = 1;
+
+    zelm::RasterProps props;  // of the target
+    std::vector<std::uint32_t> bands;
+    std::vector<zelm::PalettePtr> palettes;
+    std::uint32_t maxLevel = 0;
+    Resampling resampling = Resampling::Average;
+    std::uint32_t pixelBytes = 0;
+    std::vector<Pass> passes;
+
+    MemoryMeter meter;
+    std::optional<BuildFile> file;
+    std::optional<Raster> raster;
+    std::unique_ptr<PixelWork> work;
+    std::optional<TileStore> tiles;
+    BuildProgress progress;
+    BuildReport report;
+};
+
+BuildRun::BuildRun(ModulePtr loadedModule, RasterSource& rasterSource, std::string targetName,
+                   const BuildOptions& buildOptions)
+    : module(std::move(loadedModule)),
+      source(rasterSource),
+      name(std::move(targetName)),
+      options(buildOptions) {
+    threads = options.threads != 0 ? options.threads : AvailableThreads();
+    lanes = std::min(2 * threads, 16u);
+    const zelm::RasterProps given = source.Props();
+    props.samples = given.samples;
+    props.lines = given.lines;
+    props.bands = given.bands;
+    props.pixelType = given.pixelType;
+    props.noDataValues = given.noDataValues;
+    if (given.samples == 0 || given.lines == 0 || given.bands == 0)
+        throw Error(source.Name(), "build a pyramid of it", "it has no pixels");
+    if (zelm::CheckedPixelType(given.pixelType) == 0)
+        throw Error(source.Name(), "build a pyramid of it", "its pixel type has no reader");
+    SettleBands();
+    SettleNoData();
+    SettleOrdering();
+    SettleLevels();
+    SettleResampling();
+    pixelBytes = props.bands * zelm::PixelSize(props.pixelType);
+}
+
+void BuildRun::SettleBands() {
+    bands = options.bands;
+    if (bands.empty())
+        for (std::uint32_t band = 0; band < props.bands; ++band) bands.push_back(band);
+    std::map<std::uint32_t, double> noData;
+    for (std::uint32_t i = 0; i < bands.size(); ++i) {
+        if (bands[i] >= props.bands)
+            throw Error(source.Name(),
+                        "take band " + std::to_string(bands[i]) + ", counted from 0,",
+                        "it has " + std::to_string(props.bands));
+        if (props.HasNoDataValue(bands[i])) noData[i] = props.GetNoDataValue(bands[i]);
+        palettes.push_back(source.BandPalette(bands[i]));
+    }
+    props.bands = static_cast<std::uint32_t>(bands.size());
+    props.noDataValues = noData;
+    props.interleave = zelm::Interleave::BIP;
+}
+
+void BuildRun::SettleNoData() {
+    if (!options.noData) return;
+    props.noDataValues.clear();
+    if (!options.noData->value) return;
+    for (std::uint32_t band = 0; band < props.bands; ++band)
+        props.SetNoDataValue(band, *options.noData->value);
+}
+
+void BuildRun::SettleOrdering() {
+    const bool morton = props.bands > kMaxInterleavedBands;
+    if (options.ordering != Ordering::Auto && morton != (options.ordering == Ordering::Morton))
+        throw Error(name, "use that tile ordering",
+                    "a file of " + std::to_string(props.bands) + " bands is " +
+                        (morton ? "always in Morton order" : "never in Morton order"));
+    props.tileLines = options.ordering == Ordering::Scanline ? 1 : kTileSide;
+    report.tileOrdering = morton                ? zelm::TileOrder::Morton
+                          : props.tileLines > 1 ? zelm::TileOrder::Blocked
+                                                : zelm::TileOrder::Scanline;
+}
+
+void BuildRun::SettleLevels() {
+    std::uint32_t most = MaxLevelOf(props.samples, props.lines);
+    if (props.bands > kMaxInterleavedBands) most = std::min(most, kMaxMortonLevel);
+    maxLevel = options.levels.value_or(DefaultMaxLevel(props.samples, props.lines, props.bands));
+    if (maxLevel > most)
+        throw Error(name, "make " + std::to_string(maxLevel) + " levels",
+                    "this raster can have " + std::to_string(most));
+}
+
+void BuildRun::SettleResampling() {
+    const bool anyPalette = std::any_of(palettes.begin(), palettes.end(), [](const auto& palette) {
+        return palette && palette->nextIndex != 0;
+    });
+    resampling = options.resampling.value_or(anyPalette ? Resampling::Mode : Resampling::Average);
+    // A palette of complex values makes no sense, but is no reason to fail by default.
+    if (!options.resampling && !SupportsElementType(resampling, props.pixelType))
+        resampling = Resampling::Nearest;
+    if (!SupportsElementType(resampling, props.pixelType))
+        throw Error(name, std::string("reduce by ") + ResamplingName(resampling),
+                    std::string("pixels of type ") + zelm::PixelTypeName(props.pixelType) +
+                        " have no order");
+}
+
+TileStoreSetup BuildRun::StoreSetup() const {
+    return {name, props.samples, props.lines, maxLevel, pixelBytes, props.bands};
+}
+
+PixelWorkSetup BuildRun::WorkSetup() const {
+    return {props,
+            resampling,
+            lanes,
+            std::max(options.bins, 1u),
+            options.statistics,
+            options.memory / 8};
+}
+
+void BuildRun::Plan() {
+    const std::uint64_t besides = TileStore::WorkMemory(StoreSetup()) + work->StatisticsMemory();
+    PlanInput input{props.samples, props.lines, maxLevel, ReductionHalo(resampling), 0, 0};
+    input.pixelBytes = pixelBytes + (work->NeedsMasks() ? props.bands : 0);
+    input.budget = options.memory - std::min(options.memory, besides);
+    passes = PlanPasses(input);
+    if (passes.empty())
+        throw Error(name, "build it in " + std::to_string(options.memory) + " bytes of memory",
+                    "it needs at least " + std::to_string(LeastMemory(input) + besides));
+}
+
+BuildReport BuildRun::Run() {
+    const auto start = std::chrono::steady_clock::now();
+    file.emplace(name, options.overwrite);
+    LayOut();
+    RunWithThreads(threads, [this] { Fill(); });
+    StoreRecords();
+    Check();
+    file->Commit();
+    report.width = props.samples;
+    report.height = props.lines;
+    report.bands = props.bands;
+    report.maxLevel = maxLevel;
+    report.resampling = resampling;
+    report.peakMemory = meter.Peak();
+    report.seconds =
+        std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
+    return std::move(report);
+}
+
+// Room for the documents, generously: 21 bytes for a count, and the tags of a record.
+std::uint64_t BuildRun::MetadataBound() const {
+    std::uint64_t bound = 65536;
+    bound += props.bands * (4096 + 21 * std::uint64_t{std::max(options.bins, 256u)});
+    for (const zelm::PalettePtr& palette : palettes)
+        if (palette) bound += 64 * std::uint64_t{palette->nextIndex};
+    return bound;
+}
+
+void BuildRun::LayOut() {
+    std::uint64_t tileBytes = 0;
+    for (std::uint32_t level = 0; level <= maxLevel; ++level)
+        tileBytes += (std::uint64_t{props.samples} >> level) *
+                     (std::uint64_t{props.lines} >> level) * pixelBytes;
+    file->CheckSpace(tileBytes + MetadataBound());
+    zelm::RasterProps plain = props;
+    plain.noDataValues.clear();
+    raster.emplace(Raster::Create(module, file->Path(), plain, maxLevel));
+    if (raster->Header().tileOrdering != report.tileOrdering)
+        throw Error(name, "lay it out", "the module chose another tile ordering");
+    file->Reserve(raster->Header().tileDataEnd + MetadataBound());
+    work = MakePixelWork(*raster, WorkSetup());
+    meter.Add(work->StatisticsMemory());
+    Plan();
+    tiles.emplace(StoreSetup(), *work, meter);
+}
+
+void BuildRun::Fill() {
+    progress.total = std::uint64_t{props.samples} * props.lines;
+    if (work->NeedsSecondWalk()) progress.total *= 2;
+    for (const Pass& pass : passes) WalkPass(pass);
+    if (work->NeedsSecondWalk()) CountLevel0();
+}
+
+void BuildRun::WalkPass(const Pass& pass) {
+    std::uint64_t widest = 0;
+    for (const Column& column : pass.columns)
+        widest = std::max<std::uint64_t>(widest, column.readEnd - column.readBegin);
+    StripStore store(meter, pass.baseLevel, pass.topLevel, widest, pixelBytes,
+                     work->NeedsMasks() ? props.bands : 0);
+    for (const Column& column : pass.columns) WalkColumn(pass, column, store);
+}
+
+void BuildRun::WalkColumn(const Pass& pass, const Column& column, StripStore& store) {
+    LevelCascade cascade({pass.baseLevel, pass.topLevel, props.lines, props.bands, pixelBytes,
+                          ReductionHalo(resampling), lanes},
+                         column, *work, store, meter);
+    const std::uint32_t height = props.lines >> pass.baseLevel;
+    // The jobs are kept here, since a cancelled pipeline drops what is under way in it. Jobs end in
+    // order, so the place of a new one is free.
+    std::vector<Job> jobs(pass.stripsAhead);
+    std::uint32_t nextLine = 0;
+    const auto read = [&](tbb::flow_control& control) -> Job* {
+        if (nextLine >= height) {
+            control.stop();
+            return nullptr;
+        }
+        Job& job = jobs[nextLine / kTileSide % jobs.size()];
+        job.base = store.Take(pass.baseLevel);
+        job.base->Begin(nextLine, std::min(kTileSide, height - nextLine),
+                        column.readEnd - column.readBegin);
+        nextLine = job.base->End();
+        ReadStrip(pass, column, *job.base);
+        return &job;
+    };
+    const auto reduce = [&](Job* job) {
+        LookAtStrip(pass, column, *job->base);
+        cascade.Take(*job->base, job->finished);
+        return job;
+    };
+    const auto write = [&](Job* job) {
+        if (pass.baseLevel == 0) WriteStrip(pass, column, *job->base);
+        for (const StripStore::Loan& strip : job->finished) WriteStrip(pass, column, *strip);
+        const std::uint32_t lines = job->base->lines;
+        *job = Job();
+        if (pass.baseLevel == 0) Advance(std::uint64_t{lines} * (column.end - column.begin));
+    };
+    tbb::parallel_pipeline(
+        pass.stripsAhead,
+        tbb::make_filter<void, Job*>(tbb::filter_mode::serial_in_order, read) &
+            tbb::make_filter<Job*, Job*>(tbb::filter_mode::serial_in_order, reduce) &
+            tbb::make_filter<Job*, void>(tbb::filter_mode::serial_in_order, write));
+}
+
+void BuildRun::ReadStrip(const Pass& pass, const Column& column, Strip& strip) {
+    const Window window{column.readBegin, strip.firstLine, strip.width, strip.lines};
+    std::byte* const pixels = strip.Row(strip.firstLine);
+    if (pass.baseLevel == 0)
+        source.Read(window, bands, pixels);
+    else
+        tiles->Read(pass.baseLevel, window, pixels);
+}
+
+// Masks of a base strip; and its statistics, of what the column owns.
+void BuildRun::LookAtStrip(const Pass& pass, const Column& column, Strip& strip) {
+    const bool counts = pass.baseLevel == 0 && options.statistics;
+    if (!counts && !work->NeedsMasks()) return;
+    const std::uint32_t margin = column.begin - column.readBegin;
+    const std::size_t skippedBytes = std::size_t{margin} * pixelBytes;
+    const std::size_t skippedMask = std::size_t{margin} * props.bands;
+    InLanes(lanes, strip.firstLine, strip.End(),
+            [&](std::uint32_t lane, std::uint32_t first, std::uint32_t last) {
+                for (std::uint32_t line = first; line < last; ++line) {
+                    if (work->NeedsMasks())
+                        strip.SetMarked(
+                            line, work->MarkRow(strip.Row(line), strip.MaskRow(line), strip.width));
+                    const unsigned char* const mask = strip.MaskIfMarked(line);
+                    if (counts)
+                        work->TakeStatistics(lane, strip.Row(line) + skippedBytes,
+                                             mask ? mask + skippedMask : nullptr,
+                                             column.end - column.begin);
+                }
+            });
+}
+
+void BuildRun::WriteStrip(const Pass& pass, const Column& column, const Strip& strip) {
+    const std::uint32_t above = strip.level - pass.baseLevel;
+    tiles->Write(strip, column.readBegin >> above, column.begin >> above, column.end >> above);
+}
+
+// Level 0 once more, for the types whose bins depend on minimum and maximum.
+void BuildRun::CountLevel0() {
+    work->BeginSecondWalk();
+    const std::size_t tileBytes = std::size_t{kTileSide} * kTileSide * pixelBytes;
+    const std::size_t atOnce = std::max<std::size_t>(1, kChunkBytes / tileBytes);
+    const MeteredBytes pixels(meter, atOnce * tileBytes);
+    const std::size_t maskRow = std::size_t{kTileSide} * props.bands;
+    const MeteredBytes masks(meter, lanes * maskRow);
+    for (std::uint32_t row = 0; row < tiles->TilesDown(0); ++row)
+        for (std::uint32_t column = 0; column < tiles->TilesAcross(0);) {
+            std::vector<Window> chunk;
+            for (; chunk.size() < atOnce && column < tiles->TilesAcross(0); ++column) {
+                chunk.push_back(tiles->Tile(0, column, row));
+                tiles->ReadTile(0, chunk.back(), pixels.Data() + (chunk.size() - 1) * tileBytes);
+            }
+            InLanes(
+                lanes, 0, chunk.front().height,
+                [&](std::uint32_t lane, std::uint32_t first, std::uint32_t last) {
+                    auto* const mask = static_cast<unsigned char*>(
+                        static_cast<void*>(masks.Data() + lane * maskRow));
+                    for (std::size_t i = 0; i < chunk.size(); ++i)
+                        for (std::uint32_t line = first; line < last; ++line) {
+                            const std::byte* const samples =
+                                pixels.Data() + i * tileBytes +
+                                std::size_t{line} * chunk[i].width * pixelBytes;
+                            const bool any =
+                                work->NeedsMasks() && work->MarkRow(samples, mask, chunk[i].width);
+                            work->TakeCounts(lane, samples, any ? mask : nullptr, chunk[i].width);
+                        }
+                });
+            for (const Window& tile : chunk) Advance(std::uint64_t{tile.width} * tile.height);
+        }
+}
+
+void BuildRun::StoreRecords() {
+    work->StoreStatistics();
+    for (std::uint32_t band = 0; band < palettes.size(); ++band)
+        if (palettes[band] && palettes[band]->nextIndex != 0)
+            raster->SetBandPalette(band, *palettes[band]);
+}
+
+// Looks at the file as the next user will: from the disk, through a new connection.
+void BuildRun::Check() {
+    if (!raster->IsComplete())
+        throw Error(
+            name, "finish it",
+            std::to_string(raster->Header().BytesMissing()) + " bytes did not reach the file");
+    file->Flush();
+    const std::uint32_t lastBand = props.bands - 1;
+    const bool hasRecords = raster->HasStatistics(lastBand);
+    tiles.reset();
+    work.reset();
+    raster.reset();
+    Raster finished = Raster::Open(module, file->Path());
+    report.fileSize = finished.Header().fileSize;
+    if (!finished.IsComplete() || finished.Width() != props.samples ||
+        finished.Height() != props.lines || finished.MaxLevel() != maxLevel ||
+        finished.HasStatistics(lastBand) != hasRecords)
+        throw Error(name, "finish it", "what was written does not read back as it was meant");
+}
+
+void BuildRun::Advance(std::uint64_t pixels) {
+    progress.done += pixels;
+    if (options.progress && !options.progress(progress)) throw Cancelled(name, "build it");
+}
+
+}  // namespace
 
 BuildReport PyramidBuilder::Build(RasterSource& source, const std::string& target,
                                   const BuildOptions& options) const {
-    PyramidBuild build(module, source, target, options);
-    return build.Run();
+    BuildRun run(module, source, target, options);
+    return run.Run();
 }
 
 }  // namespace zmchost

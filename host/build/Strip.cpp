@@ -19,13 +19,12 @@ MeteredBytes::MeteredBytes(MemoryMeter& countingMeter, std::size_t byteCount)
 }
 
 Strip::Strip(MemoryMeter& meter, std::uint32_t levelNumber, std::size_t pixelCapacity,
-             std::uint32_t sampleBytesOfPixel, std::uint32_t maskBytesOfPixel,
-             std::uint32_t maxLines)
+             std::uint32_t bytesPerPixel, std::uint32_t maskBytesPerPixel, std::uint32_t maxLines)
     : level(levelNumber),
-      pixelBytes(sampleBytesOfPixel),
-      maskBytes(maskBytesOfPixel),
-      pixels(meter, pixelCapacity * sampleBytesOfPixel),
-      masks(meter, pixelCapacity * maskBytesOfPixel),
+      pixelBytes(bytesPerPixel),
+      maskBytes(maskBytesPerPixel),
+      pixels(meter, pixelCapacity * bytesPerPixel),
+      masks(meter, pixelCapacity * maskBytesPerPixel),
       marked(maxLines) {}
 
 void Strip::Begin(std::uint32_t first, std::uint32_t lineCount, std::uint32_t pixelsPerLine) {
@@ -42,12 +41,12 @@ unsigned char* Strip::MaskRow(std::uint32_t line) const {
 
 StripStore::StripStore(MemoryMeter& countingMeter, std::uint32_t firstLevel,
                        std::uint32_t lastLevel, std::uint64_t baseWidth,
-                       std::uint32_t sampleBytesOfPixel, std::uint32_t maskBytesOfPixel)
+                       std::uint32_t bytesPerPixel, std::uint32_t maskBytesPerPixel)
     : meter(countingMeter),
       baseLevel(firstLevel),
       width(baseWidth),
-      pixelBytes(sampleBytesOfPixel),
-      maskBytes(maskBytesOfPixel),
+      pixelBytes(bytesPerPixel),
+      maskBytes(maskBytesPerPixel),
       shelves(lastLevel - firstLevel + 1) {}
 
 StripStore::Loan StripStore::Take(std::uint32_t level) {

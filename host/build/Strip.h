@@ -45,7 +45,7 @@ private:
 class Strip {
 public:
     Strip(MemoryMeter& meter, std::uint32_t levelNumber, std::size_t pixelCapacity,
-          std::uint32_t sampleBytesOfPixel, std::uint32_t maskBytesOfPixel, std::uint32_t maxLines);
+          std::uint32_t bytesPerPixel, std::uint32_t maskBytesPerPixel, std::uint32_t maxLines);
 
     // Makes it empty lines of a level, to be filled.
     void Begin(std::uint32_t first, std::uint32_t lineCount, std::uint32_t pixelsPerLine);
@@ -82,8 +82,8 @@ private:
 class StripStore {
 public:
     StripStore(MemoryMeter& countingMeter, std::uint32_t firstLevel, std::uint32_t lastLevel,
-               std::uint64_t baseWidth, std::uint32_t sampleBytesOfPixel,
-               std::uint32_t maskBytesOfPixel);
+               std::uint64_t baseWidth, std::uint32_t bytesPerPixel,
+               std::uint32_t maskBytesPerPixel);
 
     struct Return {
         StripStore* store = nullptr;

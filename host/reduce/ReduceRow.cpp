@@ -54,51 +54,51 @@ class RowReducer {
     static constexpr std::size_t kShortBlock = 32;  // and if they differ, these
 
 public:
-    RowReducer(std::uint32_t bands, std::uint32_t width, const ReductionRows<T>& source,
-               const zelm::NoDataRule<T>* noData, T* out, unsigned char* outMask)
-        : bands_(bands),
-          width_(width),
-          cells_(width / 2),
-          source_(source),
-          noData_(noData),
-          out_(out),
-          outMask_(outMask) {}
+    RowReducer(std::uint32_t bandCount, std::uint32_t pixels, const ReductionRows<T>& rows,
+               const zelm::NoDataRule<T>* rules, T* row, unsigned char* rowMask)
+        : bands(bandCount),
+          width(pixels),
+          cells(pixels / 2),
+          source(rows),
+          noData(rules),
+          out(row),
+          outMask(rowMask) {}
 
     template <Resampling method>
     void Cells() {
-        const T* const* const pair = source_.rows;
+        const T* const* const pair = source.rows;
         const bool bothRows = pair[0] && pair[1];
         const auto run = [this](std::size_t x, std::size_t n) { CellRun<method>(x, n); };
         const auto one = [](const Cell<T>& cell, std::size_t, std::uint32_t) {
             return ReduceCell<method>(cell);
         };
-        Reduce(0, cells_, 2, 0, bothRows, run, one);
+        Reduce(0, cells, 2, 0, bothRows, run, one);
     }
 
     template <class Kernel>
     void Window() {
         constexpr std::size_t rows = 2 * Kernel::kReach;
-        center_ = Kernel::kReach - 1;
+        center = Kernel::kReach - 1;
         const Part* parts[rows];
         for (std::size_t r = 0; r < rows; ++r)
-            parts[r] = reinterpret_cast<const Part*>(source_.rows[r]);
-        const PartRows<Part> window{parts, source_.masks, kParts * bands_, bands_, width_};
+            parts[r] = reinterpret_cast<const Part*>(source.rows[r]);
+        const PartRows<Part> window{parts, source.masks, kParts * bands, bands, width};
         const auto run = [&](std::size_t x, std::size_t n) {
             for (std::size_t p = 0; p < window.stride; ++p)
                 WindowRun<Kernel>(window, p, static_cast<std::uint32_t>(x), n,
-                                  reinterpret_cast<Part*>(out_ + x * bands_));
+                                  reinterpret_cast<Part*>(out + x * bands));
         };
         const auto one = [&](const Cell<T>& cell, std::size_t x, std::uint32_t band) {
             return WindowCell<Kernel>(window, cell, static_cast<std::uint32_t>(x), band);
         };
         // Cells whose taps all lie inside the level.
-        const std::size_t from = std::min<std::size_t>(cells_, Kernel::kReach / 2);
-        const std::size_t beyond = width_ > Kernel::kReach ? (width_ - Kernel::kReach + 1) / 2 : 0;
-        const std::size_t to = std::clamp<std::size_t>(beyond, from, cells_);
+        const std::size_t from = std::min<std::size_t>(cells, Kernel::kReach / 2);
+        const std::size_t beyond = width > Kernel::kReach ? (width - Kernel::kReach + 1) / 2 : 0;
+        const std::size_t to = std::clamp<std::size_t>(beyond, from, cells);
         const bool allRows = std::all_of(parts, parts + rows, [](const Part* r) { return r; });
         Reduce(0, from, rows, 0, false, run, one);
         Reduce(from, to, rows, Kernel::kReach - 1, allRows, run, one);
-        Reduce(to, cells_, rows, 0, false, run, one);
+        Reduce(to, cells, rows, 0, false, run, one);
     }
 
 private:
@@ -107,7 +107,7 @@ private:
     template <class Run, class One>
     void Reduce(std::size_t from, std::size_t to, std::size_t rows, std::size_t halo, bool runs,
                 Run run, One one) {
-        if (!source_.masks && runs) return ReduceRun(from, to - from, run, one);
+        if (!source.masks && runs) return ReduceRun(from, to - from, run, one);
         for (std::size_t x = from; x < to; x += kBlock) {
             const std::size_t n = std::min(kBlock, to - x);
             if (runs && Full(x, n, rows, halo))
@@ -119,10 +119,10 @@ private:
 
     // A long run that is not wholly valid, in short ones.
     template <class Run, class One>
-    void ReduceMixed(std::size_t from, std::size_t cells, std::size_t rows, std::size_t halo,
+    void ReduceMixed(std::size_t from, std::size_t count, std::size_t rows, std::size_t halo,
                      bool runs, Run run, One one) {
-        for (std::size_t x = from; x < from + cells; x += kShortBlock) {
-            const std::size_t n = std::min(kShortBlock, from + cells - x);
+        for (std::size_t x = from; x < from + count; x += kShortBlock) {
+            const std::size_t n = std::min(kShortBlock, from + count - x);
             if (Empty(x, n))
                 FillInvalid(x, n);
             else if (runs && Full(x, n, rows, halo))
@@ -133,22 +133,21 @@ private:
     }
 
     bool Empty(std::size_t x, std::size_t n) const {
-        return source_.masks &&
-               AllMarked(source_.masks + center_, 2, 2 * x * bands_, 2 * n * bands_);
+        return source.masks && AllMarked(source.masks + center, 2, 2 * x * bands, 2 * n * bands);
     }
 
     bool Full(std::size_t x, std::size_t n, std::size_t rows, std::size_t halo) const {
-        return !source_.masks ||
-               NoneMarked(source_.masks, rows, (2 * x - halo) * bands_, 2 * (n + halo) * bands_);
+        return !source.masks ||
+               NoneMarked(source.masks, rows, (2 * x - halo) * bands, 2 * (n + halo) * bands);
     }
 
     template <class Run, class One>
     void ReduceRun(std::size_t x, std::size_t n, Run run, One one) {
         if (n == 0) return;
         run(x, n);
-        if (outMask_) std::memset(outMask_ + x * bands_, 0, n * bands_);
-        for (std::uint32_t band = 0; noData_ && band < bands_; ++band) {
-            if (noData_[band].hasValue) MoveOffNoData(x, n, band, one);
+        if (outMask) std::memset(outMask + x * bands, 0, n * bands);
+        for (std::uint32_t band = 0; noData && band < bands; ++band) {
+            if (noData[band].hasValue) MoveOffNoData(x, n, band, one);
         }
     }
 
@@ -156,13 +155,13 @@ private:
     // again for the side on which the exact result lies.
     template <class One>
     void MoveOffNoData(std::size_t x, std::size_t n, std::uint32_t band, One one) {
-        const zelm::NoDataRule<T>& rule = noData_[band];
-        const T* const results = out_ + x * bands_ + band;
+        const zelm::NoDataRule<T>& rule = noData[band];
+        const T* const results = out + x * bands + band;
         bool found = false;
-        for (std::size_t i = 0; i < n; ++i) found |= results[i * bands_] == rule.value;
+        for (std::size_t i = 0; i < n; ++i) found |= results[i * bands] == rule.value;
         if (!found) return;
         for (std::size_t i = x; i < x + n; ++i) {
-            T& result = out_[i * bands_ + band];
+            T& result = out[i * bands + band];
             if (result == rule.value) result = KeptValid(one(ValidSamples(i, band), i, band), rule);
         }
     }
@@ -170,56 +169,56 @@ private:
     template <class One>
     void ReduceEach(std::size_t x, std::size_t n, One one) {
         for (std::size_t i = x; i < x + n; ++i) {
-            for (std::uint32_t band = 0; band < bands_; ++band) {
+            for (std::uint32_t band = 0; band < bands; ++band) {
                 const Cell<T> cell = ValidSamples(i, band);
-                const std::size_t at = i * bands_ + band;
-                out_[at] = cell.count == 0 ? InvalidValue(Rule(band))
-                                           : KeptValid(one(cell, i, band), Rule(band));
-                if (outMask_) outMask_[at] = cell.count == 0 ? 1 : 0;
+                const std::size_t at = i * bands + band;
+                out[at] = cell.count == 0 ? InvalidValue(Rule(band))
+                                          : KeptValid(one(cell, i, band), Rule(band));
+                if (outMask) outMask[at] = cell.count == 0 ? 1 : 0;
             }
         }
     }
 
     void FillInvalid(std::size_t x, std::size_t n) {
         for (std::size_t i = x; i < x + n; ++i) {
-            for (std::uint32_t band = 0; band < bands_; ++band)
-                out_[i * bands_ + band] = InvalidValue(Rule(band));
+            for (std::uint32_t band = 0; band < bands; ++band)
+                out[i * bands + band] = InvalidValue(Rule(band));
         }
-        if (outMask_) std::memset(outMask_ + x * bands_, 1, n * bands_);
+        if (outMask) std::memset(outMask + x * bands, 1, n * bands);
     }
 
     // The cell's valid samples in reading order, without a branch per sample.
     Cell<T> ValidSamples(std::size_t x, std::uint32_t band) const {
         Cell<T> cell;
-        const std::size_t left = 2 * x * bands_ + band;
-        for (std::size_t r = center_; r < center_ + 2; ++r) {
-            const T* const row = source_.rows[r];
+        const std::size_t left = 2 * x * bands + band;
+        for (std::size_t r = center; r < center + 2; ++r) {
+            const T* const row = source.rows[r];
             if (!row) continue;
-            const unsigned char* const mask = source_.masks ? source_.masks[r] : nullptr;
+            const unsigned char* const mask = source.masks ? source.masks[r] : nullptr;
             cell.values[cell.count] = row[left];
             cell.count += mask ? 1 - (mask[left] & 1) : 1;
-            cell.values[cell.count] = row[left + bands_];
-            cell.count += mask ? 1 - (mask[left + bands_] & 1) : 1;
+            cell.values[cell.count] = row[left + bands];
+            cell.count += mask ? 1 - (mask[left + bands] & 1) : 1;
         }
         return cell;
     }
 
     template <Resampling method>
     void CellRun(std::size_t x, std::size_t n) {
-        const std::size_t first = 2 * x * bands_;
-        const T* const upper = source_.rows[0] + first;
-        const T* const lower = source_.rows[1] + first;
-        T* const out = out_ + x * bands_;
+        const std::size_t first = 2 * x * bands;
+        const T* const upper = source.rows[0] + first;
+        const T* const lower = source.rows[1] + first;
+        T* const results = out + x * bands;
         if constexpr (method == Resampling::Average) {
             AverageRow(reinterpret_cast<const Part*>(upper), reinterpret_cast<const Part*>(lower),
-                       kParts * bands_, n, reinterpret_cast<Part*>(out));
+                       kParts * bands, n, reinterpret_cast<Part*>(results));
         } else {
             for (std::size_t i = 0; i < n; ++i) {
-                for (std::size_t band = 0; band < bands_; ++band) {
-                    const std::size_t a = 2 * i * bands_ + band;
-                    const std::size_t b = a + bands_;
+                for (std::size_t band = 0; band < bands; ++band) {
+                    const std::size_t a = 2 * i * bands + band;
+                    const std::size_t b = a + bands;
                     const Cell<T> cell{{upper[a], upper[b], lower[a], lower[b]}, 4};
-                    out[i * bands_ + band] = ReduceCell<method>(cell).value;
+                    results[i * bands + band] = ReduceCell<method>(cell).value;
                 }
             }
         }
@@ -237,17 +236,17 @@ private:
     }
 
     zelm::NoDataRule<T> Rule(std::uint32_t band) const {
-        return noData_ ? noData_[band] : zelm::NoDataRule<T>{};
+        return noData ? noData[band] : zelm::NoDataRule<T>{};
     }
 
-    const std::size_t bands_;
-    const std::uint32_t width_;
-    const std::size_t cells_;
-    const ReductionRows<T>& source_;
-    const zelm::NoDataRule<T>* const noData_;
-    T* const out_;
-    unsigned char* const outMask_;
-    std::size_t center_ = 0;  // the first row of the pair
+    const std::size_t bands;
+    const std::uint32_t width;
+    const std::size_t cells;
+    const ReductionRows<T>& source;
+    const zelm::NoDataRule<T>* const noData;
+    T* const out;
+    unsigned char* const outMask;
+    std::size_t center = 0;  // the first row of the pair
 };
 
 // The methods that need an order, or a root of squares.

@@ -53,15 +53,15 @@ class Expansion {
 public:
     void Add(long double term) {
         int kept = 0;
-        for (int i = 0; i < count_; ++i) {
-            const long double sum = term + parts_[i];
+        for (int i = 0; i < count; ++i) {
+            const long double sum = term + parts[i];
             const long double share = sum - term;
-            const long double rest = (term - (sum - share)) + (parts_[i] - share);
-            if (rest != 0) parts_[kept++] = rest;
+            const long double rest = (term - (sum - share)) + (parts[i] - share);
+            if (rest != 0) parts[kept++] = rest;
             term = sum;
         }
-        if (term != 0) parts_[kept++] = term;
-        count_ = kept;
+        if (term != 0) parts[kept++] = term;
+        count = kept;
     }
     // factor * value squared, for a value of at most 54 bits and a small factor.
     void AddSquare(long double value, int factor) {
@@ -73,11 +73,11 @@ public:
         Add(factor * (2 * high * low));
         Add(factor * (low * low));
     }
-    int Sign() const { return count_ == 0 ? 0 : SignOf(parts_[count_ - 1]); }
+    int Sign() const { return count == 0 ? 0 : SignOf(parts[count - 1]); }
 
 private:
-    long double parts_[16] = {};
-    int count_ = 0;
+    long double parts[16] = {};
+    int count = 0;
 };
 
 // The same for types whose four squares fit in 64 bits with room to spare.

@@ -70,24 +70,24 @@ void BandAccumulator<T>::AddRow(const T* row, const unsigned char* mask, std::ui
         for (std::size_t i = 0; i < width; ++i) {
             const std::size_t at = i * bands;
             const bool marked = mask && (mask[at] & 1) != 0;
-            if (!marked && !zelm::NoDataRule<T>::NotFinite(row[at])) ++count_;
+            if (!marked && !zelm::NoDataRule<T>::NotFinite(row[at])) ++count;
         }
     } else if constexpr (std::is_floating_point_v<T>) {
-        sums_.Reserve();
-        T minimum = count_ != 0 ? minimum_ : std::numeric_limits<T>::max();
-        T maximum = count_ != 0 ? maximum_ : std::numeric_limits<T>::lowest();
+        sums.Reserve();
+        T lowest = count != 0 ? minimum : std::numeric_limits<T>::max();
+        T highest = count != 0 ? maximum : std::numeric_limits<T>::lowest();
         for (std::size_t i = 0; i < width; ++i) {
             const std::size_t at = i * bands;
             using Bits = std::conditional_t<sizeof(T) == 4, std::uint32_t, std::uint64_t>;
             const auto bits = std::bit_cast<Bits>(row[at]);
             if ((mask && (mask[at] & 1) != 0) || !ExactSums<T>::Finite(bits)) continue;
-            sums_.AddOne(bits);
-            ++count_;
-            minimum = std::min(minimum, row[at]);
-            maximum = std::max(maximum, row[at]);
+            sums.AddOne(bits);
+            ++count;
+            lowest = std::min(lowest, row[at]);
+            highest = std::max(highest, row[at]);
         }
-        minimum_ = minimum;
-        maximum_ = maximum;
+        minimum = lowest;
+        maximum = highest;
     } else if constexpr (sizeof(T) == 8) {
         for (std::size_t i = 0; i < width; ++i) {
             const std::size_t at = i * bands;
@@ -96,14 +96,14 @@ void BandAccumulator<T>::AddRow(const T* row, const unsigned char* mask, std::ui
     } else {
         for (std::uint32_t from = 0; from < width; from += std::min(kChunk, width - from)) {
             const std::size_t offset = std::size_t{from} * bands;
-            ChunkSums<T> sums;
-            sums.Add(row + offset, mask ? mask + offset : nullptr, bands,
-                     std::min(kChunk, width - from));
-            if (sums.count == 0) continue;
-            minimum_ = count_ != 0 ? std::min(minimum_, sums.minimum) : sums.minimum;
-            maximum_ = count_ != 0 ? std::max(maximum_, sums.maximum) : sums.maximum;
-            count_ += sums.count;
-            sums_.AddSums(sums.sum, sums.squares);
+            ChunkSums<T> chunk;
+            chunk.Add(row + offset, mask ? mask + offset : nullptr, bands,
+                      std::min(kChunk, width - from));
+            if (chunk.count == 0) continue;
+            minimum = count != 0 ? std::min(minimum, chunk.minimum) : chunk.minimum;
+            maximum = count != 0 ? std::max(maximum, chunk.maximum) : chunk.maximum;
+            count += chunk.count;
+            sums.AddSums(chunk.sum, chunk.squares);
         }
     }
 }
@@ -112,44 +112,44 @@ template <class T>
 void BandAccumulator<T>::AddRepeated(const T& value, std::uint64_t times) {
     if (times == 0 || zelm::NoDataRule<T>::NotFinite(value)) return;
     if constexpr (!zelm::kIsComplex<T>) {
-        sums_.Add(value, times);
-        minimum_ = count_ != 0 ? std::min(minimum_, value) : value;
-        maximum_ = count_ != 0 ? std::max(maximum_, value) : value;
+        sums.Add(value, times);
+        minimum = count != 0 ? std::min(minimum, value) : value;
+        maximum = count != 0 ? std::max(maximum, value) : value;
     }
-    count_ += times;
+    count += times;
 }
 
 template <class T>
 void BandAccumulator<T>::Merge(const BandAccumulator& other) {
-    if (other.count_ == 0) return;
+    if (other.count == 0) return;
     if constexpr (!zelm::kIsComplex<T>) {
-        sums_.Merge(other.sums_);
-        minimum_ = count_ != 0 ? std::min(minimum_, other.minimum_) : other.minimum_;
-        maximum_ = count_ != 0 ? std::max(maximum_, other.maximum_) : other.maximum_;
+        sums.Merge(other.sums);
+        minimum = count != 0 ? std::min(minimum, other.minimum) : other.minimum;
+        maximum = count != 0 ? std::max(maximum, other.maximum) : other.maximum;
     }
-    count_ += other.count_;
+    count += other.count;
 }
 
 template <class T>
 zelm::RasterBandStats<T> BandAccumulator<T>::Stats(std::uint32_t band) const {
     zelm::RasterBandStats<T> stats;
     stats.band = band;
-    stats.count = count_;
-    if (count_ == 0) return stats;
+    stats.count = count;
+    if (count == 0) return stats;
     if constexpr (!zelm::kIsComplex<T>) {
         using Sums = ExactSums<T>;
-        const BigInteger sum = sums_.Sum();
-        const BigInteger squares = sums_.SumOfSquares();
-        const auto n = static_cast<long double>(count_);
-        const long double total = ToLongDouble(sum, Sums::kSumExponent);
-        const long double totalOfSquares = ToLongDouble(squares, Sums::kSquaresExponent);
+        const BigInteger whole = sums.Sum();
+        const BigInteger wholeOfSquares = sums.SumOfSquares();
+        const auto n = static_cast<long double>(count);
+        const long double total = ToLongDouble(whole, Sums::kSumExponent);
+        const long double totalOfSquares = ToLongDouble(wholeOfSquares, Sums::kSquaresExponent);
         // n * sum of squares - square of the sum is n * n times the variance; subtracting before
         // anything is rounded keeps all its digits.
-        const BigInteger spread = BigInteger(count_) * squares - sum * sum;
+        const BigInteger spread = BigInteger(count) * wholeOfSquares - whole * whole;
         const long double deviation = std::sqrt(ToLongDouble(spread, Sums::kSquaresExponent)) / n;
 
-        stats.minimum = minimum_;
-        stats.maximum = maximum_;
+        stats.minimum = minimum;
+        stats.maximum = maximum;
         stats.flags = zelm::StatsFlag::Minimum | zelm::StatsFlag::Maximum;
         SetIfHeld(stats.mean, stats.flags, zelm::StatsFlag::Mean, total / n);
         SetIfHeld(stats.standardDeviation, stats.flags, zelm::StatsFlag::StandardDeviation,

@@ -31,7 +31,7 @@ public:
     // Takes all that `other` has seen.
     void Merge(const BandAccumulator& other);
 
-    std::uint64_t Count() const { return count_; }
+    std::uint64_t Count() const { return count; }
 
     // The record: count, and the seven values with their flags. The standard deviation is that of
     // the population. Without a valid sample, and for complex types, whose values have no order
@@ -39,10 +39,10 @@ public:
     zelm::RasterBandStats<T> Stats(std::uint32_t band) const;
 
 private:
-    std::uint64_t count_ = 0;
-    T minimum_{};
-    T maximum_{};
-    ExactSums<T> sums_;
+    std::uint64_t count = 0;
+    T minimum{};
+    T maximum{};
+    ExactSums<T> sums;
 };
 
 }  // namespace zmchost

@@ -53,26 +53,26 @@ public:
     static constexpr std::int64_t kSquaresExponent = 0;
 
     void Add(T value, std::uint64_t times = 1) {
-        sum_ += static_cast<Int128>(value) * times;
+        sum += static_cast<Int128>(value) * times;
         const UInt128 magnitude =
             value < 0 ? UInt128{0} - static_cast<UInt128>(value) : static_cast<UInt128>(value);
-        squares_.AddProduct(magnitude * magnitude, times);
+        squares.AddProduct(magnitude * magnitude, times);
     }
     // Sums that the caller has taken himself.
-    void AddSums(std::int64_t sum, UInt128 squares) {
-        sum_ += sum;
-        squares_.Add(squares);
+    void AddSums(std::int64_t furtherSum, UInt128 furtherSquares) {
+        sum += furtherSum;
+        squares.Add(furtherSquares);
     }
     void Merge(const ExactSums& other) {
-        sum_ += other.sum_;
-        squares_.Merge(other.squares_);
+        sum += other.sum;
+        squares.Merge(other.squares);
     }
-    BigInteger Sum() const { return BigInteger::Signed(sum_); }
-    BigInteger SumOfSquares() const { return squares_.Value(); }
+    BigInteger Sum() const { return BigInteger::Signed(sum); }
+    BigInteger SumOfSquares() const { return squares.Value(); }
 
 private:
-    Int128 sum_ = 0;
-    WideSum squares_;
+    Int128 sum = 0;
+    WideSum squares;
 };
 
 // float and double. Samples are finite.
@@ -90,7 +90,7 @@ public:
     void Add(T value, std::uint64_t times = 1) {
         Reserve();
         const auto bits = std::bit_cast<Bits>(value);
-        Slot& slot = slots_[Exponent(bits)];
+        Slot& slot = slots[Exponent(bits)];
         const Int128 mantissa = static_cast<Int128>(Mantissa(bits)) * times;
         slot.sum += (bits & kSign) != 0 ? -mantissa : mantissa;
         slot.squares.AddProduct(UInt128{Mantissa(bits)} * Mantissa(bits), times);
@@ -98,12 +98,12 @@ public:
 
     // Makes room, so that AddOne may follow.
     void Reserve() {
-        if (slots_.empty()) slots_.resize(kExponents);
+        if (slots.empty()) slots.resize(kExponents);
     }
 
     // The sample's bits stand for its value; the caller has looked whether it is finite.
     void AddOne(Bits bits) {
-        Slot& slot = slots_[Exponent(bits)];
+        Slot& slot = slots[Exponent(bits)];
         const std::uint64_t mantissa = Mantissa(bits);
         const auto sign = static_cast<std::int64_t>((bits & kSign) != 0 ? ~std::uint64_t{0} : 0);
         slot.sum += (static_cast<std::int64_t>(mantissa) ^ sign) - sign;
@@ -113,25 +113,25 @@ public:
     static bool Finite(Bits bits) { return Exponent(bits) < kExponents; }
 
     void Merge(const ExactSums& other) {
-        if (other.slots_.empty()) return;
+        if (other.slots.empty()) return;
         Reserve();
-        for (std::size_t i = 0; i < slots_.size(); ++i) {
-            slots_[i].sum += other.slots_[i].sum;
-            slots_[i].squares.Merge(other.slots_[i].squares);
+        for (std::size_t i = 0; i < slots.size(); ++i) {
+            slots[i].sum += other.slots[i].sum;
+            slots[i].squares.Merge(other.slots[i].squares);
         }
     }
 
     BigInteger Sum() const {
         BigInteger total;
-        for (std::uint32_t i = 0; i < slots_.size(); ++i) {
-            if (slots_[i].sum != 0) total += BigInteger::Signed(slots_[i].sum, Shift(i));
+        for (std::uint32_t i = 0; i < slots.size(); ++i) {
+            if (slots[i].sum != 0) total += BigInteger::Signed(slots[i].sum, Shift(i));
         }
         return total;
     }
     BigInteger SumOfSquares() const {
         BigInteger total;
-        for (std::uint32_t i = 0; i < slots_.size(); ++i) {
-            const WideSum& squares = slots_[i].squares;
+        for (std::uint32_t i = 0; i < slots.size(); ++i) {
+            const WideSum& squares = slots[i].squares;
             if (squares.low != 0 || squares.high != 0) total += squares.Value(2 * Shift(i));
         }
         return total;
@@ -154,7 +154,7 @@ private:
     // Subnormal numbers have the unit of the smallest normal exponent.
     static std::uint32_t Shift(std::uint32_t exponent) { return exponent == 0 ? 0 : exponent - 1; }
 
-    std::vector<Slot> slots_;
+    std::vector<Slot> slots;
 };
 
 // Complex samples have no sums that a record could hold.

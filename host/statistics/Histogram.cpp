@@ -5,8 +5,8 @@
 namespace zmchost {
 
 template <class T>
-HistogramAccumulator<T>::HistogramAccumulator(const HistogramBins<T>& bins)
-    : bins_(bins), counts_(bins.Count()) {}
+HistogramAccumulator<T>::HistogramAccumulator(const HistogramBins<T>& division)
+    : bins(division), counts(division.Count()) {}
 
 template <class T>
 void HistogramAccumulator<T>::AddRow(const T* row, const unsigned char* mask, std::uint32_t band,
@@ -18,27 +18,27 @@ void HistogramAccumulator<T>::AddRow(const T* row, const unsigned char* mask, st
 
 template <class T>
 void HistogramAccumulator<T>::AddRepeated(T value, std::uint64_t times) {
-    const std::uint32_t bin = bins_.Index(value);
-    if (bin != HistogramBins<T>::kOutside) counts_[bin] += times;
+    const std::uint32_t bin = bins.Index(value);
+    if (bin != HistogramBins<T>::kOutside) counts[bin] += times;
 }
 
 template <class T>
 void HistogramAccumulator<T>::Merge(const HistogramAccumulator& other) {
-    const std::size_t n = std::min(counts_.size(), other.counts_.size());
-    for (std::size_t i = 0; i < n; ++i) counts_[i] += other.counts_[i];
+    const std::size_t n = std::min(counts.size(), other.counts.size());
+    for (std::size_t i = 0; i < n; ++i) counts[i] += other.counts[i];
 }
 
 template <class T>
 zelm::RasterBandHistogram<T> HistogramAccumulator<T>::Histogram(std::uint32_t band) const {
     zelm::RasterBandHistogram<T> record;
     record.band = band;
-    record.binSize = bins_.Size();
-    record.binCount = bins_.Count();
-    record.minimum = bins_.Minimum();
-    record.maximum = bins_.Maximum();
+    record.binSize = bins.Size();
+    record.binCount = bins.Count();
+    record.minimum = bins.Minimum();
+    record.maximum = bins.Maximum();
     record.source = zelm::HistogramSource::ORVA;
-    if (record.counts.SetShape(zelm::ArrayShape(bins_.Count())))
-        std::copy(counts_.begin(), counts_.end(), record.counts.data);
+    if (record.counts.SetShape(zelm::ArrayShape(bins.Count())))
+        std::copy(counts.begin(), counts.end(), record.counts.data);
     return record;
 }
 

@@ -20,7 +20,7 @@ namespace zmchost {
 template <class T>
 class HistogramAccumulator {
 public:
-    explicit HistogramAccumulator(const HistogramBins<T>& bins);
+    explicit HistogramAccumulator(const HistogramBins<T>& division);
 
     // Takes band `band` of a pixel-interleaved row of `width` pixels with `bands` samples. mask: of
     // the same shape, bit 0 set = not valid; null when every sample is valid. Samples outside the
@@ -32,15 +32,15 @@ public:
     // Takes the counts of `other`, which has the same bins.
     void Merge(const HistogramAccumulator& other);
 
-    const std::vector<std::uint64_t>& Counts() const { return counts_; }
+    const std::vector<std::uint64_t>& Counts() const { return counts; }
 
     // The record, for level 0 and of source ORVA, the one that a file keeps. If the memory for the
     // counts is not there, the record's array carries the error.
     zelm::RasterBandHistogram<T> Histogram(std::uint32_t band) const;
 
 private:
-    HistogramBins<T> bins_;
-    std::vector<std::uint64_t> counts_;
+    HistogramBins<T> bins;
+    std::vector<std::uint64_t> counts;
 };
 
 }  // namespace zmchost

@@ -26,31 +26,31 @@ double Distance(T from, T to, double factor) {
 }  // namespace
 
 template <class T>
-HistogramBins<T>::HistogramBins(T minimum, T maximum, std::uint32_t binCount)
-    : minimum_(minimum), maximum_(maximum), count_(std::max<std::uint32_t>(binCount, 1)) {
+HistogramBins<T>::HistogramBins(T lowest, T highest, std::uint32_t binCount)
+    : minimum(lowest), maximum(highest), count(std::max<std::uint32_t>(binCount, 1)) {
     if constexpr (std::is_integral_v<T>) {
-        size_ =
-            static_cast<double>(static_cast<long double>(IntegerWidth(minimum, maximum)) / count_);
+        size =
+            static_cast<double>(static_cast<long double>(IntegerWidth(minimum, maximum)) / count);
     } else if constexpr (std::is_floating_point_v<T>) {
         constexpr double kLarge = 1e300;
         constexpr double kSmall = 1e-290;
         double width = Distance(minimum, maximum, 0.5);
         if (width > kLarge)
-            factor_ = 0.5;
+            factor = 0.5;
         else if (width > 0 && width < kSmall)
-            factor_ = std::ldexp(1.0, 600);
-        width = maximum > minimum ? Distance(minimum, maximum, factor_) : factor_;
-        size_ = width / count_ / factor_;
-        scale_ = count_ / width;
+            factor = std::ldexp(1.0, 600);
+        width = maximum > minimum ? Distance(minimum, maximum, factor) : factor;
+        size = width / count / factor;
+        scale = count / width;
     }
 }
 
 template <class T>
-HistogramBins<T> HistogramBins<T>::ForBand(T minimum, T maximum, std::uint32_t binCount) {
+HistogramBins<T> HistogramBins<T>::ForBand(T lowest, T highest, std::uint32_t binCount) {
     if constexpr (sizeof(T) == 1)
         return HistogramBins(std::numeric_limits<T>::min(), std::numeric_limits<T>::max(), 256);
     else
-        return HistogramBins(minimum, maximum, binCount);
+        return HistogramBins(lowest, highest, binCount);
 }
 
 template <class T>
@@ -58,18 +58,18 @@ std::uint32_t HistogramBins<T>::Index(T value) const {
     if constexpr (zelm::kIsComplex<T>) {
         return kOutside;
     } else {
-        if (!(value >= minimum_ && value <= maximum_)) return kOutside;
+        if (!(value >= minimum && value <= maximum)) return kOutside;
         if constexpr (std::is_floating_point_v<T>) {
-            const double bin = Distance(minimum_, value, factor_) * scale_;
-            return bin < count_ ? static_cast<std::uint32_t>(bin) : count_ - 1;
+            const double bin = Distance(minimum, value, factor) * scale;
+            return bin < count ? static_cast<std::uint32_t>(bin) : count - 1;
         } else if constexpr (sizeof(T) <= 4) {
-            const std::int64_t low = minimum_;
+            const std::int64_t low = minimum;
             const auto offset = static_cast<std::uint64_t>(value - low);
-            const auto width = static_cast<std::uint64_t>(maximum_ - low) + 1;
-            return static_cast<std::uint32_t>(offset * count_ / width);
+            const auto width = static_cast<std::uint64_t>(maximum - low) + 1;
+            return static_cast<std::uint32_t>(offset * count / width);
         } else {
-            const auto offset = static_cast<UInt128>(static_cast<Int128>(value) - minimum_);
-            return static_cast<std::uint32_t>(offset * count_ / IntegerWidth(minimum_, maximum_));
+            const auto offset = static_cast<UInt128>(static_cast<Int128>(value) - minimum);
+            return static_cast<std::uint32_t>(offset * count / IntegerWidth(minimum, maximum));
         }
     }
 }

@@ -21,28 +21,28 @@ public:
     static constexpr std::uint32_t kOutside = 0xFFFFFFFF;
 
     // binCount is at least 1; 0 is taken as 1. The ends are finite.
-    HistogramBins(T minimum, T maximum, std::uint32_t binCount = kDefaultHistogramBins);
+    HistogramBins(T lowest, T highest, std::uint32_t binCount = kDefaultHistogramBins);
 
     // The usual division for a band of this extent: one bin per value for 8-bit types, else
     // binCount bins between its minimum and its maximum.
-    static HistogramBins ForBand(T minimum, T maximum,
+    static HistogramBins ForBand(T lowest, T highest,
                                  std::uint32_t binCount = kDefaultHistogramBins);
 
-    T Minimum() const { return minimum_; }
-    T Maximum() const { return maximum_; }
-    std::uint32_t Count() const { return count_; }
-    double Size() const { return size_; }
+    T Minimum() const { return minimum; }
+    T Maximum() const { return maximum; }
+    std::uint32_t Count() const { return count; }
+    double Size() const { return size; }
 
     // The bin of a value; kOutside for one out of the range, and for a NaN.
     std::uint32_t Index(T value) const;
 
 private:
-    T minimum_;
-    T maximum_;
-    std::uint32_t count_;
-    double size_ = 1;    // width of a bin
-    double factor_ = 1;  // floating types: a power of two that keeps maximum - minimum in range,
-    double scale_ = 0;   // and bins per unit of what it multiplied
+    T minimum;
+    T maximum;
+    std::uint32_t count;
+    double size = 1;    // width of a bin
+    double factor = 1;  // floating types: a power of two that keeps maximum - minimum in range,
+    double scale = 0;   // and bins per unit of what it multiplied
 };
 
 }  // namespace zmchost

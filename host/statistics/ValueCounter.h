@@ -29,28 +29,28 @@ class ValueCounter {
 public:
     static constexpr std::size_t kValues = std::size_t{1} << (8 * sizeof(T));
 
-    ValueCounter() : counts_(kValues) {}
+    ValueCounter() : counts(kValues) {}
 
     // As HistogramAccumulator::AddRow.
     void AddRow(const T* row, const unsigned char* mask, std::uint32_t band, std::uint32_t bands,
                 std::uint32_t width) {
-        std::uint64_t* const counts = counts_.data();
+        std::uint64_t* const table = counts.data();
         const T* sample = row + band;
         if (!mask) {
             for (std::uint32_t i = 0; i < width; ++i, sample += bands)
-                ++counts[static_cast<Index>(*sample)];
+                ++table[static_cast<Index>(*sample)];
             return;
         }
         const unsigned char* marked = mask + band;
         for (std::uint32_t i = 0; i < width; ++i, sample += bands, marked += bands)
-            counts[static_cast<Index>(*sample)] += (*marked & 1) ^ 1;
+            table[static_cast<Index>(*sample)] += (*marked & 1) ^ 1;
     }
 
     void Merge(const ValueCounter& other) {
-        for (std::size_t i = 0; i < kValues; ++i) counts_[i] += other.counts_[i];
+        for (std::size_t i = 0; i < kValues; ++i) counts[i] += other.counts[i];
     }
 
-    std::uint64_t Count(T value) const { return counts_[static_cast<Index>(value)]; }
+    std::uint64_t Count(T value) const { return counts[static_cast<Index>(value)]; }
 
     // Statistics and histogram of all that was seen, as the accumulators would have found them.
     // Without a valid sample the histogram is that of a constant band of 0, with no counts.
@@ -71,10 +71,10 @@ private:
     template <class Accumulator>
     void AddTo(Accumulator& accumulator) const {
         for (std::size_t i = 0; i < kValues; ++i)
-            accumulator.AddRepeated(static_cast<T>(static_cast<Index>(i)), counts_[i]);
+            accumulator.AddRepeated(static_cast<T>(static_cast<Index>(i)), counts[i]);
     }
 
-    std::vector<std::uint64_t> counts_;  // by the value's bits
+    std::vector<std::uint64_t> counts;  // by the value's bits
 };
 
 }  // namespace zmchost

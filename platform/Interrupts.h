@@ -1,0 +1,19 @@
+// Interruption from outside: what ends a program by the user's or the system's wish (here SIGINT,
+// SIGTERM and SIGHUP) becomes a mark that the work looks at now and then.
+//
+// For programs; a library leaves the signals of its process alone.
+#ifndef ZMC_PLATFORM_INTERRUPTS_H
+#define ZMC_PLATFORM_INTERRUPTS_H
+
+namespace platform {
+
+// From now on an interruption sets the mark; a second one of the same kind ends the process at
+// once. What the process was started to ignore stays ignored.
+void CatchInterrupts();
+
+// Any thread may ask.
+bool IsInterrupted();
+
+}  // namespace platform
+
+#endif

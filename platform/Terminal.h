@@ -1,0 +1,24 @@
+// The standard streams of a program as those at a terminal see them.
+#ifndef ZMC_PLATFORM_TERMINAL_H
+#define ZMC_PLATFORM_TERMINAL_H
+
+#include <cstddef>
+#include <string_view>
+
+namespace platform {
+
+enum class StandardStream { Output, Errors };
+
+bool IsTerminal(StandardStream stream);
+
+// Columns of the terminal that the stream goes to; `otherwise` if it goes elsewhere or the terminal
+// does not tell.
+std::size_t TerminalColumns(StandardStream stream, std::size_t otherwise);
+
+// Hands the text to the system in one call and unbuffered, so that lines of several threads or
+// processes do not mix. A stream that takes it no longer loses it: there is nobody left to tell.
+void WriteAtOnce(StandardStream stream, std::string_view text);
+
+}  // namespace platform
+
+#endif
