@@ -13,13 +13,28 @@ namespace {
 
 using Text = std::basic_string_view<WideChar>;
 
+constexpr WideChar kKeyEnd = '=';
 constexpr WideChar kPairEnd = ';';
 
-// The narrow form of a value; an empty text where memory ran out. Units outside ASCII become bytes
-// above 127, at which every conversion of a number stops.
-const char* NarrowText(const String& value) {
-    const char* text = value.GetUtf8();
-    return text ? text : "";
+// Calls read(text) with the narrow form of a value, and answers false where memory is too short for
+// one: a number that nobody could look at is not 0. Units outside ASCII become bytes above 127, at
+// which every conversion of a number stops.
+template <class Read>
+bool ReadNarrow(const String& value, Read&& read) {
+    const char* const text = value.GetUtf8();
+    if (text) read(text);
+    return text != nullptr;
+}
+
+// Where the value of `key` starts; the first place counts at which "=" follows the key. No text is
+// put together for it, since one that memory cuts short would be found elsewhere.
+std::size_t FindValue(Text source, Text key) {
+    if (key.empty()) return Text::npos;
+    for (std::size_t at = 0; (at = source.find(key, at)) != Text::npos; ++at) {
+        const std::size_t end = at + key.size();
+        if (end < source.size() && source[end] == kKeyEnd) return end + 1;
+    }
+    return Text::npos;
 }
 
 // Calls visit(start, count) for the stretches of `source` that are not empty.
@@ -55,12 +70,9 @@ const FormatRecord* FindFormat(const String& word) {
 bool FindParameterValue(const String& source, const String& key, String& value) {
     value = "";
     if (source.IsEmpty()) return false;
-    const String needle = key + "=";
     const Text text = source.View();
-    if (needle.View().size() < 2) return false;
-    const std::size_t found = text.find(needle.View());
-    if (found == Text::npos) return false;
-    const std::size_t start = found + needle.View().size();
+    const std::size_t start = FindValue(text, key.View());
+    if (start == Text::npos) return false;
     const std::size_t end = std::min(text.find(kPairEnd, start), text.size());
     if (end == start) return false;
     source.Substring(static_cast<std::uint32_t>(start), static_cast<std::uint32_t>(end - start),
@@ -70,16 +82,14 @@ bool FindParameterValue(const String& source, const String& key, String& value) 
 
 bool ReadUnsignedParameter(const String& source, const String& key, std::uint32_t& value) {
     String text;
-    if (!FindParameterValue(source, key, text)) return false;
-    value = platform::ParseUnsigned32(NarrowText(text));
-    return true;
+    return FindParameterValue(source, key, text) &&
+           ReadNarrow(text, [&](const char* narrow) { value = platform::ParseUnsigned32(narrow); });
 }
 
 bool ReadSignedParameter(const String& source, const String& key, std::int32_t& value) {
     String text;
-    if (!FindParameterValue(source, key, text)) return false;
-    value = platform::ParseSigned32(NarrowText(text));
-    return true;
+    return FindParameterValue(source, key, text) &&
+           ReadNarrow(text, [&](const char* narrow) { value = platform::ParseSigned32(narrow); });
 }
 
 bool ReadPixelTypeParameter(const String& source, const String& key, std::uint32_t& code) {
@@ -98,8 +108,13 @@ bool ReadDoublePairParameter(const String& source, const String& key, double& fi
     Array<String> tokens;
     if (!SplitString(text, ",", tokens) || tokens.shape.elements != 2) return false;
     if (tokens.data[0].IsEmpty() || tokens.data[1].IsEmpty()) return false;
-    first = platform::ParseReal(NarrowText(tokens.data[0]));
-    second = platform::ParseReal(NarrowText(tokens.data[1]));
+    double numbers[2];
+    for (int i = 0; i < 2; ++i)
+        if (!ReadNarrow(tokens.data[i],
+                        [&](const char* narrow) { numbers[i] = platform::ParseReal(narrow); }))
+            return false;
+    first = numbers[0];
+    second = numbers[1];
     return true;
 }
 
@@ -107,10 +122,10 @@ bool ReadPointerParameter(const String& source, const String& key, void** pointe
     if (!pointer) return false;
     *pointer = nullptr;
     String text;
-    if (!FindParameterValue(source, key, text)) return false;
-    void* address = nullptr;
-    if (std::sscanf(NarrowText(text), "%p", &address) == 1) *pointer = address;
-    return true;
+    return FindParameterValue(source, key, text) && ReadNarrow(text, [&](const char* narrow) {
+               void* address = nullptr;
+               if (std::sscanf(narrow, "%p", &address) == 1) *pointer = address;
+           });
 }
 
 bool SplitString(const String& source, const String& delimiter, Array<String>& out) {

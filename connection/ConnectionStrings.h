@@ -6,8 +6,8 @@
 // are read as far as they go: what is no number is 0, and only a missing key or an empty value is
 // refused. Out arguments keep their value on false unless told otherwise.
 //
-// Nothing here throws. Memory that runs out shows as false or as an empty text. One thread at a
-// time for each text, since texts cache their narrow forms.
+// Nothing here throws. Memory that runs out shows as false, never as another number, or as an empty
+// text. One thread at a time for each text, since texts cache their narrow forms.
 #ifndef ZMC_CONNECTION_CONNECTIONSTRINGS_H
 #define ZMC_CONNECTION_CONNECTIONSTRINGS_H
 

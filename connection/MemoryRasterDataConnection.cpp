@@ -1,6 +1,7 @@
 #include "connection/MemoryRasterDataConnection.h"
 
 #include <new>
+#include <string_view>
 
 #include "connection/ConnectionStrings.h"
 #include "core/PixelVocabulary.h"
@@ -8,6 +9,12 @@
 #include "raster/ReaderRasterMemory.h"
 
 namespace zelm {
+namespace {
+
+constexpr char kFormatWord[] = "MemoryRaster";
+constexpr std::string_view kConnectionPrefix = "{MemoryRaster}@";
+
+}  // namespace
 
 void* MemoryRasterPixels(RasterDataConnection* connection) {
     const auto* memory = dynamic_cast<MemoryRasterDataConnection*>(connection);
@@ -87,19 +94,23 @@ bool MemoryRasterDataConnection::ParseMemoryParameters(const String& source,
     rasterProps.SetBands(bands);
     rasterProps.interleave = interleave;
     rasterProps.pixelType = pixelType;
-    rasterProps.formatName = "MemoryRaster";
+    rasterProps.formatName = kFormatWord;
     rasterProps.SetGeoRef(geoRef);
     // Entries are few, while a string may claim thousands of millions of bands.
     auto& values = rasterProps.noDataValues;
     values.erase(values.begin(), values.lower_bound(bands));
-    return true;
+    return rasterProps.formatName.wide != nullptr;
 }
 
+// Texts that memory ran out for are null or cut short, and a connection with such is none.
 bool MemoryRasterDataConnection::TakeParameters(const String& source) {
     parameters.Clear();
-    if (!parameters.Append("MemoryRaster") || !parameters.Append(source)) return false;
-    connectionString = String("{MemoryRaster}@") + source;
-    return true;
+    if (!parameters.Append(kFormatWord) || !parameters.Append(source)) return false;
+    if (!parameters.data[0].wide || !parameters.data[1].wide) return false;
+    const String text = String(kConnectionPrefix.data()) + source;
+    if (text.View().size() != kConnectionPrefix.size() + source.View().size()) return false;
+    connectionString = text;
+    return connectionString.wide != nullptr;
 }
 
 }  // namespace zelm

@@ -33,9 +33,9 @@ public:
     MemoryRasterDataConnection& operator=(const MemoryRasterDataConnection&) = delete;
     ~MemoryRasterDataConnection() override;
 
-    // Without exactly one parameter, false and nothing else. Other failures close the connection,
-    // and may leave a new name. An unreadable address succeeds and leaves it without pixels, so
-    // that IsOpen is false.
+    // Without exactly one parameter, false and nothing else. Other failures, memory that runs out
+    // among them, close the connection and may leave a new name. An unreadable address succeeds and
+    // leaves it without pixels, so that IsOpen is false.
     bool Open(const Array<String>& openParameters, GeoRefPtr geoRef, MetadataPtr metadata) override;
     // The reader, the name and the connection string stay: a reader in use works on.
     void Close() override;

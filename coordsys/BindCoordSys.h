@@ -20,9 +20,8 @@ std::unique_ptr<CoordSys> BindCoordSys(const String& definition);
 // The system of an EPSG code; null likewise.
 std::unique_ptr<CoordSys> BindCoordSys(int epsgCode);
 
-// What `info` of a bound CoordSys says: the datum of the engine object, and its unit by the table
-// of units where that has a row for it, else as the engine gives it. The other fields keep their
-// defaults.
+// What `info` of a bound CoordSys says: datum and unit as the engine object gives them. A datum
+// that has no name, and the other fields, keep their defaults.
 CoordSysInfo DescribeCoordSys(const CoordSysImpl& impl);
 
 }  // namespace zelm

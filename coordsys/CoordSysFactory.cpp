@@ -33,6 +33,8 @@ CoordSysFactory* CoordSysFactory::GetInstance() {
     gpCoordSysFactoryInstance = new (std::nothrow) CoordSysFactory;
     if (!gpCoordSysFactoryInstance) return nullptr;
     if (InitOrFail(*gpCoordSysFactoryInstance) == 0) {
+        // The next factory calls whatever is not null, and would call into a library that is gone.
+        if (gpCoordSysFactoryInstance->funcPtrs.module) CoordSysFuncPtrs::ClearEntryPoints();
         delete gpCoordSysFactoryInstance;
         gpCoordSysFactoryInstance = nullptr;
     }

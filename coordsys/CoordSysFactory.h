@@ -20,7 +20,8 @@ public:
     CoordSysFactory& operator=(const CoordSysFactory&) = delete;
     virtual ~CoordSysFactory() = default;
 
-    // The factory; null if memory ran out. Never throws.
+    // The factory; null if memory ran out or the engine threw while it started, and then without
+    // entry points either. Never throws.
     static CoordSysFactory* GetInstance();
 
     // Reads the settings of the bin, pe and gdal directories, each "Not Set" if it is empty, and

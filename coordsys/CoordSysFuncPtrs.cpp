@@ -19,12 +19,14 @@ bool Fetch(platform::LibraryHandle library, const char* name, Function*& functio
 }  // namespace
 
 CoordSysFuncPtrs::~CoordSysFuncPtrs() {
-    if (!module) return;
+    if (module) platform::UnloadLibrary(module);
+}
+
+void CoordSysFuncPtrs::ClearEntryPoints() {
     fp_Esri_Pe_Initialize = nullptr;
     fp_Esri_Pe_CreateFromString = nullptr;
     fp_Esri_Pe_CreateFromCode = nullptr;
     fp_Esri_Pe_Release = nullptr;
-    platform::UnloadLibrary(module);
 }
 
 String CoordSysFuncPtrs::EngineFileName() {

@@ -17,7 +17,9 @@ public:
     CoordSysFuncPtrs() = default;
     CoordSysFuncPtrs(const CoordSysFuncPtrs&) = delete;
     CoordSysFuncPtrs& operator=(const CoordSysFuncPtrs&) = delete;
-    // Unloads the library, and clears the entry points that would lead into it.
+    // Unloads the library and leaves the entry points: they are the process's, and another loader
+    // of the engine may be at work through them. Where there is none, they lead nowhere from then
+    // on; whoever destroys the last loader sees to it that nobody calls them.
     virtual ~CoordSysFuncPtrs();
 
     // Loads the engine of that directory (see EngineFileName), fetches its entry points and makes
@@ -25,6 +27,9 @@ public:
     // the first entry point that is missing; the library then stays loaded, with the entry points
     // found before. Once loaded, the library is not searched again.
     int LoadFuncPtrs(const String& binDirectory);
+
+    // Makes all entry points of the process null.
+    static void ClearEntryPoints();
 
     // File name of the engine on this platform.
     static String EngineFileName();

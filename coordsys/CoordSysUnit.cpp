@@ -2,7 +2,7 @@
 
 namespace zelm {
 
-const CoordSysUnit kCoordSysUnits[kCoordSysUnitCount] = {
+const CoordSysUnit kCoordSysUnits[] = {
     {"METER", "Meters", 1.0, 0, 9001},
     {"DEGREE", "Degrees", 1.0, 1, 9102},
     {"FOOT", "Feet", 0.3048, 0, 9002},

@@ -1,8 +1,7 @@
-// The units of coordinate systems, with their factors and codes.
+// The table of units of coordinate systems, with their factors and codes.
 #ifndef ZMC_COORDSYS_COORDSYSUNIT_H
 #define ZMC_COORDSYS_COORDSYSUNIT_H
 
-#include <cstddef>
 #include <cstdint>
 
 #include "core/String.h"
@@ -17,11 +16,10 @@ struct CoordSysUnit {
     std::int32_t code;
 };
 
-inline constexpr std::size_t kCoordSysUnitCount = 17;
-
-// The last row, "THE_END", is the end mark. The factor of "SECOND" is ten times a second of arc:
-// tables of other modules carry the same figure, and a description must compare equal to theirs.
-extern const CoordSysUnit kCoordSysUnits[kCoordSysUnitCount];
+// The last row, "THE_END", is the end mark. A vocabulary for hosts, which nothing here reads: what
+// `info` says of a coordinate system is the engine's word. The factor of "SECOND" is ten times a
+// second of arc, and stays so, since the rows are fixed; do not compute with it.
+extern const CoordSysUnit kCoordSysUnits[];
 
 }  // namespace zelm
 

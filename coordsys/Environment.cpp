@@ -13,8 +13,6 @@ namespace {
 
 const std::uint32_t Environment::typeCode = GloballyUniqueObjectTypeCode("Environment");
 
-String Environment::ToString() const { return MakeObjectUrl("Environment", this); }
-
 String& Environment::GetSetting(const String& key) const {
     return GetGlobalEnvironmentImpl().settings[key];
 }

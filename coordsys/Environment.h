@@ -17,7 +17,6 @@ public:
     bool IsKindOf(std::uint32_t code) const override {
         return code == typeCode || code == Object::typeCode;
     }
-    String ToString() const override;  // "{Environment}@" and the address
 
     // The value of `key`, which stays good while the table stands. A key that is not in the table
     // is inserted with an empty value: even reading may change the table. Throws std::bad_alloc.

@@ -46,10 +46,12 @@ public:
     virtual void GetWkt2(String& text) const = 0;
 
     // Transforms `count` points of this system into `target` in place, and returns how many came
-    // out. x is the easting or longitude and y the northing or latitude, whatever order the
-    // system's authority gives its axes, in the units of the systems; z may be null for points
-    // without heights. All coordinates of a point that cannot be transformed become infinite.
-    // `target` must come from the same engine.
+    // out. Where a system's axes point north and then east, or are a pole's northing and easting, x
+    // is the easting or longitude and y the northing or latitude, although its authority has them
+    // the other way round. In every other system x is the first axis and y the second, each in its
+    // own direction: EPSG:2053 has westing and southing, EPSG:2065 southing and westing. Units are
+    // those of the systems; z may be null for points without heights. All coordinates of a point
+    // that cannot be transformed become infinite. `target` must come from the same engine.
     virtual std::size_t Transform(const CoordSysImpl& target, std::size_t count, double* x,
                                   double* y, double* z) const = 0;
 

@@ -32,6 +32,7 @@ void AddDefaultDirectories(std::vector<std::string>& paths) {
     }
 }
 
+// Without any path, the context goes back to PROJ's own.
 void SetSearchPaths(PJ_CONTEXT* context, const std::vector<std::string>& paths) {
     std::vector<const char*> names;
     for (const std::string& path : paths) names.push_back(path.c_str());
@@ -57,11 +58,11 @@ int Esri_Pe_Initialize(String& peDirectory, String& gdalDirectory) {
         ProjContext context;
         PJ_CONTEXT* const proj = context.Get();
         if (!proj) return 0;
-        if (!paths.empty()) {
-            AddDefaultDirectories(paths);
-            SetSearchPaths(proj, paths);
-        }
-        return proj_context_get_database_path(proj) ? 1 : 0;
+        if (!paths.empty()) AddDefaultDirectories(paths);
+        SetSearchPaths(proj, paths);
+        // A context looks for its database once, unless it is told to; without a name, on its
+        // paths.
+        return proj_context_set_database_path(proj, nullptr, nullptr, nullptr);
     } catch (...) {
         return 0;
     }

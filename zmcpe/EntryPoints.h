@@ -9,9 +9,11 @@
 
 #define ZMCPE_EXPORT extern "C" __attribute__((visibility("default")))
 
-// Directories that PROJ searches for its data before its own. An empty text or "Not Set" names
-// none. 1 if the engine is ready to work, else 0. Without this call the engine works with PROJ's
-// own data.
+// Directories that PROJ searches for its data before its own, in place of those of an earlier call.
+// An empty text or "Not Set" names none. 1 if the engine is ready to work, else 0, as with a
+// directory whose database cannot be used: it is the first of its name, so the engine knows no code
+// until the next call. Without this call the engine works with PROJ's own data. Objects that are
+// there already keep what they know.
 ZMCPE_EXPORT int Esri_Pe_Initialize(zelm::String& peDirectory, zelm::String& gdalDirectory);
 
 // The coordinate system that a text describes: WKT 1 or 2, PROJJSON, a PROJ string, "EPSG:n".

@@ -9,6 +9,8 @@ PJ_CONTEXT* context = nullptr;
 ProjUser* firstUser = nullptr;
 bool closed = false;
 
+void DropMessage(void*, int, const char*) {}
+
 struct Closer {
     ~Closer() { ProjContext().CloseForGood(); }
 };
@@ -22,7 +24,10 @@ PJ_CONTEXT* ProjContext::Get() {
     if (context || closed) return context;
     context = proj_context_create();
     if (!context) return nullptr;
-    proj_log_level(context, PJ_LOG_NONE);  // refusals are answers, not news for the error stream
+    // Refusals are answers, not news for the error stream. The level alone lets the messages of a
+    // database that cannot be used through.
+    proj_log_func(context, nullptr, DropMessage);
+    proj_log_level(context, PJ_LOG_NONE);
     proj_context_set_enable_network(context, 0);
     return context;
 }

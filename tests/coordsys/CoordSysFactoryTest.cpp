@@ -136,9 +136,23 @@ TEST_F(CoordSysFactoryRun, FirstReleaseWithoutAnEngineIsHarmless) {
               "factory=1 module=0 pointers=0000 mutex=0 log=1\n");
 }
 
-TEST_F(CoordSysFactoryRun, DeletedFactoryLeavesNoPointersIntoTheLibrary) {
+// They are the process's, and another loader may have set them.
+TEST_F(CoordSysFactoryRun, DeletedFactoryLeavesTheEntryPoints) {
     EXPECT_THAT(RunProbe({"unload", StubDirectory(0), Pe()}).err,
-                HasSubstr("factory=0 module=0 pointers=0000 mutex=1"));
+                HasSubstr("factory=0 module=0 pointers=1111 mutex=1"));
+}
+
+TEST_F(CoordSysFactoryRun, SecondLoaderLeavesTheEngineOfTheFirstInUse) {
+    EXPECT_THAT(RunProbe({"second", StubDirectory(0), Pe()}).err,
+                HasSubstr("pointers=1111 mutex=1 log=1\nhandle\nRelease\n"));
+}
+
+// Nobody knows of that factory, so nobody may call into the library that went with it.
+TEST_F(CoordSysFactoryRun, FactoryThatFailsToStartTakesItsEntryPointsAlong) {
+    const ChildResult result = RunProbe({"retry", StubDirectory(5), Pe()});
+    EXPECT_EQ(result.err,
+              "Initialize throws\nfactory=0 module=0 pointers=0000 mutex=1 log=1\n"
+              "factory=1 module=0 pointers=0000 mutex=1 log=1\n");
 }
 
 }  // namespace

@@ -16,7 +16,8 @@ inline support::ChildResult RunProbe(std::vector<std::string> words) {
     return result;
 }
 
-// Directory of the stand-in engine that lacks that entry point, counted from 1; 0 lacks none.
+// Directory of the stand-in engine that lacks that entry point, counted from 1; 0 lacks none, 5
+// throws from the first.
 inline std::string StubDirectory(int lacks) {
     return ZMC_STUB_DIRECTORY "/stub" + std::to_string(lacks);
 }

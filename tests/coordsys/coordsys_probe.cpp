@@ -9,6 +9,9 @@
 //   coordsys_probe chain BIN PE CODE HANDLES   makes an object and destroys that many handles on it
 //   coordsys_probe first BIN PE                releases an object before anybody loaded the engine
 //   coordsys_probe unload BIN PE               deletes the factory with the library loaded
+//   coordsys_probe second BIN PE               another loader of the engine comes and goes
+//   coordsys_probe retry BIN PE                asks for a factory twice, the second time without
+//   BIN
 #include <cstdio>
 #include <cstdlib>
 #include <memory>
@@ -143,6 +146,32 @@ void FirstRelease(const std::vector<std::string>& words) {
     ReportEngine();
 }
 
+void ReleaseOneObject() {
+    std::fprintf(stderr, "handle\n");
+    CoordSys handle;
+    handle.impl = fp_Esri_Pe_CreateFromCode(1);
+}
+
+void SecondLoader(const std::vector<std::string>& words) {
+    SetDirectories(words.at(1), words.at(2), "-");
+    CoordSysFactory::GetInstance();
+    {
+        CoordSysFuncPtrs second;
+        second.LoadFuncPtrs(words.at(1).c_str());
+    }
+    ReportEngine();
+    ReleaseOneObject();
+}
+
+void Retry(const std::vector<std::string>& words) {
+    SetDirectories(words.at(1), words.at(2), "-");
+    CoordSysFactory::GetInstance();
+    ReportEngine();
+    SetDirectories("/nowhere", words.at(2), "-");
+    CoordSysFactory::GetInstance();
+    ReportEngine();
+}
+
 int Run(const std::vector<std::string>& words) {
     const std::string& command = words.at(0);
     if (command == "log") {
@@ -167,6 +196,10 @@ int Run(const std::vector<std::string>& words) {
         delete CoordSysFactory::GetInstance();
         gpCoordSysFactoryInstance = nullptr;
         ReportEngine();
+    } else if (command == "second") {
+        SecondLoader(words);
+    } else if (command == "retry") {
+        Retry(words);
     }
     return 0;
 }

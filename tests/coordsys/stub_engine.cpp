@@ -1,7 +1,10 @@
 // Stand-ins for the projection engine. Each build lacks one entry point, or none (ZMC_STUB_LACKS,
-// the number of the entry point from 1). They say on the error stream what was called.
+// the number of the entry point from 1); 5 lacks none, and breaks its contract: it cannot start,
+// and throws. They say on the error stream what was called.
 #include <cstdio>
 #include <memory>
+#include <stdexcept>
+#include <string>
 
 #include "coordsys/CoordSys.h"
 #include "zmcpe/CoordSysImpl.h"
@@ -48,8 +51,13 @@ private:
 
 #if ZMC_STUB_LACKS != 1
 STUB_EXPORT int Esri_Pe_Initialize(String& peDirectory, String& gdalDirectory) {
+#if ZMC_STUB_LACKS == 5
+    std::fprintf(stderr, "Initialize throws\n");
+    throw std::runtime_error(peDirectory.GetUtf8() + std::string(gdalDirectory.GetUtf8()));
+#else
     std::fprintf(stderr, "Initialize(%s,%s)\n", peDirectory.GetUtf8(), gdalDirectory.GetUtf8());
     return 1;
+#endif
 }
 #endif
 #if ZMC_STUB_LACKS != 2

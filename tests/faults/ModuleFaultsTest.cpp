@@ -9,6 +9,7 @@
 
 #include "connection/DataConnectionFactory.h"
 #include "connection/RasterDataConnection.h"
+#include "core/PixelVocabulary.h"
 #include "tests/support/AllocationFaults.h"
 #include "tests/support/CountingGeoRef.h"
 
@@ -49,6 +50,27 @@ protected:
     DataConnectionPtr Open() { return factory->Open(argument, geoRef, MetadataPtr()); }
     static RasterDataConnection& Raster(const DataConnectionPtr& connection) {
         return static_cast<RasterDataConnection&>(*connection);
+    }
+
+    // What a connection says that has opened whatever memory it lacked meanwhile.
+    void ExpectWhole(const DataConnectionPtr& connection) const {
+        ASSERT_TRUE(connection->IsOpen());
+        EXPECT_EQ(connection->GetPixelType(), 4u);
+        EXPECT_TRUE(connection->GetConnectionString() ==
+                    String("{MemoryRaster}@") + argument.data[1]);
+        const Array<String> parameters = connection->GetParameters();
+        ASSERT_EQ(parameters.shape.elements, 2u);
+        EXPECT_TRUE(parameters.data[0] == argument.data[0]);
+        EXPECT_TRUE(parameters.data[1] == argument.data[1]);
+        const RasterReaderDispatchPtr reader = Raster(connection).GetReader();
+        ASSERT_TRUE(reader);
+        EXPECT_TRUE(reader->As<float>());
+        const RasterProps props = Raster(connection).GetRasterProps();
+        EXPECT_EQ(props.samples, kSamples);
+        EXPECT_EQ(props.lines, kLines);
+        EXPECT_EQ(props.bands, 2u);
+        EXPECT_EQ(props.interleave, Interleave::BSQ);
+        EXPECT_TRUE(props.formatName == "MemoryRaster");
     }
 
     decltype(&CreateDataConnectionFactory) create = nullptr;
@@ -92,12 +114,7 @@ TEST_F(ModuleFaults, OpenGivesAnEmptyPointerOrAWholeConnection) {
         const bool failed = faults.Failed() != 0;
         faults.Disarm();
         EXPECT_TRUE(connection || failed);
-        if (connection && connection->IsOpen()) {
-            EXPECT_EQ(connection->GetPixelType(), 4u);
-            const RasterReaderDispatchPtr reader = Raster(connection).GetReader();
-            ASSERT_TRUE(reader);
-            EXPECT_TRUE(reader->As<float>());
-        }
+        if (connection) ExpectWhole(connection);
     });
     EXPECT_GE(points, 20u);
 }
@@ -138,8 +155,8 @@ TEST_F(ModuleFaults, ReopeningEndsOpenOrClosed) {
         const bool failed = faults.Failed() != 0;
         faults.Disarm();
         EXPECT_TRUE(opened || failed);
-        // An address that could not be read for want of memory leaves it open without pixels.
-        EXPECT_TRUE(!opened || connection->IsOpen() || failed);
+        EXPECT_EQ(connection->IsOpen(), opened);
+        if (opened) ExpectWhole(connection);
         EXPECT_TRUE(connection->Open(parameters, geoRef, MetadataPtr()));
         EXPECT_TRUE(connection->IsOpen());
     });

@@ -8,7 +8,6 @@
 
 #include "coordsys/BindCoordSys.h"
 #include "coordsys/CoordSysFactory.h"
-#include "coordsys/CoordSysUnit.h"
 #include "coordsys/Environment.h"
 #include "coordsys/EnvironmentKeys.h"
 #include "tests/support/ChildProcess.h"
@@ -91,23 +90,23 @@ struct Description {
 using Kind = CoordSysImpl::Kind;
 
 const Description kDescriptions[] = {
-    {"EPSG:4326", Kind::Geographic, "World Geodetic System 1984", "DEGREE", 1, 1, 9102},
-    {"EPSG:4979", Kind::Geographic, "World Geodetic System 1984", "DEGREE", 1, 1, 9102},
-    {"EPSG:32633", Kind::Projected, "World Geodetic System 1984", "METER", 1, 0, 9001},
-    {"EPSG:2263", Kind::Projected, "North American Datum 1983", "FOOT_US", 0.3048006096012192, 0,
-     9003},
-    {"EPSG:2222", Kind::Projected, "North American Datum 1983", "FOOT", 0.3048, 0, 9002},
-    {"EPSG:7405", Kind::Projected, "Ordnance Survey of Great Britain 1936", "METER", 1, 0, 9001},
-    {"EPSG:4978", Kind::Other, "World Geodetic System 1984", "METER", 1, 0, 9001},
-    {"EPSG:5773", Kind::Other, "EGM96 geoid", "METER", 1, 0, 9001},
+    {"EPSG:4326", Kind::Geographic, "World Geodetic System 1984", "degree", 1, 1, 9122},
+    {"EPSG:4979", Kind::Geographic, "World Geodetic System 1984", "degree", 1, 1, 9122},
+    {"EPSG:32633", Kind::Projected, "World Geodetic System 1984", "metre", 1, 0, 9001},
+    {"EPSG:2263", Kind::Projected, "North American Datum 1983", "US survey foot",
+     0.3048006096012192, 0, 9003},
+    {"EPSG:2222", Kind::Projected, "North American Datum 1983", "foot", 0.3048, 0, 9002},
+    {"EPSG:7405", Kind::Projected, "Ordnance Survey of Great Britain 1936", "metre", 1, 0, 9001},
+    {"EPSG:4978", Kind::Other, "World Geodetic System 1984", "metre", 1, 0, 9001},
+    {"EPSG:5773", Kind::Other, "EGM96 geoid", "metre", 1, 0, 9001},
     {"EPSG:4807", Kind::Geographic, "Nouvelle Triangulation Francaise (Paris)", "grad", 0.9, 1,
      9105},
     {"+proj=utm +zone=33 +ellps=bessel +towgs84=1,2,3 +units=km", Kind::Projected,
-     "Unknown based on Bessel 1841 ellipsoid using towgs84=1,2,3", "KILOMETER", 1000, 0, 9036},
+     "Unknown based on Bessel 1841 ellipsoid using towgs84=1,2,3", "kilometre", 1000, 0, 9036},
     {"LOCAL_CS[\"bench\",UNIT[\"cubit\",0.4572]]", Kind::Other, "D_Unknown", "cubit", 0.4572, 0, 0},
 };
 
-TEST_F(Engine, InfoIsFilledFromTheEngineAndTheUnitTable) {
+TEST_F(Engine, InfoIsWhatTheEngineSays) {
     for (const Description& expected : kDescriptions) {
         const auto system = BindCoordSys(expected.definition);
         ASSERT_NE(system, nullptr) << expected.definition;
@@ -120,18 +119,38 @@ TEST_F(Engine, InfoIsFilledFromTheEngineAndTheUnitTable) {
     }
 }
 
-TEST_F(Engine, UnitsWithoutCodeAreFoundByNameOrFactor) {
-    const std::string system =
-        "PROJCS[\"x\",GEOGCS[\"x\",DATUM[\"x\",SPHEROID[\"x\",6378137,298]],PRIMEM[\"Greenwich\","
-        "0],UNIT[\"degree\",0.0174532925199433]],PROJECTION[\"Transverse_Mercator\"],";
-    const auto byName = BindCoordSys((system + "UNIT[\"Foot_US\",0.3048006]]").c_str());
-    ASSERT_NE(byName, nullptr);
-    EXPECT_EQ(byName->info.unitCode, 9003);
-    EXPECT_EQ(byName->info.unitFactor, 0.3048006096012192);
-    const auto byFactor = BindCoordSys((system + "UNIT[\"furlongish\",1852]]").c_str());
-    ASSERT_NE(byFactor, nullptr);
-    EXPECT_EQ(Narrow(byFactor->info.unitName), "NAUTICAL_MILE");
-    EXPECT_EQ(byFactor->info.unitCode, 9030);
+std::string InUnit(const std::string& unit) {
+    return "PROJCS[\"x\",GEOGCS[\"x\",DATUM[\"x\",SPHEROID[\"x\",6378137,298]],"
+           "PRIMEM[\"Greenwich\",0],UNIT[\"degree\",0.0174532925199433]],"
+           "PROJECTION[\"Transverse_Mercator\"]," +
+           unit + "]";
+}
+
+// Names and factors near those of the table of units do not draw its rows in.
+TEST_F(Engine, UnitsWithoutCodeStayAsTheyAre) {
+    const auto foot = BindCoordSys(InUnit("UNIT[\"Foot_US\",0.3048006]").c_str());
+    ASSERT_NE(foot, nullptr);
+    EXPECT_EQ(Narrow(foot->info.unitName), "Foot_US");
+    EXPECT_EQ(foot->info.unitFactor, 0.3048006);
+    EXPECT_EQ(foot->info.unitCode, 0);
+    const auto odd = BindCoordSys(InUnit("UNIT[\"furlongish\",1852]").c_str());
+    ASSERT_NE(odd, nullptr);
+    EXPECT_EQ(Narrow(odd->info.unitName), "furlongish");
+    EXPECT_EQ(odd->info.unitFactor, 1852);
+    EXPECT_EQ(odd->info.unitCode, 0);
+}
+
+// The table of units has ten times as much for a second of arc.
+TEST_F(Engine, SecondsOfArcHaveTheFactorOfTheEngine) {
+    const auto seconds = BindCoordSys(
+        "GEOGCS[\"x\",DATUM[\"x\",SPHEROID[\"x\",6378137,298]],PRIMEM[\"Greenwich\",0],"
+        "UNIT[\"arc-second\",4.84813681109536E-06,AUTHORITY[\"EPSG\",\"9104\"]]]");
+    ASSERT_NE(seconds, nullptr);
+    EXPECT_EQ(Narrow(seconds->info.unitName), "arc-second");
+    EXPECT_NEAR(seconds->info.unitFactor, 1 / 3600.0, 1e-12);
+    EXPECT_EQ(seconds->info.unitKind, 1u);
+    EXPECT_EQ(seconds->info.unitCode, 9104);
+    EXPECT_EQ(seconds->info.unitFactor, seconds->impl->GetUnitFactor());
 }
 
 TEST_F(Engine, Wkt2IsOneLineAndReadsBack) {
@@ -247,6 +266,29 @@ TEST_F(Engine, DirectoriesOfTheHostStandBeforeThoseOfProj) {
     String none;
     EXPECT_EQ(fp_Esri_Pe_Initialize(none, none), 1);
     EXPECT_NE(BindCoordSys(3857), nullptr);
+}
+
+// Each is the first of its name that PROJ finds, and nothing that it can work with.
+TEST_F(Engine, UnusableDatabaseIsRefusedInSilenceAndForgottenAtTheNextCall) {
+    const support::ScratchDirectory scratch;
+    for (const char* kind : {"garbage", "empty", "folder"}) {
+        const std::filesystem::path directory = scratch / kind;
+        std::filesystem::create_directories(directory);
+        if (kind == std::string("folder"))
+            std::filesystem::create_directory(directory / "proj.db");
+        else
+            support::WriteText(directory / "proj.db",
+                               kind == std::string("empty") ? "" : std::string(5000, 'x'));
+        String pe(directory.c_str());
+        String none("Not Set");
+        testing::internal::CaptureStderr();
+        EXPECT_EQ(fp_Esri_Pe_Initialize(pe, none), 0) << kind;
+        EXPECT_EQ(BindCoordSys(4326), nullptr) << kind;
+        EXPECT_EQ(BindCoordSys("EPSG:3857"), nullptr) << kind;
+        EXPECT_EQ(testing::internal::GetCapturedStderr(), "") << kind;
+        EXPECT_EQ(fp_Esri_Pe_Initialize(none, none), 1) << kind;
+        EXPECT_NE(BindCoordSys(4326), nullptr) << kind;
+    }
 }
 
 TEST(EngineLibrary, ExportsFourNamesAndNothingElse) {

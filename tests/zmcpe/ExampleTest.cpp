@@ -26,7 +26,7 @@ TEST(CoordSysExample, PrintsTheRastersSystemAndItsCornersAsGdalHasThem) {
     const auto example = support::RunChild({ZMC_EXAMPLE, ZMC_ENGINE_DIRECTORY, kGrid, "EPSG:8857"});
     ASSERT_EQ(example.status, 0) << example.err;
     EXPECT_THAT(example.out, testing::HasSubstr("name   WGS 84\n"));
-    EXPECT_THAT(example.out, testing::HasSubstr("unit   DEGREE, 1 degrees, code 9102\n"));
+    EXPECT_THAT(example.out, testing::HasSubstr("unit   degree, 1 degrees, code 9122\n"));
     const std::size_t corners = example.out.find("Corners in EPSG:8857\n");
     ASSERT_NE(corners, example.out.npos);
     const auto actual = Numbers(example.out.substr(corners + 21));

@@ -75,7 +75,7 @@ Point ByProj(const std::string& from, const std::string& to, const Point& point)
     return Parse(result.out);
 }
 
-class Transform : public testing::TestWithParam<Case> {
+class Transform : public testing::Test {
 protected:
     static void SetUpTestSuite() {
         Environment().GetSetting(EnvironmentKeys::kBinDirectory) = ZMC_ENGINE_DIRECTORY;
@@ -90,7 +90,9 @@ protected:
     }
 };
 
-TEST_P(Transform, AgreesWithTheTools) {
+class TransformCase : public Transform, public testing::WithParamInterface<Case> {};
+
+TEST_P(TransformCase, AgreesWithTheTools) {
     const Case& sample = GetParam();
     const auto geographic = BindCoordSys(4326);
     const auto system = BindCoordSys(sample.code);
@@ -111,9 +113,48 @@ TEST_P(Transform, AgreesWithTheTools) {
     ExpectNear(back, Swapped(ByProj(name, "EPSG:4326", officialThere)), kNanodegree);
 }
 
-INSTANTIATE_TEST_SUITE_P(Codes, Transform, testing::ValuesIn(kCases), [](const auto& sample) {
+INSTANTIATE_TEST_SUITE_P(Codes, TransformCase, testing::ValuesIn(kCases), [](const auto& sample) {
     return "Epsg" + std::to_string(sample.param.code);
 });
+
+struct KeptAxes {
+    int code;
+    Point place;  // longitude and latitude
+    Point axes;   // what its own axes say there, in their own order and directions
+};
+
+// Systems whose axes do not point north and east keep them, whichever comes first: westing and
+// southing in the Cape, southing and westing in Bohemia.
+TEST_F(Transform, AxesThatPointElsewhereStayAsTheyAre) {
+    const auto geographic = BindCoordSys(4326);
+    ASSERT_NE(geographic, nullptr);
+    for (const KeptAxes& sample : {KeptAxes{2053, {28.5, -26}, {50059.251, 2876930.325}},
+                                   KeptAxes{2065, {15, 50}, {1058147.274, 703011.882}}}) {
+        const auto system = BindCoordSys(sample.code);
+        ASSERT_NE(system, nullptr);
+        const std::string name = "EPSG:" + std::to_string(sample.code);
+        const Point there = ByEngine(*geographic, *system, sample.place);
+        ExpectNear(there, sample.axes, kMillimetre);
+        ExpectNear(there, ByProj("EPSG:4326", name, Swapped(sample.place)), kMillimetre);
+        ExpectNear(there, ByGdal("EPSG:4326", name, sample.place), kMillimetre);
+        ExpectNear(ByEngine(*system, *geographic, there), ByGdal(name, "EPSG:4326", there),
+                   kNanodegree);
+    }
+}
+
+// Both axes point away from the pole; their names tell easting from northing.
+TEST_F(Transform, EastingIsFirstAtThePolesToo) {
+    const auto geographic = BindCoordSys(4326);
+    const auto northingFirst = BindCoordSys(32661);
+    const auto eastingFirst = BindCoordSys(5041);
+    ASSERT_NE(northingFirst, nullptr);
+    ASSERT_NE(eastingFirst, nullptr);
+    const Point place = {30, 85};
+    const Point there = ByEngine(*geographic, *northingFirst, place);
+    ExpectNear(there, {2277728.696, 1518959.788}, kMillimetre);
+    ExpectNear(there, ByEngine(*geographic, *eastingFirst, place), kMillimetre);
+    ExpectNear(there, Swapped(ByProj("EPSG:4326", "EPSG:32661", Swapped(place))), kMillimetre);
+}
 
 }  // namespace
 }  // namespace zelm
