@@ -11,19 +11,6 @@
 namespace zelm {
 namespace {
 
-// Gives the elements of `from` to the owning array `to`, without copying them.
-template <class T>
-void Hand(Array<T>& from, Array<T>& to) {
-    if (!to.owned) {
-        to = from;
-        return;
-    }
-    to.Clear();
-    std::swap(to.data, from.data);
-    std::swap(to.shape, from.shape);
-    std::swap(to.capacity, from.capacity);
-}
-
 // Parses the metadata document and has `take` look at the records; `withoutText` is the answer
 // where there is no document.
 template <class T, class Take>
@@ -82,7 +69,12 @@ bool PyramidDataset::LoadHistograms(Array<RasterBandHistogram<T>>& out) {
 
 template <class T>
 bool PyramidDataset::LoadPalette(std::uint32_t band, Palette& out) {
-    return ParseMeta<T>(*this, true, [&](auto& handlers) { handlers.palettes[band].CopyTo(out); });
+    return ParseMeta<T>(*this, true, [&](auto& handlers) {
+        // Without copying, which could end halfway.
+        Palette& found = handlers.palettes[band];
+        out.colors.swap(found.colors);
+        out.nextIndex = found.nextIndex;
+    });
 }
 
 template <class T>

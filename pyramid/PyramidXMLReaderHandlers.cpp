@@ -72,15 +72,38 @@ T ToPixel(double value) {
         return FromDouble<T>(value);
 }
 
+// Copies of arrays and colours that find no memory are empty and say nothing, so arrays are handed
+// over, and colours are looked at.
+template <class T>
+void Move(RasterBandStats<T>& from, RasterBandStats<T>& to) {
+    to = from;  // its arrays are empty
+}
+
+template <class T>
+void Move(RasterBandHistogram<T>& from, RasterBandHistogram<T>& to) {
+    Array<std::uint64_t> counts;
+    Hand(from.counts, counts);
+    to = from;
+    Hand(counts, to.counts);
+}
+
+bool IsWhole(const Palette& palette) {
+    return std::all_of(palette.colors.begin(), palette.colors.end(),
+                       [](const auto& entry) { return static_cast<bool>(entry.second); });
+}
+
 // Array::Append grows by one element, which takes time in the square of their number.
 template <class T>
-void AppendGrowing(Array<T>& array, const T& value) {
+void AppendGrowing(Array<T>& array, T& value) {
     const std::uint32_t count = array.shape.elements;
     if (count == array.capacity) {
-        const std::unique_ptr<T[]> old(array.data);
-        if (!array.Reserve(std::max(8u, count * 2))) throw std::bad_alloc();
+        Array<T> longer;
+        if (!longer.Reserve(std::max(8u, count * 2))) throw std::bad_alloc();
+        for (std::uint32_t i = 0; i < count; ++i) Move(array.data[i], longer.data[i]);
+        Hand(longer, array);
     }
-    if (!array.Append(value)) throw std::bad_alloc();  // unreachable: there is room now
+    Move(value, array.data[count]);
+    array.shape = ArrayShape(count + 1);
 }
 
 // Gives an array that owns its elements `count` of them, the new ones 0.
@@ -146,7 +169,9 @@ void PyramidXMLReaderCore::endElement(const XMLCh* const) {
     } else if (state == StateOf(HISTOGRAMS)) {
         EndHistogram();
     } else if (state == StateOf(PALETTE)) {
-        currentPalette.CopyTo(palettes[paletteBand]);
+        Palette& kept = palettes[paletteBand];
+        currentPalette.CopyTo(kept);
+        if (!IsWhole(currentPalette) || !IsWhole(kept)) throw std::bad_alloc();
     }
 }
 

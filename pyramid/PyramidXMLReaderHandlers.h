@@ -18,6 +18,7 @@
 #include <memory>
 #include <string>
 #include <string_view>
+#include <utility>
 
 #include <xercesc/sax/HandlerBase.hpp>
 
@@ -42,6 +43,20 @@ constexpr std::int32_t StateOf(ElementName name) { return StateOf(static_cast<in
 // Bins that the histograms of one document may have beyond the entries of their lists, all
 // together. A histogram that would take more keeps no counts: it claims what its text cannot hold.
 inline constexpr std::uint64_t kSpareBins = 1u << 20;
+
+// Gives the elements of the owning array `from` to `to`, without copying them; a view takes what it
+// has room for.
+template <class T>
+void Hand(Array<T>& from, Array<T>& to) {
+    if (!to.owned) {
+        to = from;
+        return;
+    }
+    to.Clear();
+    std::swap(to.data, from.data);
+    std::swap(to.shape, from.shape);
+    std::swap(to.capacity, from.capacity);
+}
 
 // Reads the counts of the histogram in hand. They grow with the pieces of the list, and take their
 // full number when its end has been seen: before that, nobody can tell what the text lacks. May

@@ -103,12 +103,10 @@ public:
             inStats = true;
         } else if (name == "HISTOGRAMS") {
             histogram = {};
-            counted = false;
+            listBins = entries = 0;
             inHistogram = true;
         } else if (name == "PALETTE") {
             palette = {};
-            paletteBand = 0;
-            ++openPalettes;
         }
     }
     void Close() {
@@ -118,11 +116,13 @@ public:
             if (inStats) out.meta.stats.push_back(stats);
             inStats = false;
         } else if (name == "HISTOGRAMS") {
-            if (inHistogram) out.meta.histograms.push_back(histogram);
+            if (inHistogram) {
+                FillCounts();
+                out.meta.histograms.push_back(histogram);
+            }
             inHistogram = false;
         } else if (name == "PALETTE") {
             out.meta.palettes[paletteBand] = palette;
-            --openPalettes;
         }
     }
     void Text(std::string_view text) {
@@ -134,7 +134,7 @@ public:
             TakeStats(name, text);
         else if (name.compare(0, 5, "HIST_") == 0 && inHistogram)
             TakeHistogram(name, text);
-        else if (name.compare(0, 8, "PALETTE_") == 0 && openPalettes != 0)
+        else if (name.compare(0, 8, "PALETTE_") == 0)
             TakePalette(name, text);
     }
 
@@ -191,19 +191,26 @@ private:
         HistogramRecord& h = histogram;
         const std::vector<std::string_view> tokens = Tokens(text);
         if (text.size() > kSurelyOnePiece) h.sure = false;
-        if (!counted) {
-            const std::uint64_t spare = h.binCount > tokens.size() ? h.binCount - tokens.size() : 0;
-            if (spare > spareBins) return;
-            spareBins -= spare;
-            h.counts.assign(h.binCount, 0);
-            counted = true;
+        if (listBins == 0) {
+            listBins = h.binCount;
+            entries = 1;
         }
-        const std::size_t end = std::min<std::size_t>({tokens.size(), h.counts.size(), h.binCount});
+        entries += tokens.size() - 1;
+        const std::size_t end = std::min<std::size_t>({tokens.size(), listBins, h.binCount});
+        h.counts.resize(std::max(h.counts.size(), end));
         for (std::size_t i = 0; i < end; ++i) {
             const double value = RealOf(tokens[i]);
             if (!(value >= 0 && value < 9e15)) h.sure = false;
             h.counts[i] = h.sure ? static_cast<std::uint64_t>(value) : 0;
         }
+    }
+
+    // What the list lacks is 0, unless it lacks too much.
+    void FillCounts() {
+        const std::uint64_t spare = listBins > entries ? listBins - entries : 0;
+        const bool given = spare <= spareBins;
+        if (given) spareBins -= spare;
+        histogram.counts.resize(given ? listBins : 0);
     }
 
     void TakePalette(const std::string& name, std::string_view text) {
@@ -225,8 +232,9 @@ private:
     StatsRecord stats;
     HistogramRecord histogram;
     PaletteRecord palette;
-    bool inStats = false, inHistogram = false, counted = false;
-    std::uint32_t openPalettes = 0, paletteBand = 0;
+    bool inStats = false, inHistogram = false;
+    std::uint32_t paletteBand = 0;
+    std::uint64_t listBins = 0, entries = 0;  // of the histogram's lists
     std::uint64_t spareBins = kSpareBins;
 };
 
@@ -490,14 +498,13 @@ std::uint32_t IntegerOf(std::string_view text) {
     while (at < text.size() && std::strchr(" \t\n\v\f\r", text[at])) ++at;
     bool negative = false;
     if (at < text.size() && (text[at] == '-' || text[at] == '+')) negative = text[at++] == '-';
+    // Beyond 64 bits with a sign the nearest of them stands.
+    const std::uint64_t most = static_cast<std::uint64_t>(INT64_MAX) + (negative ? 1 : 0);
     std::uint64_t value = 0;
-    bool huge = false;
     for (; at < text.size() && text[at] >= '0' && text[at] <= '9'; ++at) {
         const auto digit = static_cast<std::uint64_t>(text[at] - '0');
-        huge = huge || value > (UINT64_MAX - digit) / 10;
-        value = value * 10 + digit;
+        value = value > (most - digit) / 10 ? most : value * 10 + digit;
     }
-    if (huge) value = INT64_MAX;
     const auto low = static_cast<std::uint32_t>(value);
     return negative ? 0u - low : low;
 }

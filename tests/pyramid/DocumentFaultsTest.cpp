@@ -66,5 +66,50 @@ TEST(DocumentFaults, AMessageWithoutMemoryLetsNothingOut) {
     EXPECT_GT(points, 0u);
 }
 
+using FetchFaults = PyramidFileTest;
+
+// What comes back is all that was stored, or what a file without records gives.
+TEST_F(FetchFaults, AreWholeOrNothing) {
+    using Pixel = unsigned char;
+    constexpr std::uint32_t kRecords = 20, kBins = 7;
+    PyramidDescription d;
+    d.samples = d.lines = 4;
+    zelm::Array<zelm::RasterBandHistogram<Pixel>> stored;
+    zelm::Palette colours;
+    for (std::uint32_t i = 0; i < kRecords; ++i) {
+        zelm::RasterBandHistogram<Pixel> histogram;
+        histogram.band = i;
+        histogram.binCount = kBins;
+        for (std::uint32_t bin = 0; bin < kBins; ++bin) histogram.counts.Append(bin + 1);
+        stored.Append(histogram);
+        colours.AddColor(zelm::RGBAColor(
+            zelm::Array<Pixel>(std::vector<Pixel>(4, Pixel(i + 1)).data(), zelm::ArrayShape(4))));
+    }
+    const auto dataset = Create(d);
+    ASSERT_TRUE(dataset->SetHistograms(stored) && dataset->SetPalette(0, colours));
+    testing::internal::CaptureStderr();
+    const std::size_t points = ForEachAllocationFailing([&](AllocationFaults& faults) {
+        const auto histograms = dataset->GetHistograms<Pixel>();
+        const zelm::PalettePtr palette = dataset->GetPalette<Pixel>(0);
+        faults.Disarm();
+        if (const std::uint32_t count = histograms.shape.elements) {
+            ASSERT_EQ(count, kRecords);
+            for (std::uint32_t i = 0; i < count; ++i) {
+                ASSERT_EQ(histograms.data[i].counts.shape.elements, kBins) << i;
+                EXPECT_EQ(histograms.data[i].counts.data[kBins - 1], kBins);
+            }
+        }
+        if (palette && palette->nextIndex != 0) {
+            ASSERT_EQ(palette->nextIndex, kRecords);
+            for (std::uint32_t i = 0; i < kRecords; ++i)
+                EXPECT_EQ(palette->GetColor(i)->green, i + 1);
+        } else if (palette) {
+            EXPECT_TRUE(palette->colors.empty());
+        }
+    });
+    testing::internal::GetCapturedStderr();
+    EXPECT_GT(points, 100u);
+}
+
 }  // namespace
 }  // namespace zmctest
