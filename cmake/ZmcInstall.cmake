@@ -1,7 +1,7 @@
 # Installation: libraries, the command line, public headers, the CMake package `zmcraster` and zmcraster.pc.
 #
 # The module is a library that hosts load by path, so it has a folder of its own below the library
-# directory; it finds zmcg one floor up, by its own place. Hosts link the rest.
+# directory; it finds zmcg one floor up, by its own place, as zmcloader finds it. Hosts link the rest.
 
 option(ZMC_INSTALL "Make install rules" ${PROJECT_IS_TOP_LEVEL})
 if(NOT ZMC_INSTALL)
@@ -11,12 +11,12 @@ include(CMakePackageConfigHelpers)
 
 set(ZMC_INSTALL_CMAKEDIR "${CMAKE_INSTALL_LIBDIR}/cmake/zmcraster")
 set(ZMC_INSTALL_MODULEDIR "${CMAKE_INSTALL_LIBDIR}/zmcraster")
-set(ZMC_INSTALL_HEADERDIR "${CMAKE_INSTALL_INCLUDEDIR}/zmcraster")
 
 # What hosts link, users before what they use, and the module itself.
-set(linked zmchost zmccoordsys zmccore zmcplatform zmctext zmcg)
+set(linked zmchost zmcloader zmccoordsys zmccore zmcplatform zmctext zmcg)
 set(loaded zmcraster zmcpe)
-set_target_properties(${loaded} PROPERTIES INSTALL_RPATH "$ORIGIN;$ORIGIN/..")
+zmc_set_run_path("$ORIGIN;$ORIGIN/.." ${loaded})
+zmc_set_run_path("$ORIGIN" zmcloader)
 
 install(TARGETS ${linked} EXPORT zmcrasterTargets
     ARCHIVE DESTINATION ${CMAKE_INSTALL_LIBDIR}
@@ -28,8 +28,6 @@ install(TARGETS ${loaded} EXPORT zmcrasterTargets
 
 # The command line with its man page and completion.
 if(TARGET zmcraster_cli)
-    set_target_properties(zmcraster_cli PROPERTIES
-        INSTALL_RPATH "$ORIGIN/../${CMAKE_INSTALL_LIBDIR}")
     install(TARGETS zmcraster_cli RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR})
     set(documents "${CMAKE_BINARY_DIR}/tools")
     install(FILES ${documents}/zmcraster.man
@@ -38,25 +36,7 @@ if(TARGET zmcraster_cli)
         DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions RENAME zmcraster)
 endif()
 
-# Headers: floors that are public as a whole, and the interfaces of the others.
-install(DIRECTORY platform core metadata colour dispatch coordsys zmcg host
-    DESTINATION ${ZMC_INSTALL_HEADERDIR} FILES_MATCHING PATTERN "*.h")
-set(interfaces
-    connection/DataConnection.h
-    connection/DataConnectionFactory.h
-    connection/RasterDataConnection.h
-    raster/BasicRasterReader.h
-    raster/RasterBandHistogram.h
-    raster/RasterBandStats.h
-    raster/RasterProps.h
-    raster/RasterPropsCopy.h
-    raster/RasterReader.h
-    zmcpe/CoordSysImpl.h
-    zmcpe/EntryPoints.h)
-foreach(header ${interfaces})
-    get_filename_component(folder ${header} DIRECTORY)
-    install(FILES ${header} DESTINATION ${ZMC_INSTALL_HEADERDIR}/${folder})
-endforeach()
+install(DIRECTORY ${ZMC_PUBLIC_INCLUDE}/zmcraster DESTINATION ${CMAKE_INSTALL_INCLUDEDIR})
 
 # The CMake package.
 install(EXPORT zmcrasterTargets NAMESPACE zmcraster:: DESTINATION ${ZMC_INSTALL_CMAKEDIR})

@@ -76,7 +76,8 @@ function(zmc_add_library name kind)
     target_compile_features(${name} PUBLIC cxx_std_20)
     target_compile_options(${name} PUBLIC -fsigned-char)
     target_include_directories(${name} PUBLIC
-        $<BUILD_INTERFACE:${ZMC_ROOT}> $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}/zmcraster>)
+        $<BUILD_INTERFACE:${ZMC_ROOT}> $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}>
+        $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}/zmcraster>)
     if(NOT ZMC_SANITIZE AND kind MATCHES "SHARED|MODULE" AND CMAKE_SYSTEM_NAME STREQUAL "Linux")
         target_link_options(${name} PRIVATE LINKER:-z,defs)
     endif()
@@ -85,4 +86,12 @@ endfunction()
 function(zmc_add_executable name)
     add_executable(${name} ${ARGN})
     zmc_configure_target(${name})
+endfunction()
+
+# zmc_set_run_path(path targets...): where binaries that are installed look for ours, from their own
+# place. One path serves the build and the install: CMake makes room for another by filling up the
+# first with colons, and an empty element means the working directory.
+function(zmc_set_run_path path)
+    set_target_properties(${ARGN} PROPERTIES INSTALL_RPATH "${path}"
+        INSTALL_RPATH_USE_LINK_PATH ON BUILD_WITH_INSTALL_RPATH ON)
 endfunction()

@@ -66,8 +66,6 @@ std::string SystemRun();
 
 std::uint64_t CurrentProcess();
 bool ProcessAlive(std::uint64_t process);
-// Path of the program or library that the code at an address was loaded from; empty if not known.
-std::string FileOfCode(const void* code);
 // A number that another call, in this process or another, does not give.
 std::uint64_t RandomNumber();
 

@@ -11,6 +11,7 @@
 
 #include "connection/DataConnectionFactory.h"
 #include "connection/RasterDataConnection.h"
+#include "loader/OpenModule.h"
 #include "raster/RasterProps.h"
 
 namespace zmchost {
@@ -20,20 +21,19 @@ using ModulePtr = std::shared_ptr<const Module>;
 
 class Module {
 public:
-    // Loads the module of that path; an empty path means DefaultPath(). Initialises Xerces-C++,
-    // which the module needs and leaves to its host. Throws Error.
+    // Loads the module of that path; an empty path means DefaultPath(). Starts Xerces-C++, which
+    // the module needs and leaves to its host. Throws Error.
     static ModulePtr Load(const std::string& path = {});
 
-    // The environment variable ZMCRASTER_MODULE if it is set, else the module beside the program
-    // or library that this code is part of, else the one in the library folder beside that, else
-    // the installed one, else its bare name, for the system to find.
+    // Where zmcraster::FindModule finds it: what ZMCRASTER_MODULE names, else what was installed or
+    // built with this library.
     static std::string DefaultPath();
 
     ~Module();
     Module(const Module&) = delete;
     Module& operator=(const Module&) = delete;
 
-    const std::string& Path() const { return path; }
+    const std::string& Path() const { return loaded.path; }
 
     // An open connection to the pyramid file of that name, or to the memory raster that the
     // parameter string describes. Empty if the module refuses, which it does without a reason.
@@ -44,12 +44,9 @@ public:
                                                 zelm::RasterProps props) const;
 
 private:
-    explicit Module(std::string libraryPath);
-    void Bind();
+    explicit Module(zmcraster::LoadedModule opened);
 
-    std::string path;
-    void* library = nullptr;
-    void (*deleteFactory)(zelm::DataConnectionFactory*) = nullptr;
+    zmcraster::LoadedModule loaded;
     zelm::DataConnectionFactory* factory = nullptr;
 };
 

@@ -1,7 +1,6 @@
 #include "platform/FileSystem.h"
 
 #include <dirent.h>
-#include <dlfcn.h>
 #include <fcntl.h>
 #include <signal.h>
 #include <sys/stat.h>
@@ -165,12 +164,6 @@ std::uint64_t CurrentProcess() { return static_cast<std::uint64_t>(::getpid()); 
 bool ProcessAlive(std::uint64_t process) {
     if (process == 0 || process > INT_MAX) return false;
     return ::kill(static_cast<pid_t>(process), 0) == 0 || errno != ESRCH;
-}
-
-std::string FileOfCode(const void* code) {
-    Dl_info info{};
-    if (::dladdr(code, &info) == 0 || !info.dli_fname) return {};
-    return info.dli_fname;
 }
 
 std::uint64_t RandomNumber() {

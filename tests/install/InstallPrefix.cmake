@@ -11,6 +11,7 @@ execute_process(COMMAND ${CMAKE_COMMAND} --install ${ZMC_BUILD} --prefix ${ZMC_P
 foreach(file
         ${ZMC_LIBDIR}/zmcraster/libzmcraster.so
         ${ZMC_LIBDIR}/libzmcg.so
+        ${ZMC_LIBDIR}/libzmcloader.so
         ${ZMC_LIBDIR}/libzmccore.a
         ${ZMC_LIBDIR}/pkgconfig/zmcraster.pc
         ${ZMC_LIBDIR}/cmake/zmcraster/zmcraster-config.cmake

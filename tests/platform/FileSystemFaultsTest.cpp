@@ -158,11 +158,6 @@ TEST_F(FileSystemFaults, ProcessesThatLiveAndThatDoNot) {
     EXPECT_FALSE(ProcessAlive(static_cast<std::uint64_t>(child)));
 }
 
-TEST_F(FileSystemFaults, CodeHasAFile) {
-    EXPECT_NE(FileOfCode(reinterpret_cast<const void*>(&FileOfCode)), "");
-    EXPECT_EQ(FileOfCode(nullptr), "");
-}
-
 TEST_F(FileSystemFaults, LocksTellWhyTheyFail) {
     FileLock lock;
     const auto take = [&] { return lock.Take(path); };
