@@ -14,7 +14,7 @@ set(ZMC_INSTALL_MODULEDIR "${CMAKE_INSTALL_LIBDIR}/zmcraster")
 set(ZMC_INSTALL_HEADERDIR "${CMAKE_INSTALL_INCLUDEDIR}/zmcraster")
 
 # What hosts link, users before what they use, and the module itself.
-set(linked zmchost zmccoordsys zmccore zmcplatform zmctext zmcg)
+set(linked zmchost zmccoordsys zmccore zmcfiles zmcplatform zmctext zmcg)
 set(loaded zmcraster zmcpe)
 set_target_properties(${loaded} PROPERTIES INSTALL_RPATH "$ORIGIN;$ORIGIN/..")
 
@@ -39,7 +39,7 @@ if(TARGET zmcraster_cli)
 endif()
 
 # Headers: floors that are public as a whole, and the interfaces of the others.
-install(DIRECTORY platform core metadata colour dispatch coordsys zmcg host
+install(DIRECTORY platform files core metadata colour dispatch coordsys zmcg host
     DESTINATION ${ZMC_INSTALL_HEADERDIR} FILES_MATCHING PATTERN "*.h")
 set(interfaces
     connection/DataConnection.h
