@@ -54,6 +54,84 @@ bool Overflows(std::uint64_t offset, std::size_t size) {
 
 }  // namespace
 
+// All calls of what derived classes fill in.
+class ByteSource::Border {
+public:
+    static Transfer ReadOnce(ByteSource& source, std::uint64_t offset, void* buffer,
+                             std::size_t size) noexcept {
+        return GuardedTransfer(size, [&] { return source.DoReadAt(offset, buffer, size); });
+    }
+
+    static Transfer WriteOnce(ByteSource& source, std::uint64_t offset, const void* buffer,
+                              std::size_t size) noexcept {
+        return GuardedTransfer(size, [&] { return source.DoWriteAt(offset, buffer, size); });
+    }
+
+    // Goes on behind `done` until the range is whole, a read fails, or nothing comes any more. Then
+    // the source has ended, unless it says that it is longer.
+    static Transfer ReadRest(ByteSource& source, std::uint64_t offset, void* buffer,
+                             std::size_t size, Transfer done) noexcept {
+        unsigned char* const bytes = static_cast<unsigned char*>(buffer);
+        while (!IsOver(done, size)) {
+            const Transfer next =
+                ReadOnce(source, offset + done.bytes, bytes + done.bytes, size - done.bytes);
+            done.bytes += next.bytes;
+            done.error = next.error;
+            done.end = next.end;
+            if (next.bytes != 0 || IsOver(done, size)) continue;
+            done.end = EndsAt(source, offset + done.bytes);
+            done.error = done.end ? 0 : EIO;
+        }
+        return done;
+    }
+
+    static Transfer WriteAll(ByteSource& source, std::uint64_t offset, const void* buffer,
+                             std::size_t size) noexcept {
+        const unsigned char* const bytes = static_cast<const unsigned char*>(buffer);
+        Transfer done;
+        while (done.bytes != size && done.error == 0) {
+            const Transfer next =
+                WriteOnce(source, offset + done.bytes, bytes + done.bytes, size - done.bytes);
+            done.bytes += next.bytes;
+            done.error = next.bytes == 0 && next.error == 0 ? EIO : next.error;
+        }
+        return done;
+    }
+
+    static int AskSize(const ByteSource& source, std::uint64_t& size) noexcept {
+        const int failure = GuardedStep([&] { return source.DoTellSize(size); });
+        return failure == 0 && size == kUnknownSize ? EOVERFLOW : failure;
+    }
+
+    // A step that is refused where nothing may be changed.
+    template <class Step>
+    static int Change(const ByteSource& source, Step&& step) noexcept {
+        return source.IsWritable() ? GuardedStep(step) : EBADF;
+    }
+
+    static void Note(const ByteSource& source, const Failure& failure) noexcept {
+        try {
+            source.DoNote(failure);
+        } catch (...) {
+        }
+    }
+
+    // Ends an operation that is no transfer.
+    static bool Settle(const ByteSource& source, Operation operation, std::uint64_t offset,
+                       int failure, int* error) noexcept {
+        if (failure != 0) Note(source, {operation, offset, 0, 0, failure});
+        if (error) *error = failure;
+        return failure == 0;
+    }
+
+private:
+    // A source that cannot tell its size is believed when it gives no more.
+    static bool EndsAt(const ByteSource& source, std::uint64_t offset) noexcept {
+        std::uint64_t size = 0;
+        return AskSize(source, size) != 0 || size <= offset;
+    }
+};
+
 ByteSource::~ByteSource() = default;
 
 std::size_t ByteSource::ReadAt(std::uint64_t offset, void* buffer, std::size_t size,
@@ -62,8 +140,10 @@ std::size_t ByteSource::ReadAt(std::uint64_t offset, void* buffer, std::size_t s
     if (Overflows(offset, size))
         done.error = EOVERFLOW;
     else if (size != 0)
-        done = ReadRest(offset, buffer, size, ReadOnce(offset, buffer, size));
-    if (done.bytes != size) Note({Operation::Read, offset, size, done.bytes, done.error});
+        done = Border::ReadRest(*this, offset, buffer, size,
+                                Border::ReadOnce(*this, offset, buffer, size));
+    if (done.bytes != size)
+        Border::Note(*this, {Operation::Read, offset, size, done.bytes, done.error});
     if (error) *error = done.error;
     return done.bytes;
 }
@@ -81,10 +161,11 @@ bool ByteSource::ReadMany(std::span<Range> ranges) noexcept {
         range.done = Judged(range.done, range.size);
         if (!IsOver(range.done, range.size)) range.done.error = failure;
         if (Overflows(range.offset, range.size)) range.done.error = EOVERFLOW;
-        range.done = ReadRest(range.offset, range.buffer, range.size, range.done);
+        range.done = Border::ReadRest(*this, range.offset, range.buffer, range.size, range.done);
         if (range.done.bytes == range.size) continue;
         whole = false;
-        Note({Operation::Read, range.offset, range.size, range.done.bytes, range.done.error});
+        Border::Note(
+            *this, {Operation::Read, range.offset, range.size, range.done.bytes, range.done.error});
     }
     return whole;
 }
@@ -97,8 +178,9 @@ std::size_t ByteSource::WriteAt(std::uint64_t offset, const void* buffer, std::s
     else if (Overflows(offset, size))
         done.error = EOVERFLOW;
     else
-        done = WriteAll(offset, buffer, size);
-    if (done.error != 0) Note({Operation::Write, offset, size, done.bytes, done.error});
+        done = Border::WriteAll(*this, offset, buffer, size);
+    if (done.error != 0)
+        Border::Note(*this, {Operation::Write, offset, size, done.bytes, done.error});
     if (error) *error = done.error;
     return done.bytes;
 }
@@ -110,18 +192,19 @@ std::uint64_t ByteSource::Size() const noexcept {
 
 bool ByteSource::TellSize(std::uint64_t& size, int* error) const noexcept {
     std::uint64_t told = 0;
-    if (!Settle(Operation::Size, 0, AskSize(told), error)) return false;
+    if (!Border::Settle(*this, Operation::Size, 0, Border::AskSize(*this, told), error))
+        return false;
     size = told;
     return true;
 }
 
 bool ByteSource::Truncate(std::uint64_t size, int* error) noexcept {
-    const int failure = IsWritable() ? GuardedStep([&] { return DoTruncate(size); }) : EBADF;
-    return Settle(Operation::Truncate, size, failure, error);
+    const int failure = Border::Change(*this, [&] { return DoTruncate(size); });
+    return Border::Settle(*this, Operation::Truncate, size, failure, error);
 }
 
 bool ByteSource::Sync(int* error) noexcept {
-    return Settle(Operation::Sync, 0, GuardedStep([&] { return DoSync(); }), error);
+    return Border::Settle(*this, Operation::Sync, 0, GuardedStep([&] { return DoSync(); }), error);
 }
 
 bool ByteSource::IsWritable() const noexcept {
@@ -141,12 +224,13 @@ Identity ByteSource::Identify() const noexcept {
 }
 
 bool ByteSource::Remove(int* error) noexcept {
-    const int failure = IsWritable() ? GuardedStep([&] { return DoRemove(); }) : EBADF;
-    return Settle(Operation::Remove, 0, failure, error);
+    const int failure = Border::Change(*this, [&] { return DoRemove(); });
+    return Border::Settle(*this, Operation::Remove, 0, failure, error);
 }
 
 void ByteSource::DoReadMany(std::span<Range> ranges) {
-    for (Range& range : ranges) range.done = ReadOnce(range.offset, range.buffer, range.size);
+    for (Range& range : ranges)
+        range.done = Border::ReadOnce(*this, range.offset, range.buffer, range.size);
 }
 
 bool ByteSource::DoIsWritable() const { return false; }
@@ -156,68 +240,5 @@ int ByteSource::DoRemove() { return ENOTSUP; }
 int ByteSource::DoSync() { return 0; }
 Identity ByteSource::DoIdentify() const { return {}; }
 void ByteSource::DoNote(const Failure&) const {}
-
-Transfer ByteSource::ReadOnce(std::uint64_t offset, void* buffer, std::size_t size) noexcept {
-    return GuardedTransfer(size, [&] { return DoReadAt(offset, buffer, size); });
-}
-
-Transfer ByteSource::WriteOnce(std::uint64_t offset, const void* buffer,
-                               std::size_t size) noexcept {
-    return GuardedTransfer(size, [&] { return DoWriteAt(offset, buffer, size); });
-}
-
-// Goes on behind `done` until the range is whole, a read fails, or nothing comes any more. Then the
-// source has ended, unless it says that it is longer.
-Transfer ByteSource::ReadRest(std::uint64_t offset, void* buffer, std::size_t size,
-                              Transfer done) noexcept {
-    unsigned char* const bytes = static_cast<unsigned char*>(buffer);
-    while (!IsOver(done, size)) {
-        const Transfer next = ReadOnce(offset + done.bytes, bytes + done.bytes, size - done.bytes);
-        done.bytes += next.bytes;
-        done.error = next.error;
-        done.end = next.end;
-        if (next.bytes != 0 || IsOver(done, size)) continue;
-        done.end = EndsAt(offset + done.bytes);
-        done.error = done.end ? 0 : EIO;
-    }
-    return done;
-}
-
-Transfer ByteSource::WriteAll(std::uint64_t offset, const void* buffer, std::size_t size) noexcept {
-    const unsigned char* const bytes = static_cast<const unsigned char*>(buffer);
-    Transfer done;
-    while (!IsOver(done, size)) {
-        Transfer next = WriteOnce(offset + done.bytes, bytes + done.bytes, size - done.bytes);
-        if (next.bytes == 0 && next.error == 0) next.error = EIO;
-        done.bytes += next.bytes;
-        done.error = next.error;
-    }
-    return done;
-}
-
-// A source that cannot tell its size is believed when it gives no more.
-bool ByteSource::EndsAt(std::uint64_t offset) const noexcept {
-    std::uint64_t size = 0;
-    return AskSize(size) != 0 || size <= offset;
-}
-
-int ByteSource::AskSize(std::uint64_t& size) const noexcept {
-    const int failure = GuardedStep([&] { return DoTellSize(size); });
-    return failure == 0 && size == kUnknownSize ? EOVERFLOW : failure;
-}
-
-void ByteSource::Note(const Failure& failure) const noexcept {
-    try {
-        DoNote(failure);
-    } catch (...) {
-    }
-}
-
-bool ByteSource::Settle(Operation operation, std::uint64_t offset, int failure,
-                        int* error) const noexcept {
-    if (failure != 0) Note({operation, offset, 0, 0, failure});
-    if (error) *error = failure;
-    return failure == 0;
-}
 
 }  // namespace zelm::files

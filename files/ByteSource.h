@@ -181,14 +181,7 @@ protected:
     virtual void DoNote(const Failure& failure) const;
 
 private:
-    Transfer ReadOnce(std::uint64_t offset, void* buffer, std::size_t size) noexcept;
-    Transfer WriteOnce(std::uint64_t offset, const void* buffer, std::size_t size) noexcept;
-    Transfer ReadRest(std::uint64_t offset, void* buffer, std::size_t size, Transfer done) noexcept;
-    Transfer WriteAll(std::uint64_t offset, const void* buffer, std::size_t size) noexcept;
-    bool EndsAt(std::uint64_t offset) const noexcept;
-    int AskSize(std::uint64_t& size) const noexcept;
-    void Note(const Failure& failure) const noexcept;
-    bool Settle(Operation operation, std::uint64_t offset, int failure, int* error) const noexcept;
+    class ZMC_FILES_LOCAL Border;  // between the two faces
 };
 
 }  // namespace zelm::files

@@ -1,4 +1,5 @@
-// Marks what the library `zmcfiles` offers to others; whatever bears no mark stays inside.
+// Marks what the library `zmcfiles` offers to others, and parts of that which stay inside; whatever
+// bears no mark stays inside too.
 #ifndef ZMC_FILES_FILESAPI_H
 #define ZMC_FILES_FILESAPI_H
 
@@ -8,8 +9,10 @@
 #else
 #define ZMC_FILES_API __declspec(dllimport)
 #endif
+#define ZMC_FILES_LOCAL
 #else
 #define ZMC_FILES_API __attribute__((visibility("default")))
+#define ZMC_FILES_LOCAL __attribute__((visibility("hidden")))
 #endif
 
 #endif
