@@ -50,6 +50,12 @@ set(ZMC_PUBLIC_HEADERS
     coordsys/CoordSysUnit.h
     coordsys/Environment.h
     coordsys/EnvironmentKeys.h
+    # Where bytes come from, and how a host lends them.
+    files/ByteSource.h
+    files/FileSource.h
+    files/Lending.h
+    files/MemorySource.h
+    files/RecordingSource.h
     # The host's side: pyramids built, read with errors, looked into, and put in order.
     host/base/Error.h
     host/build/PyramidBuilder.h

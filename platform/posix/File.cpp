@@ -12,6 +12,7 @@
 #include <string_view>
 
 #include "platform/TextConversion.h"
+#include "platform/posix/Descriptor.h"
 #include "platform/posix/Uninterrupted.h"
 
 namespace platform {
@@ -22,6 +23,16 @@ static_assert(sizeof(off_t) == 8, "files beyond 4 GiB need 64-bit offsets");
 constexpr std::uint64_t kMaxOffset = std::numeric_limits<off_t>::max();
 // One system call moves at most this much; larger transfers are cut by the loops below.
 constexpr std::size_t kMaxCall = std::size_t{1} << 30;
+
+void Tell(int* error, int number) {
+    if (error) *error = number;
+}
+
+// True for an answer of the system that is no failure; the reason for one that is.
+bool Told(int* error, int answer) {
+    Tell(error, answer < 0 ? errno : 0);
+    return answer >= 0;
+}
 
 // The zero-terminated UTF-8 form of a name; null for no name, or if memory ran out.
 std::unique_ptr<char[]> NarrowName(const char16_t* name) {
@@ -38,7 +49,7 @@ std::unique_ptr<char[]> NarrowName(const char16_t* name) {
 
 // Non-blocking, because opening a pipe would otherwise wait for its other end.
 int OpenFlags(File::Mode mode) {
-    const int common = O_CLOEXEC | O_NONBLOCK | O_NOCTTY;
+    const int common = O_NONBLOCK | O_NOCTTY;
     switch (mode) {
         case File::Mode::Create:
             return common | O_RDWR | O_CREAT;
@@ -49,57 +60,89 @@ int OpenFlags(File::Mode mode) {
     }
 }
 
-bool IsRegular(int descriptor) {
+// 0, or the reason why the descriptor is of no use.
+int Prepare(int descriptor, File::Mode mode) {
     struct stat status;
-    return fstat(descriptor, &status) == 0 && S_ISREG(status.st_mode);
-}
-
-// Emptied only once it is known to be a regular file.
-bool Prepare(int descriptor, File::Mode mode) {
-    return IsRegular(descriptor) && (mode != File::Mode::Create ||
-                                     Uninterrupted([&] { return ftruncate(descriptor, 0); }) == 0);
+    if (fstat(descriptor, &status) != 0) return errno;
+    if (S_ISDIR(status.st_mode)) return EISDIR;
+    if (!S_ISREG(status.st_mode)) return EINVAL;
+    // Emptied only once it is known to be a regular file.
+    if (mode != File::Mode::Create) return 0;
+    return Uninterrupted([&] { return ftruncate(descriptor, 0); }) == 0 ? 0 : errno;
 }
 
 // Repeats `call(offset, done, size)` until all is moved, or it fails, or it moves nothing.
 template <class Call>
-std::size_t Transfer(std::uint64_t offset, std::size_t size, Call&& call) {
-    if (offset > kMaxOffset || size > kMaxOffset - offset) return 0;
+std::size_t Transfer(std::uint64_t offset, std::size_t size, int* error, Call&& call) {
+    Tell(error, 0);
     std::size_t done = 0;
     while (done < size) {
         const ssize_t moved =
             call(static_cast<off_t>(offset + done), done, std::min(size - done, kMaxCall));
         if (moved < 0 && errno == EINTR) continue;
+        if (moved < 0) Tell(error, errno);
         if (moved <= 0) break;
         done += static_cast<std::size_t>(moved);
     }
     return done;
 }
 
+bool InRange(std::uint64_t offset, std::size_t size) {
+    return offset <= kMaxOffset && size <= kMaxOffset - offset;
+}
+
+std::int64_t Nanoseconds(const struct timespec& time) {
+    return std::int64_t{time.tv_sec} * 1'000'000'000 + time.tv_nsec;
+}
+
+FileIdentity IdentityOf(const struct stat& status) {
+    FileIdentity identity;
+    identity.device = status.st_dev;
+    identity.number = status.st_ino;
+    identity.size = static_cast<std::uint64_t>(status.st_size);
+    identity.modified = Nanoseconds(status.st_mtim);
+    identity.changed = Nanoseconds(status.st_ctim);
+    return identity;
+}
+
 }  // namespace
 
-std::unique_ptr<File> File::Open(const char16_t* name, Mode mode) {
+std::unique_ptr<File> File::Open(const char16_t* name, Mode mode, int* error) {
+    Tell(error, name ? ENOMEM : EINVAL);
     const std::unique_ptr<char[]> narrow = NarrowName(name);
     if (!narrow) return nullptr;
-    const int descriptor = Uninterrupted([&] { return open(narrow.get(), OpenFlags(mode), 0666); });
-    if (descriptor < 0) return nullptr;
-    std::unique_ptr<File> file;
-    if (Prepare(descriptor, mode)) file.reset(new (std::nothrow) File(descriptor));
-    if (!file) close(descriptor);
+    const int descriptor = OpenForData(narrow.get(), OpenFlags(mode));
+    if (!Told(error, descriptor)) return nullptr;
+    std::unique_ptr<File> file(new (std::nothrow) File(descriptor));
+    if (!file) {
+        Tell(error, ENOMEM);
+        close(descriptor);
+        return nullptr;
+    }
+    const int failure = Prepare(descriptor, mode);
+    Tell(error, failure);
+    if (failure != 0) file.reset();
     return file;
 }
 
 File::~File() { close(descriptor); }
 
-std::size_t File::ReadAt(std::uint64_t offset, void* buffer, std::size_t size) {
+// Beyond what offsets can tell there is no file: to read there is to read at its end.
+std::size_t File::ReadAt(std::uint64_t offset, void* buffer, std::size_t size, int* error) {
+    if (!InRange(offset, size)) size = 0;
     char* const bytes = static_cast<char*>(buffer);
-    return Transfer(offset, size, [&](off_t at, std::size_t done, std::size_t count) {
+    return Transfer(offset, size, error, [&](off_t at, std::size_t done, std::size_t count) {
         return pread(descriptor, bytes + done, count, at);
     });
 }
 
-std::size_t File::WriteAt(std::uint64_t offset, const void* buffer, std::size_t size) {
+std::size_t File::WriteAt(std::uint64_t offset, const void* buffer, std::size_t size, int* error) {
+    if (!InRange(offset, size)) {
+        Tell(error, EFBIG);
+        return 0;
+    }
     const char* const bytes = static_cast<const char*>(buffer);
-    return Transfer(offset, size, [&](off_t at, std::size_t done, std::size_t count) {
+    return Transfer(offset, size, error, [&](off_t at, std::size_t done, std::size_t count) {
         return pwrite(descriptor, bytes + done, count, at);
     });
 }
@@ -109,25 +152,43 @@ std::uint64_t File::Size() const {
     return TellSize(size) ? size : kUnknownSize;
 }
 
-bool File::TellSize(std::uint64_t& size) const {
+bool File::TellSize(std::uint64_t& size, int* error) const {
     struct stat status;
-    if (fstat(descriptor, &status) != 0) return false;
+    if (!Told(error, fstat(descriptor, &status))) return false;
     size = static_cast<std::uint64_t>(status.st_size);
     return true;
 }
 
-bool File::Truncate(std::uint64_t size) {
-    return size <= kMaxOffset &&
-           Uninterrupted([&] { return ftruncate(descriptor, static_cast<off_t>(size)); }) == 0;
+bool File::TellIdentity(FileIdentity& identity) const {
+    struct stat status;
+    if (fstat(descriptor, &status) != 0) return false;
+    identity = IdentityOf(status);
+    return true;
 }
 
-bool File::Sync() {
-    return Uninterrupted([&] { return fsync(descriptor); }) == 0;
+bool File::Truncate(std::uint64_t size, int* error) {
+    Tell(error, EFBIG);
+    return size <= kMaxOffset && Told(error, Uninterrupted([&] {
+                                          return ftruncate(descriptor, static_cast<off_t>(size));
+                                      }));
 }
 
-bool RemoveFile(const char16_t* name) {
+bool File::Sync(int* error) {
+    return Told(error, Uninterrupted([&] { return fsync(descriptor); }));
+}
+
+bool TellIdentity(const char16_t* name, FileIdentity& identity) {
     const std::unique_ptr<char[]> narrow = NarrowName(name);
-    return narrow && std::remove(narrow.get()) == 0;
+    struct stat status;
+    if (!narrow || stat(narrow.get(), &status) != 0) return false;
+    identity = IdentityOf(status);
+    return true;
+}
+
+bool RemoveFile(const char16_t* name, int* error) {
+    Tell(error, name ? ENOMEM : EINVAL);
+    const std::unique_ptr<char[]> narrow = NarrowName(name);
+    return narrow && Told(error, std::remove(narrow.get()));
 }
 
 }  // namespace platform

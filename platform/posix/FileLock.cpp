@@ -7,6 +7,7 @@
 
 #include <cerrno>
 
+#include "platform/posix/Descriptor.h"
 #include "platform/posix/Uninterrupted.h"
 
 namespace platform {
@@ -28,8 +29,7 @@ int LockNow(int descriptor) {
 
 FileLock::Result FileLock::Take(const std::string& path) {
     Release();
-    descriptor =
-        Uninterrupted([&] { return ::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK); });
+    descriptor = OpenForData(path.c_str(), O_RDONLY | O_NONBLOCK);
     if (descriptor < 0) return errno == ENOENT ? Result::Missing : Result::Failed;
     Result result = Result::Taken;
     if (LockNow(descriptor) != 0)

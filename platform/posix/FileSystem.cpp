@@ -15,6 +15,7 @@
 #include <random>
 #include <system_error>
 
+#include "platform/posix/Descriptor.h"
 #include "platform/posix/Uninterrupted.h"
 
 namespace platform {
@@ -22,8 +23,7 @@ namespace {
 
 class Descriptor {
 public:
-    Descriptor(const std::string& path, int flags)
-        : value(Uninterrupted([&] { return ::open(path.c_str(), flags | O_CLOEXEC, 0666); })) {}
+    Descriptor(const std::string& path, int flags) : value(OpenForData(path.c_str(), flags)) {}
     ~Descriptor() {
         const int kept = errno;
         if (value >= 0) ::close(value);
