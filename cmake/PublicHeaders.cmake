@@ -29,6 +29,7 @@ set(ZMC_PUBLIC_HEADERS
     core/ErrorState.h
     core/GeoRef.h
     core/Object.h
+    core/ObjectCodes.h
     core/PixelVocabulary.h
     core/Pointer.h
     core/String.h
@@ -53,6 +54,7 @@ set(ZMC_PUBLIC_HEADERS
     # Where bytes come from, and how a host lends them.
     files/ByteSource.h
     files/FileSource.h
+    files/FilesApi.h
     files/Lending.h
     files/MemorySource.h
     files/RecordingSource.h
