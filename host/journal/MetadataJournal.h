@@ -5,9 +5,9 @@
 // middle leaves a document that nobody believes; the statistics of before are lost then, and when
 // the power fails the disk may hold any part of both. Whoever cannot have that stores like this:
 //
-//     MetadataJournal copy(file);   // the copy is on the disk
+//     MetadataJournal journal(file);  // the copy is on the disk
 //     ... store ...
-//     copy.Finish();             // the store is on the disk, and can be read; the copy is gone
+//     journal.Finish();  // the store is on the disk, and can be read; the copy is gone
 //
 // The copy of "scene.pyr" is "scene.pyr.zmcmeta". One that is found when nobody is storing is left
 // over: RecoverMetadata, which Raster::Open calls, puts the old document back, or removes the copy

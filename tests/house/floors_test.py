@@ -109,5 +109,18 @@ class Floors(unittest.TestCase):
             self.assertEqual(self.check(empty).returncode, 1)
 
 
+class Picture(unittest.TestCase):
+    def test_names_every_room(self):
+        done = subprocess.run([sys.executable, "-B", CHECK, "--list"], stdout=subprocess.PIPE,
+                              text=True, check=True)
+        files = [line.strip() for line in done.stdout.splitlines() if line.startswith("    ")]
+        folders = {name.split("/")[0] for name in files if not name.startswith("host/")}
+        folders |= {"/".join(name.split("/")[:2]) for name in files if name.startswith("host/")}
+        self.assertGreater(len(folders), 20)
+        text = (ROOT / "docs" / "architecture.md").read_text(encoding="utf-8")
+        picture = text.split("```")[1]
+        self.assertEqual([each for each in sorted(folders) if each + "/" not in picture], [])
+
+
 if __name__ == "__main__":
     unittest.main()

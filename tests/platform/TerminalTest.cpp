@@ -17,8 +17,7 @@ namespace {
 // Standard output and standard error are another file while it lives.
 class Redirected {
 public:
-    explicit Redirected(int target)
-        : output(dup(STDOUT_FILENO)), errors(dup(STDERR_FILENO)) {
+    explicit Redirected(int target) : output(dup(STDOUT_FILENO)), errors(dup(STDERR_FILENO)) {
         dup2(target, STDOUT_FILENO);
         dup2(target, STDERR_FILENO);
     }
