@@ -2,6 +2,7 @@
 
 #include <atomic>
 #include <cstddef>
+#include <iterator>
 #include <map>
 #include <mutex>
 #include <new>
@@ -51,7 +52,7 @@ unsigned GloballyUniqueObjectErrorCode() {
 }
 
 FormatRecord gCdfFormatRecords[] = {{u"MemoryRaster"}, {u"Pyramid"}};
-std::int32_t gCdfFormatRecordCount = 2;
+std::int32_t gCdfFormatRecordCount = std::size(gCdfFormatRecords);
 
 MetadataParseLog* gpMetadataParseLogInstance = nullptr;
 
