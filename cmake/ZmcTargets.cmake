@@ -12,7 +12,7 @@ set(ZMC_WARNING_FLAGS -Wall -Wextra -Wpedantic -Wconversion -Wsign-conversion -W
     -Wnon-virtual-dtor -Woverloaded-virtual -Wold-style-cast -Wcast-qual -Wcast-align -Wformat=2
     -Wnull-dereference -Wimplicit-fallthrough -Wextra-semi -Wundef -Wvla
     $<$<CXX_COMPILER_ID:GNU>:-Wduplicated-cond> $<$<CXX_COMPILER_ID:GNU>:-Wduplicated-branches>
-    $<$<CXX_COMPILER_ID:GNU>:-Wlogical-op>)
+    $<$<CXX_COMPILER_ID:GNU>:-Wlogical-op> $<$<CXX_COMPILER_ID:Clang>:-Wthread-safety>)
 if(ZMC_WARNINGS_AS_ERRORS)
     list(APPEND ZMC_WARNING_FLAGS -Werror)
 endif()

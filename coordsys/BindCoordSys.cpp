@@ -1,19 +1,20 @@
 #include "coordsys/BindCoordSys.h"
 
-#include <mutex>
 #include <new>
 
 #include "coordsys/CoordSysFactory.h"
+#include "platform/Mutex.h"
 #include "zmcg/zmcg.h"
 #include "zmcpe/CoordSysImpl.h"
 
 namespace zelm {
 namespace {
 
-// The factory does not guard its first call.
+// The factory does not guard its first call. The mutex guards what that call settles: the factory
+// itself, the log and the entry points, which every caller reads only after passing here.
 bool LoadEngine() {
-    static std::mutex mutex;
-    const std::lock_guard<std::mutex> lock(mutex);
+    static platform::Mutex mutex;
+    const platform::MutexHolder lock(mutex);
     return CoordSysFactory::GetInstance() != nullptr;
 }
 

@@ -67,16 +67,20 @@ CoordSysLog* CoordSysLog::CreateInstance(const String& directory) {
     try {
         fresh.reset(new (std::nothrow) CoordSysLog);
         if (fresh) fresh->peDirectory = directory;
-        if (fresh && platform::PathExists(fresh->peDirectory.GetAnsi()))
-            fresh->Init();
-        else
-            fresh.reset();
+        if (!fresh || !fresh->Start()) fresh.reset();
     } catch (...) {
         // No directory that can be used, then.
         fresh.reset();
     }
     Instance().store(fresh.get(), std::memory_order_release);
     return fresh.release();
+}
+
+bool CoordSysLog::Start() {
+    if (!platform::PathExists(peDirectory.GetAnsi())) return false;
+    const platform::MutexHolder lock(writing);
+    Init();
+    return true;
 }
 
 void CoordSysLog::Init() {
@@ -187,7 +191,7 @@ void CoordSysLog::Format(const WideChar* format, std::va_list arguments) {
 
 void CoordSysLog::Write(const WideChar* message) {
     try {
-        const std::lock_guard<std::mutex> lock(writing);
+        const platform::MutexHolder lock(writing);
         if (toDebugger == 1) {
             platform::WriteDebugOutput(message);
             platform::WriteDebugOutput(u"\n");

@@ -14,9 +14,9 @@
 #include <cstdarg>
 #include <cstdint>
 #include <cstdio>
-#include <mutex>
 
 #include "core/String.h"
+#include "platform/Mutex.h"
 
 namespace zelm {
 
@@ -27,15 +27,17 @@ public:
     // At start a file of this size is full; while writing only one above it is.
     static constexpr std::int32_t kFullSize = 500000;
 
-    String peDirectory;            // where everything below lies
-    String logPath1;               // full paths of the two log files
-    String logPath2;               //
-    std::FILE* stream = nullptr;   // the log file now open; null: nothing goes to files
-    std::int32_t currentFile = 0;  // 1 or 2: which path is open
-    std::uint32_t sequence = 0;    // lines written so far in this process
-    std::uint32_t levelMask = 0;   // the levels that are on
-    std::int32_t toDebugger = 0;   // 1: messages go to the debugger's output
-    std::int32_t toFile = 0;       // 1: messages go to the files
+    String peDirectory;  // where everything below lies
+    String logPath1;     // full paths of the two log files
+    String logPath2;     //
+    // The log file now open; null: nothing goes to files.
+    std::FILE* stream ZMC_GUARDED_BY(writing) = nullptr;
+    std::int32_t currentFile ZMC_GUARDED_BY(writing) = 0;  // 1 or 2: which path is open
+    // Lines written so far in this process.
+    std::uint32_t sequence ZMC_GUARDED_BY(writing) = 0;
+    std::uint32_t levelMask = 0;  // the levels that are on
+    std::int32_t toDebugger = 0;  // 1: messages go to the debugger's output
+    std::int32_t toFile = 0;      // 1: messages go to the files
 
     CoordSysLog() = default;
     CoordSysLog(const CoordSysLog&) = delete;
@@ -51,22 +53,24 @@ public:
     static void LogMessage(std::uint32_t level, const WideChar* format, ...);
 
 private:
-    void Init();
+    bool Start();
+    void Init() ZMC_REQUIRES(writing);
     void ReadControlFile();
     bool FindControlLine(char (&line)[1024]) const;
     void ApplyControlLine(const char* line);
-    void OpenFirstWithRoom();
-    bool OpenToContinue(std::int32_t file, bool& full);
+    void OpenFirstWithRoom() ZMC_REQUIRES(writing);
+    bool OpenToContinue(std::int32_t file, bool& full) ZMC_REQUIRES(writing);
     bool MakeLogDirectory() const;
     String PathOf(const char* name) const;
-    void CloseStream();
+    void CloseStream() ZMC_REQUIRES(writing);
     // Apart from LogMessage, whose frame stays small where nothing is logged.
     [[gnu::noinline]] void Format(const WideChar* format, std::va_list arguments);
     void Write(const WideChar* message);
-    void WriteLine(const WideChar* message);
-    void RotateIfFull();
+    void WriteLine(const WideChar* message) ZMC_REQUIRES(writing);
+    void RotateIfFull() ZMC_REQUIRES(writing);
 
-    std::mutex writing;  // guards sequence, currentFile and stream once the log runs
+    // What else the log knows is settled before others see it, and only read from then on.
+    platform::Mutex writing;
 };
 
 }  // namespace zelm

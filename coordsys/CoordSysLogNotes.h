@@ -1,9 +1,9 @@
 // The control file of the projection log as the log itself writes it.
 //
-// Its users' tools compare it byte for byte, blanks at the line ends included. The control line at
-// its end, and the example in it, have blanks between the groups; the parser takes the form without
-// blanks only. So the file as written is off, and stays off until somebody writes a line such as
-// "0110,0000,0000,0001".
+// The text is fixed, blanks at the line ends included: a file that is there is never written again,
+// so any change would leave two kinds of notes about. The control line at its end, and the example
+// in it, have blanks between the groups; the parser takes the form without blanks only. So the file
+// as written is off, and stays off until somebody writes a line such as "0110,0000,0000,0001".
 #ifndef ZMC_COORDSYS_COORDSYSLOGNOTES_H
 #define ZMC_COORDSYS_COORDSYSLOGNOTES_H
 

@@ -8,13 +8,13 @@ namespace zelm::EnvironmentKeys {
 
 // Directory that holds the library of the projection engine.
 inline const String kBinDirectory("ZELM::Environment::BinDirectory");
-inline const String kXmlDirectory("ZELM::Environment::XmlDirectory");  // for other modules
+inline const String kXmlDirectory("ZELM::Environment::XmlDirectory");  // not read here
 // Data directory of the projection engine, where the projection log has its files too.
 inline const String kPeDirectory("ZELM::Environment::PeDirectory");
 // Second directory handed to the projection engine.
 inline const String kGdalDirectory("ZELM::Environment::GdalDirectory");
-inline const String kMdfDirectory("ZELM::Environment::MdfDirectory");  // for other modules
-inline const String kWorkingDirectory("ZELM::WorkingDirectory");       // for other modules
+inline const String kMdfDirectory("ZELM::Environment::MdfDirectory");  // not read here
+inline const String kWorkingDirectory("ZELM::WorkingDirectory");       // not read here
 
 }  // namespace zelm::EnvironmentKeys
 

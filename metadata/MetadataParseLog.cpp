@@ -165,7 +165,7 @@ bool MetadataParseLog::Open() {
     if (!platform::EnsureDirectory(directory.c_str(), directory.c_str())) return false;
     logPath = logDirectory + L"/" + kFileName;
     {
-        const std::lock_guard<std::mutex> lock(writing);
+        const platform::MutexHolder lock(writing);
         UseUtf8(stream);
         stream.open(NarrowToBytes(logPath), std::ios_base::out);
         if (!stream.is_open()) {
@@ -206,7 +206,7 @@ void MetadataParseLog::Format(const wchar_t* format, std::va_list arguments) {
 
 void MetadataParseLog::Write(wchar_t* text) {
     try {
-        const std::lock_guard<std::mutex> lock(writing);
+        const platform::MutexHolder lock(writing);
         if (stream.is_open()) {
             const std::locale locale = stream.getloc();
             const auto& facet = std::use_facet<Facet>(locale);

@@ -15,18 +15,18 @@
 #include <cstdarg>
 #include <cstdint>
 #include <fstream>
-#include <mutex>
 #include <string>
 
 #include "metadata/MetadataUtils.h"
+#include "platform/Mutex.h"
 
 class MetadataParseLog : public MetadataUtils {
 public:
-    std::wstring logDirectory;    // bytes of the variable, widened one by one with their sign
-    std::wstring logPath;         // directory, "/" and the file name
-    std::wofstream stream;        // not open while the log is off
-    std::uint32_t level = 0;      // highest level that is written; 0 is off
-    std::uint32_t toConsole = 0;  // not 0: each message also goes to std::wcout
+    std::wstring logDirectory;  // bytes of the variable, widened one by one with their sign
+    std::wstring logPath;       // directory, "/" and the file name
+    std::wofstream stream ZMC_GUARDED_BY(writing);  // not open while the log is off
+    std::uint32_t level = 0;                        // highest level that is written; 0 is off
+    std::uint32_t toConsole = 0;                    // not 0: each message also goes to std::wcout
 
     MetadataParseLog() = default;
     MetadataParseLog(const MetadataParseLog&) = delete;
@@ -51,7 +51,8 @@ private:
     [[gnu::noinline]] void Format(const wchar_t* format, std::va_list arguments);
     void Write(wchar_t* text);
 
-    std::mutex writing;  // keeps the texts of two threads apart
+    // Keeps the texts of two threads apart, on the console too. The paths are the creator's alone.
+    platform::Mutex writing;
 };
 
 #endif

@@ -2,9 +2,11 @@
 
 #include <atomic>
 #include <cstddef>
+#include <iterator>
 #include <map>
-#include <mutex>
 #include <new>
+
+#include "platform/Mutex.h"
 
 using zelm::EnvironmentImpl;
 using zelm::String;
@@ -22,9 +24,9 @@ T& Immortal() {
 }
 
 struct TypeCodes {
-    std::mutex mutex;
-    std::map<String, unsigned> codes;
-    unsigned last = 0;
+    platform::Mutex mutex;
+    std::map<String, unsigned> codes ZMC_GUARDED_BY(mutex);
+    unsigned last ZMC_GUARDED_BY(mutex) = 0;
 };
 
 }  // namespace
@@ -33,7 +35,7 @@ struct TypeCodes {
 // has; only a later call with the same word draws another.
 unsigned GloballyUniqueObjectTypeCode(const String& name) {
     TypeCodes& table = Immortal<TypeCodes>();
-    const std::lock_guard<std::mutex> lock(table.mutex);
+    const platform::MutexHolder lock(table.mutex);
     if (const auto known = table.codes.find(name); known != table.codes.end()) return known->second;
     const unsigned code = ++table.last;
     try {
@@ -51,7 +53,7 @@ unsigned GloballyUniqueObjectErrorCode() {
 }
 
 FormatRecord gCdfFormatRecords[] = {{u"MemoryRaster"}, {u"Pyramid"}};
-std::int32_t gCdfFormatRecordCount = 2;
+std::int32_t gCdfFormatRecordCount = std::size(gCdfFormatRecords);
 
 MetadataParseLog* gpMetadataParseLogInstance = nullptr;
 

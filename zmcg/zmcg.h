@@ -45,8 +45,8 @@ ZMCG_SYMBOL zelm::EnvironmentImpl& GetGlobalEnvironmentImpl();
 #endif
 
 // The coordinate-system singletons and the entry points of the projection engine; all null until
-// the engine is asked for. The mutex is declared by its historical type and used as a critical
-// section throughout: see coordsys/CoordSysMutex.h.
+// the engine is asked for. gpCoordSysMutex points to a critical section, whatever its type says:
+// only coordsys/CoordSysMutex.h looks behind it.
 ZMCG_SYMBOL tbb::mutex* gpCoordSysMutex;
 ZMCG_SYMBOL zelm::CoordSysLog* gpCoordSysLogInstance;
 ZMCG_SYMBOL zelm::CoordSysFactory* gpCoordSysFactoryInstance;

@@ -21,7 +21,7 @@ void AddDirectory(const String& directory, std::vector<std::string>& paths) {
 }
 
 // PROJ's own directories stay in the list: the host's may hold grids but no database.
-void AddDefaultDirectories(std::vector<std::string>& paths) {
+void AddDefaultDirectories(std::vector<std::string>& paths) ZMC_REQUIRES(zelm::projMutex) {
     const char* const defaults = proj_info().searchpath;
     std::string_view rest(defaults ? defaults : "");
     while (!rest.empty()) {
@@ -33,7 +33,8 @@ void AddDefaultDirectories(std::vector<std::string>& paths) {
 }
 
 // Without any path, the context goes back to PROJ's own.
-void SetSearchPaths(PJ_CONTEXT* context, const std::vector<std::string>& paths) {
+void SetSearchPaths(PJ_CONTEXT* context, const std::vector<std::string>& paths)
+    ZMC_REQUIRES(zelm::projMutex) {
     std::vector<const char*> names;
     for (const std::string& path : paths) names.push_back(path.c_str());
     proj_context_set_search_paths(context, static_cast<int>(names.size()), names.data());

@@ -1,13 +1,15 @@
 #include "zmcpe/ProjContext.h"
 
 namespace zelm {
-namespace {
 
 // Trivially destroyed, all of them: handles may be released after this library's destructors ran.
-std::mutex projMutex;
-PJ_CONTEXT* context = nullptr;
-ProjUser* firstUser = nullptr;
-bool closed = false;
+platform::Mutex projMutex;
+
+namespace {
+
+PJ_CONTEXT* context ZMC_GUARDED_BY(projMutex) = nullptr;
+ProjUser* firstUser ZMC_GUARDED_BY(projMutex) = nullptr;
+bool closed ZMC_GUARDED_BY(projMutex) = false;
 
 void DropMessage(void*, int, const char*) {}
 
@@ -18,7 +20,9 @@ const Closer closer;
 
 }  // namespace
 
-ProjContext::ProjContext() : lock(projMutex) {}
+ProjContext::ProjContext() { projMutex.Lock(); }
+
+ProjContext::~ProjContext() { projMutex.Unlock(); }
 
 PJ_CONTEXT* ProjContext::Get() {
     if (context || closed) return context;

@@ -10,7 +10,8 @@
 #include <proj.h>
 
 #include <memory>
-#include <mutex>
+
+#include "platform/Mutex.h"
 
 namespace zelm {
 
@@ -21,32 +22,36 @@ using PjHolder = std::unique_ptr<PJ, PjDestroyer>;  // destroy under the lock
 
 class ProjUser;
 
+// Guards the context, the list of its users, and whatever they hold of PROJ.
+extern platform::Mutex projMutex;
+
 // Holds the lock for as long as it lives.
-class ProjContext {
+class ZMC_LOCK_HOLDER ProjContext {
 public:
-    ProjContext();
+    ProjContext() ZMC_ACQUIRE(projMutex);
+    ProjContext(const ProjContext&) = delete;
+    ProjContext& operator=(const ProjContext&) = delete;
+    ~ProjContext() ZMC_RELEASE();
 
     // The context, made by the first use; null if it cannot be made or is gone for good.
-    PJ_CONTEXT* Get();
+    PJ_CONTEXT* Get() ZMC_REQUIRES(projMutex);
 
     // Objects that hold something of PROJ, to be told when it goes.
-    void Enlist(ProjUser* user);
-    void Dismiss(ProjUser* user);
+    void Enlist(ProjUser* user) ZMC_REQUIRES(projMutex);
+    void Dismiss(ProjUser* user) ZMC_REQUIRES(projMutex);
 
     // Lets every user drop what it holds, and ends the context for good.
-    void CloseForGood();
-
-private:
-    std::lock_guard<std::mutex> lock;
+    void CloseForGood() ZMC_REQUIRES(projMutex);
 };
 
 class ProjUser {
 public:
-    ProjUser* previous = nullptr;  // neighbours in the context's list; the context's alone to touch
-    ProjUser* next = nullptr;
+    // Neighbours in the context's list; the context's alone to touch.
+    ProjUser* previous ZMC_GUARDED_BY(projMutex) = nullptr;
+    ProjUser* next ZMC_GUARDED_BY(projMutex) = nullptr;
 
-    // Destroys everything of PROJ that the user holds; called under the lock.
-    virtual void DropProj() = 0;
+    // Destroys everything of PROJ that the user holds.
+    virtual void DropProj() ZMC_REQUIRES(projMutex) = 0;
 
 protected:
     ~ProjUser() = default;

@@ -32,17 +32,18 @@ public:
                           double* z) const override;
 
 private:
-    ProjCoordSys(ProjContext& context, PjHolder definition);
-    void DropProj() override;
-    PJ* TransformationTo(ProjContext& context, const ProjCoordSys& target) const;
+    ProjCoordSys(ProjContext& context, PjHolder definition) ZMC_REQUIRES(projMutex);
+    void DropProj() override ZMC_REQUIRES(projMutex);
+    PJ* TransformationTo(ProjContext& context, const ProjCoordSys& target) const
+        ZMC_REQUIRES(projMutex);
 
     std::atomic<std::int32_t> references{1};
     const std::uint64_t serial;  // never given twice, unlike an address
     const ProjDescription description;
-    PjHolder crs;
+    PjHolder crs ZMC_GUARDED_BY(projMutex);
     // The transformation of the last call, since making one costs far more than using it.
-    mutable PjHolder transformation;
-    mutable std::uint64_t transformationTarget = 0;
+    mutable PjHolder transformation ZMC_GUARDED_BY(projMutex);
+    mutable std::uint64_t transformationTarget ZMC_GUARDED_BY(projMutex) = 0;
 };
 
 }  // namespace zelm

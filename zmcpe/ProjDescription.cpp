@@ -3,8 +3,6 @@
 #include <cstdlib>
 #include <numbers>
 
-#include "zmcpe/ProjContext.h"
-
 namespace zelm {
 namespace {
 

@@ -5,6 +5,7 @@
 #include <proj.h>
 
 #include "zmcpe/CoordSysImpl.h"
+#include "zmcpe/ProjContext.h"
 
 namespace zelm {
 
@@ -19,8 +20,7 @@ struct ProjDescription {
     CoordSysImpl::Kind kind = CoordSysImpl::Kind::Other;
 };
 
-// To be called under the lock of `context`.
-ProjDescription DescribeProj(PJ_CONTEXT* context, const PJ* crs);
+ProjDescription DescribeProj(PJ_CONTEXT* context, const PJ* crs) ZMC_REQUIRES(projMutex);
 
 }  // namespace zelm
 

@@ -42,6 +42,11 @@ bool OpenARaster(void* module) {
     return opened;
 }
 
+// Called where no other thread logs.
+bool IsOpenOnLevelTwo(const MetadataParseLog& log) ZMC_NO_LOCK_NEEDED {
+    return log.stream.is_open() && log.stream.good() && log.level == 2;
+}
+
 }  // namespace
 
 int main(int, char** argv) {
@@ -62,6 +67,6 @@ int main(int, char** argv) {
         MetadataParseLog::Log(2, L"after unload %d, f\u00fcr %s\n", round, L"sich");
         MetadataParseLog::Log(3, L"above the level\n");
     }
-    if (!log->stream.is_open() || !log->stream.good() || log->level != 2) return Fail("its state");
+    if (!IsOpenOnLevelTwo(*log)) return Fail("its state");
     return 0;
 }

@@ -31,7 +31,8 @@ using namespace zelm;
 
 namespace {
 
-void ReportLog() {
+// Called where no other thread logs.
+void ReportLog() ZMC_NO_LOCK_NEEDED {
     const CoordSysLog* const log = gpCoordSysLogInstance;
     if (!log) {
         std::fprintf(stderr, "no log\n");

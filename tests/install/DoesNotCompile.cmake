@@ -1,7 +1,8 @@
 # Compiles SOURCE with ZMC_MISUSE=0, which has to succeed, and with ZMC_MISUSE=CASE, which has to
-# fail in the very line that is marked "misuse CASE", and not for want of a header or a flag.
+# fail in the very line that is marked "misuse CASE", and not for want of a header or a flag. FLAGS
+# are the compiler's, besides those of every source.
 cmake_minimum_required(VERSION 3.25)
-set(command ${COMPILER} -std=c++20 -fsigned-char -fsyntax-only -I${INCLUDE})
+set(command ${COMPILER} -std=c++20 -fsigned-char -fsyntax-only -I${INCLUDE} ${FLAGS})
 execute_process(COMMAND ${command} -DZMC_MISUSE=0 ${SOURCE} RESULT_VARIABLE result
     ERROR_VARIABLE errors)
 if(NOT result EQUAL 0)

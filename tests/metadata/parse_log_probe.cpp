@@ -20,7 +20,8 @@
 
 namespace {
 
-void Report() {
+// Called where no other thread logs.
+void Report() ZMC_NO_LOCK_NEEDED {
     MetadataParseLog* const log = gpMetadataParseLogInstance;
     if (!log) {
         std::fprintf(stderr, "no log\n");
