@@ -30,8 +30,9 @@ inline constexpr std::uint32_t Blocked = 1;
 inline constexpr std::uint32_t Morton = 2;
 }  // namespace TileOrder
 
-// Code to word. The words are static texts; a code that is not known is "Unknown", and for a tile
-// ordering "Scanline".
+// Code to word. The words are static texts, which nobody frees: a name is asked for in messages and
+// tables, where a text to own would be a burden. A code that is not known is "Unknown", and for a
+// tile ordering "Scanline".
 const char* PixelTypeName(std::uint32_t code);
 const char* InterleaveName(std::int32_t code);
 const char* TileOrderName(std::uint32_t code);

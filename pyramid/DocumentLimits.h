@@ -14,7 +14,9 @@
 
 namespace zelm {
 
-// These limits stand in docs/format.md: writers count on them.
+// These limits stand in docs/format.md, and so do the refusals of BoundedParser.h and of the text's
+// source (document types and NUL, with which UTF-16 goes): writers count on them, and a file that
+// one version of a reader takes and another refuses helps nobody. They do not change.
 inline constexpr std::uint64_t kMaxDocumentBytes = std::uint64_t{256} << 20;
 inline constexpr std::uint32_t kMaxDocumentDepth = 64;
 inline constexpr std::uint32_t kMaxDocumentNodes = 1u << 20;  // elements, comments, and the like

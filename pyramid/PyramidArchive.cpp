@@ -37,13 +37,16 @@ bool Store(PyramidDataset& dataset, Append append) {
     PyramidXMLDocument* document = dataset.EnsureMetaDocument();
     if (!document || !document->document) return false;
     const std::uint32_t before = document->RecordCount();
-    if (!append(*document)) {
-        document->RemoveFrom(before);
-        return false;
+    // What a failing disk did not take is written with the next store. What makes the document too
+    // long never would be, nor would anything after it.
+    if (append(*document) &&
+        (document->SerializeDocument(*dataset.File, dataset.MetaDocumentOffset) ||
+         !document->IsTooLong())) {
+        dataset.MetaLoaded = false;
+        return true;
     }
-    document->SerializeDocument(*dataset.File, dataset.MetaDocumentOffset);
-    dataset.MetaLoaded = false;
-    return true;
+    document->RemoveFrom(before);
+    return false;
 }
 
 template <class Record, class Write>

@@ -244,13 +244,15 @@ bool PyramidXMLDocument::WritePaletteElement(std::uint32_t band, const Palette& 
 }
 
 bool PyramidXMLDocument::SerializeDocument(platform::File& file, std::uint64_t offset) {
+    tooLong = false;
     if (!document) return false;
     return Attempt("Exception when serializing the XML:\n", [&] {
         xercesc::MemBufFormatTarget target(1023);
         bool complete = false;
         Serialize(*document, target, complete);
         const std::size_t length = target.getLen();
-        if (!complete || length > kMaxDocumentBytes) return false;
+        tooLong = length > kMaxDocumentBytes;
+        if (!complete || tooLong) return false;
         return DocumentStore<platform::File>(file, offset).Write(target.getRawBuffer(), length);
     });
 }

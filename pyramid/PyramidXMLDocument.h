@@ -69,6 +69,8 @@ public:
     // that the text behind the document, which a writer of longer lines may have left, does not
     // spoil it.
     bool SerializeDocument(platform::File& file, std::uint64_t offset);
+    // The last SerializeDocument failed because the text was beyond the limits.
+    bool IsTooLong() const { return tooLong; }
 
     // Number of elements under the root; RemoveFrom takes back all from that position on.
     std::uint32_t RecordCount() const;
@@ -78,6 +80,7 @@ private:
     template <class Build>
     bool AppendRecord(ElementName name, Build build);
 
+    bool tooLong = false;
     std::uint64_t elementCount = 0;  // elements of the tree, the root included
 };
 

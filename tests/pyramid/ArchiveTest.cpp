@@ -9,6 +9,8 @@
 #include <limits>
 #include <random>
 
+#include <xercesc/dom/DOM.hpp>
+
 #include "core/NumericConversion.h"
 #include "pyramid/NumberText.h"
 #include "pyramid/PyramidDataset.h"
@@ -289,6 +291,19 @@ TEST_F(ArchiveTest, RefusedRecordTakesItsStoreBack) {
     EXPECT_FALSE(dataset->SetHistograms(ArrayOf({good, bad})));
     EXPECT_TRUE(dataset->SetHistograms(Array<RasterBandHistogram<T>>()));
     EXPECT_EQ(Compact(DocumentText(*dataset)), "<DATASET/>");
+}
+
+// Five bytes of text for each character, so that the document fills most of what it may.
+TEST_F(ArchiveTest, RecordsThatMakeTheTextTooLongAreTakenBack) {
+    const auto dataset = Make();
+    xercesc::DOMDocument& tree = *dataset->EnsureMetaDocument()->document;
+    const std::u16string text(kMaxDocumentBytes / 5 - 200, u'&');
+    tree.getDocumentElement()->appendChild(tree.createTextNode(text.c_str()));
+    RasterBandHistogram<T> histogram;
+    histogram.binCount = 1000;
+    EXPECT_FALSE(dataset->SetHistograms(ArrayOf({histogram})));
+    EXPECT_EQ(std::filesystem::file_size(name), dataset->TileDataStart);
+    EXPECT_EQ(dataset->MetaDocument->RecordCount(), 0u) << "shorter ones may still fit";
 }
 
 // --- all element types, with what is lost ---
