@@ -91,8 +91,9 @@ std::string MakeManPage(const CLI::App& app) {
     for (const CLI::App* command : CommandsOf(app)) WriteCommand(out, *command);
     out << ".SH EXIT STATUS\n"
         << Escape(kExitStatusText) << ".\n"
-        << ".SH ENVIRONMENT\n.TP\n.B ZMCRASTER_MODULE\nPath of the raster module, where it is not "
-           "beside the program or in the library folder beside that.\n";
+        << ".SH ENVIRONMENT\n.TP\n.B ZMCRASTER_MODULE\nAbsolute path of the raster module, where "
+           "it "
+           "is not to be the one that was installed with the program.\n";
     return out.str();
 }
 
