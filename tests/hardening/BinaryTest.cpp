@@ -136,6 +136,7 @@ const Shipped others[]{
     {"Sibling", ZMC_ZMCG_BINARY, false},
     {"Engine", ZMC_ENGINE_BINARY, false},
     {"Loader", ZMC_LOADER_BINARY, false},
+    {"Files", ZMC_FILES_BINARY, false},
 };
 
 std::string NameOf(const ::testing::TestParamInfo<Shipped>& instance) {

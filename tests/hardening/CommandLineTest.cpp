@@ -16,8 +16,8 @@ using ::testing::SizeIs;
 
 // Folders whose sources end up in something that is shipped.
 const std::set<std::string> shippedFolders{
-    "platform",   "core", "metadata", "colour", "raster", "dispatch", "pyramid", "coordsys",
-    "connection", "zmcg", "zmcpe",    "loader", "host",   "gdal",     "tools"};
+    "platform", "files",      "core", "metadata", "colour", "raster", "dispatch", "pyramid",
+    "coordsys", "connection", "zmcg", "zmcpe",    "loader", "host",   "gdal",     "tools"};
 
 TEST(HardeningCommandLine, EverySourceThatIsShippedHasTheFlags) {
 #ifndef ZMC_HARDENED

@@ -6,6 +6,7 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <cerrno>
 #include <csignal>
 #include <filesystem>
 #include <string>
@@ -152,6 +153,72 @@ TEST_F(FileTest, ChildrenDoNotInheritTheHandle) {
     const int flags = fcntl(before, F_GETFD);
     ASSERT_GE(flags, 0);
     EXPECT_NE(flags & FD_CLOEXEC, 0);
+}
+
+TEST_F(FileTest, OperationsTellWhyTheyFailed) {
+    const auto name = Name("a.bin");
+    int error = -1;
+    EXPECT_FALSE(File::Open(name.c_str(), File::Mode::Read, &error));
+    EXPECT_EQ(error, ENOENT);
+    EXPECT_FALSE(File::Open(nullptr, File::Mode::Read, &error));
+    EXPECT_EQ(error, EINVAL);
+    const auto file = File::Open(name.c_str(), File::Mode::Create, &error);
+    ASSERT_TRUE(file);
+    EXPECT_EQ(error, 0);
+    char byte = 'x';
+    EXPECT_EQ(file->WriteAt(~std::uint64_t{0}, &byte, 1, &error), 0u);
+    EXPECT_EQ(error, EFBIG);
+    EXPECT_EQ(file->WriteAt(0, &byte, 1, &error), 1u);
+    EXPECT_EQ(error, 0);
+    EXPECT_EQ(file->ReadAt(1, &byte, 1, &(error = -1)), 0u);
+    EXPECT_EQ(error, 0) << "the end is no failure";
+    EXPECT_FALSE(file->Truncate(~std::uint64_t{0}, &error));
+    EXPECT_EQ(error, EFBIG);
+    EXPECT_TRUE(file->Sync(&error) && error == 0);
+    const auto readOnly = File::Open(name.c_str(), File::Mode::Read);
+    EXPECT_EQ(readOnly->WriteAt(0, &byte, 1, &error), 0u);
+    EXPECT_EQ(error, EBADF);
+    EXPECT_TRUE(RemoveFile(name.c_str(), &error) && error == 0);
+    EXPECT_FALSE(RemoveFile(name.c_str(), &error));
+    EXPECT_EQ(error, ENOENT);
+    EXPECT_FALSE(RemoveFile(nullptr, &error));
+    EXPECT_EQ(error, EINVAL);
+}
+
+TEST_F(FileTest, IdentityGoesWithTheFileAndNotWithItsName) {
+    const auto name = Name("a.bin"), other = Name("b.bin");
+    const auto file = File::Open(name.c_str(), File::Mode::Create);
+    FileIdentity open, named;
+    ASSERT_TRUE(file->TellIdentity(open) && TellIdentity(name.c_str(), named));
+    EXPECT_EQ(open.device, named.device);
+    EXPECT_EQ(open.number, named.number);
+    EXPECT_EQ(open.modified, named.modified);
+    EXPECT_EQ(open.changed, named.changed);
+    EXPECT_GT(open.modified, std::int64_t{1'500'000'000'000'000'000}) << "nanoseconds since 1970";
+    file->WriteAt(0, "abc", 3);
+    ASSERT_TRUE(file->TellIdentity(open));
+    EXPECT_EQ(open.size, 3u);
+    std::filesystem::rename(name, other);
+    EXPECT_FALSE(TellIdentity(name.c_str(), named));
+    EXPECT_TRUE(TellIdentity(other.c_str(), named));
+    EXPECT_EQ(open.number, named.number);
+    EXPECT_FALSE(TellIdentity(nullptr, named));
+}
+
+TEST_F(FileTest, LocksAndFilesOpenForAMomentKeepOffTheStandardStreams) {
+    const std::string path = (directory / "lock").string();
+    ASSERT_TRUE(CreateNewFile(path));
+    const pid_t child = fork();
+    if (child == 0) {
+        for (const int stream : {0, 1, 2}) close(stream);
+        FileLock lock;
+        bool good = lock.Take(path) == FileLock::Result::Taken && fcntl(0, F_GETFD) < 0;
+        good = good && SyncFile(path) && ReserveSpace(path, 10) && fcntl(0, F_GETFD) < 0;
+        _exit(good ? 0 : 1);
+    }
+    int status = -1;
+    ASSERT_EQ(waitpid(child, &status, 0), child);
+    EXPECT_EQ(status, 0);
 }
 
 TEST_F(FileTest, LockHasOneHolder) {

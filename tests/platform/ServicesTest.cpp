@@ -11,6 +11,7 @@
 #include "platform/Directory.h"
 #include "platform/LoadableLibrary.h"
 #include "platform/LocalTime.h"
+#include "platform/Random.h"
 #include "platform/TextConversion.h"
 #include "platform/TextStream.h"
 #include "tests/support/ScratchDirectory.h"
@@ -117,6 +118,16 @@ TEST(DebugOutput, UnpairedSurrogatesEndSomewhere) {
     testing::internal::CaptureStderr();
     WriteDebugOutput(text.c_str());
     EXPECT_EQ(testing::internal::GetCapturedStderr().size(), 9000u);
+}
+
+TEST(Random, FillsAndDoesNotRepeatItself) {
+    unsigned char first[40] = {}, second[40] = {};
+    ASSERT_TRUE(RandomBytes(first, 32));
+    ASSERT_TRUE(RandomBytes(second, 32));
+    EXPECT_NE(std::string(first, first + 32), std::string(second, second + 32));
+    EXPECT_NE(std::string(first, first + 16), std::string(first + 16, first + 32));
+    EXPECT_EQ(std::string(first + 32, first + 40), std::string(8, '\0')) << "and no further";
+    EXPECT_TRUE(RandomBytes(nullptr, 0));
 }
 
 TEST(LocalTime, HasTwentyFourCharacters) {
