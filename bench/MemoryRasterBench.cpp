@@ -188,21 +188,24 @@ constexpr std::uint32_t kSide = 256;
 
 enum class Layout { OneBand, Lines, Pixels, PixelsAlike };
 
+// Sizes come with the tile: the loops do not know them beforehand.
 template <Layout kLayout, class Run, class Pixel>
 void VisitPlainly(Run&& run, Pixel&& pixel) {
-    constexpr std::size_t kPlane = std::size_t{kSide} * kSide;
+    std::size_t side = kSide;
+    benchmark::DoNotOptimize(side);
+    const std::size_t plane = side * side;
     if constexpr (kLayout == Layout::OneBand) {
-        run(std::integral_constant<std::uint32_t, 0>(), 0, kPlane);
+        run(std::integral_constant<std::uint32_t, 0>(), 0, plane);
     } else if constexpr (kLayout == Layout::PixelsAlike) {
-        run(std::integral_constant<std::uint32_t, 0>(), 0, kPlane * kBands);
+        run(std::integral_constant<std::uint32_t, 0>(), 0, plane * kBands);
     } else if constexpr (kLayout == Layout::Pixels) {
-        for (std::size_t i = 0; i < kPlane; ++i) pixel(i * kBands);
+        for (std::size_t i = 0; i < plane; ++i) pixel(i * kBands);
     } else {
-        for (std::size_t line = 0; line < kSide; ++line) {
-            const std::size_t at = line * kBands * kSide;
-            run(std::integral_constant<std::uint32_t, 0>(), at, kSide);
-            run(std::integral_constant<std::uint32_t, 1>(), at + kSide, kSide);
-            run(std::integral_constant<std::uint32_t, 2>(), at + 2 * kSide, kSide);
+        for (std::size_t line = 0; line < side; ++line) {
+            const std::size_t at = line * kBands * side;
+            run(std::integral_constant<std::uint32_t, 0>(), at, side);
+            run(std::integral_constant<std::uint32_t, 1>(), at + side, side);
+            run(std::integral_constant<std::uint32_t, 2>(), at + 2 * side, side);
         }
     }
 }

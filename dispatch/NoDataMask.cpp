@@ -144,18 +144,26 @@ struct TileShape {
     std::size_t bands;
 };
 
-// Calls visit(rules, place of the first sample, samples) for runs that make up a tile of several
+// Runs of samples under the same rules: samples in all of them, samples of a run, of which the last
+// may have fewer, and from one run to the next.
+struct Runs {
+    std::size_t samples;
+    std::size_t length;
+    std::size_t step;
+};
+
+// Calls visit(rules, place of the first sample, runs) for all samples of a tile of several
 // pixel-interleaved bands.
 template <class S, class Visit>
 void VisitPixels(const RuleSource<S>& source, const TileShape& tile, const Visit& visit) {
     const std::size_t pixels = tile.width * tile.height;
     for (std::size_t first = 0; first < tile.bands;) {
         const PixelRules<S> rules(source, first, tile.bands, pixels);
+        const std::size_t samples = pixels * rules.Bands();
         if (rules.IsUniform() && rules.Bands() == tile.bands)
-            return visit(rules.First(), 0, pixels * tile.bands);
-        for (std::size_t pixel = 0; pixel < pixels; pixel += rules.Pixels())
-            visit(rules, pixel * tile.bands + first,
-                  std::min(rules.Pixels(), pixels - pixel) * rules.Bands());
+            return visit(rules.First(), 0, Runs{samples, samples, samples});
+        visit(rules, first,
+              Runs{samples, rules.Pixels() * rules.Bands(), rules.Pixels() * tile.bands});
         first += rules.Bands();
     }
 }
@@ -168,55 +176,68 @@ void VisitRuns(const RuleSource<S>& source, const TileShape& tile, const Visit& 
     if (tile.interleave == Interleave::BIP && tile.bands > 1)
         return VisitPixels(source, tile, visit);
     const std::size_t bands = tile.interleave == Interleave::None ? 1 : tile.bands;
-    const std::size_t runs = tile.interleave == Interleave::BIL ? tile.height : 1;
-    const std::size_t length = tile.width * tile.height / runs;
-    for (std::size_t band = 0; band < bands; ++band) {
-        const BandRules<S> rules{source.RuleOf(band)};
-        for (std::size_t run = 0; run < runs; ++run)
-            visit(rules, (run * bands + band) * length, length);
-    }
-}
-
-void ClearMarks(unsigned char* mask, std::size_t count) {
-    for (std::size_t i = 0; i < count; ++i)
-        mask[i] = static_cast<unsigned char>(mask[i] & kOtherBits);
+    const std::size_t plane = tile.width * tile.height;
+    const std::size_t length = tile.interleave == Interleave::BIL ? tile.width : plane;
+    for (std::size_t band = 0; band < bands; ++band)
+        visit(BandRules<S>{source.RuleOf(band)}, band * length,
+              Runs{plane, length, bands * length});
 }
 
 template <class S, class Rules>
 [[gnu::noinline]] void MarkSamples(const Rules& rules, const S* __restrict samples,
-                                   unsigned char* __restrict mask, std::size_t count) {
-    // Integers without a value have no marked sample, so that they need no look.
-    if (std::is_integral_v<S> && !rules.HasAny()) return ClearMarks(mask, count);
-    for (std::size_t i = 0; i < count; ++i) {
-        auto marked = static_cast<unsigned>(IsMarked(samples[i], rules.Value(i)));
-        if constexpr (std::is_integral_v<S>) marked &= rules.Has(i);
-        mask[i] = static_cast<unsigned char>((mask[i] & kOtherBits) | marked);
+                                   unsigned char* __restrict mask, const Runs& runs) {
+    for (std::size_t left = runs.samples, length = runs.length; left != 0; left -= length) {
+        length = std::min(length, left);
+        for (std::size_t i = 0; i < length; ++i) {
+            const unsigned mark = std::is_integral_v<S> ? rules.Has(i) : 1;
+            const unsigned marked = IsMarked(samples[i], rules.Value(i)) ? mark : 0;
+            mask[i] = static_cast<unsigned char>((mask[i] & kOtherBits) | marked);
+        }
+        samples += runs.step;
+        mask += runs.step;
     }
 }
 
 template <class S, class Rules>
 [[gnu::noinline]] void StampSamples(const Rules& rules, S* __restrict samples,
-                                    const unsigned char* __restrict mask, std::size_t count) {
-    if (!rules.HasAny()) return;
-    for (std::size_t i = 0; i < count; ++i) {
-        const S value = rules.Value(i);
-        samples[i] = (mask[i] & kMarkedBit & rules.Has(i)) != 0 ? value : samples[i];
+                                    const unsigned char* __restrict mask, const Runs& runs) {
+    for (std::size_t left = runs.samples, length = runs.length; left != 0; left -= length) {
+        length = std::min(length, left);
+        for (std::size_t i = 0; i < length; ++i) {
+            const S value = rules.Value(i);
+            samples[i] = (mask[i] & kMarkedBit & rules.Has(i)) != 0 ? value : samples[i];
+        }
+        samples += runs.step;
+        mask += runs.step;
+    }
+}
+
+void ClearMarks(unsigned char* mask, const Runs& runs) {
+    for (std::size_t left = runs.samples, length = runs.length; left != 0; left -= length) {
+        length = std::min(length, left);
+        for (std::size_t i = 0; i < length; ++i)
+            mask[i] = static_cast<unsigned char>(mask[i] & kOtherBits);
+        mask += runs.step;
     }
 }
 
 template <class S>
-void MarkTile(const RuleSource<S>& source, const TileShape& tile, const S* samples,
-              unsigned char* mask) {
-    VisitRuns(source, tile, [=](const auto& rules, std::size_t at, std::size_t count) {
-        MarkSamples(rules, samples + at, mask + at, count);
+[[gnu::noinline]] void MarkTile(const RuleSource<S>& source, const TileShape& tile,
+                                const S* samples, unsigned char* mask) {
+    VisitRuns(source, tile, [=](const auto& rules, std::size_t at, const Runs& runs) {
+        // Integers without a value have no marked sample, so that they need no look.
+        if (std::is_integral_v<S> && !rules.HasAny())
+            ClearMarks(mask + at, runs);
+        else
+            MarkSamples(rules, samples + at, mask + at, runs);
     });
 }
 
 template <class S>
-void StampTile(const RuleSource<S>& source, const TileShape& tile, S* samples,
-               const unsigned char* mask) {
-    VisitRuns(source, tile, [=](const auto& rules, std::size_t at, std::size_t count) {
-        StampSamples(rules, samples + at, mask + at, count);
+[[gnu::noinline]] void StampTile(const RuleSource<S>& source, const TileShape& tile, S* samples,
+                                 const unsigned char* mask) {
+    VisitRuns(source, tile, [=](const auto& rules, std::size_t at, const Runs& runs) {
+        if (rules.HasAny()) StampSamples(rules, samples + at, mask + at, runs);
     });
 }
 
