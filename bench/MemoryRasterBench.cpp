@@ -3,6 +3,8 @@
 #include <cstring>
 #include <memory>
 #include <string>
+#include <type_traits>
+#include <utility>
 #include <vector>
 
 #include "bench/Comparison.h"
@@ -11,6 +13,7 @@
 #include "core/NumericConversion.h"
 #include "core/PixelVocabulary.h"
 #include "dispatch/NoDataMask.h"
+#include "dispatch/NoDataRule.h"
 #include "tests/support/MemoryRaster.h"
 #include "tests/support/TileModel.h"
 
@@ -26,15 +29,16 @@ constexpr std::uint32_t kSamples = 512, kLines = 256, kBands = 3, kFirstLine = 3
 
 template <class T>
 struct Raster {
-    std::vector<T> pixels = Samples<T>(std::size_t{kSamples} * kLines * kBands);
+    std::vector<T> pixels;
     std::vector<T> tile = std::vector<T>(pixels.size());
     std::vector<unsigned char> mask = std::vector<unsigned char>(pixels.size());
     MemoryRasterDataConnection connection;
     RasterReaderDispatchPtr dispatch;
 
-    explicit Raster(std::int32_t interleave) {
+    explicit Raster(std::int32_t interleave, std::size_t bands = kBands)
+        : pixels(Samples<T>(std::size_t{kSamples} * kLines * bands)) {
         connection.Open(Argument({MemoryRasterText(pixels.data())
-                                      .Size(kSamples, kLines, kBands)
+                                      .Size(kSamples, kLines, bands)
                                       .Layout(interleave)
                                       .Type(ElementTraits<T>::code)
                                       .Text()}),
@@ -47,6 +51,10 @@ struct Raster {
     void Read(std::vector<int>& list) {
         Reader().ReadTile(0, kFirstLine, kSamples, kTileLines, ListView(list), 0, tile.data(),
                           nullptr);
+    }
+    void Write(std::vector<int>& list) {
+        Reader().WriteTile(0, kFirstLine, kSamples, kTileLines, ListView(list), 0, tile.data(),
+                           mask.data());
     }
 };
 
@@ -113,31 +121,177 @@ void SingleBand(benchmark::State& state, std::int32_t interleave) {
         });
 }
 
-// The mask of a tile, against a loop that reads its pixels and writes its mask bytes.
-template <class T>
-void Mask(benchmark::State& state, std::int32_t interleave, std::uint32_t bands,
-          std::uint32_t values) {
-    constexpr std::uint32_t kSide = 256;
-    Raster<T> raster(interleave);
-    RasterProps noData;
-    noData.SetBands(kBands);
-    for (std::uint32_t b = 0; b < values; ++b) noData.SetNoDataValue(b, 5 + b);
-    raster.Reader().SetNoDataValues(noData);
-    std::vector<unsigned char> other(raster.mask.size());
-    const std::size_t samples = std::size_t{kSide} * kSide * bands;
+// Some of the bands of pixel-interleaved rasters, by loops to which the compiler knows all of them.
+template <class T, std::size_t kOf, int... kList>
+void ReadPlainly(const T* __restrict raster, T* __restrict tile, std::size_t pixels) {
+    for (std::size_t i = 0; i < pixels; ++i, tile += sizeof...(kList), raster += kOf) {
+        std::size_t k = 0;
+        ((tile[k++] = raster[kList]), ...);
+    }
+}
+
+template <class T, std::size_t kOf, int... kList>
+void WritePlainly(T* __restrict raster, const T* __restrict tile, std::size_t pixels) {
+    for (std::size_t i = 0; i < pixels; ++i, tile += sizeof...(kList), raster += kOf) {
+        std::size_t k = 0;
+        ((raster[kList] = tile[k++]), ...);
+    }
+}
+
+template <class T, std::size_t kOf, int... kList>
+void PixelsRead(benchmark::State& state) {
+    Raster<T> raster(Interleave::BIP, kOf);
+    std::vector<int> list{kList...};
+    std::vector<T> other(raster.tile.size());
+    const std::size_t pixels = std::size_t{kSamples} * kTileLines;
     bench::Compare(
-        state, samples * (sizeof(T) + 1),
+        state, pixels * sizeof...(kList) * sizeof(T), [&] { raster.Read(list); },
         [&] {
-            ComputeNoDataMask<T>(raster.Reader(), kSide, kSide, bands, raster.pixels.data(),
-                                 raster.mask.data());
+            ReadPlainly<T, kOf, kList...>(
+                raster.pixels.data() + std::size_t{kFirstLine} * kSamples * kOf, other.data(),
+                pixels);
+        });
+}
+
+template <class T, std::size_t kOf, int... kList>
+void PixelsWritten(benchmark::State& state) {
+    Raster<T> raster(Interleave::BIP, kOf);
+    std::vector<int> list{kList...};
+    std::vector<T> other(raster.pixels.size());
+    const std::size_t pixels = std::size_t{kSamples} * kTileLines;
+    bench::Compare(
+        state, pixels * sizeof...(kList) * sizeof(T), [&] { raster.Write(list); },
+        [&] {
+            WritePlainly<T, kOf, kList...>(other.data() + std::size_t{kFirstLine} * kSamples * kOf,
+                                           raster.tile.data(), pixels);
+        });
+}
+
+// Rules of which the compiler knows the kind: kValues of the bands, the first ones, have a value.
+template <class T, std::uint32_t kValues>
+struct PlainRules {
+    T values[kBands];
+
+    template <std::uint32_t kBand>
+    unsigned char Marked(unsigned char byte, const T& x) const {
+        const NoDataRule<T> rule{kBand < kValues, values[kBand]};
+        return static_cast<unsigned char>((byte & 0xFE) | static_cast<unsigned>(rule.Marks(x)));
+    }
+    template <std::uint32_t kBand>
+    T Stamped(unsigned char byte, const T& x) const {
+        const T value = values[kBand];
+        return kBand < kValues && (byte & 1) != 0 ? value : x;
+    }
+};
+
+constexpr std::uint32_t kSide = 256;
+
+enum class Layout { OneBand, Lines, Pixels, PixelsAlike };
+
+// Sizes come with the tile: the loops do not know them beforehand.
+template <Layout kLayout, class Run, class Pixel>
+void VisitPlainly(Run&& run, Pixel&& pixel) {
+    std::size_t side = kSide;
+    benchmark::DoNotOptimize(side);
+    const std::size_t plane = side * side;
+    if constexpr (kLayout == Layout::OneBand) {
+        run(std::integral_constant<std::uint32_t, 0>(), 0, plane);
+    } else if constexpr (kLayout == Layout::PixelsAlike) {
+        run(std::integral_constant<std::uint32_t, 0>(), 0, plane * kBands);
+    } else if constexpr (kLayout == Layout::Pixels) {
+        for (std::size_t i = 0; i < plane; ++i) pixel(i * kBands);
+    } else {
+        for (std::size_t line = 0; line < side; ++line) {
+            const std::size_t at = line * kBands * side;
+            run(std::integral_constant<std::uint32_t, 0>(), at, side);
+            run(std::integral_constant<std::uint32_t, 1>(), at + side, side);
+            run(std::integral_constant<std::uint32_t, 2>(), at + 2 * side, side);
+        }
+    }
+}
+
+template <Layout kLayout, class T, std::uint32_t kValues>
+void MarkPlainly(const PlainRules<T, kValues> rules, const T* __restrict samples,
+                 unsigned char* __restrict mask) {
+    VisitPlainly<kLayout>(
+        [=](auto band, std::size_t at, std::size_t count) {
+            for (std::size_t i = at; i < at + count; ++i)
+                mask[i] = rules.template Marked<band()>(mask[i], samples[i]);
+        },
+        [=](std::size_t at) {
+            mask[at] = rules.template Marked<0>(mask[at], samples[at]);
+            mask[at + 1] = rules.template Marked<1>(mask[at + 1], samples[at + 1]);
+            mask[at + 2] = rules.template Marked<2>(mask[at + 2], samples[at + 2]);
+        });
+}
+
+template <Layout kLayout, class T, std::uint32_t kValues>
+void StampPlainly(const PlainRules<T, kValues> rules, T* __restrict samples,
+                  const unsigned char* __restrict mask) {
+    VisitPlainly<kLayout>(
+        [=](auto band, std::size_t at, std::size_t count) {
+            for (std::size_t i = at; i < at + count; ++i)
+                samples[i] = rules.template Stamped<band()>(mask[i], samples[i]);
+        },
+        [=](std::size_t at) {
+            samples[at] = rules.template Stamped<0>(mask[at], samples[at]);
+            samples[at + 1] = rules.template Stamped<1>(mask[at + 1], samples[at + 1]);
+            samples[at + 2] = rules.template Stamped<2>(mask[at + 2], samples[at + 2]);
+        });
+}
+
+// A raster whose first kValues bands have a no-data value, and the same told to plain loops.
+template <class T, Layout kLayout, std::uint32_t kValues>
+struct Masked {
+    static constexpr std::uint32_t kCount = kLayout == Layout::OneBand ? 1 : kBands;
+    static constexpr std::size_t kBytes = std::size_t{kSide} * kSide * kCount * (sizeof(T) + 1);
+
+    Raster<T> raster{kLayout == Layout::OneBand ? Interleave::BSQ
+                     : kLayout == Layout::Lines ? Interleave::BIL
+                                                : Interleave::BIP};
+    PlainRules<T, kValues> rules;
+
+    Masked() {
+        RasterProps noData;
+        noData.SetBands(kBands);
+        for (std::uint32_t b = 0; b < kBands; ++b) {
+            const double value = kLayout == Layout::PixelsAlike ? 5 : 5 + b;
+            rules.values[b] = FromDouble<T>(value);
+            if (b < kValues) noData.SetNoDataValue(b, value);
+        }
+        raster.Reader().SetNoDataValues(noData);
+    }
+};
+
+template <class T, Layout kLayout, std::uint32_t kValues>
+void Mask(benchmark::State& state) {
+    Masked<T, kLayout, kValues> tile;
+    std::vector<unsigned char> other(tile.raster.mask.size());
+    bench::Compare(
+        state, tile.kBytes,
+        [&] {
+            ComputeNoDataMask<T>(tile.raster.Reader(), kSide, kSide, tile.kCount,
+                                 tile.raster.pixels.data(), tile.raster.mask.data());
         },
         [&] {
-            const T value = FromDouble<T>(5);
-            const T* __restrict const from = raster.pixels.data();
-            unsigned char* __restrict const to = other.data();
-            for (std::size_t i = 0; i < samples; ++i)
-                to[i] = static_cast<unsigned char>((to[i] & 0xFE) | (from[i] == value ? 1 : 0));
+            MarkPlainly<kLayout>(tile.rules, std::as_const(tile.raster.pixels).data(),
+                                 other.data());
         });
+}
+
+template <class T, Layout kLayout, std::uint32_t kValues>
+void Stamp(benchmark::State& state) {
+    Masked<T, kLayout, kValues> tile;
+    std::vector<unsigned char>& mask = tile.raster.mask;
+    for (std::size_t i = 0; i < mask.size(); i += 1 + i * 7 % 5) mask[i] = 1;
+    std::vector<T> other = tile.raster.pixels;
+    bench::Compare(
+        state, tile.kBytes,
+        [&] {
+            ApplyNoDataMask<T>(tile.raster.Reader(), kSide, kSide, tile.kCount,
+                               tile.raster.pixels.data(), mask.data());
+        },
+        [&] { StampPlainly<kLayout>(tile.rules, other.data(), std::as_const(mask).data()); });
 }
 
 template <class Run>
@@ -160,16 +314,29 @@ void RegisterTiles(std::int32_t interleave) {
 }
 
 template <class T>
+void RegisterPixels() {
+    const std::string name = std::string("/") + ElementTraits<T>::word + "/";
+    Register("Read" + name + "2of5", PixelsRead<T, 5, 1, 3>);
+    Register("Read" + name + "Reversed", PixelsRead<T, 3, 2, 1, 0>);
+    Register("Read" + name + "3of4", PixelsRead<T, 4, 0, 1, 2>);
+    Register("Read" + name + "5of6", PixelsRead<T, 6, 0, 2, 3, 4, 5>);
+    Register("Write" + name + "1of3", PixelsWritten<T, 3, 1>);
+    Register("Write" + name + "2of3", PixelsWritten<T, 3, 2, 0>);
+    Register("Write" + name + "Reversed", PixelsWritten<T, 3, 2, 1, 0>);
+    Register("Write" + name + "3of4", PixelsWritten<T, 4, 0, 1, 2>);
+}
+
+template <class T>
 void RegisterMasks() {
-    const std::string name = std::string("Mask/") + ElementTraits<T>::word;
-    Register(name + "/OneBand",
-             [](benchmark::State& state) { Mask<T>(state, Interleave::BSQ, 1, 1); });
-    Register(name + "/BIL",
-             [](benchmark::State& state) { Mask<T>(state, Interleave::BIL, kBands, kBands); });
-    Register(name + "/BIP",
-             [](benchmark::State& state) { Mask<T>(state, Interleave::BIP, kBands, kBands); });
-    Register(name + "/BIPWithAndWithoutValue",
-             [](benchmark::State& state) { Mask<T>(state, Interleave::BIP, kBands, 2); });
+    const std::string name = std::string("/") + ElementTraits<T>::word;
+    Register("Mask" + name + "/OneBand", Mask<T, Layout::OneBand, 1>);
+    Register("Mask" + name + "/BIL", Mask<T, Layout::Lines, kBands>);
+    Register("Mask" + name + "/BIP", Mask<T, Layout::Pixels, kBands>);
+    Register("Mask" + name + "/BIPWithAndWithoutValue", Mask<T, Layout::Pixels, 2>);
+    Register("Mask" + name + "/BIPSameValue", Mask<T, Layout::PixelsAlike, kBands>);
+    Register("Stamp" + name + "/OneBand", Stamp<T, Layout::OneBand, 1>);
+    Register("Stamp" + name + "/BIP", Stamp<T, Layout::Pixels, kBands>);
+    Register("Stamp" + name + "/BIPWithAndWithoutValue", Stamp<T, Layout::Pixels, 2>);
 }
 
 // One element type for each sample size: tiles know no more of a type.
@@ -181,6 +348,11 @@ void RegisterMasks() {
         RegisterTiles<double>(interleave);
         RegisterTiles<Complex<double>>(interleave);
     }
+    RegisterPixels<unsigned char>();
+    RegisterPixels<unsigned short>();
+    RegisterPixels<float>();
+    RegisterPixels<double>();
+    RegisterPixels<Complex<double>>();
 #define ZMC_X(type, name, code) RegisterMasks<type>();
     ZMC_ELEMENT_TYPES(ZMC_X)
 #undef ZMC_X

@@ -13,245 +13,236 @@ namespace {
 constexpr unsigned kMarkedBit = 1;
 constexpr unsigned kOtherBits = 0xFE;
 
-// Where the samples of one band lie in a tile whose interleave keeps them in runs.
-struct BandRuns {
-    std::size_t bands;
-    std::size_t bandStride;  // from a band's first run to the next band's
-    std::size_t runs;
-    std::size_t runStride;
-    std::size_t length;  // samples of a run
+// What the loops take a sample for: signed integers are equal where their bits are, and need no
+// loops of their own.
+template <class T, bool kIsInteger = std::is_integral_v<T>>
+struct SampleOf {
+    using Type = T;
 };
-
-// Every interleave but BIP of several bands. None has one plane, whatever the count of bands.
-BandRuns RunsOf(std::int32_t interleave, std::size_t width, std::size_t height, std::size_t bands) {
-    const std::size_t plane = width * height;
-    if (interleave == Interleave::None) return {1, 0, 1, 0, plane};
-    if (interleave == Interleave::BIL) return {bands, width, height, bands * width, width};
-    return {bands, plane, 1, 0, plane};
-}
-
 template <class T>
-NoDataRule<T> RuleOf(const RasterReader<T>& reader, std::size_t band) {
-    const auto number = static_cast<std::uint32_t>(band);
-    if (!reader.HasNoDataValue(number)) return {};
-    return {true, reader.GetNoDataValue(number)};
-}
-
-// Equality of integers of 64 bits, by halves: the vector units that every processor of this kind
-// has compare 32 bits at most.
+struct SampleOf<T, true> {
+    using Type = std::make_unsigned_t<T>;
+};
 template <class T>
-bool Matches(const T& x, const T& value) {
-    if constexpr (std::is_integral_v<T> && sizeof(T) == 8) {
-        const std::uint64_t difference =
-            static_cast<std::uint64_t>(x) ^ static_cast<std::uint64_t>(value);
+using Sample = typename SampleOf<T>::Type;
+
+// Loops of comparisons that decide on bytes become vector code up to 32 bits. Wider integers are
+// compared by halves. Of wider reals the outcome is a number, which narrows: a finite sample times
+// 0 adds nothing to it, and any other makes it a NaN.
+template <class S>
+bool IsMarked(const S& x, const S& value) {
+    if constexpr (std::is_same_v<S, std::uint64_t>) {
+        const std::uint64_t difference = x ^ value;
         return (static_cast<std::uint32_t>(difference) |
                 static_cast<std::uint32_t>(difference >> 32)) == 0;
-    } else if constexpr (kIsComplex<T>) {
-        return (static_cast<unsigned>(x.re == value.re) &
-                static_cast<unsigned>(x.im == value.im)) != 0;
+    } else if constexpr (std::is_same_v<S, double>) {
+        return static_cast<float>((x == value ? 1.0 : 0.0) + x * 0) != 0;
+    } else if constexpr (std::is_same_v<S, Complex<double>>) {
+        const double matches = (x.re == value.re ? 1.0 : 0.0) * (x.im == value.im ? 1.0 : 0.0);
+        return static_cast<float>(matches + x.re * 0 + x.im * 0) != 0;
+    } else if constexpr (kIsComplex<S>) {
+        return ((static_cast<unsigned>(x.re == value.re) &
+                 static_cast<unsigned>(x.im == value.im)) |
+                static_cast<unsigned>(NoDataRule<S>::NotFinite(x))) != 0;
     } else {
-        return x == value;
+        return (static_cast<unsigned>(x == value) |
+                static_cast<unsigned>(NoDataRule<S>::NotFinite(x))) != 0;
     }
 }
 
-// 64-bit floats are judged in two steps, for which see MarkWideFloats.
-template <class T>
-constexpr bool kIsWideFloat = std::is_same_v<T, double> || std::is_same_v<T, Complex<double>>;
-
-// The verdict on a sample, as a number of half the width: 1 or NaN for a marked one, else a zero of
-// either sign. x times 0 is such a zero for what is finite, and NaN otherwise.
-float VerdictOn(double x, double value) { return static_cast<float>(x == value ? 1.0 : x * 0); }
-
-float VerdictOn(const Complex<double>& x, const Complex<double>& value) {
-    const double finite = x.re * 0 + x.im * 0;
-    const double verdict = x.re == value.re ? 1.0 : finite;
-    return static_cast<float>(x.im == value.im ? verdict : finite);
-}
-
-void SetMark(unsigned char& byte, bool marked) {
-    byte = static_cast<unsigned char>((byte & kOtherBits) | static_cast<unsigned>(marked));
-}
-
-// Loops in which 64-bit comparisons decide on bytes do not become vector code; one that halves the
-// width and one that goes on from there both do.
-template <class T, class ValueAt>
-void MarkWideFloats(ValueAt valueAt, const T* __restrict samples, unsigned char* __restrict mask,
-                    std::size_t count) {
-    constexpr std::size_t kBlock = 64;
-    float verdicts[kBlock];
-    for (std::size_t start = 0; start < count; start += kBlock) {
-        const std::size_t length = std::min(kBlock, count - start);
-        for (std::size_t i = 0; i < length; ++i)
-            verdicts[i] = VerdictOn(samples[start + i], valueAt(start + i));
-        for (std::size_t i = 0; i < length; ++i) SetMark(mask[start + i], verdicts[i] != 0);
-    }
-}
-
-// Sets or clears bit 0 for each sample, against the value that valueAt(i) gives for it. Floating
-// bands without a value come with one that no sample equals.
-template <class T, class ValueAt>
-void MarkSamples(ValueAt valueAt, const T* __restrict samples, unsigned char* __restrict mask,
-                 std::size_t count) {
-    if constexpr (kIsWideFloat<T>) {
-        MarkWideFloats(valueAt, samples, mask, count);
-    } else {
-        for (std::size_t i = 0; i < count; ++i)
-            SetMark(mask[i], (static_cast<unsigned>(Matches(samples[i], valueAt(i))) |
-                              static_cast<unsigned>(NoDataRule<T>::NotFinite(samples[i]))) != 0);
-    }
-}
-
-// The value to compare with; a floating band without one has the value that no sample equals.
-template <class T>
-T ValueOf(const NoDataRule<T>& rule) {
-    if constexpr (!std::is_integral_v<T>)
-        return rule.hasValue ? rule.value : NoDataRule<T>::Unmatched();
-    else
-        return rule.value;
-}
-
-void ClearRun(unsigned char* mask, std::size_t count) {
-    for (std::size_t i = 0; i < count; ++i)
-        mask[i] = static_cast<unsigned char>(mask[i] & kOtherBits);
-}
-
-// Integers without a no-data value have no marked sample, so that their pixels need no look.
-template <class T>
-void MarkOrClearRun(const NoDataRule<T>& rule, const T* pixels, unsigned char* mask,
-                    std::size_t count) {
-    if (std::is_integral_v<T> && !rule.hasValue)
-        ClearRun(mask, count);
-    else
-        MarkSamples([value = ValueOf(rule)](std::size_t) { return value; }, pixels, mask, count);
-}
-
-template <class T>
-void StampRun(T value, T* __restrict pixels, const unsigned char* __restrict mask,
-              std::size_t count) {
-    for (std::size_t i = 0; i < count; ++i)
-        pixels[i] = (mask[i] & kMarkedBit) != 0 ? value : pixels[i];
-}
-
-// The rules of neighbouring bands of a pixel-interleaved tile, repeated over as many pixels as fit,
-// so that the samples of several pixels are compared in one contiguous loop. Bands that do not fit
-// together are taken in several patterns.
-template <class T>
-class BandPattern {
+// Asks a reader for the rule of the band in one place of a tile, whatever the sign of its samples.
+// A floating band without a value gets one that no sample equals.
+template <class S>
+class RuleSource {
 public:
-    BandPattern(const RasterReader<T>& reader, std::size_t firstBand, std::size_t bandCount)
-        : bands(std::min(bandCount - firstBand, kSamples)) {
-        const NoDataRule<T> first = RuleOf(reader, firstBand);
-        Put(0, first);
-        uniform = true;
-        for (std::size_t band = 1; band < bands; ++band) {
-            const NoDataRule<T> rule = RuleOf(reader, firstBand + band);
-            uniform = uniform && IsSame(rule, first);
-            anyValue = anyValue || rule.hasValue;
-            allValues = allValues && rule.hasValue;
-            Put(band, rule);
-        }
-        anyValue = anyValue || first.hasValue;
-        allValues = allValues && first.hasValue;
-        // Only a pattern of all bands may run on into the next pixel.
-        if (bands == bandCount) Repeat();
+    template <class T>
+    explicit RuleSource(const RasterReader<T>& source) : reader(&source), ask(&Ask<T>) {}
+
+    NoDataRule<S> RuleOf(std::size_t band) const {
+        return ask(reader, static_cast<std::uint32_t>(band));
     }
+
+private:
+    const BasicRasterReader* reader;
+    NoDataRule<S> (*ask)(const BasicRasterReader*, std::uint32_t);
+
+    template <class T>
+    static NoDataRule<S> Ask(const BasicRasterReader* source, std::uint32_t band) {
+        const auto& typed = static_cast<const RasterReader<T>&>(*source);
+        if (typed.HasNoDataValue(band)) return {true, static_cast<S>(typed.GetNoDataValue(band))};
+        if constexpr (std::is_integral_v<T>)
+            return {};
+        else
+            return {false, NoDataRule<T>::Unmatched()};
+    }
+};
+
+// The rules of a run of samples, by the sample's place in the run: those of a run of one band.
+template <class S>
+struct BandRules {
+    static constexpr unsigned Has(std::size_t) { return 1; }
+    S Value(std::size_t) const { return rule.value; }
+    bool HasAny() const { return rule.hasValue; }
+
+    NoDataRule<S> rule;
+};
+
+// Those of neighbouring bands of a pixel-interleaved tile, repeated over as many pixels as fit.
+template <class S>
+class PixelRules {
+public:
+    // Bands that do not fit together are taken in several goes, pixel by pixel.
+    [[gnu::noinline]] PixelRules(const RuleSource<S>& source, std::size_t first,
+                                 std::size_t bandCount, std::size_t pixelCount)
+        : bands(std::min(bandCount - first, kMost)) {
+        for (std::size_t band = 0; band < bands; ++band) {
+            const NoDataRule<S> rule = source.RuleOf(first + band);
+            values[band] = rule.value;
+            has[band] = rule.hasValue ? 1 : 0;
+            uniform =
+                uniform && has[band] == has[0] && (!rule.hasValue || values[band] == values[0]);
+        }
+        if (bands == bandCount && !uniform) Repeat(pixelCount);
+    }
+
+    unsigned Has(std::size_t at) const { return has[at]; }
+    S Value(std::size_t at) const { return values[at]; }
+    static constexpr bool HasAny() { return true; }
 
     std::size_t Bands() const { return bands; }
     std::size_t Pixels() const { return pixels; }
     bool IsUniform() const { return uniform; }
-    bool HasAnyValue() const { return anyValue; }
-    NoDataRule<T> First() const { return {flags[0] != 0, values[0]}; }
-
-    void Mark(const T* samples, unsigned char* mask, std::size_t count) const {
-        if (std::is_integral_v<T> && !allValues)
-            MarkFlagged(samples, mask, count);
-        else
-            MarkSamples([this](std::size_t i) { return values[i]; }, samples, mask, count);
-    }
-
-    void Stamp(T* __restrict samples, const unsigned char* __restrict mask,
-               std::size_t count) const {
-        for (std::size_t i = 0; i < count; ++i)
-            samples[i] = (mask[i] & flags[i]) != 0 ? values[i] : samples[i];
-    }
+    BandRules<S> First() const { return {{has[0] != 0, values[0]}}; }
 
 private:
-    static constexpr std::size_t kSamples = 512;
-    // A whole number of vectors of any sample size, so that no loop over a pattern has a rest.
-    static constexpr std::size_t kAlignedPixels = 16;
-    T values[kSamples];
-    unsigned char flags[kSamples];  // 1 where the band has a value
+    static constexpr std::size_t kMost = 4096 / sizeof(S);
+    // A whole number of vectors of any sample size, so that no run but the last has a rest.
+    static constexpr std::size_t kAligned = 16;
+
+    S values[kMost];
+    unsigned char has[kMost];
     std::size_t bands;
     std::size_t pixels = 1;
-    bool uniform = false;
-    bool anyValue = false;
-    bool allValues = true;
+    bool uniform = true;
 
-    static bool IsSame(const NoDataRule<T>& a, const NoDataRule<T>& b) {
-        return a.hasValue == b.hasValue && (!a.hasValue || a.value == b.value);
-    }
-
-    // For integers of which some bands have a value: there is none that no sample equals.
-    void MarkFlagged(const T* __restrict samples, unsigned char* __restrict mask,
-                     std::size_t count) const {
-        for (std::size_t i = 0; i < count; ++i)
-            mask[i] = static_cast<unsigned char>(
-                (mask[i] & kOtherBits) |
-                (static_cast<unsigned>(Matches(samples[i], values[i])) & flags[i]));
-    }
-
-    void Put(std::size_t at, const NoDataRule<T>& rule) {
-        values[at] = ValueOf(rule);
-        flags[at] = rule.hasValue ? 1 : 0;
-    }
-
-    void Repeat() {
-        pixels = kSamples / bands;
-        if (pixels > kAlignedPixels) pixels -= pixels % kAlignedPixels;
-        for (std::size_t i = bands; i < pixels * bands; ++i) {
-            values[i] = values[i - bands];
-            flags[i] = flags[i - bands];
+    void Repeat(std::size_t pixelCount) {
+        pixels = std::min(kMost / bands, pixelCount);
+        if (pixels > kAligned) pixels -= pixels % kAligned;
+        const std::size_t samples = pixels * bands;
+        for (std::size_t done = bands; done < samples; done *= 2) {
+            std::copy_n(values, std::min(done, samples - done), values + done);
+            std::copy_n(has, std::min(done, samples - done), has + done);
         }
     }
 };
 
-// Calls visit(offset, count) for the stretches of a pixel-interleaved tile that a pattern starting
-// at band `first` covers, each beginning where the pattern begins.
-template <class T, class Visit>
-void ForEachStretch(const BandPattern<T>& pattern, std::size_t first, std::size_t pixels,
-                    std::size_t bands, Visit&& visit) {
-    for (std::size_t pixel = 0; pixel < pixels; pixel += pattern.Pixels())
-        visit(pixel * bands + first, std::min(pattern.Pixels(), pixels - pixel) * pattern.Bands());
-}
+// How the samples of a tile lie.
+struct TileShape {
+    std::int32_t interleave;
+    std::size_t width;
+    std::size_t height;
+    std::size_t bands;
+};
 
-template <class T>
-void MarkPixelInterleaved(const RasterReader<T>& reader, std::size_t pixels, std::size_t bands,
-                          const T* samples, unsigned char* mask) {
-    for (std::size_t first = 0; first < bands;) {
-        const BandPattern<T> pattern(reader, first, bands);
-        if (pattern.IsUniform() && pattern.Bands() == bands) {
-            MarkOrClearRun(pattern.First(), samples, mask, pixels * bands);
-        } else {
-            ForEachStretch(pattern, first, pixels, bands, [&](std::size_t at, std::size_t count) {
-                pattern.Mark(samples + at, mask + at, count);
-            });
-        }
-        first += pattern.Bands();
+// Runs of samples under the same rules: samples in all of them, samples of a run, of which the last
+// may have fewer, and from one run to the next.
+struct Runs {
+    std::size_t samples;
+    std::size_t length;
+    std::size_t step;
+};
+
+// Calls visit(rules, place of the first sample, runs) for all samples of a tile of several
+// pixel-interleaved bands.
+template <class S, class Visit>
+void VisitPixels(const RuleSource<S>& source, const TileShape& tile, const Visit& visit) {
+    const std::size_t pixels = tile.width * tile.height;
+    for (std::size_t first = 0; first < tile.bands;) {
+        const PixelRules<S> rules(source, first, tile.bands, pixels);
+        const std::size_t samples = pixels * rules.Bands();
+        if (rules.IsUniform() && rules.Bands() == tile.bands)
+            return visit(rules.First(), 0, Runs{samples, samples, samples});
+        visit(rules, first,
+              Runs{samples, rules.Pixels() * rules.Bands(), rules.Pixels() * tile.bands});
+        first += rules.Bands();
     }
 }
 
-template <class T>
-void StampPixelInterleaved(const RasterReader<T>& reader, std::size_t pixels, std::size_t bands,
-                           T* samples, const unsigned char* mask) {
-    for (std::size_t first = 0; first < bands;) {
-        const BandPattern<T> pattern(reader, first, bands);
-        if (pattern.HasAnyValue()) {
-            ForEachStretch(pattern, first, pixels, bands, [&](std::size_t at, std::size_t count) {
-                pattern.Stamp(samples + at, mask + at, count);
-            });
+// The same for any tile. In all other layouts the samples of a band lie in runs of their own: one
+// for each line where lines hold the bands, else one. None has one band, whatever their count.
+template <class S, class Visit>
+void VisitRuns(const RuleSource<S>& source, const TileShape& tile, const Visit& visit) {
+    if (!IsInterleave(tile.interleave) || tile.width == 0 || tile.height == 0) return;
+    if (tile.interleave == Interleave::BIP && tile.bands > 1)
+        return VisitPixels(source, tile, visit);
+    const std::size_t bands = tile.interleave == Interleave::None ? 1 : tile.bands;
+    const std::size_t plane = tile.width * tile.height;
+    const std::size_t length = tile.interleave == Interleave::BIL ? tile.width : plane;
+    for (std::size_t band = 0; band < bands; ++band)
+        visit(BandRules<S>{source.RuleOf(band)}, band * length,
+              Runs{plane, length, bands * length});
+}
+
+template <class S, class Rules>
+[[gnu::noinline]] void MarkSamples(const Rules& rules, const S* __restrict samples,
+                                   unsigned char* __restrict mask, const Runs& runs) {
+    for (std::size_t left = runs.samples, length = runs.length; left != 0; left -= length) {
+        length = std::min(length, left);
+        for (std::size_t i = 0; i < length; ++i) {
+            const unsigned mark = std::is_integral_v<S> ? rules.Has(i) : 1;
+            const unsigned marked = IsMarked(samples[i], rules.Value(i)) ? mark : 0;
+            mask[i] = static_cast<unsigned char>((mask[i] & kOtherBits) | marked);
         }
-        first += pattern.Bands();
+        samples += runs.step;
+        mask += runs.step;
     }
+}
+
+template <class S, class Rules>
+[[gnu::noinline]] void StampSamples(const Rules& rules, S* __restrict samples,
+                                    const unsigned char* __restrict mask, const Runs& runs) {
+    for (std::size_t left = runs.samples, length = runs.length; left != 0; left -= length) {
+        length = std::min(length, left);
+        for (std::size_t i = 0; i < length; ++i) {
+            const S value = rules.Value(i);
+            samples[i] = (mask[i] & kMarkedBit & rules.Has(i)) != 0 ? value : samples[i];
+        }
+        samples += runs.step;
+        mask += runs.step;
+    }
+}
+
+void ClearMarks(unsigned char* mask, const Runs& runs) {
+    for (std::size_t left = runs.samples, length = runs.length; left != 0; left -= length) {
+        length = std::min(length, left);
+        for (std::size_t i = 0; i < length; ++i)
+            mask[i] = static_cast<unsigned char>(mask[i] & kOtherBits);
+        mask += runs.step;
+    }
+}
+
+template <class S>
+[[gnu::noinline]] void MarkTile(const RuleSource<S>& source, const TileShape& tile,
+                                const S* samples, unsigned char* mask) {
+    VisitRuns(source, tile, [=](const auto& rules, std::size_t at, const Runs& runs) {
+        // Integers without a value have no marked sample, so that they need no look.
+        if (std::is_integral_v<S> && !rules.HasAny())
+            ClearMarks(mask + at, runs);
+        else
+            MarkSamples(rules, samples + at, mask + at, runs);
+    });
+}
+
+template <class S>
+[[gnu::noinline]] void StampTile(const RuleSource<S>& source, const TileShape& tile, S* samples,
+                                 const unsigned char* mask) {
+    VisitRuns(source, tile, [=](const auto& rules, std::size_t at, const Runs& runs) {
+        if (rules.HasAny()) StampSamples(rules, samples + at, mask + at, runs);
+    });
+}
+
+std::int32_t InterleaveOf(const BasicRasterReader& reader) {
+    return reader.GetRasterProps().interleave;
 }
 
 }  // namespace
@@ -259,40 +250,17 @@ void StampPixelInterleaved(const RasterReader<T>& reader, std::size_t pixels, st
 template <class T>
 void ComputeNoDataMask(const RasterReader<T>& reader, std::uint32_t width, std::uint32_t height,
                        std::uint32_t bandCount, const T* pixels, unsigned char* mask) {
-    if (!pixels || !mask || width == 0 || height == 0) return;
-    const std::int32_t interleave = reader.GetRasterProps().interleave;
-    if (!IsInterleave(interleave)) return;
-    if (interleave == Interleave::BIP && bandCount > 1) {
-        MarkPixelInterleaved(reader, std::size_t{width} * height, bandCount, pixels, mask);
-        return;
-    }
-    const BandRuns layout = RunsOf(interleave, width, height, bandCount);
-    for (std::size_t band = 0; band < layout.bands; ++band) {
-        const NoDataRule<T> rule = RuleOf(reader, band);
-        std::size_t at = band * layout.bandStride;
-        for (std::size_t run = 0; run < layout.runs; ++run, at += layout.runStride)
-            MarkOrClearRun(rule, pixels + at, mask + at, layout.length);
-    }
+    if (!pixels || !mask) return;
+    MarkTile(RuleSource<Sample<T>>(reader), {InterleaveOf(reader), width, height, bandCount},
+             reinterpret_cast<const Sample<T>*>(pixels), mask);
 }
 
 template <class T>
 void ApplyNoDataMask(const RasterReader<T>& reader, std::uint32_t width, std::uint32_t height,
                      std::uint32_t bandCount, T* pixels, const unsigned char* mask) {
-    if (!pixels || !mask || width == 0 || height == 0) return;
-    const std::int32_t interleave = reader.GetRasterProps().interleave;
-    if (!IsInterleave(interleave)) return;
-    if (interleave == Interleave::BIP && bandCount > 1) {
-        StampPixelInterleaved(reader, std::size_t{width} * height, bandCount, pixels, mask);
-        return;
-    }
-    const BandRuns layout = RunsOf(interleave, width, height, bandCount);
-    for (std::size_t band = 0; band < layout.bands; ++band) {
-        const NoDataRule<T> rule = RuleOf(reader, band);
-        if (!rule.hasValue) continue;
-        std::size_t at = band * layout.bandStride;
-        for (std::size_t run = 0; run < layout.runs; ++run, at += layout.runStride)
-            StampRun(rule.value, pixels + at, mask + at, layout.length);
-    }
+    if (!pixels || !mask) return;
+    StampTile(RuleSource<Sample<T>>(reader), {InterleaveOf(reader), width, height, bandCount},
+              reinterpret_cast<Sample<T>*>(pixels), mask);
 }
 
 #define ZMC_X(type, name, code)                                                                    \
