@@ -26,6 +26,7 @@
 #include "pyramid/PyramidDataset.h"
 #include "pyramid/PyramidLimits.h"
 #include "pyramid/TileGather.h"
+#include "pyramid/TileRequest.h"
 
 namespace {
 

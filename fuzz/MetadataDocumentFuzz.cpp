@@ -66,7 +66,7 @@ void UseOpenDataset(MemoryFile& file, InputBytes& input) {
     if (!dataset.File) ZMC_EXPECT(!dataset.ReadHeader());
     dataset.MetaLoaded = false;
     dataset.MetaSource.reset();
-    dataset.MetaDocument.reset();
+    dataset.MetaDocument = DocumentOnDemand();
     if (file.Size() > dataset.MetaDocumentOffset) dataset.ReadMetaTree();
     zmcfuzz::StoreCheck<T>(dataset, file).Run(input);
 }

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <iterator>
 #include <new>
+#include <optional>
 #include <utility>
 #include <xercesc/framework/MemBufInputSource.hpp>
 #include <xercesc/parsers/SAXParser.hpp>
@@ -11,15 +12,12 @@
 #include "core/PixelVocabulary.h"
 #include "pyramid/BoundedParser.h"
 #include "pyramid/LevelGeometry.h"
+#include "pyramid/TileTable.h"
 
 namespace zelm {
 namespace {
 
-// These stand in files: the magic, then two offsets of 8 bytes, then the header document.
-constexpr unsigned char kMagic[4] = {'K', 'O', 'B', 'T'};
-constexpr std::uint64_t kOffsetsOffset = sizeof kMagic;
-constexpr std::size_t kOffsetsSize = 16;
-constexpr std::uint64_t kHeaderOffset = kOffsetsOffset + kOffsetsSize;
+using namespace PyramidFront;
 
 // Integers in files are little-endian, whatever the machine.
 std::uint64_t DecodeUint64(const unsigned char* bytes) {
@@ -35,6 +33,19 @@ void EncodeUint64(std::uint64_t value, unsigned char* bytes) {
 std::uint32_t OrderingFor(const RasterProps& props) {
     if (props.bands > 8) return TileOrder::Morton;
     return props.tileLines > 1 ? TileOrder::Blocked : TileOrder::Scanline;
+}
+
+std::optional<std::uint64_t> SizeOf(const platform::File& file) {
+    const std::uint64_t size = file.Size();
+    if (size == platform::File::kUnknownSize) return std::nullopt;
+    return size;
+}
+
+template <class Value>
+void TakeArray(Array<Value>& from, Array<Value>& to) noexcept {
+    std::swap(to.data, from.data);
+    std::swap(to.shape, from.shape);
+    std::swap(to.capacity, from.capacity);
 }
 
 }  // namespace
@@ -69,68 +80,75 @@ bool PyramidDataset::OpenFile(bool create) {
 }
 
 // False for a file of another kind, or one too short for the header that it announces.
-bool PyramidDataset::ReadFixedFields() {
+bool PyramidDataset::ReadFixedFields(PyramidLayout& layout) const {
     unsigned char fields[kHeaderOffset] = {};
     const std::size_t read = File->ReadAt(0, fields, sizeof fields);
     if (!std::equal(std::begin(kMagic), std::end(kMagic), fields) || read != sizeof fields)
         return false;
-    TileDataStart = DecodeUint64(fields + kOffsetsOffset);
-    MetaDocumentOffset = DecodeUint64(fields + kOffsetsOffset + 8);
-    const std::uint64_t size = File->Size();
-    return TileDataStart >= kHeaderOffset && TileDataStart <= size &&
-           size != platform::File::kUnknownSize;
+    layout.tileDataStart = DecodeUint64(fields + kOffsetsOffset);
+    layout.metaDocumentOffset = DecodeUint64(fields + kOffsetsOffset + 8);
+    const auto size = SizeOf(*File);
+    return layout.tileDataStart >= kHeaderOffset && size && layout.tileDataStart <= *size;
 }
 
 bool PyramidDataset::ReadHeader() {
-    if (!OpenFile(false) || !ReadFixedFields()) return true;
-    PyramidHeaderRecord header;
-    if (!ParseHeaderDocument(header)) return true;
-    TakeHeaderRecord(header);
+    PyramidLayout layout;
+    std::unique_ptr<xercesc::MemBufInputSource> text;
+    if (!OpenFile(false) || !ReadFixedFields(layout) || !ReadHeaderText(layout, text)) return true;
     // Not a failure, by the rules of the format: such a file opens, and refuses its tiles.
-    if (TileSize > kMaxTileSize) return false;
-    if (!PyramidLimits::Allow(header) || !LayOutLevels()) return true;
+    const bool served = layout.header.tileSize <= kMaxTileSize;
+    if (served && (!PyramidLimits::Allow(layout.header) || !layout.LayOut())) return true;
     // The file was opened a moment ago: CheckPyramidComplete would open it once more.
-    const std::uint64_t size = File->Size();
-    HasPyramid = CountsAsComplete(size);
-    if (size > MetaDocumentOffset) ReadMetaTree();
+    const auto size = SizeOf(*File);
+    layout.complete =
+        served && PyramidLayout::IsComplete(layout.header.versionMajor, layout.header.versionMinor,
+                                            layout.tileDataEnd, size);
+    Settle(std::move(layout));
+    HeaderSource = std::move(text);
+    HeaderLoaded = true;
+    MetaLoaded = false;
+    if (served && (!size || *size > MetaDocumentOffset)) ReadMetaTree();
     return false;
 }
 
 void PyramidDataset::CreateFile(std::uint32_t levelMin, std::uint32_t levelMax) {
     VersionMajor = VersionMinor = 1;
-    PyramidHeaderRecord header = MakeHeaderRecord();
-    header.levelMin = levelMin;
-    header.levelMax = levelMax;
-    if (!PyramidLimits::Allow(header)) return;
+    PyramidLayout layout;
+    layout.header = MakeHeaderRecord();
+    layout.header.levelMin = levelMin;
+    layout.header.levelMax = levelMax;
+    if (!PyramidLimits::Allow(layout.header)) return;
     if (!OpenFile(true) || !Writable) return;
-    LevelMin = levelMin;
-    LevelMax = levelMax;
-    if (!WriteHeader() || !LayOutLevels()) return;
-    unsigned char offsets[kOffsetsSize];
-    EncodeUint64(TileDataStart, offsets);
-    EncodeUint64(MetaDocumentOffset, offsets + 8);
-    File->WriteAt(kOffsetsOffset, offsets, sizeof offsets);
+    // The file is empty: from here on the layout that stood is nobody's.
+    metaUnknown = false;
+    if (!WriteFront(layout)) {
+        PyramidLayout none;
+        none.header = MakeHeaderRecord();
+        none.header.levelMin = none.header.levelMax = 0;
+        return Settle(std::move(none));
+    }
+    Settle(std::move(layout));
     HasPyramid = CheckPyramidComplete();
-    TileScratch.reset();
-    tileScratchBytes = 0;
 }
 
-// Writes everything in front of the tile data, with offsets that are not known yet; the file then
-// ends with its header document. What a failure leaves is refused by everybody who opens it.
-bool PyramidDataset::WriteHeader() {
-    TileDataStart = MetaDocumentOffset = 0;
-    const unsigned char noOffsets[kOffsetsSize] = {};
+// Writes everything in front of the tile data and lays out the levels behind it. The offsets come
+// last: what a failure leaves has none, and is refused by everybody who opens it.
+bool PyramidDataset::WriteFront(PyramidLayout& layout) {
+    unsigned char offsets[kOffsetsSize] = {};
     HeaderDocument = PyramidXMLDocument::Make();
     const bool written = File->WriteAt(0, kMagic, sizeof kMagic) == sizeof kMagic &&
-                         File->WriteAt(kOffsetsOffset, noOffsets, kOffsetsSize) == kOffsetsSize &&
+                         File->WriteAt(kOffsetsOffset, offsets, kOffsetsSize) == kOffsetsSize &&
                          HeaderDocument && HeaderDocument->CreateDocument() &&
-                         HeaderDocument->WriteHeaderElement(MakeHeaderRecord()) &&
+                         HeaderDocument->WriteHeaderElement(layout.header) &&
                          HeaderDocument->SerializeDocument(*File, kHeaderOffset);
     HeaderDocument.reset();
-    const std::uint64_t end = File->Size();
-    if (!written || end == platform::File::kUnknownSize) return false;
-    TileDataStart = end;
-    return true;
+    const auto end = SizeOf(*File);
+    if (!written || !end) return false;
+    layout.tileDataStart = *end;
+    if (!layout.LayOut()) return false;
+    EncodeUint64(layout.tileDataStart, offsets);
+    EncodeUint64(layout.metaDocumentOffset, offsets + 8);
+    return File->WriteAt(kOffsetsOffset, offsets, kOffsetsSize) == kOffsetsSize;
 }
 
 bool PyramidDataset::RefreshPyramidState() {
@@ -139,13 +157,11 @@ bool PyramidDataset::RefreshPyramidState() {
 }
 
 bool PyramidDataset::CheckPyramidComplete() {
-    return OpenFile(false) && CountsAsComplete(File->Size());
-}
-
-// Files of version 1.0 never do, however long they are.
-bool PyramidDataset::CountsAsComplete(std::uint64_t fileSize) const {
-    const bool outdated = VersionMajor == 0 || (VersionMajor == 1 && VersionMinor == 0);
-    return !outdated && fileSize >= TileDataEnd && fileSize != platform::File::kUnknownSize;
+    // A file of too large tiles has an end of its tile data as well: none, or 0. One whose header
+    // could not be written has none.
+    const bool settled = LevelOffsets || TileSize > kMaxTileSize;
+    return OpenFile(false) && settled &&
+           PyramidLayout::IsComplete(VersionMajor, VersionMinor, TileDataEnd, SizeOf(*File));
 }
 
 void PyramidDataset::DeleteFile() {
@@ -170,42 +186,45 @@ PyramidHeaderRecord PyramidDataset::MakeHeaderRecord() const {
     return header;
 }
 
-void PyramidDataset::TakeHeaderRecord(const PyramidHeaderRecord& header) {
+void PyramidDataset::Settle(PyramidLayout&& layout) noexcept {
+    const PyramidHeaderRecord& header = layout.header;
     VersionMajor = header.versionMajor;
     VersionMinor = header.versionMinor;
     BandCount = header.bandCount;
     Samples = header.width;
     Lines = header.height;
     TileSize = header.tileSize;
+    LevelCount = layout.LevelCount();
     LevelMin = header.levelMin;
     LevelMax = header.levelMax;
+    TileDataEnd = layout.tileDataEnd;
+    HasPyramid = layout.complete;
     PixelType = header.pixelType;
     Interleave = header.interleave;
     TileOrdering = header.tileOrdering;
+    TileCursor = layout.tileCursor;
+    TakeArray(layout.tileOffsets, TileOffsets);
+    // Made for the tile size that was.
+    TileScratch.reset();
+    tileScratchBytes = 0;
     BytesPerSample = PixelSize(PixelType);
+    LevelOffsets = std::move(layout.levelOffsets);
+    TileDataStart = layout.tileDataStart;
+    MetaDocumentOffset = layout.metaDocumentOffset;
 }
 
-// Needs a header that PyramidLimits allow. The coarsest level comes first in the file.
-bool PyramidDataset::LayOutLevels() {
-    LevelCount = LevelMax - LevelMin + 1u;
-    TileOffsets.Clear();
-    LevelOffsets.reset(new (std::nothrow) std::uint64_t[LevelMax + 1u]());
-    if (!LevelOffsets) return false;
-    const std::uint64_t tileDataStart = TileDataStart;
-    std::uint64_t cursor = tileDataStart;
-    for (std::uint32_t above = LevelMax + 1u; above > LevelMin; --above) {
-        const std::uint32_t level = above - 1u;
-        LevelOffsets[level] = cursor;
-        cursor += LevelGeometry::LevelPixels(Samples, Lines, level) * BytesPerSample * BandCount;
-    }
-    TileDataEnd = MetaDocumentOffset = cursor;
-    if (TileOrdering < TileOrder::Morton) return true;
+std::uint64_t PyramidDataset::GetTileOffset(std::uint32_t tileX, std::uint32_t tileY,
+                                            std::uint32_t level) const {
+    const LevelGeometry geometry(Samples, Lines, TileSize, level);
+    return geometry.TileOffset(tileX, tileY, std::uint64_t{BytesPerSample} * BandCount);
+}
 
-    const LevelGeometry grid(Samples, Lines, TileSize, 0);
-    const std::uint64_t tiles = std::uint64_t{grid.tilesAcross} * grid.tilesDown;
-    const bool small = PyramidLimits::TileTableBytes(tiles, BandCount, LevelMax) <=
-                       PyramidLimits::kMaxEagerTableBytes;
-    return !small || EnsureTileTable();
+void PyramidDataset::BuildTileTable(std::uint32_t width, std::uint32_t height,
+                                    std::uint32_t tileWidth, std::uint32_t tileHeight,
+                                    std::uint32_t bands, std::uint32_t bytesPerSample) {
+    if (tileWidth != tileHeight) return TileOffsets.Clear();
+    TileTable{LevelGeometry(width, height, tileWidth, 0), LevelMin, LevelMax, bands, bytesPerSample}
+        .Place(TileOffsets, TileCursor);
 }
 
 bool PyramidDataset::EnsureTileTable() {

@@ -3,10 +3,13 @@
 // A pyramid file holds an image at several resolutions (levels), cut into square tiles, between a
 // header document in front and a metadata document behind. No tile offset is stored: the tables
 // are recomputed from the header at each open, so the formulas here are the format
-// (docs/format.md). Fields are public and stand in the order in which the system tells them.
+// (docs/format.md). Fields are public: the reader, the connection and the archive work on them.
+//
+// What a header settles (the numbers, the tables, both ends, completeness) is a PyramidLayout that
+// is built aside; the fields take it over whole, or stay as they were.
 //
 // One stream and one work buffer: a dataset is for one thread at a time, reads included. No
-// operation throws. Tile transfers report nothing; what cannot be read is zeros.
+// operation throws. Tile transfers do not report what the disk did.
 #ifndef ZMC_PYRAMID_PYRAMIDDATASET_H
 #define ZMC_PYRAMID_PYRAMIDDATASET_H
 
@@ -19,7 +22,9 @@
 #include "core/Pointer.h"
 #include "core/String.h"
 #include "platform/File.h"
+#include "pyramid/DocumentOnDemand.h"
 #include "pyramid/PyramidHeaderRecord.h"
+#include "pyramid/PyramidLayout.h"
 #include "pyramid/PyramidLimits.h"
 #include "pyramid/PyramidXMLDocument.h"
 #include "raster/RasterBandHistogram.h"
@@ -75,9 +80,10 @@ public:
     std::unique_ptr<std::uint64_t[]> LevelOffsets;  // LevelMax + 1 entries
     std::uint64_t TileDataStart = 0;
     std::uint64_t MetaDocumentOffset = 0;
-    // Tree of the metadata document; null until the file's text or a store calls for one, since
-    // making it would be a fifth of the time of an open.
-    std::unique_ptr<PyramidXMLDocument> MetaDocument;
+    // Tree of the metadata document: an empty one until a header is read with a document behind it.
+    // Records join it as they are stored. It outlives the file: one that is made anew by the same
+    // dataset gets all of it with the next store.
+    DocumentOnDemand MetaDocument;
     std::unique_ptr<PyramidXMLDocument> HeaderDocument;  // only while CreateFile runs
     std::unique_ptr<xercesc::SAXParser> Parser;          // for both documents
     std::unique_ptr<xercesc::MemBufInputSource> MetaSource;
@@ -99,11 +105,14 @@ public:
     bool OpenFile(bool create);
     // Opens the file and lays out all levels. FALSE on success, TRUE on failure: callers are
     // written to this sense. A header that claims more than PyramidLimits allow is a failure, one
-    // whose tiles are too large a success with no tables behind it.
+    // whose tiles are too large a success with no tables behind it. After a failure the file may be
+    // open, and all that a layout settles is as it was.
     bool ReadHeader();
-    // Makes the file, or empties it, writes the header and lays out the levels, both inclusive. On
-    // a file that cannot be made, or levels beyond PyramidLimits, nothing but the version changes,
-    // and nothing is reported.
+    // Makes the file, or empties it, writes the header and lays out the levels, both inclusive.
+    // Nothing is reported. On a file that cannot be made, and for a layout beyond PyramidLimits (a
+    // level above kMaxLevel, more tile data or tile offsets than it allows), nothing but the
+    // version changes. Where the header of an emptied file cannot be written, no layout is left:
+    // tiles and records are refused until a file is made.
     void CreateFile(std::uint32_t levelMin, std::uint32_t levelMax);
     // Reopens the file and stores in HasPyramid whether it is complete; always true.
     bool RefreshPyramidState();
@@ -132,22 +141,26 @@ public:
     // The three transfers move a rectangle of one level, pixel-interleaved in `buffer`, with the
     // listed bands in list order; an identity or (in the orderings 0 and 1) empty list means all
     // bands. T has the size of the file's samples. False, with nothing moved, for what AcceptsTile
-    // refuses; a null File moves nothing and is true. Failures of the stream are not reported.
+    // refuses, and where memory runs out; a null File moves nothing and is true. True is all that
+    // is told of a disk that failed.
 
     // What the file does not hold reads as zeros, except that one whole tile with all bands in
-    // order (orderings 0 and 1) leaves that part of `buffer` as it was.
+    // order (orderings 0 and 1) leaves that part of `buffer` as it was. So does what the disk does
+    // not give.
     template <class T>
     bool ReadTile(std::uint32_t x, std::uint32_t y, std::uint32_t width, std::uint32_t height,
                   const Array<int>& bandList, std::int32_t level, T* buffer);
     // For the orderings 0 and 1. Whole tiles and edge tiles of exact size, with all bands, are
-    // written as they are, other rectangles merged into their tiles. Three kinds of rectangles do
-    // not arrive where they belong (see TileTransfer.cpp): write whole tiles with all bands.
+    // written as they are, other rectangles merged into their tiles; nothing is written where the
+    // old samples cannot be read, or there is no memory (or they have 4 GiB or more) to hold them.
+    // Three kinds of rectangles do not arrive where they belong (see TileRequest.h): write whole
+    // tiles with all bands.
     template <class T>
     bool WriteTileInterleaved(std::uint32_t x, std::uint32_t y, std::uint32_t width,
                               std::uint32_t height, const Array<int>& bandList, std::int32_t level,
                               const T* buffer);
-    // For the other orderings. Whole tiles and edge tiles of exact size are written; any other
-    // rectangle is dropped without a word.
+    // For the other orderings. Whole tiles and edge tiles of exact size are written, band by band
+    // in list order; any other rectangle is dropped without a word.
     template <class T>
     bool WriteTileMorton(std::uint32_t x, std::uint32_t y, std::uint32_t width,
                          std::uint32_t height, const Array<int>& bandList, std::int32_t level,
@@ -164,10 +177,12 @@ public:
     // exception it is dropped and its flag cleared.
     int ParseDocument(xercesc::HandlerBase* handlers,
                       std::unique_ptr<xercesc::MemBufInputSource>& source, bool& loaded);
-    // Builds the tree of MetaDocument from the file's text, if it has any.
+    // Puts the tree of the file's text into MetaDocument, if the file has any. Text that cannot be
+    // had, or is malformed, leaves MetaDocument without a tree, so that no store replaces it.
     void ReadMetaTree();
-    // MetaDocument, made with an empty tree if there is none yet; null if memory ran out, now or
-    // when the file's own text was read.
+    // MetaDocument, ready for records; null if memory ran out. Where the open could not tell
+    // whether the file has a document, the file is looked at now, and nothing is given until that
+    // is known.
     PyramidXMLDocument* EnsureMetaDocument();
 
     // --- archive of statistics, histograms and palettes (PyramidArchive.cpp) ---
@@ -201,22 +216,25 @@ private:
     friend class TileTransfer;
 
     PyramidHeaderRecord MakeHeaderRecord() const;
-    void TakeHeaderRecord(const PyramidHeaderRecord& header);
-    bool ReadFixedFields();
-    bool CountsAsComplete(std::uint64_t fileSize) const;
-    bool LayOutLevels();
+    // Takes a layout over, whole.
+    void Settle(PyramidLayout&& layout) noexcept;
+    // The fixed fields of the open file, and its header document, as far as `layout` goes.
+    bool ReadFixedFields(PyramidLayout& layout) const;
+    bool ReadHeaderText(PyramidLayout& layout, std::unique_ptr<xercesc::MemBufInputSource>& text);
+    bool ParseHeaderText(std::unique_ptr<xercesc::MemBufInputSource>& text, bool& loaded,
+                         PyramidHeaderRecord& out);
+    bool WriteFront(PyramidLayout& layout);
     bool EnsureTileTable();
     // Judges a transfer that has something to move, and makes sure of the tile table.
     bool PrepareTransfer(std::uint32_t x, std::uint32_t y, std::uint32_t width,
                          std::uint32_t height, const Array<int>& bandList, std::int32_t level,
                          std::size_t elementBytes, const void* buffer);
     void AllocateTileScratch();
-    bool WriteHeader();
     // At least `bytes` of work space: TileScratch where it suffices, else a buffer that is kept.
     // Null if memory ran out.
     unsigned char* WorkSpace(std::uint64_t bytes);
 
-    bool metaTreeLost = false;  // the file's text found no memory: nothing may replace it
+    bool metaUnknown = false;  // the open could not tell whether the file has a metadata document
     std::uint64_t tileScratchBytes = 0;
     std::unique_ptr<unsigned char[]> workBuffer;
     std::uint64_t workBufferBytes = 0;

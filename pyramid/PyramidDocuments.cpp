@@ -16,7 +16,7 @@
 namespace zelm {
 namespace {
 
-constexpr std::uint64_t kHeaderOffset = 20;
+using PyramidFront::kHeaderOffset;
 
 // A source over a text, or null if memory ran out.
 std::unique_ptr<xercesc::MemBufInputSource> MakeSource(std::unique_ptr<XMLByte[]> text,
@@ -46,6 +46,13 @@ std::unique_ptr<xercesc::MemBufInputSource> LoadText(platform::File& file, std::
     if (!text) return nullptr;
     const std::size_t read = file.ReadAt(offset, text.get(), static_cast<std::size_t>(size));
     return MakeSource(std::move(text), read, name);
+}
+
+// The header document that ends at `end`. An end before its beginning wraps to a size that no file
+// has.
+std::unique_ptr<xercesc::MemBufInputSource> LoadHeaderText(platform::File& file,
+                                                           std::uint64_t end) {
+    return LoadText(file, kHeaderOffset, end - kHeaderOffset, "ORVAPYRHEADER");
 }
 
 // Handlers live on the stack of their parse, so the parser forgets them with it.
@@ -108,22 +115,36 @@ std::unique_ptr<xercesc::SAXParser> MakeDocumentParser() {
 bool PyramidDataset::LoadHeaderDocument() {
     if (!File) return false;
     if (TileDataStart == kHeaderOffset) return true;
-    // A start before the document wraps to a size that no file has.
-    HeaderSource = LoadText(*File, kHeaderOffset, TileDataStart - kHeaderOffset, "ORVAPYRHEADER");
+    HeaderSource = LoadHeaderText(*File, TileDataStart);
     HeaderLoaded = HeaderSource != nullptr;
     return false;
 }
 
 bool PyramidDataset::ParseHeaderDocument(PyramidHeaderRecord& out) {
     if (!HeaderLoaded && LoadHeaderDocument()) return true;
+    return ParseHeaderText(HeaderSource, HeaderLoaded, out);
+}
+
+bool PyramidDataset::ParseHeaderText(std::unique_ptr<xercesc::MemBufInputSource>& text,
+                                     bool& loaded, PyramidHeaderRecord& out) {
     try {
         PyramidXMLReaderHandlers<char> handlers;
-        if (ParseDocument(&handlers, HeaderSource, HeaderLoaded) != kParsed) return false;
+        if (ParseDocument(&handlers, text, loaded) != kParsed) return false;
         out = handlers.header;
         return true;
     } catch (...) {
         return false;
     }
+}
+
+// What LoadHeaderDocument and ParseHeaderDocument do, aside. An empty region leaves the record
+// without a tile size, and with that refused.
+bool PyramidDataset::ReadHeaderText(PyramidLayout& layout,
+                                    std::unique_ptr<xercesc::MemBufInputSource>& text) {
+    if (layout.tileDataStart == kHeaderOffset) return true;
+    text = LoadHeaderText(*File, layout.tileDataStart);
+    bool loaded = text != nullptr;
+    return ParseHeaderText(text, loaded, layout.header);
 }
 
 bool PyramidDataset::LoadMetaDocument() {
@@ -159,27 +180,19 @@ int PyramidDataset::ParseDocument(xercesc::HandlerBase* handlers,
 }
 
 void PyramidDataset::ReadMetaTree() {
-    if (MetaLoaded || LoadMetaDocument()) {
-        MetaDocument = PyramidXMLDocument::Make();
-        if (MetaDocument) MetaDocument->ParseTree(*MetaSource);
-        metaTreeLost = !MetaDocument;
-        return;
-    }
-    std::uint64_t size = 0;
-    if (!File || (File->TellSize(size) && size <= MetaDocumentOffset)) return;
-    // There is, or may be, a document, and it cannot be had: without a tree nothing overwrites it.
-    MetaDocument = PyramidXMLDocument::Make();
-    metaTreeLost = !MetaDocument;
+    if (!File) return;
+    const bool loaded = MetaLoaded || LoadMetaDocument();
+    const std::uint64_t size = File->Size();
+    metaUnknown = !loaded && size == platform::File::kUnknownSize;
+    if (metaUnknown || (!loaded && size <= MetaDocumentOffset)) return;
+    std::unique_ptr<PyramidXMLDocument> document = PyramidXMLDocument::Make();
+    if (document && loaded) document->ParseTree(*MetaSource);
+    MetaDocument.reset(std::move(document));
 }
 
 PyramidXMLDocument* PyramidDataset::EnsureMetaDocument() {
-    // An open that could not tell the size of the file has not looked for one.
-    if (!MetaDocument && !metaTreeLost) ReadMetaTree();
-    if (!MetaDocument && !metaTreeLost) {
-        MetaDocument = PyramidXMLDocument::Make();
-        if (MetaDocument) MetaDocument->CreateDocument();
-    }
-    return MetaDocument.get();
+    if (metaUnknown) ReadMetaTree();
+    return metaUnknown ? nullptr : MetaDocument.get();
 }
 
 }  // namespace zelm

@@ -1,10 +1,9 @@
-// Where tiles lie: by formula in the orderings Scanline and Blocked, and along the Morton curve.
+#include "pyramid/TileTable.h"
+
 #include <algorithm>
 #include <array>
 #include <bit>
 
-#include "pyramid/LevelGeometry.h"
-#include "pyramid/PyramidDataset.h"
 #include "pyramid/PyramidLimits.h"
 
 namespace zelm {
@@ -138,39 +137,29 @@ std::uint64_t PlacedTiles(const LevelGeometry& levelZero, std::uint32_t level) {
 
 }  // namespace
 
-std::uint64_t PyramidDataset::GetTileOffset(std::uint32_t tileX, std::uint32_t tileY,
-                                            std::uint32_t level) const {
-    const LevelGeometry geometry(Samples, Lines, TileSize, level);
-    return geometry.TileOffset(tileX, tileY, std::uint64_t{BytesPerSample} * BandCount);
-}
-
-void PyramidDataset::BuildTileTable(std::uint32_t width, std::uint32_t height,
-                                    std::uint32_t tileWidth, std::uint32_t tileHeight,
-                                    std::uint32_t bands, std::uint32_t bytesPerSample) {
-    const LevelGeometry grid(width, height, tileWidth, 0);
-    const std::uint64_t tiles = std::uint64_t{grid.tilesAcross} * grid.tilesDown;
-    if (tileWidth == 0 || tileWidth != tileHeight ||
-        std::max(grid.tilesAcross, grid.tilesDown) > PyramidLimits::kMaxMortonTiles ||
-        LevelMax > PyramidLimits::kMaxLevel ||
-        PyramidLimits::TileTableBytes(tiles, bands, LevelMax) > PyramidLimits::kMaxTableBytes ||
-        !TileOffsets.SetShape(
-            ArrayShape(LevelMax + 1u, bands, static_cast<std::uint32_t>(tiles)))) {
-        TileOffsets.Clear();
+void TileTable::Place(Array<std::uint64_t>& offsets, std::uint64_t& cursor) const {
+    const std::uint64_t tiles = Tiles();
+    if (levelZero.tileSize == 0 ||
+        std::max(levelZero.tilesAcross, levelZero.tilesDown) > PyramidLimits::kMaxMortonTiles ||
+        levelMax > PyramidLimits::kMaxLevel ||
+        PyramidLimits::TileTableBytes(tiles, bands, levelMax) > PyramidLimits::kMaxTableBytes ||
+        !offsets.SetShape(ArrayShape(levelMax + 1u, bands, static_cast<std::uint32_t>(tiles)))) {
+        offsets.Clear();
         return;
     }
-    std::uint64_t* const table = TileOffsets.data;
-    std::fill_n(table, TileOffsets.shape.elements, 0);
-    if (tiles == 0 || bands == 0 || LevelMin > LevelMax) return;
+    std::uint64_t* const table = offsets.data;
+    std::fill_n(table, offsets.shape.elements, 0);
+    if (tiles == 0 || bands == 0 || levelMin > levelMax) return;
 
-    const std::uint64_t start = TileCursor;
+    const std::uint64_t start = cursor;
     const std::uint64_t stride = tiles * bands;
     const std::uint64_t end =
-        MortonWalk(grid, LevelMin, LevelMax, bytesPerSample, table, stride, start).Run();
-    TileCursor = start + (end - start) * bands;
+        MortonWalk(levelZero, levelMin, levelMax, sampleBytes, table, stride, start).Run();
+    cursor = start + (end - start) * bands;
     // A later band lies as the first one does, by a constant further on.
-    for (std::uint32_t level = LevelMin; level <= LevelMax; ++level) {
+    for (std::uint32_t level = levelMin; level <= levelMax; ++level) {
         const std::uint64_t* const row = table + level * stride;
-        const std::uint64_t placed = PlacedTiles(grid, level);
+        const std::uint64_t placed = PlacedTiles(levelZero, level);
         for (std::uint64_t band = 1; band < bands; ++band)
             std::transform(row, row + placed, table + level * stride + band * tiles,
                            [&](std::uint64_t offset) { return offset + (end - start) * band; });

@@ -101,20 +101,57 @@ TEST_F(ArchiveTest, FileWithoutDocument) {
     EXPECT_TRUE(palette->colors.empty());
 }
 
-// Opened before there was a document, and storing after another has stored and this one has seen
-// it.
-TEST_F(ArchiveTest, ARecordJoinsTheDocumentThatWasFetched) {
+TEST_F(ArchiveTest, TreeIsThereAndEmptyFromTheStart) {
+    PyramidDataset described(String(name.c_str()), PyramidProps(10, 6, 2, PixelTypeCode::Byte));
+    PyramidDataset named{String(name.c_str())};
+    for (PyramidDataset* dataset : {&described, &named}) {
+        ASSERT_TRUE(dataset->MetaDocument);
+        ASSERT_NE(dataset->MetaDocument->document, nullptr);
+        EXPECT_EQ(dataset->MetaDocument->RecordCount(), 0u);
+        EXPECT_TRUE(dataset->MetaDocument->WriteBandStatsElement(StatsOf<T>(0, 1)));
+    }
+    described.CreateFile(0, 0);
+    EXPECT_TRUE(described.SetBandStats(Array<RasterBandStats<T>>()));
+    EXPECT_TRUE(described.HasBandStats<T>(0));
+    EXPECT_EQ(Open()->MetaDocument->RecordCount(), 1u);
+}
+
+// Opened before there was a document: its tree is the empty one, whatever others store meanwhile,
+// and whether it has fetched that or not.
+TEST_F(ArchiveTest, RecordsOfOthersDoNotJoinTheTree) {
+    for (const bool fetches : {false, true}) {
+        Make();
+        const auto early = Open();
+        EXPECT_TRUE(Open()->SetBandStats(ArrayOf({StatsOf<T>(1, 2.5)})));
+        if (fetches) {
+            EXPECT_TRUE(early->HasBandStats<T>(1));
+        }
+        EXPECT_TRUE(early->SetBandStats(ArrayOf({StatsOf<T>(0, 1)})));
+        EXPECT_EQ(ValuesOf(DocumentText(*early), "RSTC_MEAN"), std::vector<std::string>{"1"});
+    }
+}
+
+TEST_F(ArchiveTest, RecordThatWasOnlyFetchedIsNotStoredInTheNewFile) {
     Make();
-    std::filesystem::resize_file(name, Open()->MetaDocumentOffset);
     const auto early = Open();
     EXPECT_TRUE(Open()->SetBandStats(ArrayOf({StatsOf<T>(1, 2.5)})));
     EXPECT_TRUE(early->HasBandStats<T>(1));
-    Palette palette;
-    palette.AddColor(ColorOf(1, 2, 3, 4));
-    EXPECT_TRUE(early->SetPalette(0, palette));
-    const auto later = Open();
-    EXPECT_TRUE(later->HasBandStats<T>(1));
-    EXPECT_EQ(later->GetPalette<T>(0)->nextIndex, 1u);
+    early->CreateFile(0, 0);
+    EXPECT_TRUE(early->SetBandStats(ArrayOf({StatsOf<T>(0, 1)})));
+    EXPECT_EQ(ValuesOf(DocumentText(*early), "RSTC_MEAN"), std::vector<std::string>{"1"});
+}
+
+// Some bands of a level that is one tile go behind the tile, which is behind all tiles.
+TEST_F(ArchiveTest, BytesBehindTheTilesDoNotStandInTheWayOfStores) {
+    const auto dataset = Make();
+    Array<int> second;
+    second.Append(1);
+    const std::vector<T> pixels(60, 0xEE);
+    EXPECT_TRUE(dataset->WriteTileInterleaved(0, 0, 10, 6, second, 0, pixels.data()));
+    EXPECT_GT(std::filesystem::file_size(name), dataset->TileDataEnd);
+    EXPECT_TRUE(dataset->SetBandStats(ArrayOf({StatsOf<T>(0, 1)})));
+    EXPECT_TRUE(dataset->HasBandStats<T>(0));
+    EXPECT_TRUE(Open()->HasBandStats<T>(0));
 }
 
 TEST_F(ArchiveTest, AnswersWithoutADocumentDiffer) {

@@ -191,7 +191,8 @@ TEST_F(RefusalTest, DocumentsWithoutAFileOrAParser) {
     EXPECT_FALSE(dataset->LoadMetaDocument());
     EXPECT_FALSE(dataset->LoadHeaderDocument());
     dataset->ReadMetaTree();
-    EXPECT_EQ(dataset->MetaDocument, nullptr);
+    ASSERT_TRUE(dataset->MetaDocument);
+    EXPECT_EQ(dataset->MetaDocument->RecordCount(), 0u);
     bool loaded = true;
     std::unique_ptr<xercesc::MemBufInputSource> none;
     EXPECT_EQ(dataset->ParseDocument(nullptr, none, loaded), PyramidDataset::kParseError);

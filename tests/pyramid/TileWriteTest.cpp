@@ -136,6 +136,69 @@ TEST_F(TileWriteTest, SomeBandsOfAMortonTileAreWrittenAlone) {
     EXPECT_EQ(ReadRect(*dataset, 0, 0, 256, 256, BandList({0, 2}), 0), old);
 }
 
+// Where 2^L does not divide the tile size the curve leaves less room than a tile takes, and a band
+// reaches into the next: bands go in list order, each whole.
+TEST_F(TileWriteTest, MortonBandsThatOverlapGoInListOrderEachWhole) {
+    for (const std::uint32_t type : {1u, 12u, 4u, 5u})
+        for (const std::vector<int>& list :
+             {std::vector<int>{0, 1}, {1, 0}, {0, 1, 2}, {2, 1, 0}, {1, 0, 1}, {2}, {0, 2, 0, 1}}) {
+            PyramidDescription d;
+            d.samples = d.lines = 2400;
+            d.bands = 3;
+            d.tile = 300;
+            d.levelMin = d.levelMax = 3;
+            d.type = type;
+            d.ordering = 2;
+            model = std::make_unique<PyramidModel>(d);
+            model->Save(path);
+            dataset = Open();
+            ASSERT_TRUE(dataset);
+            Bytes pixels(std::size_t{300} * 300 * list.size() * model->SampleBytes());
+            for (unsigned char& byte : pixels) byte = static_cast<unsigned char>(random());
+            EXPECT_TRUE(WriteBytes(*dataset, 0, 0, 300, 300, BandList(list), 3, pixels));
+            model->WriteTile(0, 0, 300, 300, list, 3, pixels);
+            EXPECT_TRUE(FileBytes() == model->file) << type << ' ' << list.size();
+        }
+}
+
+// Tile sizes that no power of two divides, so that tiles of levels and bands overlap.
+TEST_F(TileWriteTest, RandomMortonWritesOfOverlappingTilesLeaveTheBytesOfTheModel) {
+    for (int round = 0; round < 150; ++round) {
+        const auto below = [&](std::uint32_t n) {
+            return static_cast<std::uint32_t>(random() % n);
+        };
+        PyramidDescription d;
+        d.tile = 9 + 2 * below(12);
+        d.samples = 1 + below(200);
+        d.lines = 1 + below(200);
+        d.bands = 1 + below(20);
+        d.levelMin = below(4);
+        d.levelMax = d.levelMin + below(2);
+        d.type = below(2) ? 1 : 12;
+        d.ordering = 2;
+        model = std::make_unique<PyramidModel>(d);
+        model->Save(path);
+        dataset = Open();
+        ASSERT_TRUE(dataset);
+        for (int write = 0; write < 12; ++write) {
+            const std::uint32_t level = d.levelMin + below(d.levelMax - d.levelMin + 1);
+            // Tiles that shrink to nothing have no place.
+            if (d.tile >> level == 0 || d.samples >> level == 0 || d.lines >> level == 0) continue;
+            const std::uint32_t tx = below(model->Across(level)), ty = below(model->Down(level));
+            const std::uint32_t width = model->TileWidth(level, tx);
+            const std::uint32_t height = model->TileHeight(level, ty);
+            std::vector<int> list(1 + below(d.bands));
+            for (int& band : list) band = static_cast<int>(below(d.bands));
+            Bytes pixels(std::size_t{width} * height * list.size() * model->SampleBytes());
+            for (unsigned char& byte : pixels) byte = static_cast<unsigned char>(random());
+            EXPECT_TRUE(WriteBytes(*dataset, tx * d.tile, ty * d.tile, width, height,
+                                   BandList(list), static_cast<int>(level), pixels));
+            model->WriteTile(tx * d.tile, ty * d.tile, width, height, list, level, pixels);
+        }
+        ASSERT_TRUE(FileBytes() == model->file) << round;
+    }
+}
+
 TEST_F(TileWriteTest, AlignedPairOfMortonTilesIsDropped) {
     Make(2, true);
     const Bytes before = model->file;
