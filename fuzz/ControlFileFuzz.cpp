@@ -264,7 +264,9 @@ std::u16string LineOf(std::uint32_t sequence, const std::u16string& message) {
 
 std::string WithNewline(const std::u16string& text) { return zmcfuzz::Utf8Of(text) + "\n"; }
 
-void ExpectLog(const CoordSysLog& log, const LogModel& model, const Settings& settings) {
+// There is no other thread.
+void ExpectLog(const CoordSysLog& log, const LogModel& model,
+               const Settings& settings) ZMC_NO_LOCK_NEEDED {
     ZMC_EXPECT(log.levelMask == settings.levels);
     ZMC_EXPECT((log.toDebugger == 1) == settings.debugger);
     ZMC_EXPECT((log.toFile == 1) == model.toFile);

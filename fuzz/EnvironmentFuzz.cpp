@@ -188,6 +188,9 @@ struct ParseLogModel {
     }
 };
 
+// There is no other thread.
+bool IsOpen(const MetadataParseLog& log) ZMC_NO_LOCK_NEEDED { return log.stream.is_open(); }
+
 void RunParseLog(InputBytes& input) {
     const Variable directory = TakeDirectory(input);
     const Variable level = Variable::Take(input);
@@ -204,7 +207,7 @@ void RunParseLog(InputBytes& input) {
         const std::unique_ptr<MetadataParseLog> log(MetadataParseLog::GetInstance());
         ZMC_EXPECT(log && MetadataParseLog::GetInstance() == log.get());
         ZMC_EXPECT(log->level == model.level && log->toConsole == model.console);
-        ZMC_EXPECT(log->stream.is_open() == model.open);
+        ZMC_EXPECT(IsOpen(*log) == model.open);
         const std::size_t headerLength = console.Text().size();
         for (std::uint32_t count = input.UpTo(3); count > 0; --count) {
             const std::uint32_t messageLevel = input.Flag() ? input.UpTo(9) : input.Size();
@@ -272,7 +275,7 @@ Engine EngineOf(std::uint8_t kind) {
 
 void RunTable(InputBytes& input) {
     const zelm::Environment environment;
-    ZMC_EXPECT(environment.ToString().Find("{Environment}@") == 0);
+    ZMC_EXPECT(environment.ToString().Find("{Object}@") == 0);
     auto& settings = GetGlobalEnvironmentImpl().settings;
     settings.clear();
     std::map<std::u16string, std::u16string> model;
@@ -332,7 +335,9 @@ void RunFactory(InputBytes& input) {
     ZMC_EXPECT((gpCoordSysLogInstance != nullptr) == (kind % 4 == 0));
     delete gpCoordSysLogInstance;
     gpCoordSysLogInstance = nullptr;
-    fp_Esri_Pe_Initialize = nullptr;
+    ZMC_EXPECT((fp_Esri_Pe_Release != nullptr) == (engine == Engine::Real));
+    zelm::CoordSysFuncPtrs::ClearEntryPoints();
+    ZMC_EXPECT(!fp_Esri_Pe_Initialize && !fp_Esri_Pe_Release);
 }
 
 }  // namespace

@@ -7,6 +7,7 @@
 // move only where the address is the buffer's and the sizes fit into it; all else that can be asked
 // of a connection is asked of every one.
 #include <algorithm>
+#include <bit>
 #include <cmath>
 #include <cstddef>
 #include <cstdint>
@@ -125,10 +126,9 @@ Array<String> ArrayOf(const std::vector<std::string>& texts) {
     return array;
 }
 
-// Whether a decimal number of that text is the double nearest to it. Hexadecimal numbers, and the
-// words for what is no number, are read by some libraries and not by others.
-bool IsPlainDecimal(const std::string& text) {
-    return text.find_first_not_of("0123456789+-.eE \t") == std::string::npos;
+bool IsSameReal(double a, double b) {
+    return std::bit_cast<std::uint64_t>(a) == std::bit_cast<std::uint64_t>(b) ||
+           (std::isnan(a) && std::isnan(b));
 }
 
 void ExpectPair(const String& source, const String& key, const Value& value) {
@@ -140,8 +140,8 @@ void ExpectPair(const String& source, const String& key, const Value& value) {
     for (std::size_t i = 0; i < 2; ++i) {
         if (!found)
             ZMC_EXPECT(pair[i] == -77 - static_cast<double>(i));
-        else if (IsPlainDecimal(tokens[i]))
-            ZMC_EXPECT(pair[i] == std::strtod(tokens[i].c_str(), nullptr));
+        else
+            ZMC_EXPECT(IsSameReal(pair[i], std::strtod(tokens[i].c_str(), nullptr)));
     }
 }
 

@@ -161,6 +161,16 @@ TEST_F(CoordSysLogRun, MissingDirectoryMeansNoLog) {
     EXPECT_EQ(result.err, "no log\nno log\n");
 }
 
+TEST_F(CoordSysLogRun, DirectoryOutsideAsciiNeedsALocaleThatHoldsIt) {
+    const std::string directory = scratch / "pe\xC3\xA4";
+    std::filesystem::create_directory(directory);
+    support::WriteText(directory + "/pelog.txt", "0110,0000,0000,0000\n");
+    EXPECT_EQ(RunProbe({"log", directory, "1", "8192", "5"}).err, "no log\nno log\n");
+    EXPECT_THAT(RunProbe({"utf8", "log", directory, "1", "8192", "5"}).err,
+                HasSubstr("sequence=1"));
+    EXPECT_THAT(ReadText(directory + "/logs/zmcpe_pe_1.log"), HasSubstr(", xxxxx \n"));
+}
+
 TEST_F(CoordSysLogRun, LinesHaveTheirForm) {
     LogByLine("0110,0000,0000,0001", 2, 1, 5);
     const std::string time =

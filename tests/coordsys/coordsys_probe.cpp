@@ -1,5 +1,6 @@
 // A process of its own for what happens once in a process: the settings of the projection log, the
-// loading of the engine, the first release. Reports go to the standard error stream.
+// loading of the engine, the first release. Reports go to the standard error stream. The word
+// "utf8" in front of a command sets such a locale before.
 //
 //   coordsys_probe log DIR COUNT LEVEL LENGTH  logs COUNT messages of LENGTH units x
 //   coordsys_probe log DIR COUNT LEVEL LENGTH UNIT  the same, of units of that number
@@ -12,6 +13,7 @@
 //   coordsys_probe second BIN PE               another loader of the engine comes and goes
 //   coordsys_probe retry BIN PE                asks for a factory twice, the second time without
 //   BIN
+#include <clocale>
 #include <cstdio>
 #include <cstdlib>
 #include <memory>
@@ -207,4 +209,11 @@ int Run(const std::vector<std::string>& words) {
 
 }  // namespace
 
-int main(int argc, char** argv) { return Run(std::vector<std::string>(argv + 1, argv + argc)); }
+int main(int argc, char** argv) {
+    std::vector<std::string> words(argv + 1, argv + argc);
+    if (words.at(0) == "utf8") {
+        std::setlocale(LC_ALL, "C.UTF-8");
+        words.erase(words.begin());
+    }
+    return Run(words);
+}
