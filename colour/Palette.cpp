@@ -3,6 +3,15 @@
 #include <new>
 
 namespace zelm {
+namespace {
+
+ColorPtr WholeCopy(const Color& color) {
+    const ColorPtr copy(new Color(color));
+    if (!copy || (color.name.wide && !copy->name.wide)) throw std::bad_alloc();
+    return copy;
+}
+
+}  // namespace
 
 void Palette::Clear() {
     colors.clear();
@@ -30,10 +39,11 @@ void Palette::SetColor(std::uint32_t index, const Color& color) {
 
 void Palette::CopyTo(Palette& target) const {
     if (this == &target) return;
-    target.Clear();
-    target.nextIndex = nextIndex;
+    std::map<std::uint32_t, ColorPtr> copies;
     for (const auto& [index, color] : colors)
-        if (color) target.SetColor(index, *color);
+        if (color) copies[index] = WholeCopy(*color);
+    target.colors.swap(copies);
+    target.nextIndex = nextIndex;
 }
 
 }  // namespace zelm

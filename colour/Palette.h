@@ -38,7 +38,7 @@ public:
     void SetColor(std::uint32_t index, const Color& color);
 
     // Makes `target` a copy of this palette; entries without a colour are not carried over.
-    // A palette copied to itself stays as it is.
+    // A palette copied to itself stays as it is, and so does the target of a copy that throws.
     void CopyTo(Palette& target) const;
 };
 

@@ -11,8 +11,9 @@
 
 namespace zelm {
 
-// Truncation to a signed integer; what lies outside it, NaN included, gives its lowest value, as
-// the processors do for which the formats were made.
+// Truncation to a signed integer; what lies outside it, NaN included, gives its lowest value. The
+// language leaves these conversions undefined, and a no-data value of a file has to become the same
+// pixel in every build.
 template <class Signed>
 Signed TruncateToSigned(double value) {
     constexpr double lowest = static_cast<double>(std::numeric_limits<Signed>::min());

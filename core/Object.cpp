@@ -2,6 +2,9 @@
 
 #include <cinttypes>
 #include <cstdio>
+#include <cstring>
+#include <memory>
+#include <new>
 
 #include "core/ObjectCodes.h"
 
@@ -12,11 +15,14 @@ const std::uint32_t Object::typeCode = GloballyUniqueObjectTypeCode("Object");
 String Object::ToString() const { return MakeObjectUrl("Object", this); }
 
 String MakeObjectUrl(const char* word, const void* object) {
-    char address[24];
+    constexpr std::size_t kRest = sizeof "{}@" + 16;  // an address has at most sixteen digits
+    const std::size_t size = std::strlen(word) + kRest;
+    const std::unique_ptr<char[]> text(new (std::nothrow) char[size]);
+    if (!text) return String();
     static_cast<void>(
-        std::snprintf(address, sizeof address, "}@%" PRIx64,
+        std::snprintf(text.get(), size, "{%s}@%" PRIx64, word,
                       static_cast<std::uint64_t>(reinterpret_cast<std::uintptr_t>(object))));
-    return String("{") + String(word) + String(address);
+    return String(text.get());
 }
 
 }  // namespace zelm

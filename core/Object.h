@@ -29,7 +29,8 @@ public:
     virtual bool IsValid() const { return (error.flags & kErrorFlag) == 0; }
 };
 
-// "{", the word, "}@" and the address in lower-case hexadecimal without prefix or leading zeros.
+// "{", the word, "}@" and the address in lower-case hexadecimal without prefix or leading zeros;
+// null where memory runs out.
 String MakeObjectUrl(const char* word, const void* object);
 
 }  // namespace zelm

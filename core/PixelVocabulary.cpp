@@ -1,11 +1,11 @@
 #include "core/PixelVocabulary.h"
 
 #include <cstring>
-#include <istream>
 #include <string>
 #include <string_view>
 
 #include "core/ElementTypes.h"
+#include "core/String.h"
 
 namespace zelm {
 namespace {
@@ -57,7 +57,7 @@ Code CodeOf(const Word<Code> (&words)[N], std::string_view token, Code unknown) 
 // an unknown one, and a file be read by another ordering than its own.
 std::string ReadToken(std::istream& stream) {
     std::string token;
-    stream >> token;
+    ReadTrimmedToken(stream, token);
     token.resize(std::strlen(token.c_str()));  // a word ends at a zero
     return token;
 }

@@ -37,8 +37,9 @@ const char* PixelTypeName(std::uint32_t code);
 const char* InterleaveName(std::int32_t code);
 const char* TileOrderName(std::uint32_t code);
 
-// Read one token and compare it with the words, exact and case-sensitive. A word that is not known
-// gives 0, and for an interleave -1. "USHORT" is read as UInt16; no writer emits it.
+// Read one token with ReadTrimmedToken and compare it with the words, exact and case-sensitive. A
+// word that is not known gives 0, and for an interleave -1. "USHORT" is read as UInt16; no writer
+// emits it.
 void ParsePixelType(std::istream& stream, std::uint32_t& code);
 void ParseInterleave(std::istream& stream, std::int32_t& code);
 void ParseTileOrder(std::istream& stream, std::uint32_t& code);

@@ -4,6 +4,10 @@
 // A pointer has no record only after Release, or where the record could not be allocated; Get
 // covers that case, and the pointer then counts as empty.
 //
+// The record names the object by one address for all its pointers, whose last one destroys it by
+// its own type. A pointer to a class therefore converts to a pointer to a base, and takes over an
+// object of a derived class, only where that is sound: see CanStandFor.
+//
 // Copies may be made and dropped on several threads, as long as each Pointer variable is used by
 // one thread at a time.
 #ifndef ZMC_CORE_POINTER_H
@@ -11,14 +15,16 @@
 
 #include <atomic>
 #include <cstdint>
+#include <memory>
 #include <new>
 #include <type_traits>
+#include <utility>
 
 namespace zelm {
 
 struct ReferenceRecord {
     std::atomic<std::uint32_t> count{0};
-    // Untyped, because pointers to a class and to its first base share one record.
+    // Untyped, because pointers to a class and to the base at its start share one record.
     void* object = nullptr;
     bool noDelete = false;  // the last release then frees the record and not the object
 };
@@ -29,6 +35,31 @@ struct ObjectDestroyer {
     static void Destroy(T* object) { delete object; }
 };
 
+// Deleting a Derived through a Base destroys all of it.
+template <class Derived, class Base>
+concept DestroyedThrough = std::is_same_v<Derived, Base> || std::has_virtual_destructor_v<Base>;
+
+// Told at compile time, abstract classes included: memory for one is enough to compare addresses.
+// A base that cannot be cast back is a virtual one, whose place each object decides.
+template <class Derived, class Base>
+constexpr bool LiesAtTheStart() {
+    if constexpr (requires(Base * base) { static_cast<Derived*>(base); }) {
+        std::allocator<Derived> memory;
+        Derived* const object = memory.allocate(1);
+        const Base* const base = object;
+        const bool same = static_cast<const void*>(base) == static_cast<const void*>(object);
+        memory.deallocate(object, 1);
+        return same;
+    } else {
+        return false;
+    }
+}
+
+// A pointer to Base may share the record of a pointer to Derived.
+template <class Derived, class Base>
+concept CanStandFor = !std::is_same_v<Derived, Base> && std::is_convertible_v<Derived*, Base*> &&
+                      DestroyedThrough<Derived, Base> && LiesAtTheStart<Derived, Base>();
+
 // NOLINTBEGIN(clang-analyzer-cplusplus.NewDelete): it does not follow an atomic count, and takes
 // the release by any of two holders for the last.
 template <class T>
@@ -38,13 +69,13 @@ public:
 
     // Takes ownership of `object`, which may be null.
     explicit Pointer(T* object = nullptr) { Bind(object); }
+    template <class U>
+    requires(!DestroyedThrough<U, T>) explicit Pointer(U* object) = delete;
     Pointer(const Pointer& other) : record(other.record) { AddReference(); }
 
-    // Shares the record of a pointer to a class of which T is a base at the same address.
+    // Shares the record of a pointer to a class of which T is a base.
     template <class U>
-    requires(std::is_convertible_v<U*, T*> && !std::is_same_v<U, T>)
-        Pointer(const Pointer<U>& other)
-        : record(other.record) {
+    requires CanStandFor<U, T> Pointer(const Pointer<U>& other) : record(other.record) {
         AddReference();
     }
 
@@ -64,6 +95,11 @@ public:
         Release();
         Bind(object);
     }
+    template <class U>
+    requires(!DestroyedThrough<U, T>) void Reset(U* object) = delete;
+
+    // Exchanges the records; counts stand.
+    void Swap(Pointer& other) noexcept { std::swap(record, other.record); }
 
     // Drops this pointer's reference. The last one destroys the object and frees the record; else
     // the pointer still names the record, and its caller overwrites it or is done with it.

@@ -50,32 +50,27 @@ String::String(const char* utf8Text) {
     if (utf8Text) ConvertFromUtf8(utf8Text, std::strlen(utf8Text));
 }
 
-String::String(const String& other) {
-    if (!other.wide) return;
-    CopyUnits(other.wide, Units(other.wide));
-    if (wide) length = other.length;
-}
+String::String(const String& other) { CopyOf(other); }
 
 String::~String() { Free(); }
 
 // NOLINTNEXTLINE(cert-oop54-cpp): a string that is assigned to itself ends as null.
 String& String::operator=(const String& other) {
     Free();
-    if (other.wide) {
-        CopyUnits(other.wide, Units(other.wide));
-        if (wide) length = other.length;
-    }
+    CopyOf(other);
     return *this;
 }
 
 String& String::operator=(const WideChar* text) {
     String fresh(text);  // `text` may point into this string
-    return Take(fresh);
+    Swap(fresh);
+    return *this;
 }
 
 String& String::operator=(const char* utf8Text) {
     String fresh(utf8Text);  // likewise
-    return Take(fresh);
+    Swap(fresh);
+    return *this;
 }
 
 String& String::operator=(const std::string& utf8Text) {
@@ -113,19 +108,19 @@ String& String::Append(const String& other) {
 }
 
 void String::Substring(std::uint32_t start, std::uint32_t count, String& out) const {
-    const std::uint64_t end = std::uint64_t{start} + count;
-    std::uint32_t units = (count == 0 || end > length) ? length - start : count;
+    const std::uint32_t left = start < length ? length - start : 0;
+    const std::uint32_t units = count == 0 || count > left ? left : count;
     // `length` can exceed the units of text that came from UTF-8; never read past the terminator.
     const std::size_t available = wide ? Units(wide) : 0;
     const std::size_t begin = std::min<std::size_t>(start, available);
     const std::size_t copied = std::min<std::size_t>(units, available - begin);
-    out.Free();
-    WideChar* text = nullptr;
-    if (!AllocateText(text, copied)) return;
-    if (copied != 0) std::copy_n(wide + begin, copied, text);
-    text[copied] = 0;
-    out.wide = text;
-    out.length = units;
+    String part;
+    if (AllocateText(part.wide, copied)) {
+        if (copied != 0) std::copy_n(wide + begin, copied, part.wide);
+        part.wide[copied] = 0;
+        part.length = units;
+    }
+    out.Swap(part);  // `out` may be this string
 }
 
 void String::ToLower() {
@@ -160,11 +155,17 @@ std::basic_string_view<WideChar> String::View() const {
     return {wide, Units(wide)};
 }
 
-String& String::Take(String& other) {
+void String::Swap(String& other) noexcept {
     std::swap(wide, other.wide);
+    std::swap(ansi, other.ansi);
+    std::swap(utf8, other.utf8);
     std::swap(length, other.length);
-    FreeCaches();
-    return *this;
+}
+
+// Into a string without a buffer.
+void String::CopyOf(const String& other) {
+    if (other.wide) CopyUnits(other.wide, Units(other.wide));
+    if (wide || !other.wide) length = other.length;
 }
 
 void String::Free() {
@@ -198,23 +199,23 @@ void String::ConvertFromUtf8(const char* text, std::size_t bytes) {
 
 String operator+(const String& a, const String& b) {
     String joined(a);
-    joined.Append(b);
+    if (joined.wide || a.length == 0) joined.Append(b);  // b alone is not the sum
     return joined;
 }
 
 bool operator==(const String& a, const char* b) { return a.Compare(String(b)) == 0; }
 
-void ReadTrimmedToken(std::istream& stream, String& out) {
+void ReadTrimmedToken(std::istream& stream, std::string& out) {
     static constexpr const char* kBlanks = " \r\n\t";
+    out.clear();
+    stream >> out;
+    out.erase(out.find_last_not_of(kBlanks) + 1);
+    out.erase(0, out.find_first_not_of(kBlanks));
+}
+
+void ReadTrimmedToken(std::istream& stream, String& out) {
     std::string token;
-    stream >> token;
-    const std::size_t first = token.find_first_not_of(kBlanks);
-    if (first == std::string::npos) {
-        token.clear();
-    } else {
-        token.erase(token.find_last_not_of(kBlanks) + 1);
-        token.erase(0, first);
-    }
+    ReadTrimmedToken(stream, token);
     out = token;
 }
 

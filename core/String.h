@@ -34,7 +34,9 @@ public:
     String() = default;
     String(const WideChar* text);  // null gives the null state
     String(const char* utf8Text);  // null gives the null state
-    String(const String& other);   // copies text and length, not the caches
+    // Text and length, not the caches; the length also where the text is null, as it is where
+    // memory ran out for narrow text.
+    String(const String& other);
     ~String();
 
     // Assigning a string to itself leaves it null: the buffer is freed before it is read.
@@ -51,8 +53,9 @@ public:
     String& Append(const String& other);
     String& operator+=(const String& other) { return Append(other); }
 
-    // Writes `count` units from `start` into `out`, which may not be this string. A count of 0,
-    // or one that runs over the end, means up to the end. `start` must lie within the text.
+    // Writes `count` units from `start` into `out`, which may be this string itself. A count of 0,
+    // or one that runs over the end, means up to the end; a start behind the end gives the empty
+    // text. Where memory runs out, `out` is null.
     void Substring(std::uint32_t start, std::uint32_t count, String& out) const;
 
     // Folds the text in place, unit by unit.
@@ -68,16 +71,20 @@ public:
     // The text up to its terminator; empty for a null buffer. Valid until the text changes.
     std::basic_string_view<WideChar> View() const;
 
+    // Exchanges texts, lengths and caches.
+    void Swap(String& other) noexcept;
+
     bool IsEmpty() const { return length == 0; }
 
 private:
-    String& Take(String& other);
+    void CopyOf(const String& other);
     void Free();
     void FreeCaches() const;
     void CopyUnits(const WideChar* text, std::size_t units);
     void ConvertFromUtf8(const char* text, std::size_t bytes);
 };
 
+// Null where memory runs out.
 String operator+(const String& a, const String& b);
 
 inline bool operator==(const String& a, const String& b) { return a.Compare(b) == 0; }
@@ -85,8 +92,10 @@ inline bool operator<(const String& a, const String& b) { return a.Compare(b) < 
 // Compares with UTF-8 text; null counts as a null buffer.
 bool operator==(const String& a, const char* b);
 
-// Reads one token that white space delimits, trims " \r\n\t" at both ends, and assigns it; an
-// exhausted stream gives the null state.
+// Reads one token that white space delimits, trims " \r\n\t" at both ends, and assigns it, to a
+// String up to the first zero; an exhausted stream gives the null state, and the empty narrow text.
+// A short narrow token takes no memory, so that a known word is not lost for want of it.
+void ReadTrimmedToken(std::istream& stream, std::string& out);
 void ReadTrimmedToken(std::istream& stream, String& out);
 
 }  // namespace zelm

@@ -4,6 +4,7 @@
 
 #include <cstdint>
 #include <new>
+#include <utility>
 
 #include "core/ElementTypes.h"
 #include "dispatch/RasterReaderDispatch.h"
@@ -41,15 +42,16 @@ RasterReaderDispatchPtr KeptDispatch(RasterReaderDispatchPtr& kept, std::uint32_
 
 // Takes the reader's properties over into `props` and returns a copy: no-data values that were set
 // on the reader arrive so, and an invalid dispatch, whose record is the default one, resets them.
-// Where memory ran out, `props` stays and the default record is returned.
+// Where memory ran out or the host's georeference threw, `props` stays and the default record is
+// returned.
 inline RasterProps RefreshedProps(const RasterReaderDispatchPtr& dispatch, RasterProps& props) {
     try {
-        if (dispatch) {
-            const RasterProps known = dispatch->GetRasterProps();
-            if (known.interleave == kNoLayout) return RasterProps();
-            props = known;
-        }
-        return props;
+        if (!dispatch) return props;
+        RasterProps known = dispatch->GetRasterProps();
+        if (known.interleave == kNoLayout) return RasterProps();
+        RasterProps answer(known);
+        props = std::move(known);
+        return answer;
     } catch (...) {
         return RasterProps();
     }

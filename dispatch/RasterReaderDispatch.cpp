@@ -1,5 +1,7 @@
 #include "dispatch/RasterReaderDispatch.h"
 
+#include "raster/RasterPropsCopy.h"
+
 namespace zelm {
 
 RasterReaderDispatch::RasterReaderDispatch() {
@@ -15,9 +17,13 @@ ZMC_ELEMENT_TYPES(ZMC_X)
 #undef ZMC_X
 
 RasterProps RasterReaderDispatch::GetRasterProps() const {
-    RasterProps props;
-    Visit([&props](auto& reader) { props = reader.GetRasterProps(); });
-    return props;
+    try {
+        RasterProps props;
+        Visit([&props](auto& reader) { props = reader.GetRasterProps(); });
+        return props;
+    } catch (...) {  // a reader of somebody else's
+        return PropsNotCopied();
+    }
 }
 
 bool RasterReaderDispatch::IsValidLevel() const {

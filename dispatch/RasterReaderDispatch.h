@@ -34,7 +34,9 @@ public:
     ZMC_ELEMENT_TYPES(ZMC_X)
 #undef ZMC_X
 
-    // The answers of the bound reader; a default record and false from an invalid dispatch.
+    // The answers of the bound reader; a default record and false from an invalid dispatch. Neither
+    // throws: properties that cannot be had, because memory runs out or the host's georeference
+    // throws, are a record that is not valid and has no interleave, not even None.
     RasterProps GetRasterProps() const;
     bool IsValidLevel() const;
 

@@ -4,6 +4,7 @@
 // The first byte of an input chooses the locale; after it come steps, each a byte for what to do
 // and whatever that needs. Three strings take part, so that texts are appended to themselves, found
 // in each other and assigned across.
+#include <algorithm>
 #include <clocale>
 #include <cstddef>
 #include <cstdint>
@@ -262,15 +263,14 @@ private:
     }
 
     void Substring(int i, int j) {
-        if (i == j) return;
-        const Model& whole = models[i];
+        const Model whole = models[i];
         const auto units = static_cast<std::uint32_t>(whole.text.size());
-        const std::uint32_t start = input.UpTo(255) % (units + 1);
+        const std::uint32_t start = input.UpTo(255) % (units + 3);
         const std::uint32_t count = input.Flag() ? input.Size() : input.UpTo(80);
         strings[i].Substring(start, count, strings[j]);
-        const bool toTheEnd = count == 0 || std::uint64_t{start} + count > whole.length;
-        const std::uint32_t length = toTheEnd ? whole.length - start : count;
-        Set(j, {false, whole.text.substr(start, length), length});
+        const std::uint32_t left = start < whole.length ? whole.length - start : 0;
+        const std::uint32_t length = count == 0 ? left : std::min(count, left);
+        Set(j, {false, whole.text.substr(std::min(start, units), length), length});
     }
 
     void ToLower(int i) {

@@ -1,7 +1,22 @@
 #include "metadata/MetadataObject.h"
 
-#include <iomanip>
-#include <sstream>
+#include <algorithm>
+#include <string>
+#include <utility>
+
+namespace {
+
+std::wstring Left(std::wstring text, std::size_t width) {
+    text.resize(std::max(text.size(), width), L' ');
+    return text;
+}
+
+std::wstring Right(std::wstring text, std::size_t width) {
+    if (text.size() < width) text.insert(0, width - text.size(), L' ');
+    return text;
+}
+
+}  // namespace
 
 bool MetadataObject::GetArrayDimensions(std::uint32_t& rowCount, std::uint32_t& columnCount) const {
     rowCount = rows;
@@ -9,16 +24,12 @@ bool MetadataObject::GetArrayDimensions(std::uint32_t& rowCount, std::uint32_t& 
     return IsArray();
 }
 
-// The widths keep the columns of a printed tree aligned, arrays and scalars alike.
+// The widths keep the columns of a printed tree aligned, arrays and scalars alike. No stream makes
+// the text: a stream keeps to itself that memory ran out, and gives what it has.
 std::wstring MetadataObject::Format(const std::wstring& name) const {
-    std::wostringstream line;
-    line.imbue(std::locale::classic());
-    line << std::left << std::setw(80) << name << L" = (";
-    line << std::right << std::setw(7) << GetTypeName() << L' ';
-    if (IsArray())
-        line << std::setw(4) << rows << L',' << std::setw(3) << columns;
-    else
-        line << std::setw(8) << GetElementCount();
-    line << L") = " << std::left << std::setw(50) << GetValueText() << L'\n';
-    return std::move(line).str();
+    const std::wstring size =
+        IsArray() ? Right(std::to_wstring(rows), 4) + L',' + Right(std::to_wstring(columns), 3)
+                  : Right(std::to_wstring(GetElementCount()), 8);
+    return Left(name, 80) + L" = (" + Right(GetTypeName(), 7) + L' ' + size + L") = " +
+           Left(GetValueText(), 50) + L'\n';
 }

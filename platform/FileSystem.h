@@ -1,8 +1,10 @@
 // What the file system offers beyond the transfers of platform/File.h: names, folders, replacing a
 // file in one step, space, and what is needed to tell a dead process's leavings.
 //
-// Paths are narrow UTF-8. Nothing throws. An operation that fails says so by its result, and
-// LastErrorText gives the system's reason to the thread that called it, until its next call.
+// Paths are narrow UTF-8. An operation that fails says so by its result, and LastErrorText gives
+// the system's reason to the thread that called it, until its next call. Operations do not throw.
+// What answers with a text or a list throws std::bad_alloc where there is no memory for it, and
+// nothing else: a path that came back empty instead, or cut, would be that of another file.
 #ifndef ZMC_PLATFORM_FILESYSTEM_H
 #define ZMC_PLATFORM_FILESYSTEM_H
 
@@ -26,7 +28,7 @@ struct FileStatus {
 
 std::string LastErrorText();
 
-FileStatus StatusOf(const std::string& path);
+FileStatus StatusOf(const std::string& path) noexcept;
 
 // The folder of a path ("." for a bare name), its last part, and the two put together.
 std::string FolderOf(const std::string& path);
@@ -41,33 +43,33 @@ std::string ResolveLinks(const std::string& path);
 std::vector<std::string> ListFolder(const std::string& folder);
 
 // Makes an empty file; fails if anything of that name exists.
-bool CreateNewFile(const std::string& path);
+bool CreateNewFile(const std::string& path) noexcept;
 // Gives a file another name, replacing what bears it, in one step that others see whole.
-bool RenameFile(const std::string& from, const std::string& to);
+bool RenameFile(const std::string& from, const std::string& to) noexcept;
 // The same, and fails if anything bears that name.
-bool RenameToNewName(const std::string& from, const std::string& to);
-bool RemoveEntry(const std::string& path);
+bool RenameToNewName(const std::string& from, const std::string& to) noexcept;
+bool RemoveEntry(const std::string& path) noexcept;
 
 // Waits until a file's bytes, or a folder's names, have reached the disk.
-bool SyncFile(const std::string& path);
-bool SyncFolder(const std::string& folder);
+bool SyncFile(const std::string& path) noexcept;
+bool SyncFolder(const std::string& folder) noexcept;
 
 // Bytes that this process can still write in a folder.
-std::optional<std::uint64_t> FreeSpace(const std::string& folder);
+std::optional<std::uint64_t> FreeSpace(const std::string& folder) noexcept;
 // Takes `size` bytes of the disk for a file without changing its size. False only if the space is
 // not there: file systems without the service give true.
-bool ReserveSpace(const std::string& path, std::uint64_t size);
+bool ReserveSpace(const std::string& path, std::uint64_t size) noexcept;
 // Gives back what was reserved and not used.
-bool ReleaseReserve(const std::string& path);
+bool ReleaseReserve(const std::string& path) noexcept;
 
 // What tells this run of the operating system from those before and after: as long as it is the
 // same, the power did not fail, and files have all that was written to them. Empty if not known.
 std::string SystemRun();
 
-std::uint64_t CurrentProcess();
-bool ProcessAlive(std::uint64_t process);
+std::uint64_t CurrentProcess() noexcept;
+bool ProcessAlive(std::uint64_t process) noexcept;
 // A number that another call, in this process or another, does not give.
-std::uint64_t RandomNumber();
+std::uint64_t RandomNumber() noexcept;
 
 }  // namespace platform
 

@@ -1,6 +1,7 @@
 #include "raster/RasterProps.h"
 
 #include <algorithm>
+#include <utility>
 
 #include "core/ObjectCodes.h"
 
@@ -11,20 +12,24 @@ const std::uint32_t RasterProps::typeCode = GloballyUniqueObjectTypeCode("Raster
 RasterProps::RasterProps(const RasterProps& other)
     : noDataValues(other.noDataValues),
       formatName(other.formatName),
-      geoRef(other.geoRef),
+      geoRef(other.geoRef ? other.geoRef->Clone() : nullptr),
       metadata(other.metadata) {
     TakeFields(other);
-    CloneGeoRef();
 }
 
 RasterProps& RasterProps::operator=(const RasterProps& other) {
-    if (this == &other) return *this;
-    noDataValues = other.noDataValues;
-    formatName = other.formatName;
-    geoRef = other.geoRef;
-    metadata = other.metadata;
+    if (this != &other) *this = RasterProps(other);
+    return *this;
+}
+
+RasterProps::RasterProps(RasterProps&& other) noexcept : RasterProps() { *this = std::move(other); }
+
+RasterProps& RasterProps::operator=(RasterProps&& other) noexcept {
+    noDataValues.swap(other.noDataValues);
+    formatName.Swap(other.formatName);
+    geoRef.Swap(other.geoRef);
+    metadata.impl.Swap(other.metadata.impl);
     TakeFields(other);
-    CloneGeoRef();
     return *this;
 }
 
@@ -64,18 +69,19 @@ void RasterProps::TakeNoDataValues(const RasterProps& source) {
 }
 
 void RasterProps::SetGeoRef(GeoRefPtr other) {
-    geoRef.Reset(other ? other->Clone() : nullptr);
-    TellGeoRefSize();
+    GeoRefPtr own(other ? other->Clone() : nullptr);
+    if (own) own->SetRasterSize(samples, lines);
+    geoRef.Swap(own);
 }
 
 void RasterProps::SetSamples(std::uint32_t value) {
+    if (geoRef) geoRef->SetRasterSize(value, lines);
     samples = value;
-    TellGeoRefSize();
 }
 
 void RasterProps::SetLines(std::uint32_t value) {
+    if (geoRef) geoRef->SetRasterSize(samples, value);
     lines = value;
-    TellGeoRefSize();
 }
 
 void RasterProps::SetBands(std::uint32_t value) {
@@ -83,7 +89,7 @@ void RasterProps::SetBands(std::uint32_t value) {
     if (bands == 0) noDataValues.clear();
 }
 
-void RasterProps::TakeFields(const RasterProps& other) {
+void RasterProps::TakeFields(const RasterProps& other) noexcept {
     samples = other.samples;
     lines = other.lines;
     bands = other.bands;
@@ -92,14 +98,6 @@ void RasterProps::TakeFields(const RasterProps& other) {
     std::copy(std::begin(other.reserved), std::end(other.reserved), std::begin(reserved));
     interleave = other.interleave;
     pixelType = other.pixelType;
-}
-
-void RasterProps::CloneGeoRef() {
-    if (geoRef) geoRef.Reset(GeoRefPtr(geoRef)->Clone());
-}
-
-void RasterProps::TellGeoRefSize() {
-    if (geoRef) geoRef->SetRasterSize(samples, lines);
 }
 
 }  // namespace zelm

@@ -3,6 +3,10 @@
 // Each holder has its own copy with its own clone of the georeference; the metadata tree is shared
 // among the copies. A record belongs to one thread at a time.
 //
+// Copying throws what the host's georeference throws, and std::bad_alloc; so do the operations that
+// tell the georeference something. The record is then as it was before. Moving never throws and
+// clones nothing.
+//
 // Whoever changes `samples` or `lines` of a record that holds a georeference calls SetRasterSize
 // on it with the new pair right away; whoever sets `bands` to 0 empties `noDataValues`. SetSamples,
 // SetLines and SetBands do so.
@@ -39,6 +43,10 @@ public:
     RasterProps() = default;
     RasterProps(const RasterProps& other);
     RasterProps& operator=(const RasterProps& other);
+    // What is left of a record that was moved from is there to be assigned or destroyed.
+    RasterProps(RasterProps&& other) noexcept;
+    RasterProps& operator=(RasterProps&& other) noexcept;
+    ~RasterProps() = default;
 
     // True when pixel type and format are both known.
     bool IsValid() const;
@@ -62,9 +70,7 @@ public:
     void SetBands(std::uint32_t value);
 
 private:
-    void TakeFields(const RasterProps& other);
-    void CloneGeoRef();
-    void TellGeoRefSize();
+    void TakeFields(const RasterProps& other) noexcept;
 };
 
 }  // namespace zelm

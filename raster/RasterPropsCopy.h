@@ -13,15 +13,19 @@ namespace zelm {
 // a mask is left alone rather than computed by a layout that the tile does not have.
 inline constexpr std::int32_t kNoLayout = std::numeric_limits<std::int32_t>::min();
 
-// The copy, or, where memory ran out or the host's georeference threw, a record that is not valid
-// and whose interleave is kNoLayout.
+// What stands for a record that could not be copied: not valid, with kNoLayout for an interleave.
+inline RasterProps PropsNotCopied() noexcept {
+    RasterProps nothing;
+    nothing.interleave = kNoLayout;
+    return nothing;
+}
+
+// The copy, or PropsNotCopied where memory ran out or the host's georeference threw.
 inline RasterProps CopyOfProps(const RasterProps& props) noexcept {
     try {
         return props;
     } catch (...) {
-        RasterProps nothing;
-        nothing.interleave = kNoLayout;
-        return nothing;
+        return PropsNotCopied();
     }
 }
 

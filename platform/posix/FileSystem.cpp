@@ -7,14 +7,16 @@
 #include <sys/statvfs.h>
 #include <unistd.h>
 
+#include <atomic>
 #include <cerrno>
+#include <chrono>
 #include <climits>
 #include <cstdio>
 #include <cstdlib>
 #include <memory>
-#include <random>
 #include <system_error>
 
+#include "platform/Random.h"
 #include "platform/posix/Descriptor.h"
 #include "platform/posix/Uninterrupted.h"
 
@@ -45,7 +47,7 @@ bool Sync(const std::string& path, int flags) {
 
 std::string LastErrorText() { return std::generic_category().message(errno); }
 
-FileStatus StatusOf(const std::string& path) {
+FileStatus StatusOf(const std::string& path) noexcept {
     FileStatus status;
     struct stat info {};
     if (::stat(path.c_str(), &info) != 0) return status;
@@ -97,15 +99,15 @@ std::vector<std::string> ListFolder(const std::string& folder) {
     return names;
 }
 
-bool CreateNewFile(const std::string& path) {
+bool CreateNewFile(const std::string& path) noexcept {
     return static_cast<bool>(Descriptor(path, O_WRONLY | O_CREAT | O_EXCL));
 }
 
-bool RenameFile(const std::string& from, const std::string& to) {
+bool RenameFile(const std::string& from, const std::string& to) noexcept {
     return ::rename(from.c_str(), to.c_str()) == 0;
 }
 
-bool RenameToNewName(const std::string& from, const std::string& to) {
+bool RenameToNewName(const std::string& from, const std::string& to) noexcept {
 #if defined(RENAME_NOREPLACE)
     if (::renameat2(AT_FDCWD, from.c_str(), AT_FDCWD, to.c_str(), RENAME_NOREPLACE) == 0)
         return true;
@@ -115,20 +117,20 @@ bool RenameToNewName(const std::string& from, const std::string& to) {
     return ::link(from.c_str(), to.c_str()) == 0 && ::unlink(from.c_str()) == 0;
 }
 
-bool RemoveEntry(const std::string& path) { return ::unlink(path.c_str()) == 0; }
+bool RemoveEntry(const std::string& path) noexcept { return ::unlink(path.c_str()) == 0; }
 
-bool SyncFile(const std::string& path) { return Sync(path, O_RDONLY); }
+bool SyncFile(const std::string& path) noexcept { return Sync(path, O_RDONLY); }
 
-bool SyncFolder(const std::string& folder) { return Sync(folder, O_RDONLY | O_DIRECTORY); }
+bool SyncFolder(const std::string& folder) noexcept { return Sync(folder, O_RDONLY | O_DIRECTORY); }
 
-std::optional<std::uint64_t> FreeSpace(const std::string& folder) {
+std::optional<std::uint64_t> FreeSpace(const std::string& folder) noexcept {
     struct statvfs info {};
     if (::statvfs(folder.c_str(), &info) != 0) return std::nullopt;
     const std::uint64_t blocks = ::geteuid() == 0 ? info.f_bfree : info.f_bavail;
     return blocks * info.f_frsize;
 }
 
-bool ReserveSpace(const std::string& path, std::uint64_t size) {
+bool ReserveSpace(const std::string& path, std::uint64_t size) noexcept {
     const Descriptor file(path, O_WRONLY);
     if (!file) return false;
 #if defined(__linux__)
@@ -143,7 +145,7 @@ bool ReserveSpace(const std::string& path, std::uint64_t size) {
 #endif
 }
 
-bool ReleaseReserve(const std::string& path) {
+bool ReleaseReserve(const std::string& path) noexcept {
     const Descriptor file(path, O_WRONLY);
     struct stat info {};
     return file && ::fstat(file.value, &info) == 0 &&
@@ -159,16 +161,20 @@ std::string SystemRun() {
     return run;
 }
 
-std::uint64_t CurrentProcess() { return static_cast<std::uint64_t>(::getpid()); }
+std::uint64_t CurrentProcess() noexcept { return static_cast<std::uint64_t>(::getpid()); }
 
-bool ProcessAlive(std::uint64_t process) {
+bool ProcessAlive(std::uint64_t process) noexcept {
     if (process == 0 || process > INT_MAX) return false;
     return ::kill(static_cast<pid_t>(process), 0) == 0 || errno != ESRCH;
 }
 
-std::uint64_t RandomNumber() {
-    std::random_device device;
-    return (std::uint64_t{device()} << 32) ^ device();
+std::uint64_t RandomNumber() noexcept {
+    std::uint64_t number = 0;
+    if (RandomBytes(&number, sizeof number)) return number;
+    // unreachable: only where the system has no random numbers; time and count differ then
+    static std::atomic<std::uint64_t> calls{0};
+    const auto now = std::chrono::system_clock::now().time_since_epoch().count();
+    return (CurrentProcess() << 40) ^ (++calls << 32) ^ static_cast<std::uint64_t>(now);
 }
 
 }  // namespace platform

@@ -2,9 +2,11 @@
 
 #include <gtest/gtest.h>
 
+#include <locale>
 #include <set>
 #include <sstream>
 #include <string>
+#include <vector>
 
 #include "core/ElementTypes.h"
 
@@ -75,6 +77,49 @@ TEST(PixelVocabulary, AliasAndMisspellings) {
     EXPECT_EQ(PixelTypeOf("byte"), 0u);
     EXPECT_EQ(PixelTypeOf(" Byte\r\n"), 1u);
     EXPECT_EQ(PixelTypeOf("Byte Int16"), 1u);
+}
+
+// A locale in which a carriage return is no white space and ends no token.
+class CarriageReturnIsALetter : public std::ctype<char> {
+public:
+    CarriageReturnIsALetter() : std::ctype<char>(Table()) {}
+
+private:
+    static const mask* Table() {
+        static const std::vector<mask> table = [] {
+            std::vector<mask> made(classic_table(), classic_table() + table_size);
+            made[static_cast<unsigned char>('\r')] = alpha;
+            return made;
+        }();
+        return table.data();
+    }
+};
+
+TEST(PixelVocabulary, WordsAreTrimmedWhateverTheStreamTakesForWhiteSpace) {
+    const std::locale odd(std::locale::classic(), new CarriageReturnIsALetter);
+    const auto streamOf = [&odd](const char* text) {
+        std::istringstream stream(text);
+        stream.imbue(odd);
+        return stream;
+    };
+    std::uint32_t pixelType = 1234;
+    std::istringstream pixelTypes = streamOf("\rUSHORT\r\n");
+    ParsePixelType(pixelTypes, pixelType);
+    EXPECT_EQ(pixelType, 12u);
+    std::int32_t interleave = 1234;
+    std::istringstream interleaves = streamOf("BIP\r");
+    ParseInterleave(interleaves, interleave);
+    EXPECT_EQ(interleave, 0);
+    std::uint32_t order = 1234;
+    std::istringstream orders = streamOf("\r\rMorton");
+    ParseTileOrder(orders, order);
+    EXPECT_EQ(order, 2u);
+}
+
+TEST(PixelVocabulary, AWordEndsAtAZero) {
+    EXPECT_EQ(PixelTypeOf(std::string("Byte\0x", 6)), 1u);
+    EXPECT_EQ(InterleaveOf(std::string("BIP\0", 4)), 0);
+    EXPECT_EQ(TileOrderOf(std::string("\0Morton", 7)), 0u);
 }
 
 TEST(PixelVocabulary, CodesWithoutReaderAreNotChecked) {

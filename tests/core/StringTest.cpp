@@ -201,6 +201,46 @@ TEST(String, SubstringAtTheEndIsEmptyAndNotNull) {
     EXPECT_EQ(out.length, 0u);
 }
 
+TEST(String, SubstringMayBeWrittenIntoItsOwnString) {
+    String s("abcde");
+    s.GetUtf8();
+    s.Substring(1, 2, s);
+    EXPECT_TRUE(s == "bc");
+    EXPECT_EQ(s.length, 2u);
+    EXPECT_STREQ(s.GetUtf8(), "bc");
+    s.Substring(0, 0, s);
+    EXPECT_TRUE(s == "bc");
+    s.Substring(2, 5, s);
+    EXPECT_TRUE(s == "");
+}
+
+TEST(String, SubstringFromBehindTheEndIsEmpty) {
+    const String s("abc");
+    for (const std::uint32_t start : {4u, 100u, 0xFFFFFFFFu})
+        for (const std::uint32_t count : {0u, 1u, 3u, 0xFFFFFFFFu}) {
+            String out("old");
+            s.Substring(start, count, out);
+            ASSERT_NE(out.wide, nullptr);
+            EXPECT_TRUE(out == "") << start << ' ' << count;
+            EXPECT_EQ(out.length, 0u) << start << ' ' << count;
+        }
+}
+
+TEST(String, CopyTakesTheLengthOfATextThatIsNull) {
+    String lost;
+    lost.length = 6;  // as narrow text leaves it where memory ran out
+    const String copy(lost);
+    EXPECT_EQ(copy.wide, nullptr);
+    EXPECT_EQ(copy.length, 6u);
+    String assigned("old");
+    assigned = lost;
+    EXPECT_EQ(assigned.wide, nullptr);
+    EXPECT_EQ(assigned.length, 6u);
+    const String& same = assigned;
+    assigned = same;
+    EXPECT_EQ(assigned.length, 0u) << "a string that is assigned to itself is null";
+}
+
 TEST(String, SubstringBeyondTheTerminatorReadsNothing) {
     // Four bytes but two units, so that a start within `length` lies behind the text.
     const String s("\xC3\xA9\xC3\xA9");
@@ -266,6 +306,21 @@ TEST(String, ReadTrimmedTokenStopsAtWhiteSpace) {
     EXPECT_TRUE(token == "BIP");
     ReadTrimmedToken(stream, token);
     EXPECT_TRUE(token == "next");
+}
+
+TEST(String, ReadTrimmedTokenEndsAStringAtAZeroAndANarrowTextNot) {
+    const std::string text("ab\0c \0d", 7);
+    std::istringstream strings(text);
+    String token;
+    ReadTrimmedToken(strings, token);
+    EXPECT_TRUE(token == "ab");
+    ReadTrimmedToken(strings, token);
+    ASSERT_NE(token.wide, nullptr) << "there was a token";
+    EXPECT_TRUE(token == "");
+    std::istringstream narrow(text);
+    std::string bytes;
+    ReadTrimmedToken(narrow, bytes);
+    EXPECT_EQ(bytes, std::string("ab\0c", 4));
 }
 
 TEST(String, ReadTrimmedTokenOnAnExhaustedStreamIsEmpty) {

@@ -55,6 +55,30 @@ TEST(StringFaults, AFailedAppendLosesTheText) {
     EXPECT_EQ(s.length, 0u);
 }
 
+TEST(StringFaults, AFailedSumIsNullAndNotOneOfItsParts) {
+    const String a("left");
+    const String b("right");
+    const std::size_t points = ForEachAllocationFailing([&](AllocationFaults& faults) {
+        const String sum = a + b;
+        faults.Disarm();
+        const bool failed = faults.Failed() != 0;
+        EXPECT_EQ(sum.wide == nullptr, failed);
+        EXPECT_EQ(sum.length, failed ? 0u : 9u);
+    });
+    EXPECT_EQ(points, 2u);
+}
+
+TEST(StringFaults, AFailedSubstringIntoItselfLeavesItEmpty) {
+    String s("text");
+    s.GetUtf8();
+    AllocationFaults faults(1);
+    s.Substring(1, 2, s);
+    faults.Disarm();
+    EXPECT_EQ(s.wide, nullptr);
+    EXPECT_EQ(s.utf8, nullptr);
+    EXPECT_EQ(s.length, 0u);
+}
+
 TEST(StringFaults, AFailedSubstringLeavesItsTargetEmpty) {
     const String s("text");
     String out("old");

@@ -1,4 +1,5 @@
 // Palettes, metadata, raster properties and codes with each allocation failing in turn.
+#include <algorithm>
 #include <memory>
 #include <new>
 #include <string>
@@ -7,6 +8,7 @@
 #include "core/ElementTypes.h"
 #include "core/Object.h"
 #include "metadata/Metadata.h"
+#include "metadata/MetadataContainer.h"
 #include "raster/RasterProps.h"
 #include "tests/support/AllocationFaults.h"
 #include "tests/support/CountingGeoRef.h"
@@ -52,6 +54,45 @@ TEST(PaletteFaults, TheTableItselfThrows) {
     EXPECT_TRUE(palette.colors.empty());
 }
 
+bool SameColors(const Palette& a, const Palette& b) {
+    return a.nextIndex == b.nextIndex &&
+           std::equal(a.colors.begin(), a.colors.end(), b.colors.begin(), b.colors.end(),
+                      [](const auto& x, const auto& y) {
+                          return x.first == y.first && x.second && y.second &&
+                                 x.second->name == y.second->name && x.second->red == y.second->red;
+                      });
+}
+
+// The target has all colours and the length of the source, or its own as they were.
+TEST(PaletteFaults, ACopyIsWholeOrThrown) {
+    Palette source;
+    for (unsigned char value = 1; value <= 3; ++value) source.AddColor(Grey(value));
+    std::size_t thrown = 0;
+    ForEachAllocationFailing([&](AllocationFaults& faults) {
+        faults.Disarm();
+        Palette target;
+        target.AddColor(Grey(9));
+        const Color* const held = target.GetColor(0);
+        faults.Rearm();
+        bool threw = false;
+        try {
+            source.CopyTo(target);
+        } catch (const std::bad_alloc&) {
+            threw = true;
+        }
+        faults.Disarm();
+        if (threw) {
+            EXPECT_EQ(target.nextIndex, 1u);
+            EXPECT_EQ(target.colors.size(), 1u);
+            EXPECT_EQ(target.GetColor(0), held);
+        } else {
+            EXPECT_TRUE(SameColors(target, source));
+        }
+        thrown += threw ? 1 : 0;
+    });
+    EXPECT_GE(thrown, 24u) << "entry, colour, name and record of each, in both modes";
+}
+
 TEST(PaletteFaults, EveryOperationSurvivesEveryFailure) {
     const RGBAColor grey = Grey(3);
     const std::size_t points = ForEachAllocationFailing([&grey](AllocationFaults&) {
@@ -71,6 +112,18 @@ TEST(PaletteFaults, EveryOperationSurvivesEveryFailure) {
             if (color) static_cast<void>(color->red);
     });
     EXPECT_GE(points, 12u);
+}
+
+TEST(ObjectFaults, TextFormIsWholeOrNull) {
+    const Object object;
+    const String whole = object.ToString();
+    const std::size_t points = ForEachAllocationFailing([&](AllocationFaults& faults) {
+        const String text = object.ToString();
+        faults.Disarm();
+        EXPECT_TRUE(text.wide == nullptr || text == whole);
+        EXPECT_EQ(text == whole, faults.Failed() == 0);
+    });
+    EXPECT_GE(points, 1u);
 }
 
 TEST(MetadataFaults, WithoutATreeTheHandleHoldsNothing) {
@@ -95,6 +148,39 @@ TEST(MetadataFaults, EveryOperationSurvivesEveryFailure) {
         MetadataPtr held(new (std::nothrow) Metadata(other));
     });
     EXPECT_GE(points, 9u);
+}
+
+// A leaf whose texts are too long to lie in a string itself.
+class LongLeaf : public MetadataObject {
+public:
+    std::wstring GetValueText() const override { return std::wstring(200, L'v'); }
+    const void* GetValueData(std::uint32_t&) const override { return nullptr; }
+    std::uint32_t GetElementCount() const override { return 1; }
+    std::wstring GetTypeName() const override { return std::wstring(100, L't'); }
+    std::int32_t GetTypeCode() const override { return 3; }
+};
+
+TEST(MetadataFaults, FormatThrowsOrGivesTheWholeText) {
+    MetadataContainer tree;
+    tree.children[L"scalar"] = new LongLeaf;
+    auto* const array = new LongLeaf;
+    array->rows = array->columns = 7;
+    tree.children[L"array"] = array;
+    const std::wstring whole = tree.Format(L"");
+    std::size_t thrown = 0;
+    const std::size_t points = ForEachAllocationFailing([&](AllocationFaults& faults) {
+        std::wstring text;
+        try {
+            text = tree.Format(L"");
+            faults.Disarm();
+            EXPECT_EQ(text, whole);
+            EXPECT_EQ(faults.Failed(), 0u);
+        } catch (const std::bad_alloc&) {
+            ++thrown;
+        }
+    });
+    EXPECT_GE(points, 6u);
+    EXPECT_EQ(thrown, 2 * points);
 }
 
 TEST(RasterPropsFaults, AGeoRefThatCannotBeClonedIsNone) {

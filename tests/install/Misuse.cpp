@@ -7,6 +7,23 @@
 
 using namespace zelm;
 
+struct FirstBase {
+    virtual ~FirstBase() = default;
+    int first = 1;
+};
+struct SecondBase {
+    virtual ~SecondBase() = default;
+    int second = 2;
+};
+struct OfTwo : FirstBase, SecondBase {};
+struct OfVirtual : virtual FirstBase {};
+struct PlainBase {
+    int plain = 3;
+};
+struct OfPlain : PlainBase {
+    PalettePtr owned;
+};
+
 void Misuse(RasterReaderDispatch& dispatch, RasterReaderPtr<int> ints, DataConnectionPtr connection,
             RasterDataConnectionPtr raster, PalettePtr palette, Palette& colors, Color& color) {
 #if ZMC_MISUSE == 1
@@ -23,7 +40,24 @@ void Misuse(RasterReaderDispatch& dispatch, RasterReaderPtr<int> ints, DataConne
     color = Color();  // misuse 6: assignment that would slice
 #elif ZMC_MISUSE == 7
     DataConnectionFactory factory;  // misuse 7: an interface is not an object
+#elif ZMC_MISUSE == 8
+    Pointer<SecondBase> second{Pointer<OfTwo>()};  // misuse 8: a base at another address
+#elif ZMC_MISUSE == 9
+    Pointer<FirstBase> first{Pointer<OfVirtual>()};  // misuse 9: a base somewhere in the object
+#elif ZMC_MISUSE == 10
+    Pointer<PlainBase> plain{Pointer<OfPlain>()};  // misuse 10: a destructor that would be skipped
+#elif ZMC_MISUSE == 11
+    Pointer<PlainBase> plain(new OfPlain);  // misuse 11: likewise, of an object taken over
+#elif ZMC_MISUSE == 12
+    Pointer<PlainBase>().Reset(new OfPlain);  // misuse 12: likewise, later
 #else
+    Pointer<FirstBase> first{Pointer<OfTwo>()};
+    first.Reset(new OfVirtual);
+    Pointer<SecondBase> second(new OfTwo);
+    Pointer<PlainBase> plain(new PlainBase);
+    plain.Reset(new PlainBase);
+    plain.Reset(nullptr);
+    Pointer<OfPlain> derived(new OfPlain);
     RasterReaderPtr<int> reader = dispatch.As<int>();
     Pointer<DataConnection> other(raster);
     RasterReaderDispatch bound(ints);

@@ -4,6 +4,8 @@
 
 #include <algorithm>
 #include <iterator>
+#include <stdexcept>
+#include <utility>
 
 #include "core/ObjectCodes.h"
 #include "tests/support/CountingGeoRef.h"
@@ -165,6 +167,59 @@ TEST(RasterProps, AssignmentHasItsOwnGeoRefAndSharesTheTree) {
         EXPECT_EQ(CountingGeoRef::living, 1);
     }
     EXPECT_EQ(CountingGeoRef::living, 0);
+}
+
+TEST(RasterProps, AssignmentWhoseCloneThrowsChangesNothing) {
+    {
+        RasterProps source = Filled();
+        source.samples = 77;
+        source.noDataValues.clear();
+        source.formatName = "MemoryRaster";
+        RasterProps target = Filled();
+        const RasterProps before(target);
+        const GeoRef* const held = target.geoRef.Get();
+        {
+            const testsupport::ThrowingClones throwing;
+            EXPECT_THROW(target = source, std::runtime_error);
+            EXPECT_THROW(static_cast<void>(RasterProps(source)), std::runtime_error);
+            EXPECT_THROW(target.SetGeoRef(source.geoRef), std::runtime_error);
+        }
+        ExpectSameFields(target, before);
+        EXPECT_EQ(target.geoRef.Get(), held);
+        EXPECT_EQ(source.geoRef.record->count, 1u) << "nobody shares it";
+    }
+    EXPECT_EQ(CountingGeoRef::living, 0);
+}
+
+TEST(RasterProps, AGeoRefThatRefusesItsSizeLeavesTheRecordAsItWas) {
+    {
+        RasterProps props = Filled();
+        const GeoRef* const held = props.geoRef.Get();
+        CountingGeoRef::sizeThrows = true;
+        EXPECT_THROW(props.SetSamples(1), std::runtime_error);
+        EXPECT_THROW(props.SetLines(1), std::runtime_error);
+        EXPECT_THROW(props.SetGeoRef(props.geoRef), std::runtime_error);
+        CountingGeoRef::sizeThrows = false;
+        EXPECT_EQ(props.samples, 10u);
+        EXPECT_EQ(props.lines, 20u);
+        EXPECT_EQ(props.geoRef.Get(), held);
+    }
+    EXPECT_EQ(CountingGeoRef::living, 0);
+}
+
+TEST(RasterProps, MovingTakesTheGeoRefWithoutCloningIt) {
+    RasterProps source = Filled();
+    const GeoRef* const held = source.geoRef.Get();
+    const testsupport::ThrowingClones throwing;
+    RasterProps moved(std::move(source));
+    EXPECT_EQ(moved.geoRef.Get(), held);
+    EXPECT_EQ(moved.noDataValues.size(), 2u);
+    RasterProps target;
+    target = std::move(moved);
+    EXPECT_EQ(target.geoRef.Get(), held);
+    EXPECT_EQ(target.samples, 10u);
+    EXPECT_TRUE(target.formatName == "Pyramid");
+    EXPECT_EQ(held, target.geoRef.Get());
 }
 
 TEST(RasterProps, SelfAssignmentChangesNothing) {
