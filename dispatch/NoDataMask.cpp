@@ -87,6 +87,20 @@ struct BandRules {
     NoDataRule<S> rule;
 };
 
+// Narrow samples are compared so fast that one more look for each of them shows.
+template <class S>
+constexpr bool kIsNarrow = std::is_integral_v<S> && sizeof(S) <= 2;
+
+// Those of a run of several bands of narrow samples that all have a value.
+template <class S>
+struct ValueRules {
+    static constexpr unsigned Has(std::size_t) { return 1; }
+    S Value(std::size_t at) const { return values[at]; }
+    static constexpr bool HasAny() { return true; }
+
+    const S* values;
+};
+
 // Those of neighbouring bands of a pixel-interleaved tile, repeated over as many pixels as fit.
 template <class S>
 class PixelRules {
@@ -99,6 +113,7 @@ public:
             const NoDataRule<S> rule = source.RuleOf(first + band);
             values[band] = rule.value;
             has[band] = rule.hasValue ? 1 : 0;
+            complete = complete && rule.hasValue;
             uniform =
                 uniform && has[band] == has[0] && (!rule.hasValue || values[band] == values[0]);
         }
@@ -112,6 +127,8 @@ public:
     std::size_t Bands() const { return bands; }
     std::size_t Pixels() const { return pixels; }
     bool IsUniform() const { return uniform; }
+    bool IsComplete() const { return complete; }
+    ValueRules<S> Values() const { return {values}; }
     BandRules<S> First() const { return {{has[0] != 0, values[0]}}; }
 
 private:
@@ -123,7 +140,8 @@ private:
     unsigned char has[kMost];
     std::size_t bands;
     std::size_t pixels = 1;
-    bool uniform = true;
+    bool complete = true;  // all of the bands have a value
+    bool uniform = true;   // all have the same, or none has one
 
     void Repeat(std::size_t pixelCount) {
         pixels = std::min(kMost / bands, pixelCount);
@@ -162,8 +180,11 @@ void VisitPixels(const RuleSource<S>& source, const TileShape& tile, const Visit
         const std::size_t samples = pixels * rules.Bands();
         if (rules.IsUniform() && rules.Bands() == tile.bands)
             return visit(rules.First(), 0, Runs{samples, samples, samples});
-        visit(rules, first,
-              Runs{samples, rules.Pixels() * rules.Bands(), rules.Pixels() * tile.bands});
+        const Runs runs{samples, rules.Pixels() * rules.Bands(), rules.Pixels() * tile.bands};
+        if (kIsNarrow<S> && rules.IsComplete())
+            visit(rules.Values(), first, runs);
+        else
+            visit(rules, first, runs);
         first += rules.Bands();
     }
 }

@@ -1,9 +1,9 @@
 #include "raster/TileCopy.h"
 
 #include <algorithm>
+#include <bit>
 #include <cassert>
 #include <cstring>
-#include <type_traits>
 
 #include "core/PixelVocabulary.h"
 
@@ -12,41 +12,63 @@ namespace {
 
 // Bytes from which neighbouring bands of one pixel are moved as a block, not sample by sample.
 constexpr std::size_t kBlockBytes = 64;
-// Bands that one pass over a line moves.
+// Bands that one pass over a line of pixels moves.
 constexpr std::uint32_t kPassBands = 4;
 
-// Distance in bytes between neighbouring lines, bands and samples.
-struct Strides {
-    std::size_t line;
-    std::size_t band;
-    std::size_t sample;
+// The two directions.
+struct ToTile {
+    using Raster = const unsigned char*;
+    using Tile = unsigned char*;
+    static void Move(Raster raster, Tile tile, std::size_t bytes) {
+        std::memcpy(tile, raster, bytes);
+    }
+};
+struct ToRaster {
+    using Raster = unsigned char*;
+    using Tile = const unsigned char*;
+    static void Move(Raster raster, Tile tile, std::size_t bytes) {
+        std::memcpy(raster, tile, bytes);
+    }
 };
 
-Strides StridesOf(std::int32_t interleave, std::size_t samples, std::size_t lines,
-                  std::size_t bands, std::size_t size) {
-    switch (interleave) {
+// One of the loops that a copy is made of: how often, and how many bytes further on either side.
+struct Loop {
+    std::size_t count;
+    std::size_t inRaster;
+    std::size_t inTile;
+
+    bool Continues(const Loop& inner) const {
+        return inRaster == inner.count * inner.inRaster && inTile == inner.count * inner.inTile;
+    }
+};
+
+// The loops over the lines, bands and samples of a tile. What they move is one sample.
+struct Loops {
+    Loop line;
+    Loop band;
+    Loop sample;
+};
+
+Loops LoopsOf(const RasterLayout& raster, const TileWindow& tile, std::size_t tileBands,
+              std::size_t size) {
+    const std::size_t width = raster.samples * size, tileWidth = tile.width * size;
+    switch (raster.interleave) {
         case Interleave::BIP:
-            return {samples * bands * size, size, bands * size};
+            return {{tile.height, width * raster.bands, tileWidth * tileBands},
+                    {tileBands, size, size},
+                    {tile.width, size * raster.bands, size * tileBands}};
         case Interleave::BIL:
-            return {samples * bands * size, samples * size, size};
+            return {{tile.height, width * raster.bands, tileWidth * tileBands},
+                    {tileBands, width, tileWidth},
+                    {tile.width, size, size}};
         case Interleave::BSQ:
-            return {samples * size, samples * lines * size, size};
+            return {{tile.height, width, tileWidth},
+                    {tileBands, width * raster.lines, tileWidth * tile.height},
+                    {tile.width, size, size}};
         default:
-            return {samples * size, 0, size};
+            return {{tile.height, width, tileWidth}, {1, 0, 0}, {tile.width, size, size}};
     }
 }
-
-// One dimension of a rectangular copy.
-struct Dimension {
-    std::size_t count;
-    std::size_t rasterStride;
-    std::size_t tileStride;
-
-    bool Continues(const Dimension& inner) const {
-        return rasterStride == inner.count * inner.rasterStride &&
-               tileStride == inner.count * inner.tileStride;
-    }
-};
 
 // How many bands from position `first` of the list on follow one another in the raster.
 std::uint32_t NeighbouringBands(TileBands bands, std::uint32_t first) {
@@ -55,192 +77,117 @@ std::uint32_t NeighbouringBands(TileBands bands, std::uint32_t first) {
     return next - first;
 }
 
-template <bool kToTile>
-struct Side;
-template <>
-struct Side<true> {
-    using Raster = const unsigned char*;
-    using Tile = unsigned char*;
-};
-template <>
-struct Side<false> {
-    using Raster = unsigned char*;
-    using Tile = const unsigned char*;
-};
-
-// The copies of one direction and one sample size.
-template <bool kToTile, std::size_t kSize>
-class Copier {
-public:
-    using Raster = typename Side<kToTile>::Raster;
-    using Tile = typename Side<kToTile>::Tile;
-
-    static void Run(const RasterLayout& layout, const TileWindow& window, TileBands bands,
-                    Raster raster, Tile tile) {
-        const Strides in =
-            StridesOf(layout.interleave, layout.samples, layout.lines, layout.bands, kSize);
-        const Strides out =
-            StridesOf(layout.interleave, window.width, window.height, bands.count, kSize);
-        raster += static_cast<std::size_t>(window.y) * in.line +
-                  static_cast<std::size_t>(window.x) * in.sample;
-        const bool allBands = bands.count == layout.bands && bands.numbers[0] == 0 &&
-                              NeighbouringBands(bands, 0) == bands.count;
-        if (layout.interleave == Interleave::BIP && !allBands)
-            CopyPixels(window, bands, in, out, raster, tile);
-        else
-            CopyRuns(layout.interleave, window, bands, in, out, raster, tile);
+// Runs three loops, of which the innermost steps over neighbouring samples on both sides: it is one
+// move, and so is every loop that goes on where the one within it ends.
+template <class Way>
+void CopyBox(Loop outer, Loop middle, Loop inner, typename Way::Raster raster,
+             typename Way::Tile tile) {
+    if (middle.count == 1 || middle.Continues(inner)) {
+        inner.count *= middle.count;
+        middle = outer;
+        outer.count = 1;
+        if (middle.count == 1 || middle.Continues(inner)) {
+            inner.count *= middle.count;
+            middle.count = 1;
+        }
     }
+    for (std::size_t i = 0; i < outer.count; ++i)
+        for (std::size_t j = 0; j < middle.count; ++j)
+            Way::Move(raster + i * outer.inRaster + j * middle.inRaster,
+                      tile + i * outer.inTile + j * middle.inTile, inner.count * inner.inTile);
+}
 
-private:
-    // Lists that go through the raster's bands in order are cut into stretches of neighbouring
-    // bands, each a box that is copied in the longest runs that lie together on both sides.
-    static void CopyRuns(std::int32_t interleave, const TileWindow& window, TileBands bands,
-                         const Strides& in, const Strides& out, Raster raster, Tile tile) {
+// Cuts a list into stretches of neighbouring bands, each of which is a box.
+template <class Way>
+void CopyStretches(std::int32_t interleave, TileBands bands, const Loops& loops,
+                   typename Way::Raster raster, typename Way::Tile tile) {
+    for (std::uint32_t k = 0; k < bands.count;) {
+        const std::uint32_t together = NeighbouringBands(bands, k);
+        const Loop band{together, loops.band.inRaster, loops.band.inTile};
+        const auto from = raster + static_cast<std::size_t>(bands.numbers[k]) * band.inRaster;
+        const auto to = tile + k * band.inTile;
+        if (interleave == Interleave::BIP)
+            CopyBox<Way>(loops.line, loops.sample, band, from, to);
+        else if (interleave == Interleave::BIL)
+            CopyBox<Way>(loops.line, band, loops.sample, from, to);
+        else
+            CopyBox<Way>(band, loops.line, loops.sample, from, to);
+        k += together;
+    }
+}
+
+// Moves a few bands of a line of pixels in one pass: bands that stand together in the tile, and
+// anywhere in the raster's pixel.
+template <class Way>
+using Pass = void (*)(const Loop& pixel, const int* bands, typename Way::Raster raster,
+                      typename Way::Tile tile);
+
+template <class Way, std::size_t kSize, std::uint32_t kBands>
+void CopyPixels(const Loop& pixel, const int* bands, typename Way::Raster __restrict raster,
+                typename Way::Tile __restrict tile) {
+    const std::size_t inRaster = pixel.inRaster, inTile = pixel.inTile;
+    typename Way::Raster samples[kBands];
+    for (std::uint32_t k = 0; k < kBands; ++k)
+        samples[k] = raster + static_cast<std::size_t>(bands[k]) * kSize;
+    // Several pixels for each step of the pointers, which cost as much as the moves.
+    constexpr std::size_t kPixels = 4;
+    std::size_t left = pixel.count;
+    for (; left >= kPixels; left -= kPixels) {
+        for (std::size_t p = 0; p < kPixels; ++p)
+            for (std::uint32_t k = 0; k < kBands; ++k)
+                Way::Move(samples[k] + p * inRaster, tile + p * inTile + k * kSize, kSize);
+        for (std::uint32_t k = 0; k < kBands; ++k) samples[k] += kPixels * inRaster;
+        tile += kPixels * inTile;
+    }
+    for (; left != 0; --left) {
+        for (std::uint32_t k = 0; k < kBands; ++k) {
+            Way::Move(samples[k], tile + k * kSize, kSize);
+            samples[k] += inRaster;
+        }
+        tile += inTile;
+    }
+}
+
+// The passes for samples of a size, by the count of bands less one.
+template <class Way, std::size_t kSize>
+constexpr Pass<Way> kPasses[kPassBands] = {&CopyPixels<Way, kSize, 1>, &CopyPixels<Way, kSize, 2>,
+                                           &CopyPixels<Way, kSize, 3>, &CopyPixels<Way, kSize, 4>};
+
+template <class Way>
+const Pass<Way>* PassesOf(std::size_t size) {
+    static constexpr const Pass<Way>* kBySize[] = {
+        kPasses<Way, 1>, kPasses<Way, 2>, kPasses<Way, 4>, kPasses<Way, 8>, kPasses<Way, 16>};
+    return kBySize[std::countr_zero(size)];
+}
+
+// Pixel-interleaved samples of some of the bands, or of all in another order, line by line so that
+// the passes over a line find it in the cache.
+template <class Way>
+void CopyPixelLines(TileBands bands, Loops loops, std::size_t size, typename Way::Raster raster,
+                    typename Way::Tile tile) {
+    const Pass<Way>* const passes = PassesOf<Way>(size);
+    // Whole lines that one pass can move are one long line.
+    if (bands.count <= kPassBands && loops.line.Continues(loops.sample)) {
+        loops.sample.count *= loops.line.count;
+        loops.line.count = 1;
+    }
+    for (std::size_t line = 0; line < loops.line.count; ++line) {
         for (std::uint32_t k = 0; k < bands.count;) {
             const std::uint32_t together = NeighbouringBands(bands, k);
-            const Dimension line{window.height, in.line, out.line};
-            const Dimension band{together, in.band, out.band};
-            const Dimension sample{window.width, in.sample, out.sample};
-            Raster from = raster + static_cast<std::size_t>(bands.numbers[k]) * in.band;
-            Tile to = tile + k * out.band;
-            if (interleave == Interleave::BIP)
-                CopyBox(line, sample, band, from, to);
-            else if (interleave == Interleave::BIL)
-                CopyBox(line, band, sample, from, to);
+            const bool isBlock = together * size >= kBlockBytes;
+            const std::uint32_t count = isBlock ? together : std::min(bands.count - k, kPassBands);
+            if (isBlock)
+                CopyBox<Way>({1, 0, 0}, loops.sample, {together, size, size},
+                             raster + static_cast<std::size_t>(bands.numbers[k]) * size,
+                             tile + k * size);
             else
-                CopyBox(band, line, sample, from, to);
-            k += together;
+                passes[count - 1](loops.sample, bands.numbers + k, raster, tile + k * size);
+            k += count;
         }
+        raster += loops.line.inRaster;
+        tile += loops.line.inTile;
     }
-
-    // Copies a box whose innermost dimension lies together on both sides.
-    static void CopyBox(Dimension outer, Dimension middle, Dimension inner, Raster raster,
-                        Tile tile) {
-        if (outer.count == 1) outer = {1, 0, 0};
-        if (middle.Continues(inner) || middle.count == 1) {
-            inner.count *= middle.count;
-            middle = {1, 0, 0};
-            if (outer.Continues(inner)) {
-                inner.count *= outer.count;
-                outer = {1, 0, 0};
-            }
-        }
-        for (std::size_t i = 0; i < outer.count; ++i)
-            for (std::size_t j = 0; j < middle.count; ++j)
-                Move(raster + i * outer.rasterStride + j * middle.rasterStride,
-                     tile + i * outer.tileStride + j * middle.tileStride, inner.count * kSize);
-    }
-
-    // Pixel-interleaved samples of some of the bands, or of all in another order, line by line so
-    // that the passes over a line find it in the cache.
-    static void CopyPixels(const TileWindow& window, TileBands bands, const Strides& in,
-                           const Strides& out, Raster raster, Tile tile) {
-        std::size_t width = window.width;
-        std::size_t height = window.height;
-        // Whole lines that one pass can move are one long line.
-        if (bands.count <= kPassBands && in.line == width * in.sample) {
-            width *= height;
-            height = 1;
-        }
-        for (std::size_t line = 0; line < height; ++line) {
-            for (std::uint32_t k = 0; k < bands.count;) {
-                const std::uint32_t together = NeighbouringBands(bands, k);
-                if (together * kSize >= kBlockBytes) {
-                    CopyBlocks(width, together, in.sample, out.sample,
-                               raster + static_cast<std::size_t>(bands.numbers[k]) * kSize,
-                               tile + k * kSize);
-                    k += together;
-                } else {
-                    k += CopyPass(width, bands, k, in.sample, out.sample, raster, tile + k * kSize);
-                }
-            }
-            raster += in.line;
-            tile += out.line;
-        }
-    }
-
-    static void CopyBlocks(std::size_t width, std::size_t bands, std::size_t rasterStep,
-                           std::size_t tileStep, Raster raster, Tile tile) {
-        for (std::size_t s = 0; s < width; ++s)
-            Move(raster + s * rasterStep, tile + s * tileStep, bands * kSize);
-    }
-
-    // Moves the next bands of the list along one line, and tells how many.
-    static std::uint32_t CopyPass(std::size_t width, TileBands bands, std::uint32_t first,
-                                  std::size_t rasterStep, std::size_t tileStep, Raster raster,
-                                  Tile tile) {
-        const int* const numbers = bands.numbers + first;
-        const std::uint32_t count = std::min(bands.count - first, kPassBands);
-        switch (count) {
-            case 1:
-                CopyStrided<1>(width, numbers, rasterStep, tileStep, raster, tile);
-                break;
-            case 2:
-                CopyStrided<2>(width, numbers, rasterStep, tileStep, raster, tile);
-                break;
-            case 3:
-                CopyStrided<3>(width, numbers, rasterStep, tileStep, raster, tile);
-                break;
-            default:
-                CopyStrided<kPassBands>(width, numbers, rasterStep, tileStep, raster, tile);
-                break;
-        }
-        return count;
-    }
-
-    // Rasters of few bands, of which a tile takes some, are frequent enough to have loops in which
-    // the compiler knows both steps.
-    template <std::uint32_t kBands>
-    static void CopyStrided(std::size_t width, const int* numbers, std::size_t rasterStep,
-                            std::size_t tileStep, Raster raster, Tile tile) {
-        constexpr std::size_t kTileStep = kBands * kSize;
-        if (tileStep == kTileStep && rasterStep == 3 * kSize)
-            CopySamples<kBands>(width, numbers, Step<3 * kSize>(), Step<kTileStep>(), raster, tile);
-        else if (tileStep == kTileStep && rasterStep == 4 * kSize)
-            CopySamples<kBands>(width, numbers, Step<4 * kSize>(), Step<kTileStep>(), raster, tile);
-        else if (tileStep == kTileStep && rasterStep == 2 * kSize)
-            CopySamples<kBands>(width, numbers, Step<2 * kSize>(), Step<kTileStep>(), raster, tile);
-        else
-            CopySamples<kBands>(width, numbers, rasterStep, tileStep, raster, tile);
-    }
-
-    template <std::size_t kBytes>
-    using Step = std::integral_constant<std::size_t, kBytes>;
-
-    template <std::uint32_t kBands, class RasterStep, class TileStep>
-    static void CopySamples(std::size_t width, const int* numbers, RasterStep rasterStep,
-                            TileStep tileStep, Raster __restrict raster, Tile __restrict tile) {
-        Raster from[kBands];
-        for (std::uint32_t k = 0; k < kBands; ++k)
-            from[k] = raster + static_cast<std::size_t>(numbers[k]) * kSize;
-        // Bytes have no vector code of this kind, and gain from fewer steps of the pointers.
-        constexpr std::size_t kPixels = kSize == 1 ? 4 : 1;
-        std::size_t s = 0;
-        for (; s + kPixels <= width; s += kPixels) {
-            for (std::size_t p = 0; p < kPixels; ++p)
-                for (std::uint32_t k = 0; k < kBands; ++k)
-                    Move(from[k] + p * rasterStep, tile + p * tileStep + k * kSize, kSize);
-            for (std::uint32_t k = 0; k < kBands; ++k) from[k] += kPixels * rasterStep;
-            tile += kPixels * tileStep;
-        }
-        for (; s < width; ++s) {
-            for (std::uint32_t k = 0; k < kBands; ++k) {
-                Move(from[k], tile + k * kSize, kSize);
-                from[k] += rasterStep;
-            }
-            tile += tileStep;
-        }
-    }
-
-    static void Move(const unsigned char* raster, unsigned char* tile,
-                     std::size_t bytes) requires(kToTile) {
-        std::memcpy(tile, raster, bytes);
-    }
-    static void Move(unsigned char* raster, const unsigned char* tile,
-                     std::size_t bytes) requires(!kToTile) {
-        std::memcpy(raster, tile, bytes);
-    }
-};
+}
 
 // Looked at by an assertion alone.
 [[maybe_unused]] bool LiesWithin(const RasterLayout& layout, const TileWindow& window,
@@ -254,11 +201,9 @@ private:
     });
 }
 
-// Chooses the copier once per tile.
-template <bool kToTile>
+template <class Way>
 void CopyTile(RasterLayout layout, const TileWindow& window, TileBands bands,
-              std::size_t sampleSize, typename Side<kToTile>::Raster raster,
-              typename Side<kToTile>::Tile tile) {
+              std::size_t sampleSize, typename Way::Raster raster, typename Way::Tile tile) {
     static constexpr int kOnlyBand = 0;
     if (layout.interleave == Interleave::None) {
         layout.bands = 1;
@@ -267,34 +212,31 @@ void CopyTile(RasterLayout layout, const TileWindow& window, TileBands bands,
     if (window.width == 0 || window.height == 0 || bands.count == 0) return;
     assert(raster && tile && "a tile needs its buffer");
     assert(LiesWithin(layout, window, bands) && "a tile lies within its raster");
-    switch (sampleSize) {
-        case 1:
-            return Copier<kToTile, 1>::Run(layout, window, bands, raster, tile);
-        case 2:
-            return Copier<kToTile, 2>::Run(layout, window, bands, raster, tile);
-        case 4:
-            return Copier<kToTile, 4>::Run(layout, window, bands, raster, tile);
-        case 8:
-            return Copier<kToTile, 8>::Run(layout, window, bands, raster, tile);
-        case 16:
-            return Copier<kToTile, 16>::Run(layout, window, bands, raster, tile);
-        default:
-            assert(false && "samples have 1, 2, 4, 8 or 16 bytes");
-    }
+    assert(std::has_single_bit(sampleSize) && sampleSize <= 16 &&
+           "samples have 1, 2, 4, 8 or 16 bytes");
+    const Loops loops = LoopsOf(layout, window, bands.count, sampleSize);
+    raster += static_cast<std::size_t>(window.y) * loops.line.inRaster +
+              static_cast<std::size_t>(window.x) * loops.sample.inRaster;
+    const bool allBands = bands.count == layout.bands && bands.numbers[0] == 0 &&
+                          NeighbouringBands(bands, 0) == bands.count;
+    if (layout.interleave == Interleave::BIP && !allBands)
+        CopyPixelLines<Way>(bands, loops, sampleSize, raster, tile);
+    else
+        CopyStretches<Way>(layout.interleave, bands, loops, raster, tile);
 }
 
 }  // namespace
 
 void CopyTileFromRaster(const RasterLayout& layout, const TileWindow& window, TileBands bands,
                         std::size_t sampleSize, const void* raster, void* tile) {
-    CopyTile<true>(layout, window, bands, sampleSize, static_cast<const unsigned char*>(raster),
-                   static_cast<unsigned char*>(tile));
+    CopyTile<ToTile>(layout, window, bands, sampleSize, static_cast<const unsigned char*>(raster),
+                     static_cast<unsigned char*>(tile));
 }
 
 void CopyTileToRaster(const RasterLayout& layout, const TileWindow& window, TileBands bands,
                       std::size_t sampleSize, void* raster, const void* tile) {
-    CopyTile<false>(layout, window, bands, sampleSize, static_cast<unsigned char*>(raster),
-                    static_cast<const unsigned char*>(tile));
+    CopyTile<ToRaster>(layout, window, bands, sampleSize, static_cast<unsigned char*>(raster),
+                       static_cast<const unsigned char*>(tile));
 }
 
 }  // namespace zelm
