@@ -20,6 +20,7 @@
 #include "files/MemorySource.h"
 #include "files/OpenSource.h"
 #include "tests/support/ChildProcess.h"
+#include "tests/support/ScratchDirectory.h"
 
 namespace {
 // What the system's randomness answers in place of its own, while set.
@@ -318,6 +319,14 @@ TEST(LendingProcesses, AProgramThatIsStartedKnowsNone) {
     const auto result = support::RunChild({ZMC_LENT_NAME_PROBE, name.Utf8()});
     EXPECT_EQ(result.status, 0);
     EXPECT_EQ(result.out, "looks lent, opens nothing\n") << result.err;
+}
+
+TEST(LendingProcesses, TheExampleOfTheDocumentRuns) {
+    const support::ScratchDirectory folder;
+    support::WriteText(folder / "image.pyr", "KOBT");
+    const auto result = support::RunChild({ZMC_LENDING_GUIDE_EXAMPLE, folder.String()});
+    EXPECT_EQ(result.status, 0);
+    EXPECT_EQ(result.err, "") << "nothing failed, nothing changed";
 }
 
 TEST(LendingModules, AModuleThatIsLoadedHasTheSameRegistry) {
