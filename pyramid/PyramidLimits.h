@@ -1,7 +1,8 @@
 // What a pyramid file may claim before anything is allocated for it.
 //
 // A header is a few hundred bytes and can announce anything. It is judged as a whole by one
-// function; a file that fails the judgement does not open, and one that fails it is not made.
+// function; a file that fails the judgement does not open, and one that fails it is not made: a
+// reader's BuildPyramid up to level 1024 leaves a file of that name as it is.
 #ifndef ZMC_PYRAMID_PYRAMIDLIMITS_H
 #define ZMC_PYRAMID_PYRAMIDLIMITS_H
 

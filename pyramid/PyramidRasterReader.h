@@ -5,10 +5,10 @@
 // values live in this reader alone; the file has no place for them.
 //
 // Tiles are pixel-interleaved whatever the interleave says, while masks go by the interleave. What
-// the dataset refuses, a rectangle, level or band that it does not hold, is false with buffer and
-// mask as they were; all else is true, whatever the file did. The setters of records are true even
-// where nothing could be stored. A reader is for one thread at a time, and shares that thread with
-// all readers of its dataset.
+// the dataset refuses, a rectangle, level or band that it does not hold or has no memory for, is
+// false with buffer and mask as they were; all else is true, whatever the file did. The setters of
+// records are true even where nothing could be stored. A reader is for one thread at a time, and
+// shares that thread with all readers of its dataset.
 #ifndef ZMC_PYRAMID_PYRAMIDRASTERREADER_H
 #define ZMC_PYRAMID_PYRAMIDRASTERREADER_H
 
@@ -44,7 +44,8 @@ public:
     std::int32_t GetMaxLevel() const override;
     bool HasPyramid() const override { return dataset && dataset->HasPyramid; }
     // Makes the file, or empties it, and lays out the levels; the client fills them. True even if
-    // the file could not be made; false for a null `pair`, or one of two values.
+    // the file could not be made, or was not touched because the levels are beyond the limits (no
+    // level above 1023; see PyramidLimits.h); false for a null `pair`, or one of two values.
     bool BuildPyramid(std::int32_t minLevel, std::int32_t maxLevel, std::int32_t third,
                       const std::int32_t* pair) override;
     bool CanBuildPyramid() const override { return true; }
