@@ -16,7 +16,7 @@ set(ZMC_INSTALL_MODULEDIR "${CMAKE_INSTALL_LIBDIR}/zmcraster")
 set(linked zmchost zmcloader zmccoordsys zmccore zmcfiles zmcplatform zmctext zmcg)
 set(loaded zmcraster zmcpe)
 zmc_set_run_path("$ORIGIN;$ORIGIN/.." ${loaded})
-zmc_set_run_path("$ORIGIN" zmcloader)
+zmc_set_run_path("$ORIGIN" zmcloader zmcfiles)
 
 install(TARGETS ${linked} EXPORT zmcrasterTargets
     ARCHIVE DESTINATION ${CMAKE_INSTALL_LIBDIR}

@@ -1,7 +1,9 @@
 // Error: what every failure of this library is thrown as.
 //
 // The text names the file, what was being done to it and why it failed, in one line:
-// "scene.zmc: cannot read lines 0 to 255: the source ended".
+// "scene.zmc: cannot read lines 0 to 255: the source ended". It is meant for people; a program that
+// wants to tell failures apart has the three parts. What a failed operation leaves behind is told
+// where the operation is. Memory that runs out is thrown as std::bad_alloc, not as an Error.
 #ifndef ZMC_HOST_BASE_ERROR_H
 #define ZMC_HOST_BASE_ERROR_H
 
@@ -19,8 +21,10 @@ public:
           operation(std::move(operationText)),
           reason(std::move(reasonText)) {}
 
+    // The name as the caller gave it, as a rule; a file beside it where that one failed.
     const std::string& File() const { return file; }
     const std::string& Operation() const { return operation; }
+    // The system's own words where it was the system that refused.
     const std::string& Reason() const { return reason; }
 
 private:

@@ -15,8 +15,10 @@ std::string FileAt(std::uintptr_t address, const std::string& line) {
     std::uintptr_t first = 0;
     std::uintptr_t end = 0;
     int file = 0;
-    // NOLINTNEXTLINE(cert-err34-c): a line of another form has no file behind it, or no address.
-    std::sscanf(line.c_str(), "%" SCNxPTR "-%" SCNxPTR " %*s %*s %*s %*s %n", &first, &end, &file);
+    // NOLINTNEXTLINE(cert-err34-c): numbers that the system wrote fit their types.
+    if (std::sscanf(line.c_str(), "%" SCNxPTR "-%" SCNxPTR " %*s %*s %*s %*s %n", &first, &end,
+                    &file) < 2)
+        return {};
     if (address < first || address >= end || file == 0) return {};
     const std::string path = line.substr(static_cast<std::size_t>(file));
     return IsAbsolutePath(path) ? path : std::string();

@@ -5,7 +5,7 @@
 
 #include <zmcraster/coordsys/Environment.h>
 #include <zmcraster/coordsys/EnvironmentKeys.h>
-#include <zmcraster/host/Raster.h>
+#include <zmcraster/host/raster/Raster.h>
 
 void SetDirectories();
 void StoreStatistics(const std::vector<zelm::RasterBandStats<float>>& records);

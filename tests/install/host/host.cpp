@@ -1,11 +1,12 @@
 // The smallest host: links the interface, loads the module by path, asks it for a factory. Also
-// proof that the package's headers and libraries are enough.
+// proof that the package's headers and libraries are enough, and that both spellings of a header
+// work.
 #include <dlfcn.h>
 
+#include <zmcraster/connection/RasterDataConnection.h>
 #include <cstdio>
 
 #include "connection/DataConnectionFactory.h"
-#include "connection/RasterDataConnection.h"
 #include "zmcg/zmcg.h"
 
 using namespace zelm;
