@@ -54,6 +54,7 @@ void Unregister(const WideChar* name) noexcept {
     decltype(registry.lent)::node_type gone;
     const std::lock_guard lock(registry.mutex);
     const auto found = registry.lent.find(WideView(name));
+    // unreachable: a LentName that has a text is registered under it
     if (found != registry.lent.end()) gone = registry.lent.extract(found);
 }
 

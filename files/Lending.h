@@ -16,6 +16,9 @@
 // used, and never taken from a file, a command line, a URL, an environment variable or a dataset
 // name. Programs refuse there whatever LooksLent.
 //
+// The code of a source has to stay loaded as long as anybody holds the source. A module that lends
+// and can be unloaded withdraws, and waits until it is the only holder, before it goes.
+//
 // There is one registry in a process, that of this library, whoever links it or loads it. All
 // functions may be called from any thread, at load time and at the end of the process too, and from
 // within a source. Nothing throws.

@@ -208,17 +208,18 @@ TEST_F(FileTest, IdentityGoesWithTheFileAndNotWithItsName) {
 TEST_F(FileTest, LocksAndFilesOpenForAMomentKeepOffTheStandardStreams) {
     const std::string path = (directory / "lock").string();
     ASSERT_TRUE(CreateNewFile(path));
-    const pid_t child = fork();
-    if (child == 0) {
-        for (const int stream : {0, 1, 2}) close(stream);
-        FileLock lock;
-        bool good = lock.Take(path) == FileLock::Result::Taken && fcntl(0, F_GETFD) < 0;
-        good = good && SyncFile(path) && ReserveSpace(path, 10) && fcntl(0, F_GETFD) < 0;
-        _exit(good ? 0 : 1);
-    }
-    int status = -1;
-    ASSERT_EQ(waitpid(child, &status, 0), child);
-    EXPECT_EQ(status, 0);
+    const int input = fcntl(0, F_DUPFD_CLOEXEC, 3);
+    ASSERT_GE(input, 3);
+    close(0);
+    const auto isFree = [] { return fcntl(0, F_GETFD) < 0; };
+    FileLock lock;
+    const bool taken = lock.Take(path) == FileLock::Result::Taken && isFree();
+    const bool served = SyncFile(path) && ReserveSpace(path, 10) && isFree();
+    const auto wide = Name("lock");
+    const bool opened = File::Open(wide.c_str(), File::Mode::Update) && isFree();
+    dup2(input, 0);
+    close(input);
+    EXPECT_TRUE(taken && served && opened) << taken << served << opened;
 }
 
 TEST_F(FileTest, LockHasOneHolder) {
