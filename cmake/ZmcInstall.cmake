@@ -13,7 +13,7 @@ set(ZMC_INSTALL_CMAKEDIR "${CMAKE_INSTALL_LIBDIR}/cmake/zmcraster")
 set(ZMC_INSTALL_MODULEDIR "${CMAKE_INSTALL_LIBDIR}/zmcraster")
 
 # What hosts link, users before what they use, and the module itself.
-set(linked zmchost zmcloader zmccoordsys zmccore zmcfiles zmcplatform zmctext zmcg)
+set(linked zmchost zmcloader zmccoordsys zmcformat zmccore zmcfiles zmcplatform zmctext zmcg)
 set(loaded zmcraster zmcpe)
 zmc_set_run_path("$ORIGIN;$ORIGIN/.." ${loaded})
 zmc_set_run_path("$ORIGIN" zmcloader zmcfiles)

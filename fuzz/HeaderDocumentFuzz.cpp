@@ -8,13 +8,13 @@
 #include <string_view>
 
 #include "core/PixelVocabulary.h"
+#include "format/LevelGeometry.h"
+#include "format/PyramidLimits.h"
 #include "fuzz/support/Expect.h"
 #include "fuzz/support/Host.h"
 #include "fuzz/support/MemoryFile.h"
 #include "fuzz/support/NaiveFile.h"
-#include "pyramid/LevelGeometry.h"
 #include "pyramid/PyramidDataset.h"
-#include "pyramid/PyramidLimits.h"
 #include "tests/support/PyramidFiles.h"
 
 namespace {

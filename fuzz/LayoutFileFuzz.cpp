@@ -4,13 +4,13 @@
 #include <cstdint>
 #include <xercesc/util/PlatformUtils.hpp>
 
+#include "format/PyramidLimits.h"
 #include "fuzz/support/Expect.h"
 #include "fuzz/support/InputBytes.h"
 #include "fuzz/support/LayoutFields.h"
 #include "fuzz/support/NaiveLayout.h"
 #include "fuzz/support/ScratchFolder.h"
 #include "pyramid/PyramidDataset.h"
-#include "pyramid/PyramidLimits.h"
 
 namespace {
 

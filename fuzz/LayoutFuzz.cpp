@@ -17,14 +17,14 @@
 
 #include "core/ElementTypes.h"
 #include "core/PixelVocabulary.h"
+#include "format/LevelGeometry.h"
+#include "format/PyramidLimits.h"
 #include "fuzz/support/Expect.h"
 #include "fuzz/support/InputBytes.h"
 #include "fuzz/support/LayoutFields.h"
 #include "fuzz/support/NaiveLayout.h"
 #include "fuzz/support/ScratchFolder.h"
-#include "pyramid/LevelGeometry.h"
 #include "pyramid/PyramidDataset.h"
-#include "pyramid/PyramidLimits.h"
 #include "pyramid/TileGather.h"
 #include "pyramid/TileRequest.h"
 

@@ -22,13 +22,9 @@
 #include <new>
 #include <string>
 
-#include "pyramid/DocumentLimits.h"
+#include "format/DocumentLimits.h"
 
 namespace zelm {
-
-// Stands in files, where a store did not come to its end. XML has no such character, in any
-// encoding that may begin with it, and by another first byte a text is not taken for UTF-16.
-inline constexpr unsigned char kUnfinishedDocument = 0x1A;
 
 template <class File>
 class DocumentStore {

@@ -10,9 +10,9 @@
 
 #include "core/CheckedArithmetic.h"
 #include "core/PixelVocabulary.h"
-#include "pyramid/BoundedParser.h"
-#include "pyramid/LevelGeometry.h"
-#include "pyramid/TileTable.h"
+#include "format/BoundedParser.h"
+#include "format/LevelGeometry.h"
+#include "format/TileTable.h"
 
 namespace zelm {
 namespace {

@@ -7,11 +7,11 @@
 #include <xercesc/util/OutOfMemoryException.hpp>
 #include <xercesc/util/XMLException.hpp>
 
-#include "pyramid/BoundedParser.h"
-#include "pyramid/DocumentText.h"
+#include "format/BoundedParser.h"
+#include "format/DocumentText.h"
+#include "format/XercesText.h"
 #include "pyramid/PyramidDataset.h"
 #include "pyramid/PyramidXMLReaderHandlers.h"
-#include "pyramid/XercesText.h"
 
 namespace zelm {
 namespace {

@@ -11,9 +11,9 @@
 #include <xercesc/util/XMLException.hpp>
 
 #include "core/PixelVocabulary.h"
+#include "format/NumberText.h"
+#include "format/XercesText.h"
 #include "pyramid/DocumentStore.h"
-#include "pyramid/NumberText.h"
-#include "pyramid/XercesText.h"
 
 namespace zelm {
 namespace {

@@ -18,10 +18,10 @@
 #include <xercesc/parsers/XercesDOMParser.hpp>
 
 #include "colour/Palette.h"
+#include "format/BoundedParser.h"
+#include "format/ElementNames.h"
+#include "format/PyramidHeaderRecord.h"
 #include "platform/File.h"
-#include "pyramid/BoundedParser.h"
-#include "pyramid/ElementNames.h"
-#include "pyramid/PyramidHeaderRecord.h"
 #include "raster/RasterBandHistogram.h"
 #include "raster/RasterBandStats.h"
 

@@ -9,8 +9,8 @@
 
 #include "core/NumericConversion.h"
 #include "core/PixelVocabulary.h"
-#include "pyramid/NumberText.h"
-#include "pyramid/XercesText.h"
+#include "format/NumberText.h"
+#include "format/XercesText.h"
 
 namespace zelm {
 namespace {

@@ -24,8 +24,8 @@
 
 #include "colour/Palette.h"
 #include "core/Array.h"
-#include "pyramid/ElementNames.h"
-#include "pyramid/PyramidHeaderRecord.h"
+#include "format/ElementNames.h"
+#include "format/PyramidHeaderRecord.h"
 #include "raster/RasterBandHistogram.h"
 #include "raster/RasterBandStats.h"
 

@@ -4,7 +4,7 @@
 
 #include "core/CheckedArithmetic.h"
 #include "core/PixelVocabulary.h"
-#include "pyramid/PyramidLimits.h"
+#include "format/PyramidLimits.h"
 
 namespace zelm {
 namespace {

@@ -13,8 +13,8 @@
 #include <cstdint>
 
 #include "core/Array.h"
-#include "pyramid/LevelGeometry.h"
-#include "pyramid/PyramidHeaderRecord.h"
+#include "format/LevelGeometry.h"
+#include "format/PyramidHeaderRecord.h"
 
 namespace zelm {
 

@@ -7,8 +7,8 @@
 #include <cstdint>
 #include <tuple>
 
+#include "format/PyramidHeaderRecord.h"
 #include "pyramid/PyramidDataset.h"
-#include "pyramid/PyramidHeaderRecord.h"
 
 namespace zmcfuzz {
 

@@ -12,7 +12,7 @@
 #include <xercesc/dom/DOM.hpp>
 
 #include "core/NumericConversion.h"
-#include "pyramid/NumberText.h"
+#include "format/NumberText.h"
 #include "pyramid/PyramidDataset.h"
 #include "tests/support/PyramidFiles.h"
 #include "tests/support/ScratchDirectory.h"

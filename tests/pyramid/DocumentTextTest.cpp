@@ -1,4 +1,4 @@
-#include "pyramid/DocumentText.h"
+#include "format/DocumentText.h"
 
 #include <gtest/gtest.h>
 
@@ -7,6 +7,8 @@
 #include <random>
 #include <string>
 #include <vector>
+
+#include "pyramid/DocumentStore.h"
 
 namespace zelm::test {
 namespace {

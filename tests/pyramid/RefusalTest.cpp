@@ -7,8 +7,8 @@
 #include <xercesc/framework/MemBufInputSource.hpp>
 #include <xercesc/sax/AttributeList.hpp>
 
-#include "pyramid/NumberText.h"
-#include "pyramid/PyramidLimits.h"
+#include "format/NumberText.h"
+#include "format/PyramidLimits.h"
 #include "pyramid/PyramidXMLReaderHandlers.h"
 #include "pyramid/TileGather.h"
 #include "tests/support/PyramidFileTest.h"

@@ -4,8 +4,8 @@
 // Document types are refused, and with them all entities; nothing outside the text is ever opened;
 // DocumentLimits holds. What is refused is reported to the error handler as a fatal error, and
 // leaves parse as a DocumentRefused. Error handlers see all other faults as usual.
-#ifndef ZMC_PYRAMID_BOUNDEDPARSER_H
-#define ZMC_PYRAMID_BOUNDEDPARSER_H
+#ifndef ZMC_FORMAT_BOUNDEDPARSER_H
+#define ZMC_FORMAT_BOUNDEDPARSER_H
 
 #include <memory>
 #include <string>
@@ -17,7 +17,7 @@
 #include <xercesc/parsers/SAXParser.hpp>
 #include <xercesc/util/XMLUni.hpp>
 
-#include "pyramid/DocumentLimits.h"
+#include "format/DocumentLimits.h"
 
 namespace zelm {
 

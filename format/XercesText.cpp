@@ -1,4 +1,4 @@
-#include "pyramid/XercesText.h"
+#include "format/XercesText.h"
 
 #include <cstdio>
 

@@ -1,4 +1,4 @@
-#include "pyramid/LevelGeometry.h"
+#include "format/LevelGeometry.h"
 
 #include <gtest/gtest.h>
 

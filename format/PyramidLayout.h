@@ -3,15 +3,15 @@
 //
 // Pure arithmetic: no file. A layout is built aside, and a dataset takes it over whole once nothing
 // can fail any more. One without `levelOffsets` has no place for any tile.
-#ifndef ZMC_PYRAMID_PYRAMIDLAYOUT_H
-#define ZMC_PYRAMID_PYRAMIDLAYOUT_H
+#ifndef ZMC_FORMAT_PYRAMIDLAYOUT_H
+#define ZMC_FORMAT_PYRAMIDLAYOUT_H
 
 #include <cstdint>
 #include <memory>
 #include <optional>
 
 #include "core/Array.h"
-#include "pyramid/PyramidHeaderRecord.h"
+#include "format/PyramidHeaderRecord.h"
 
 namespace zelm {
 

@@ -1,11 +1,11 @@
-#include "pyramid/PyramidLimits.h"
+#include "format/PyramidLimits.h"
 
 #include <algorithm>
 #include <limits>
 
 #include "core/CheckedArithmetic.h"
 #include "core/PixelVocabulary.h"
-#include "pyramid/LevelGeometry.h"
+#include "format/LevelGeometry.h"
 
 namespace zelm::PyramidLimits {
 namespace {

@@ -4,8 +4,8 @@
 // after. A store (DocumentStore.h) marks the first byte before it touches the others, and writes
 // each of them once: where both readings agree, nothing was under way between them, and the text is
 // that of one moment, old or new. Where they do not, they are repeated a few times.
-#ifndef ZMC_PYRAMID_DOCUMENTTEXT_H
-#define ZMC_PYRAMID_DOCUMENTTEXT_H
+#ifndef ZMC_FORMAT_DOCUMENTTEXT_H
+#define ZMC_FORMAT_DOCUMENTTEXT_H
 
 #include <algorithm>
 #include <cstddef>
@@ -15,8 +15,7 @@
 #include <new>
 #include <thread>
 
-#include "pyramid/DocumentLimits.h"
-#include "pyramid/DocumentStore.h"
+#include "format/DocumentLimits.h"
 
 namespace zelm {
 

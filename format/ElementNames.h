@@ -2,8 +2,8 @@
 //
 // Names stand in files: they are compared exactly, case included, and none may change. RSTC_SUMXY,
 // RSTC_COV and HIST_TYPE are reserved: nothing writes them, and their text is dropped on reading.
-#ifndef ZMC_PYRAMID_ELEMENTNAMES_H
-#define ZMC_PYRAMID_ELEMENTNAMES_H
+#ifndef ZMC_FORMAT_ELEMENTNAMES_H
+#define ZMC_FORMAT_ELEMENTNAMES_H
 
 #include <string_view>
 #include <type_traits>

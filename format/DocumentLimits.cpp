@@ -1,6 +1,6 @@
-#include "pyramid/DocumentLimits.h"
+#include "format/DocumentLimits.h"
 
-#include "pyramid/ElementNames.h"
+#include "format/ElementNames.h"
 
 namespace zelm {
 

@@ -1,11 +1,11 @@
-#include "pyramid/PyramidLayout.h"
+#include "format/PyramidLayout.h"
 
 #include <new>
 
 #include "core/PixelVocabulary.h"
-#include "pyramid/LevelGeometry.h"
-#include "pyramid/PyramidLimits.h"
-#include "pyramid/TileTable.h"
+#include "format/LevelGeometry.h"
+#include "format/PyramidLimits.h"
+#include "format/TileTable.h"
 
 namespace zelm {
 

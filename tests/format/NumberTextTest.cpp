@@ -1,4 +1,4 @@
-#include "pyramid/NumberText.h"
+#include "format/NumberText.h"
 
 #include <gtest/gtest.h>
 #include <rapidcheck/gtest.h>

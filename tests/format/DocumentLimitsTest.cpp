@@ -1,10 +1,10 @@
 // The limits of documents at their exact values, as docs/format.md tells them.
-#include "pyramid/DocumentLimits.h"
+#include "format/DocumentLimits.h"
 
 #include <gtest/gtest.h>
 
-#include "pyramid/ElementNames.h"
-#include "pyramid/PyramidLimits.h"
+#include "format/ElementNames.h"
+#include "format/PyramidLimits.h"
 
 namespace zelm::test {
 namespace {

@@ -3,12 +3,12 @@
 // A header is a few hundred bytes and can announce anything. It is judged as a whole by one
 // function; a file that fails the judgement does not open, and one that fails it is not made: a
 // reader's BuildPyramid up to level 1024 leaves a file of that name as it is.
-#ifndef ZMC_PYRAMID_PYRAMIDLIMITS_H
-#define ZMC_PYRAMID_PYRAMIDLIMITS_H
+#ifndef ZMC_FORMAT_PYRAMIDLIMITS_H
+#define ZMC_FORMAT_PYRAMIDLIMITS_H
 
 #include <cstdint>
 
-#include "pyramid/PyramidHeaderRecord.h"
+#include "format/PyramidHeaderRecord.h"
 
 namespace zelm::PyramidLimits {
 

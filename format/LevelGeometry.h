@@ -4,8 +4,8 @@
 // columns and rows of the one before, truncated. The formulas are the file format
 // (docs/format.md). Sizes are unsigned 32-bit and wrap as such; offsets and products of sizes are
 // 64-bit.
-#ifndef ZMC_PYRAMID_LEVELGEOMETRY_H
-#define ZMC_PYRAMID_LEVELGEOMETRY_H
+#ifndef ZMC_FORMAT_LEVELGEOMETRY_H
+#define ZMC_FORMAT_LEVELGEOMETRY_H
 
 #include <cstdint>
 

@@ -3,13 +3,13 @@
 // Pure arithmetic on a table in memory: no file. The table has a row for each level up to
 // `levelMax` and each band, of as many entries as level 0 has tiles; a level uses the start of its
 // rows, row by row of its own grid, and what it does not use is 0. Offsets are absolute.
-#ifndef ZMC_PYRAMID_TILETABLE_H
-#define ZMC_PYRAMID_TILETABLE_H
+#ifndef ZMC_FORMAT_TILETABLE_H
+#define ZMC_FORMAT_TILETABLE_H
 
 #include <cstdint>
 
 #include "core/Array.h"
-#include "pyramid/LevelGeometry.h"
+#include "format/LevelGeometry.h"
 
 namespace zelm {
 

@@ -3,8 +3,8 @@
 // Reading takes the number at the start of a text, after white space, and ignores what follows; a
 // text without one is 0. Numbers are those of the C library's atof and atoi in its own locale:
 // hexadecimal reals, `inf` and `nan` as well.
-#ifndef ZMC_PYRAMID_NUMBERTEXT_H
-#define ZMC_PYRAMID_NUMBERTEXT_H
+#ifndef ZMC_FORMAT_NUMBERTEXT_H
+#define ZMC_FORMAT_NUMBERTEXT_H
 
 #include <charconv>
 #include <concepts>

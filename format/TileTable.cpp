@@ -1,10 +1,10 @@
-#include "pyramid/TileTable.h"
+#include "format/TileTable.h"
 
 #include <algorithm>
 #include <array>
 #include <bit>
 
-#include "pyramid/PyramidLimits.h"
+#include "format/PyramidLimits.h"
 
 namespace zelm {
 namespace {

@@ -1,6 +1,6 @@
 // Text between Xerces and us, and the messages of the XML layer.
-#ifndef ZMC_PYRAMID_XERCESTEXT_H
-#define ZMC_PYRAMID_XERCESTEXT_H
+#ifndef ZMC_FORMAT_XERCESTEXT_H
+#define ZMC_FORMAT_XERCESTEXT_H
 
 #include <string>
 #include <string_view>

@@ -1,7 +1,7 @@
 // The front of a pyramid file: where its fixed fields stand, and the eleven values of its header
 // document.
-#ifndef ZMC_PYRAMID_PYRAMIDHEADERRECORD_H
-#define ZMC_PYRAMID_PYRAMIDHEADERRECORD_H
+#ifndef ZMC_FORMAT_PYRAMIDHEADERRECORD_H
+#define ZMC_FORMAT_PYRAMIDHEADERRECORD_H
 
 #include <cstddef>
 #include <cstdint>

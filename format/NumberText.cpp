@@ -1,4 +1,4 @@
-#include "pyramid/NumberText.h"
+#include "format/NumberText.h"
 
 #include <algorithm>
 #include <limits>

@@ -4,8 +4,8 @@
 // A document of ours is three elements deep and knows 39 names. The parser keeps names in tables
 // that do not grow, so a document of a million different names would take hours; and a tree costs
 // many times its text. Beyond these limits a document counts as malformed.
-#ifndef ZMC_PYRAMID_DOCUMENTLIMITS_H
-#define ZMC_PYRAMID_DOCUMENTLIMITS_H
+#ifndef ZMC_FORMAT_DOCUMENTLIMITS_H
+#define ZMC_FORMAT_DOCUMENTLIMITS_H
 
 #include <cstdint>
 #include <set>
@@ -22,6 +22,10 @@ inline constexpr std::uint32_t kMaxDocumentDepth = 64;
 inline constexpr std::uint32_t kMaxDocumentNodes = 1u << 20;  // elements, comments, and the like
 inline constexpr std::uint32_t kMaxForeignNames = 256;        // different names not of the list
 inline constexpr std::uint32_t kMaxAttributes = 64;           // of one element
+
+// Stands in files, where a store did not come to its end. XML has no such character, in any
+// encoding that may begin with it, and by another first byte a text is not taken for UTF-16.
+inline constexpr unsigned char kUnfinishedDocument = 0x1A;
 
 class DocumentLimits {
 public:
