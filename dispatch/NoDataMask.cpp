@@ -1,6 +1,7 @@
 #include "dispatch/NoDataMask.h"
 
 #include <algorithm>
+#include <bit>
 #include <cstddef>
 
 #include "core/ElementTypes.h"
@@ -48,6 +49,19 @@ bool IsMarked(const S& x, const S& value) {
         return (static_cast<unsigned>(x == value) |
                 static_cast<unsigned>(NoDataRule<S>::NotFinite(x))) != 0;
     }
+}
+
+// The value where `bit` is 1, else the sample. Wide samples are put together from bits or parts,
+// for the loops' sake.
+template <class S>
+S Stamped(unsigned bit, const S& value, const S& x) {
+    if constexpr (std::is_same_v<S, std::uint64_t>)
+        return x ^ ((x ^ value) & (std::uint64_t{0} - bit));
+    else if constexpr (std::is_same_v<S, Complex<float>>)
+        return std::bit_cast<S>(
+            Stamped(bit, std::bit_cast<std::uint64_t>(value), std::bit_cast<std::uint64_t>(x)));
+    else
+        return bit != 0 ? value : x;
 }
 
 // Asks a reader for the rule of the band in one place of a tile, whatever the sign of its samples.
@@ -224,10 +238,8 @@ template <class S, class Rules>
                                     const unsigned char* __restrict mask, const Runs& runs) {
     for (std::size_t left = runs.samples, length = runs.length; left != 0; left -= length) {
         length = std::min(length, left);
-        for (std::size_t i = 0; i < length; ++i) {
-            const S value = rules.Value(i);
-            samples[i] = (mask[i] & kMarkedBit & rules.Has(i)) != 0 ? value : samples[i];
-        }
+        for (std::size_t i = 0; i < length; ++i)
+            samples[i] = Stamped(mask[i] & kMarkedBit & rules.Has(i), rules.Value(i), samples[i]);
         samples += runs.step;
         mask += runs.step;
     }
