@@ -12,6 +12,7 @@
 #include <xercesc/dom/DOM.hpp>
 
 #include "core/NumericConversion.h"
+#include "platform/File.h"
 #include "pyramid/NumberText.h"
 #include "pyramid/PyramidDataset.h"
 #include "tests/support/PyramidFiles.h"
