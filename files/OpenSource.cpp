@@ -4,6 +4,7 @@
 
 #include "files/FileSource.h"
 #include "files/Lending.h"
+#include "platform/File.h"
 
 namespace zelm::files {
 namespace {
@@ -26,6 +27,13 @@ std::shared_ptr<ByteSource> OpenSource(const String& name, OpenMode mode, int* e
     const int failure = Prepare(source.get(), mode);
     if (error) *error = failure;
     return failure == 0 ? source : nullptr;
+}
+
+bool RemoveSource(const String& name, int* error) noexcept {
+    if (!LooksLent(name)) return platform::RemoveFile(name.wide, error);
+    if (const std::shared_ptr<ByteSource> source = FindLent(name)) return source->Remove(error);
+    if (error) *error = ENOENT;
+    return false;
 }
 
 }  // namespace zelm::files

@@ -21,6 +21,11 @@ namespace zelm::files {
 ZMC_FILES_API std::shared_ptr<ByteSource> OpenSource(const String& name, OpenMode mode,
                                                      int* error = nullptr) noexcept;
 
+// Removes what a name stands for: of a lent name what its source stands for (ByteSource::Remove),
+// of any other the file of that name. False, with the reason in `error`, if that failed. The name
+// of a lent source stays good.
+ZMC_FILES_API bool RemoveSource(const String& name, int* error = nullptr) noexcept;
+
 }  // namespace zelm::files
 
 #endif

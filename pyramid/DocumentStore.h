@@ -10,8 +10,8 @@
 // A step that fails is taken back: the old text, or the old end of the file. Where that fails too,
 // the mark stays.
 //
-// File is platform::File, or what a test puts in its place. One writer at a time; readers in other
-// processes take the text by DocumentText.h.
+// File is files::ByteSource, or what a test puts in its place. One writer at a time; readers in
+// other processes take the text by DocumentText.h.
 #ifndef ZMC_PYRAMID_DOCUMENTSTORE_H
 #define ZMC_PYRAMID_DOCUMENTSTORE_H
 

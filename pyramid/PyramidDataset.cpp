@@ -10,6 +10,7 @@
 
 #include "core/CheckedArithmetic.h"
 #include "core/PixelVocabulary.h"
+#include "files/OpenSource.h"
 #include "format/BoundedParser.h"
 #include "format/LevelGeometry.h"
 #include "format/TileTable.h"
@@ -35,9 +36,9 @@ std::uint32_t OrderingFor(const RasterProps& props) {
     return props.tileLines > 1 ? TileOrder::Blocked : TileOrder::Scanline;
 }
 
-std::optional<std::uint64_t> SizeOf(const platform::File& file) {
+std::optional<std::uint64_t> SizeOf(const files::ByteSource& file) {
     const std::uint64_t size = file.Size();
-    if (size == platform::File::kUnknownSize) return std::nullopt;
+    if (size == files::ByteSource::kUnknownSize) return std::nullopt;
     return size;
 }
 
@@ -72,10 +73,10 @@ PyramidDataset::~PyramidDataset() = default;
 bool PyramidDataset::OpenFile(bool create) {
     File.reset();
     Writable = false;
-    using Mode = platform::File::Mode;
-    File = platform::File::Open(FileName.wide, create ? Mode::Create : Mode::Update);
+    using files::OpenMode;
+    File = files::OpenSource(FileName, create ? OpenMode::Create : OpenMode::Update);
     Writable = File != nullptr;
-    if (!File) File = platform::File::Open(FileName.wide, Mode::Read);
+    if (!File) File = files::OpenSource(FileName, OpenMode::Read);
     return File != nullptr;
 }
 
@@ -166,7 +167,7 @@ bool PyramidDataset::CheckPyramidComplete() {
 
 void PyramidDataset::DeleteFile() {
     File.reset();
-    platform::RemoveFile(FileName.wide);
+    files::RemoveSource(FileName);
     HasPyramid = false;
 }
 

@@ -1,4 +1,4 @@
-// PyramidDataset: one pyramid file, its tables and its stream.
+// PyramidDataset: one pyramid file, its tables and the source that its bytes come from.
 //
 // A pyramid file holds an image at several resolutions (levels), cut into square tiles, between a
 // header document in front and a metadata document behind. No tile offset is stored: the tables
@@ -8,7 +8,7 @@
 // What a header settles (the numbers, the tables, both ends, completeness) is a PyramidLayout that
 // is built aside; the fields take it over whole, or stay as they were.
 //
-// One stream and one work buffer: a dataset is for one thread at a time, reads included. No
+// One open source and one work buffer: a dataset is for one thread at a time, reads included. No
 // operation throws. Tile transfers do not report what the disk did.
 #ifndef ZMC_PYRAMID_PYRAMIDDATASET_H
 #define ZMC_PYRAMID_PYRAMIDDATASET_H
@@ -21,10 +21,10 @@
 #include "core/Array.h"
 #include "core/Pointer.h"
 #include "core/String.h"
+#include "files/ByteSource.h"
 #include "format/PyramidHeaderRecord.h"
 #include "format/PyramidLayout.h"
 #include "format/PyramidLimits.h"
-#include "platform/File.h"
 #include "pyramid/DocumentOnDemand.h"
 #include "pyramid/PyramidXMLDocument.h"
 #include "raster/RasterBandHistogram.h"
@@ -49,8 +49,8 @@ public:
     // Files with larger tiles open, and then refuse every tile operation.
     static constexpr std::uint32_t kMaxTileSize = PyramidLimits::kMaxTileSize;
 
-    std::unique_ptr<platform::File> File;  // the open file, or null
-    bool Writable = false;                 // `File` was opened for update
+    std::shared_ptr<files::ByteSource> File;  // the open file or lent source, or null
+    bool Writable = false;                    // `File` was opened for update
     std::uint32_t VersionMajor = 0;
     std::uint32_t VersionMinor = 0;
     std::uint32_t BandCount = 0;
@@ -101,7 +101,8 @@ public:
     PyramidDataset& operator=(const PyramidDataset&) = delete;
 
     // --- life of the file (PyramidDataset.cpp) ---
-    // Opens for update, or failing that for reading; `create` makes the file or empties it.
+    // Opens for update, or failing that for reading; `create` makes the file or empties it. A name
+    // under which the process lends a source (files/Lending.h) opens that source, each time.
     bool OpenFile(bool create);
     // Opens the file and lays out all levels. FALSE on success, TRUE on failure: callers are
     // written to this sense. A header that claims more than PyramidLimits allow is a failure, one
@@ -118,7 +119,8 @@ public:
     bool RefreshPyramidState();
     // Reopens the file; true if its version is 1.1 or later and it reaches TileDataEnd.
     bool CheckPyramidComplete();
-    // Closes and removes the file, whether that succeeds or not.
+    // Closes and removes the file, whether that succeeds or not. Of a lent source, what it stands
+    // for.
     void DeleteFile();
 
     // --- addresses (TileTable.cpp, with the arithmetic of LevelGeometry.h) ---

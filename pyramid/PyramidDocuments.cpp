@@ -38,7 +38,7 @@ std::unique_ptr<xercesc::MemBufInputSource> MakeSource(std::unique_ptr<XMLByte[]
 
 // A source over `size` bytes of the file at `offset`, or null: too long, past the end of the file,
 // or out of memory.
-std::unique_ptr<xercesc::MemBufInputSource> LoadText(platform::File& file, std::uint64_t offset,
+std::unique_ptr<xercesc::MemBufInputSource> LoadText(files::ByteSource& file, std::uint64_t offset,
                                                      std::uint64_t size, const char* name) {
     const std::uint64_t fileSize = file.Size();
     if (size > kMaxDocumentBytes || offset > fileSize || size > fileSize - offset) return nullptr;
@@ -50,7 +50,7 @@ std::unique_ptr<xercesc::MemBufInputSource> LoadText(platform::File& file, std::
 
 // The header document that ends at `end`. An end before its beginning wraps to a size that no file
 // has.
-std::unique_ptr<xercesc::MemBufInputSource> LoadHeaderText(platform::File& file,
+std::unique_ptr<xercesc::MemBufInputSource> LoadHeaderText(files::ByteSource& file,
                                                            std::uint64_t end) {
     return LoadText(file, kHeaderOffset, end - kHeaderOffset, "ORVAPYRHEADER");
 }
@@ -183,7 +183,7 @@ void PyramidDataset::ReadMetaTree() {
     if (!File) return;
     const bool loaded = MetaLoaded || LoadMetaDocument();
     const std::uint64_t size = File->Size();
-    metaUnknown = !loaded && size == platform::File::kUnknownSize;
+    metaUnknown = !loaded && size == files::ByteSource::kUnknownSize;
     if (metaUnknown || (!loaded && size <= MetaDocumentOffset)) return;
     std::unique_ptr<PyramidXMLDocument> document = PyramidXMLDocument::Make();
     if (document && loaded) document->ParseTree(*MetaSource);

@@ -243,7 +243,7 @@ bool PyramidXMLDocument::WritePaletteElement(std::uint32_t band, const Palette& 
     });
 }
 
-bool PyramidXMLDocument::SerializeDocument(platform::File& file, std::uint64_t offset) {
+bool PyramidXMLDocument::SerializeDocument(files::ByteSource& file, std::uint64_t offset) {
     tooLong = false;
     if (!document) return false;
     return Attempt("Exception when serializing the XML:\n", [&] {
@@ -253,7 +253,7 @@ bool PyramidXMLDocument::SerializeDocument(platform::File& file, std::uint64_t o
         const std::size_t length = target.getLen();
         tooLong = length > kMaxDocumentBytes;
         if (!complete || tooLong) return false;
-        return DocumentStore<platform::File>(file, offset).Write(target.getRawBuffer(), length);
+        return DocumentStore<files::ByteSource>(file, offset).Write(target.getRawBuffer(), length);
     });
 }
 

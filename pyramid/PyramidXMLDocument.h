@@ -18,10 +18,10 @@
 #include <xercesc/parsers/XercesDOMParser.hpp>
 
 #include "colour/Palette.h"
+#include "files/ByteSource.h"
 #include "format/BoundedParser.h"
 #include "format/ElementNames.h"
 #include "format/PyramidHeaderRecord.h"
-#include "platform/File.h"
 #include "raster/RasterBandHistogram.h"
 #include "raster/RasterBandStats.h"
 
@@ -68,7 +68,7 @@ public:
     // document that no parser accepts. A file that reaches further is filled with line ends, so
     // that the text behind the document, which a writer of longer lines may have left, does not
     // spoil it.
-    bool SerializeDocument(platform::File& file, std::uint64_t offset);
+    bool SerializeDocument(files::ByteSource& file, std::uint64_t offset);
     // The last SerializeDocument failed because the text was beyond the limits.
     bool IsTooLong() const { return tooLong; }
 

@@ -55,7 +55,7 @@ protected:
 
     PyramidDataset& dataset;
     const TileRequest& request;
-    platform::File& file;
+    files::ByteSource& file;
 
     // At least `bytes`; null if memory ran out.
     unsigned char* WorkSpace(std::uint64_t bytes) const { return dataset.WorkSpace(bytes); }

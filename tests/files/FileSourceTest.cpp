@@ -267,5 +267,26 @@ TEST_F(FileSourceTest, ANameThatLooksLentNeverMeansAFile) {
     std::filesystem::current_path(home);
 }
 
+TEST_F(FileSourceTest, RemoveSourceRemovesWhatANameStandsFor) {
+    EXPECT_TRUE(RemoveSource(path.c_str(), &error));
+    EXPECT_EQ(error, 0);
+    EXPECT_FALSE(std::filesystem::exists(path));
+    EXPECT_FALSE(RemoveSource(path.c_str(), &error));
+    EXPECT_EQ(error, ENOENT);
+    WriteText(path, "first");
+    LentName name = Lend(Open(OpenMode::Read));
+    EXPECT_FALSE(RemoveSource(name.Text(), &error)) << "not writable";
+    EXPECT_EQ(error, EBADF);
+    name = Lend(Open());
+    EXPECT_TRUE(RemoveSource(name.Text(), &error));
+    EXPECT_FALSE(std::filesystem::exists(path));
+    EXPECT_TRUE(FindLent(name.Text())) << "what is open goes on";
+    const std::string gone = name.Utf8();
+    name.Withdraw();
+    EXPECT_FALSE(RemoveSource(gone.c_str(), &error));
+    EXPECT_EQ(error, ENOENT);
+    EXPECT_FALSE(RemoveSource(gone.c_str()));
+}
+
 }  // namespace
 }  // namespace zelm::files

@@ -13,6 +13,7 @@
 
 #include "core/NumericConversion.h"
 #include "format/NumberText.h"
+#include "platform/File.h"
 #include "pyramid/PyramidDataset.h"
 #include "tests/support/PyramidFiles.h"
 #include "tests/support/ScratchDirectory.h"

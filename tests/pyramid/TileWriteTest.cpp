@@ -2,6 +2,7 @@
 
 #include <random>
 
+#include "files/OpenSource.h"
 #include "tests/support/PyramidFileTest.h"
 
 namespace zmctest {
@@ -63,7 +64,7 @@ TEST_F(TileWriteTest, WholeTilesGoDirect) {
 TEST_F(TileWriteTest, ReadOnlyFileDropsTheWrite) {
     for (const std::uint32_t ordering : {0u, 2u}) {
         Make(ordering, true);
-        dataset->File = platform::File::Open(dataset->FileName.wide, platform::File::Mode::Read);
+        dataset->File = zelm::files::OpenSource(dataset->FileName, zelm::files::OpenMode::Read);
         dataset->Writable = false;
         EXPECT_TRUE(WriteBytes(*dataset, 0, 0, 256, 256, BandList(all), 0, Pixels(256, 256, 3)));
         EXPECT_TRUE(WriteBytes(*dataset, 5, 5, 20, 20, BandList(all), 0, Pixels(20, 20, 3)));

@@ -9,6 +9,7 @@
 #include <xercesc/framework/MemBufInputSource.hpp>
 
 #include "core/PixelVocabulary.h"
+#include "files/OpenSource.h"
 #include "tests/support/PyramidFiles.h"
 #include "tests/support/ScratchDirectory.h"
 #include "tests/support/XercesEnvironment.h"
@@ -24,7 +25,7 @@ protected:
     std::string Raw() {
         const std::string name = (folder / "document");
         const String wide(name.c_str());
-        const auto file = platform::File::Open(wide.wide, platform::File::Mode::Create);
+        const auto file = files::OpenSource(wide, files::OpenMode::Create);
         EXPECT_TRUE(document.SerializeDocument(*file, 7));
         return support::ReadText(name).substr(7);
     }
@@ -220,7 +221,7 @@ TEST_F(XmlDocumentTest, WithoutATreeEverythingIsRefused) {
     EXPECT_FALSE(document.WriteHistogramElement(RasterBandHistogram<int>()));
     EXPECT_FALSE(document.WritePaletteElement(0, Palette()));
     const std::string name = (folder / "document");
-    const auto file = platform::File::Open(String(name.c_str()).wide, platform::File::Mode::Create);
+    const auto file = files::OpenSource(name.c_str(), files::OpenMode::Create);
     EXPECT_FALSE(document.SerializeDocument(*file, 0));
     EXPECT_EQ(file->Size(), 0u);
 }
@@ -250,7 +251,7 @@ TEST_F(XmlDocumentTest, RecordsAreTakenBackFromAPosition) {
 TEST_F(XmlDocumentTest, ReadOnlyFileIsAFailure) {
     const std::string name = (folder / "document");
     support::WriteText(name, "old");
-    const auto file = platform::File::Open(String(name.c_str()).wide, platform::File::Mode::Read);
+    const auto file = files::OpenSource(name.c_str(), files::OpenMode::Read);
     EXPECT_FALSE(document.SerializeDocument(*file, 0));
     EXPECT_EQ(support::ReadText(name), "old");
 }
@@ -258,7 +259,7 @@ TEST_F(XmlDocumentTest, ReadOnlyFileIsAFailure) {
 TEST_F(XmlDocumentTest, OldTextBehindTheDocumentIsBlankedAndNothingIsCut) {
     const std::string name = (folder / "document");
     support::WriteText(name, std::string(10000, 'x'));
-    const auto file = platform::File::Open(String(name.c_str()).wide, platform::File::Mode::Update);
+    const auto file = files::OpenSource(name.c_str(), files::OpenMode::Update);
     EXPECT_TRUE(document.SerializeDocument(*file, 5));
     const std::string text = support::ReadText(name);
     EXPECT_EQ(text.size(), 10000u);
@@ -275,7 +276,7 @@ TEST_F(XmlDocumentTest, ParsedTreeGrows) {
     RasterBandStats<int> stats;
     EXPECT_TRUE(parsed.WriteBandStatsElement(stats));
     const std::string name = (folder / "document");
-    const auto file = platform::File::Open(String(name.c_str()).wide, platform::File::Mode::Create);
+    const auto file = files::OpenSource(name.c_str(), files::OpenMode::Create);
     ASSERT_TRUE(parsed.SerializeDocument(*file, 0));
     const std::string text = Compact(support::ReadText(name));
     EXPECT_NE(text.find("<!-- kept -->"), std::string::npos);
@@ -332,7 +333,7 @@ TEST_F(XmlDocumentTest, ATextBeyondTheLimitIsNotWritten) {
         document.document->createTextNode(text.c_str()));
     const std::string name = (folder / "document");
     const String wide(name.c_str());
-    const auto file = platform::File::Open(wide.wide, platform::File::Mode::Create);
+    const auto file = files::OpenSource(wide, files::OpenMode::Create);
     EXPECT_FALSE(document.SerializeDocument(*file, 7));
     EXPECT_EQ(file->Size(), 0u);
 }
