@@ -51,6 +51,11 @@ set(ZMC_PUBLIC_HEADERS
     coordsys/CoordSysUnit.h
     coordsys/Environment.h
     coordsys/EnvironmentKeys.h
+    # The pyramid file: its front, the values of its header, the arithmetic of its levels.
+    format/LevelGeometry.h
+    format/PyramidFront.h
+    format/PyramidHeaderRecord.h
+    format/Rectangle.h
     # Where bytes come from, and how a host lends them.
     files/ByteSource.h
     files/FileSource.h

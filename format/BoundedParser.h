@@ -7,7 +7,6 @@
 #ifndef ZMC_FORMAT_BOUNDEDPARSER_H
 #define ZMC_FORMAT_BOUNDEDPARSER_H
 
-#include <memory>
 #include <string>
 
 #include <xercesc/framework/XMLAttr.hpp>
@@ -99,9 +98,6 @@ private:
         throw DocumentRefused();
     }
 };
-
-// The parser for both documents of a dataset; null if memory ran out.
-std::unique_ptr<xercesc::SAXParser> MakeDocumentParser();
 
 }  // namespace zelm
 

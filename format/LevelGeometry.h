@@ -7,7 +7,10 @@
 #ifndef ZMC_FORMAT_LEVELGEOMETRY_H
 #define ZMC_FORMAT_LEVELGEOMETRY_H
 
+#include <algorithm>
 #include <cstdint>
+
+#include "format/Rectangle.h"
 
 namespace zelm {
 
@@ -28,8 +31,8 @@ struct LevelGeometry {
     constexpr LevelGeometry(std::uint32_t samples0, std::uint32_t lines0, std::uint32_t tileSide,
                             std::uint32_t level)
         : tileSize(tileSide),
-          samples(samples0 >> (level & 31u)),
-          lines(lines0 >> (level & 31u)),
+          samples(Shifted(samples0, level)),
+          lines(Shifted(lines0, level)),
           tilesAcross(TilesOver(samples, tileSide)),
           tilesDown(TilesOver(lines, tileSide)),
           lastWidth(samples + (1u - tilesAcross) * tileSide),
@@ -40,6 +43,12 @@ struct LevelGeometry {
     }
     constexpr std::uint32_t TileHeight(std::uint32_t tileY) const {
         return tileY == tilesDown - 1u ? lastHeight : tileSize;
+    }
+    constexpr Rectangle Whole() const { return {0, 0, samples, lines}; }
+    // The pixels of a tile, which the grid has.
+    constexpr Rectangle Tile(std::uint32_t tileX, std::uint32_t tileY) const {
+        const std::uint32_t x = tileX * tileSize, y = tileY * tileSize;
+        return {x, y, std::min(tileSize, samples - x), std::min(tileSize, lines - y)};
     }
     constexpr bool HasTile(std::uint32_t tileX, std::uint32_t tileY) const {
         return tileX < tilesAcross && tileY < tilesDown;
@@ -58,8 +67,15 @@ struct LevelGeometry {
     // Pixels that a level occupies in a file.
     static constexpr std::uint64_t LevelPixels(std::uint32_t samples0, std::uint32_t lines0,
                                                std::uint32_t level) {
-        if (level >= kLevelsWithPixels) return 0;
-        return std::uint64_t{samples0 >> level} * (lines0 >> level);
+        return std::uint64_t{Extent(samples0, level)} * Extent(lines0, level);
+    }
+    // Columns, or rows, that a level has to show of `extent` in level 0: none from level 32 on.
+    static constexpr std::uint32_t Extent(std::uint32_t extent, std::uint32_t level) {
+        return level < kLevelsWithPixels ? Shifted(extent, level) : 0;
+    }
+    // The same with levels counted modulo 32: what the module's readers tell.
+    static constexpr std::uint32_t Shifted(std::uint32_t extent, std::uint32_t level) {
+        return extent >> (level & 31u);
     }
 
 private:

@@ -15,8 +15,8 @@ std::uint64_t LevelTableBytes(std::uint32_t levelMax) {
 }
 
 bool AllowTileTable(const PyramidHeaderRecord& header) {
-    if (header.tileOrdering < TileOrder::Morton) return true;
-    const LevelGeometry grid(header.width, header.height, header.tileSize, 0);
+    if (!header.IsPlanar()) return true;
+    const LevelGeometry grid = header.Geometry(0);
     if (grid.tilesAcross > kMaxMortonTiles || grid.tilesDown > kMaxMortonTiles) return false;
     const std::uint64_t tiles = std::uint64_t{grid.tilesAcross} * grid.tilesDown;
     const std::uint64_t bytes = TileTableBytes(tiles, header.bandCount, header.levelMax);

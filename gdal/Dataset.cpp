@@ -23,10 +23,10 @@ zmchost::PyramidFileInfo CheckedInfo(const std::string& fileName,
         throw zmchost::Error(fileName, "show it to GDAL", why);
     };
     zmchost::PyramidFileInfo info = zmchost::DescribePyramidFile(header);
-    const auto* const base = info.FindLevel(header.minLevel);
+    const auto* const base = info.FindLevel(header.levelMin);
     if (!base || base->width == 0 || base->height == 0) refuse("it holds no pixels");
     if (header.width > INT_MAX || header.height > INT_MAX) refuse("it is too large");
-    const auto bands = std::min<std::uint32_t>(header.bands, INT_MAX);
+    const auto bands = std::min<std::uint32_t>(header.bandCount, INT_MAX);
     if (!GDALCheckBandCount(static_cast<int>(bands), FALSE)) refuse("of its number of bands");
     const std::uint64_t tilePixels = std::uint64_t{header.tileSize} * header.tileSize;
     if (tilePixels * zelm::PixelSize(header.pixelType) > kMaxTileBytes / bands)
@@ -67,12 +67,12 @@ Dataset::~Dataset() {
 }
 
 std::unique_ptr<Dataset> Dataset::FromFile(std::shared_ptr<OpenFile> file, GDALAccess access) {
-    const std::uint32_t base = file->info.header.minLevel;
+    const std::uint32_t base = file->info.header.levelMin;
     return std::unique_ptr<Dataset>(new Dataset(std::move(file), base, access, nullptr));
 }
 
 void Dataset::AddBands() {
-    const auto count = static_cast<int>(file->info.header.bands);
+    const auto count = static_cast<int>(file->info.header.bandCount);
     for (int number = 1; number <= count; ++number) SetBand(number, new Band(*this, number));
 }
 
@@ -102,8 +102,8 @@ void Dataset::DescribeFile() {
     set("INTERLEAVE", zelm::InterleaveName(header.interleave));
     set("TILE_SIZE", std::to_string(header.tileSize));
     set("LEVEL", std::to_string(level));
-    set("LEVEL_MIN", std::to_string(header.minLevel));
-    set("LEVEL_MAX", std::to_string(header.maxLevel));
+    set("LEVEL_MIN", std::to_string(header.levelMin));
+    set("LEVEL_MAX", std::to_string(header.levelMax));
     set("COMPLETE", file->info.complete ? "YES" : "NO");
     if (file->info.bytesMissing > 0) set("BYTES_MISSING", std::to_string(file->info.bytesMissing));
 }

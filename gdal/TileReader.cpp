@@ -41,14 +41,12 @@ TileReader::TileReader(LazyRaster& pyramid, const zmchost::PyramidFileInfo& info
       rawSampleSize(zelm::PixelSize(info.header.pixelType)),
       sampleSize(static_cast<std::size_t>(GDALGetDataTypeSizeBytes(type))),
       tileSize(static_cast<int>(info.header.tileSize)),
-      fileBands(static_cast<int>(info.header.bands)),
-      allBands(info.header.bands) {
+      fileBands(static_cast<int>(info.header.bandCount)),
+      allBands(info.header.bandCount) {
     std::iota(allBands.begin(), allBands.end(), 0);
 }
 
-bool TileReader::IsPixelInterleaved() const {
-    return layout.header.tileOrdering != zelm::TileOrder::Morton;
-}
+bool TileReader::IsPixelInterleaved() const { return !layout.header.IsPlanar(); }
 
 Window TileReader::TileAt(std::uint32_t level, int tileX, int tileY) const {
     const zmchost::PyramidLevelInfo& info = *layout.FindLevel(level);

@@ -1,7 +1,5 @@
 #include "pyramid/PyramidDataset.h"
 
-#include <algorithm>
-#include <iterator>
 #include <new>
 #include <optional>
 #include <utility>
@@ -11,30 +9,13 @@
 #include "core/CheckedArithmetic.h"
 #include "core/PixelVocabulary.h"
 #include "files/OpenSource.h"
-#include "format/BoundedParser.h"
+#include "format/DocumentParse.h"
 #include "format/LevelGeometry.h"
+#include "format/PyramidFront.h"
 #include "format/TileTable.h"
 
 namespace zelm {
 namespace {
-
-using namespace PyramidFront;
-
-// Integers in files are little-endian, whatever the machine.
-std::uint64_t DecodeUint64(const unsigned char* bytes) {
-    std::uint64_t value = 0;
-    for (int i = 7; i >= 0; --i) value = value << 8 | bytes[i];
-    return value;
-}
-
-void EncodeUint64(std::uint64_t value, unsigned char* bytes) {
-    for (int i = 0; i < 8; ++i) bytes[i] = static_cast<unsigned char>(value >> (8 * i));
-}
-
-std::uint32_t OrderingFor(const RasterProps& props) {
-    if (props.bands > 8) return TileOrder::Morton;
-    return props.tileLines > 1 ? TileOrder::Blocked : TileOrder::Scanline;
-}
 
 std::optional<std::uint64_t> SizeOf(const files::ByteSource& file) {
     const std::uint64_t size = file.Size();
@@ -56,10 +37,10 @@ PyramidDataset::PyramidDataset(String fileName, RasterProps props)
     : BandCount(props.bands),
       Samples(props.samples),
       Lines(props.lines),
-      TileSize(256),
+      TileSize(kWrittenTileSize),
       PixelType(props.pixelType),
       Interleave(props.interleave),
-      TileOrdering(OrderingFor(props)),
+      TileOrdering(TileOrderFor(props.bands, props.tileLines)),
       FileName(fileName),
       BytesPerSample(PixelSize(props.pixelType)),
       Parser(MakeDocumentParser()) {}
@@ -82,14 +63,13 @@ bool PyramidDataset::OpenFile(bool create) {
 
 // False for a file of another kind, or one too short for the header that it announces.
 bool PyramidDataset::ReadFixedFields(PyramidLayout& layout) const {
-    unsigned char fields[kHeaderOffset] = {};
-    const std::size_t read = File->ReadAt(0, fields, sizeof fields);
-    if (!std::equal(std::begin(kMagic), std::end(kMagic), fields) || read != sizeof fields)
-        return false;
-    layout.tileDataStart = DecodeUint64(fields + kOffsetsOffset);
-    layout.metaDocumentOffset = DecodeUint64(fields + kOffsetsOffset + 8);
-    const auto size = SizeOf(*File);
-    return layout.tileDataStart >= kHeaderOffset && size && layout.tileDataStart <= *size;
+    char start[PyramidFront::kHeaderOffset];
+    const std::size_t read = File->ReadAt(0, start, sizeof start);
+    PyramidFront front;
+    if (DecodeFront({start, read}, SizeOf(*File), front) != FrontFault::None) return false;
+    layout.tileDataStart = front.tileDataStart;
+    layout.metaDocumentOffset = front.metaDocumentOffset;
+    return true;
 }
 
 bool PyramidDataset::ReadHeader() {
@@ -135,21 +115,24 @@ void PyramidDataset::CreateFile(std::uint32_t levelMin, std::uint32_t levelMax) 
 // Writes everything in front of the tile data and lays out the levels behind it. The offsets come
 // last: what a failure leaves has none, and is refused by everybody who opens it.
 bool PyramidDataset::WriteFront(PyramidLayout& layout) {
-    unsigned char offsets[kOffsetsSize] = {};
+    using Front = PyramidFront;
+    unsigned char offsets[Front::kOffsetsSize] = {};
+    const auto writeOffsets = [&] {
+        return File->WriteAt(Front::kOffsetsOffset, offsets, sizeof offsets) == sizeof offsets;
+    };
     HeaderDocument = PyramidXMLDocument::Make();
-    const bool written = File->WriteAt(0, kMagic, sizeof kMagic) == sizeof kMagic &&
-                         File->WriteAt(kOffsetsOffset, offsets, kOffsetsSize) == kOffsetsSize &&
-                         HeaderDocument && HeaderDocument->CreateDocument() &&
-                         HeaderDocument->WriteHeaderElement(layout.header) &&
-                         HeaderDocument->SerializeDocument(*File, kHeaderOffset);
+    const bool written =
+        File->WriteAt(0, Front::kMagic, sizeof Front::kMagic) == sizeof Front::kMagic &&
+        writeOffsets() && HeaderDocument && HeaderDocument->CreateDocument() &&
+        HeaderDocument->WriteHeaderElement(layout.header) &&
+        HeaderDocument->SerializeDocument(*File, Front::kHeaderOffset);
     HeaderDocument.reset();
     const auto end = SizeOf(*File);
     if (!written || !end) return false;
     layout.tileDataStart = *end;
     if (!layout.LayOut()) return false;
-    EncodeUint64(layout.tileDataStart, offsets);
-    EncodeUint64(layout.metaDocumentOffset, offsets + 8);
-    return File->WriteAt(kOffsetsOffset, offsets, kOffsetsSize) == kOffsetsSize;
+    Front{layout.tileDataStart, layout.metaDocumentOffset}.EncodeOffsets(offsets);
+    return writeOffsets();
 }
 
 bool PyramidDataset::RefreshPyramidState() {

@@ -1,14 +1,14 @@
 // The documents of a dataset: from the file into a source, and from there into records and a tree.
-#include <algorithm>
 #include <new>
 #include <utility>
 
 #include <xercesc/framework/MemBufInputSource.hpp>
-#include <xercesc/util/OutOfMemoryException.hpp>
+#include <xercesc/parsers/SAXParser.hpp>
 #include <xercesc/util/XMLException.hpp>
 
-#include "format/BoundedParser.h"
+#include "format/DocumentParse.h"
 #include "format/DocumentText.h"
+#include "format/PyramidFront.h"
 #include "format/XercesText.h"
 #include "pyramid/PyramidDataset.h"
 #include "pyramid/PyramidXMLReaderHandlers.h"
@@ -16,17 +16,12 @@
 namespace zelm {
 namespace {
 
-using PyramidFront::kHeaderOffset;
+constexpr std::uint64_t kHeaderOffset = PyramidFront::kHeaderOffset;
 
 // A source over a text, or null if memory ran out.
 std::unique_ptr<xercesc::MemBufInputSource> MakeSource(std::unique_ptr<XMLByte[]> text,
                                                        std::size_t size, const char* name) {
-    // The parser takes a NUL behind the root element for the end of the text, and so it takes a
-    // character that lacks its last bytes, and would believe the front part of a torn document. No
-    // parser accepts this character anywhere, and no document ends with one outside ASCII.
-    constexpr XMLByte refused = 1;
-    std::replace(text.get(), text.get() + size, XMLByte{0}, refused);
-    for (std::size_t end = size; end != 0 && text[end - 1] >= 0x80; --end) text[end - 1] = refused;
+    GuardText(text.get(), size);
     try {
         auto source = std::make_unique<xercesc::MemBufInputSource>(text.get(), size, name, true);
         text.release();
@@ -55,62 +50,21 @@ std::unique_ptr<xercesc::MemBufInputSource> LoadHeaderText(files::ByteSource& fi
     return LoadText(file, kHeaderOffset, end - kHeaderOffset, "ORVAPYRHEADER");
 }
 
-// Handlers live on the stack of their parse, so the parser forgets them with it.
-class HandlerScope {
-public:
-    HandlerScope(xercesc::SAXParser& saxParser, xercesc::HandlerBase* handlers)
-        : parser(saxParser) {
-        Set(handlers);
-    }
-    ~HandlerScope() { Set(nullptr); }
-    HandlerScope(const HandlerScope&) = delete;
-    HandlerScope& operator=(const HandlerScope&) = delete;
+// Printed while memory may be out.
+void PrintFailure(const xercesc::XMLException& exception) noexcept {
+    PrintError("\nAn error occurred\n Error: ");
+    PrintError(exception.getMessage());
+    PrintError("\n\n");
+}
 
-private:
-    void Set(xercesc::HandlerBase* handlers) {
-        parser.setDocumentHandler(handlers);
-        parser.setErrorHandler(handlers);
-    }
-    xercesc::SAXParser& parser;
-};
-
-int PrintOutOfMemory() {
+int ResultOf(ParseEnd::Kind kind) {
+    if (kind == ParseEnd::Kind::Parsed) return PyramidDataset::kParsed;
+    if (kind == ParseEnd::Kind::Refused) return PyramidDataset::kParseError;
     PrintError("OutOfMemoryException\n");
     return PyramidDataset::kParseOutOfMemory;
 }
 
-// Answers as ParseDocument does, and tells whether the parse ended by an exception.
-int Parse(xercesc::SAXParser& parser, xercesc::HandlerBase* handlers,
-          const xercesc::InputSource& source, bool& thrown) {
-    thrown = true;
-    try {
-        const HandlerScope scope(parser, handlers);
-        parser.parse(source);
-        thrown = false;
-        return parser.getErrorCount() == 0 ? PyramidDataset::kParsed : PyramidDataset::kParseError;
-    } catch (const xercesc::OutOfMemoryException&) {
-        return PrintOutOfMemory();
-    } catch (const std::bad_alloc&) {
-        return PrintOutOfMemory();
-    } catch (const xercesc::XMLException& exception) {
-        PrintError("\nAn error occurred\n Error: ");
-        PrintError(exception.getMessage());
-        PrintError("\n\n");
-        return PyramidDataset::kParseError;
-    } catch (const DocumentRefused&) {
-        return PyramidDataset::kParseError;  // reported where it was found
-    }
-}
-
 }  // namespace
-
-std::unique_ptr<xercesc::SAXParser> MakeDocumentParser() {
-    try {
-        return std::make_unique<BoundedParser<xercesc::SAXParser>>();
-    } catch (...) {
-        return nullptr;
-    }
-}
 
 bool PyramidDataset::LoadHeaderDocument() {
     if (!File) return false;
@@ -163,20 +117,13 @@ int PyramidDataset::ParseDocument(xercesc::HandlerBase* handlers,
                                   std::unique_ptr<xercesc::MemBufInputSource>& source,
                                   bool& loaded) {
     if (!source || !Parser) return kParseError;
-    bool thrown = false;
-    int result = kParseError;
-    try {
-        result = Parse(*Parser, handlers, *source, thrown);
-    } catch (...) {
-        // Nothing else is thrown on purpose.
-    }
-    if (thrown) {
-        // Out of memory leaves a parser that takes itself to be at work for good.
+    const ParseEnd end = RunParser(*Parser, handlers, *source, PrintFailure);
+    if (end.thrown) {
         Parser = MakeDocumentParser();
         source.reset();
         loaded = false;
     }
-    return result;
+    return ResultOf(end.kind);
 }
 
 void PyramidDataset::ReadMetaTree() {

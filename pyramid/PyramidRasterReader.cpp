@@ -14,7 +14,7 @@ namespace zelm {
 namespace {
 
 // What readers tell of the tiles, whatever the size in the file is.
-constexpr std::uint32_t kToldTileSize = 256;
+constexpr std::uint32_t kToldTileSize = kWrittenTileSize;
 
 // The georeference is told the size after each change, samples before lines.
 void Describe(const PyramidDataset& dataset, const GeoRefPtr& geoRef, const MetadataPtr& metadata,
@@ -32,7 +32,8 @@ void Describe(const PyramidDataset& dataset, const GeoRefPtr& geoRef, const Meta
 
 // Levels count modulo 32, as in the layout of the file.
 std::uint32_t SizeAt(std::uint32_t size, std::int32_t level, bool reduced) {
-    return reduced && level > 0 ? size >> (level & 31) : size;
+    return reduced && level > 0 ? LevelGeometry::Shifted(size, static_cast<std::uint32_t>(level))
+                                : size;
 }
 
 }  // namespace

@@ -1,14 +1,12 @@
 #include "pyramid/PyramidXMLReaderHandlers.h"
 
 #include <algorithm>
-#include <locale>
 #include <new>
-#include <sstream>
 
 #include <xercesc/sax/SAXParseException.hpp>
 
 #include "core/NumericConversion.h"
-#include "core/PixelVocabulary.h"
+#include "format/HeaderParser.h"
 #include "format/NumberText.h"
 #include "format/XercesText.h"
 
@@ -16,8 +14,6 @@ namespace zelm {
 namespace {
 
 using enum ElementName;
-
-std::u16string_view View(const XMLCh* text) { return text ? text : std::u16string_view(); }
 
 void PrintMessage(const char* heading, const xercesc::SAXParseException& exception) {
     try {
@@ -37,15 +33,6 @@ bool TakeToken(std::string_view& text, std::string_view& token) {
     if (bar == std::string_view::npos) return false;
     text.remove_prefix(bar + 1);
     return true;
-}
-
-template <class Code>
-Code ReadWord(void (*parse)(std::istream&, Code&), std::string_view text) {
-    std::istringstream stream{std::string(text)};
-    stream.imbue(std::locale::classic());
-    Code code{};
-    parse(stream, code);
-    return code;
 }
 
 std::uint32_t ReadSource(std::string_view text) {
@@ -148,9 +135,7 @@ void CountList::End(std::uint64_t& spareBins, Array<std::uint64_t>& counts) cons
     Extend(counts, binCount);
 }
 
-void PyramidXMLReaderCore::startElement(const XMLCh* const name, xercesc::AttributeList&) {
-    const std::int32_t state = StateOf(FindElementName(View(name)));
-    stateStack.push_back(state);
+void PyramidXMLReaderCore::Enter(std::int32_t state) {
     if (state == StateOf(BANDSTATISTICS)) {
         BeginStats();
     } else if (state == StateOf(HISTOGRAMS)) {
@@ -160,10 +145,7 @@ void PyramidXMLReaderCore::startElement(const XMLCh* const name, xercesc::Attrib
     }
 }
 
-void PyramidXMLReaderCore::endElement(const XMLCh* const) {
-    if (stateStack.empty()) return;
-    const std::int32_t state = stateStack.back();
-    stateStack.pop_back();
+void PyramidXMLReaderCore::Leave(std::int32_t state) {
     if (state == StateOf(BANDSTATISTICS)) {
         EndStats();
     } else if (state == StateOf(HISTOGRAMS)) {
@@ -175,60 +157,15 @@ void PyramidXMLReaderCore::endElement(const XMLCh* const) {
     }
 }
 
-void PyramidXMLReaderCore::characters(const XMLCh* const text, const XMLSize_t length) {
-    const std::int32_t state = stateStack.empty() ? 0 : stateStack.back();
-    // The elements that hold elements, and those that nobody knows, have no text of their own.
-    if (state < StateOf(RSTC_LEVEL)) return;
-    NarrowAscii({text, length}, narrow);
-    const auto name = static_cast<ElementName>(state - 1);
+void PyramidXMLReaderCore::TakeText(ElementName name, std::string_view text) {
     if (name < HIST_LEVEL)
-        TakeStatsText(name, narrow);
+        TakeStatsText(name, text);
     else if (name < HEADER_VERSION_MAJOR)
-        TakeHistogramText(name, narrow);
+        TakeHistogramText(name, text);
     else if (name < PALETTE_BAND)
-        TakeHeaderText(name, narrow);
+        TakeHeaderText(header, name, text);
     else
-        TakePaletteText(name, narrow);
-}
-
-void PyramidXMLReaderCore::TakeHeaderText(ElementName name, std::string_view text) {
-    switch (name) {
-        case HEADER_VERSION_MAJOR:
-            header.versionMajor = ReadInteger(text);
-            break;
-        case HEADER_VERSION_MINOR:
-            header.versionMinor = ReadInteger(text);
-            break;
-        case HEADER_BANDS:
-            header.bandCount = ReadInteger(text);
-            break;
-        case HEADER_PIXEL_WIDTH:
-            header.width = ReadInteger(text);
-            break;
-        case HEADER_PIXEL_HEIGHT:
-            header.height = ReadInteger(text);
-            break;
-        case HEADER_TILESIZE:
-            header.tileSize = ReadInteger(text);
-            break;
-        case HEADER_LEVELMIN:
-            header.levelMin = ReadInteger(text);
-            break;
-        case HEADER_LEVELMAX:
-            header.levelMax = ReadInteger(text);
-            break;
-        case HEADER_INTERLEAVE:
-            header.interleave = ReadWord(ParseInterleave, text);
-            break;
-        case HEADER_BUILD_METHOD:
-            header.tileOrdering = ReadWord(ParseTileOrder, text);
-            break;
-        case HEADER_PIXEL_TYPE:
-            header.pixelType = ReadWord(ParsePixelType, text);
-            break;
-        default:  // unreachable: characters() sends these names alone
-            break;
-    }
+        TakePaletteText(name, text);
 }
 
 void PyramidXMLReaderCore::TakePaletteText(ElementName name, std::string_view text) {

@@ -1,44 +1,30 @@
 // PyramidXMLReaderHandlers<T>: turns the two documents of a pyramid file back into records.
 //
-// SAX callbacks over a stack of element states: the state on top decides what a piece of text
-// means, and nothing checks that an element has the right parent. One object serves one parse. T is
-// the element type of the pixels and matters for minima and maxima alone; the header is read by the
-// instance for char, because the type is not known before.
+// One object serves one parse. T is the element type of the pixels and matters for minima and
+// maxima alone; the header is read by the instance for char, because the type is not known before.
 //
-// The parser may deliver a text in pieces. Each piece is taken for a whole value: of a number the
-// last piece counts, and in a list each piece starts again from the first entry.
+// Each piece of a text is taken for a whole value (ElementReader.h): in a list each piece starts
+// again from the first entry.
 //
 // Nothing here allocates by a number from the file: see CountList.
 #ifndef ZMC_PYRAMID_PYRAMIDXMLREADERHANDLERS_H
 #define ZMC_PYRAMID_PYRAMIDXMLREADERHANDLERS_H
 
 #include <cstdint>
-#include <deque>
 #include <map>
 #include <memory>
 #include <string>
 #include <string_view>
 #include <utility>
 
-#include <xercesc/sax/HandlerBase.hpp>
-
 #include "colour/Palette.h"
 #include "core/Array.h"
-#include "format/ElementNames.h"
+#include "format/ElementReader.h"
 #include "format/PyramidHeaderRecord.h"
 #include "raster/RasterBandHistogram.h"
 #include "raster/RasterBandStats.h"
 
 namespace zelm {
-
-// State of an open element: 0 for a name that is not in the list, else its place there counted from
-// 1, except that HEADER and PALETTE have changed places.
-constexpr std::int32_t StateOf(int position) {
-    if (position == static_cast<int>(ElementName::PALETTE)) return 5;
-    if (position == static_cast<int>(ElementName::HEADER)) return 4;
-    return position + 1;
-}
-constexpr std::int32_t StateOf(ElementName name) { return StateOf(static_cast<int>(name)); }
 
 // Bins that the histograms of one document may have beyond the entries of their lists, all
 // together. A histogram that would take more keeps no counts: it claims what its text cannot hold.
@@ -76,7 +62,7 @@ private:
 };
 
 // The part that does not depend on the element type.
-class PyramidXMLReaderCore : public xercesc::HandlerBase {
+class PyramidXMLReaderCore : public ElementReader {
 public:
     static constexpr auto& elementNames = kElementNames;
     static constexpr std::int32_t initialBand = 0;  // band of a record that names none
@@ -84,12 +70,7 @@ public:
     PyramidHeaderRecord header;
     Palette currentPalette;
     std::map<std::uint32_t, Palette> palettes;  // finished palettes, by band
-    std::deque<std::int32_t> stateStack;
-    std::uint32_t paletteBand = 0;  // the last one told, in whatever element
-
-    void startElement(const XMLCh* const name, xercesc::AttributeList& attributes) override;
-    void endElement(const XMLCh* const name) override;
-    void characters(const XMLCh* const text, const XMLSize_t length) override;
+    std::uint32_t paletteBand = 0;              // the last one told, in whatever element
 
     // Each prints a message to the standard error stream; none throws.
     void warning(const xercesc::SAXParseException& exception) override;
@@ -97,6 +78,10 @@ public:
     void fatalError(const xercesc::SAXParseException& exception) override;
 
 protected:
+    void Enter(std::int32_t state) override;
+    void Leave(std::int32_t state) override;
+    void TakeText(ElementName name, std::string_view text) override;
+
     virtual void BeginStats() = 0;
     virtual void EndStats() = 0;
     virtual void BeginHistogram() = 0;
@@ -108,10 +93,7 @@ protected:
     std::uint64_t spareBins = kSpareBins;
 
 private:
-    void TakeHeaderText(ElementName name, std::string_view text);
     void TakePaletteText(ElementName name, std::string_view text);
-
-    std::string narrow;  // the piece of text in hand
 };
 
 template <class T>

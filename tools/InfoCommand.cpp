@@ -36,7 +36,7 @@ void InfoCommand::Describe(CLI::App& app) {
 
 Json LevelsOf(const zmchost::PyramidFileInfo& info) {
     Json levels = Json::array();
-    const bool woven = info.header.tileOrdering == zelm::TileOrder::Morton;
+    const bool woven = info.header.IsPlanar();
     for (const zmchost::PyramidLevelInfo& level : info.levels)
         levels.push_back({{"level", level.level},
                           {"width", level.width},
@@ -114,15 +114,15 @@ Json Describe(const std::string& file) {
                      {"file", file},
                      {"width", header.width},
                      {"height", header.height},
-                     {"bands", header.bands},
+                     {"bands", header.bandCount},
                      {"pixelType", zelm::PixelTypeName(header.pixelType)},
                      {"interleave", zelm::InterleaveName(header.interleave)},
                      {"tileOrdering", zelm::TileOrderName(header.tileOrdering)},
                      {"tileSize", header.tileSize},
                      {"version", std::to_string(header.versionMajor) + '.' +
                                      std::to_string(header.versionMinor)},
-                     {"levelMin", header.minLevel},
-                     {"levelMax", header.maxLevel},
+                     {"levelMin", header.levelMin},
+                     {"levelMax", header.levelMax},
                      {"complete", info.complete},
                      {"bytesMissing", JsonNumber(info.bytesMissing)},
                      {"levels", LevelsOf(info)},

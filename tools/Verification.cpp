@@ -33,9 +33,9 @@ CheckResult CheckStructure(const zmchost::PyramidFileInfo& info, const zmchost::
     };
     expect("the width", header.width, props.samples);
     expect("the height", header.height, props.lines);
-    expect("the number of bands", header.bands, props.bands);
+    expect("the number of bands", header.bandCount, props.bands);
     expect("the pixel type", header.pixelType, props.pixelType);
-    expect("the finest level", header.minLevel, 0);
+    expect("the finest level", header.levelMin, 0);
     const std::uint32_t version = header.versionMajor << 16 | header.versionMinor;
     if (version < (1u << 16 | 1u))
         result.problems.push_back("version " + std::to_string(header.versionMajor) + '.' +

@@ -71,9 +71,10 @@ std::uint32_t MaxLevelOf(std::uint32_t width, std::uint32_t height) {
 
 std::uint32_t DefaultMaxLevel(std::uint32_t width, std::uint32_t height, std::uint32_t bands) {
     std::uint32_t most = MaxLevelOf(width, height);
-    if (bands > kMaxInterleavedBands) most = std::min(most, kMaxMortonLevel);
+    if (bands > zelm::kMaxInterleavedBands) most = std::min(most, kMaxMortonLevel);
     std::uint32_t level = 0;
-    while (level < most && (std::max(width, height) >> level) > kTileSide) ++level;
+    while (level < most && zelm::LevelGeometry::Extent(std::max(width, height), level) > kTileSide)
+        ++level;
     return level;
 }
 

@@ -10,17 +10,19 @@
 #ifndef ZMC_HOST_BUILD_BUILDPLAN_H
 #define ZMC_HOST_BUILD_BUILDPLAN_H
 
+#include <bit>
 #include <cstdint>
 #include <vector>
+
+#include "format/PyramidHeaderRecord.h"
 
 namespace zmchost {
 
 // Side of the tiles of every file that the module creates.
-inline constexpr std::uint32_t kTileSide = 256;
-// Coarsest level that has addresses in the Morton ordering.
-inline constexpr std::uint32_t kMaxMortonLevel = 8;
-// Bands above which the module lays a file out in the Morton ordering.
-inline constexpr std::uint32_t kMaxInterleavedBands = 8;
+inline constexpr std::uint32_t kTileSide = zelm::kWrittenTileSize;
+// Coarsest level whose tiles have addresses in the Morton ordering: behind it they shrink to
+// nothing.
+inline constexpr std::uint32_t kMaxMortonLevel = std::bit_width(kTileSide) - 1;
 
 inline std::uint32_t TilesAlong(std::uint32_t pixels) {
     return pixels / kTileSide + (pixels % kTileSide != 0 ? 1 : 0);

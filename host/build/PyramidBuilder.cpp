@@ -142,20 +142,18 @@ void BuildRun::SettleNoData() {
 }
 
 void BuildRun::SettleOrdering() {
-    const bool morton = props.bands > kMaxInterleavedBands;
+    const bool morton = props.bands > zelm::kMaxInterleavedBands;
     if (options.ordering != Ordering::Auto && morton != (options.ordering == Ordering::Morton))
         throw Error(name, "use that tile ordering",
                     "a file of " + std::to_string(props.bands) + " bands is " +
                         (morton ? "always in Morton order" : "never in Morton order"));
     props.tileLines = options.ordering == Ordering::Scanline ? 1 : kTileSide;
-    report.tileOrdering = morton                ? zelm::TileOrder::Morton
-                          : props.tileLines > 1 ? zelm::TileOrder::Blocked
-                                                : zelm::TileOrder::Scanline;
+    report.tileOrdering = zelm::TileOrderFor(props.bands, props.tileLines);
 }
 
 void BuildRun::SettleLevels() {
     std::uint32_t most = MaxLevelOf(props.samples, props.lines);
-    if (props.bands > kMaxInterleavedBands) most = std::min(most, kMaxMortonLevel);
+    if (props.bands > zelm::kMaxInterleavedBands) most = std::min(most, kMaxMortonLevel);
     maxLevel = options.levels.value_or(DefaultMaxLevel(props.samples, props.lines, props.bands));
     if (maxLevel > most)
         throw Error(name, "make " + std::to_string(maxLevel) + " levels",
@@ -231,8 +229,8 @@ std::uint64_t BuildRun::MetadataBound() const {
 void BuildRun::LayOut() {
     std::uint64_t tileBytes = 0;
     for (std::uint32_t level = 0; level <= maxLevel; ++level)
-        tileBytes += (std::uint64_t{props.samples} >> level) *
-                     (std::uint64_t{props.lines} >> level) * pixelBytes;
+        tileBytes +=
+            zelm::LevelGeometry::LevelPixels(props.samples, props.lines, level) * pixelBytes;
     file->CheckSpace(tileBytes + MetadataBound());
     zelm::RasterProps plain = props;
     plain.noDataValues.clear();

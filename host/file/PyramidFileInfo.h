@@ -8,13 +8,15 @@
 
 #include <cstdint>
 #include <string>
-#include <string_view>
 #include <vector>
 
+#include "format/PyramidFront.h"
 #include "host/file/PyramidHeader.h"
 
 namespace zmchost {
 
+// Levels from 32 on hold nothing, and neither do those that have shrunk to it: no pixel and no
+// byte.
 struct PyramidLevelInfo {
     std::uint32_t level = 0;
     std::uint32_t width = 0;
@@ -29,7 +31,7 @@ struct PyramidLevelInfo {
 
 struct PyramidFileInfo {
     PyramidHeader header;
-    std::vector<PyramidLevelInfo> levels;  // from header.minLevel to header.maxLevel
+    std::vector<PyramidLevelInfo> levels;  // from header.levelMin to header.levelMax
     // The file reaches the end of its tiles and its version is 1.1 or later.
     bool complete = false;
     std::uint64_t bytesMissing = 0;  // up to the end of the tiles
@@ -48,9 +50,8 @@ PyramidFileInfo ReadPyramidFileInfo(const std::string& file);
 // The same from a header that is known already.
 PyramidFileInfo DescribePyramidFile(const PyramidHeader& header);
 
-// True if `start`, some bytes from the beginning of a file, look like a pyramid: the magic, and the
-// opening of an XML document behind the offsets. 32 bytes are enough.
-bool LooksLikePyramid(std::string_view start);
+// True if some bytes from the beginning of a file, of which 32 are enough, look like a pyramid.
+using zelm::LooksLikePyramid;
 
 }  // namespace zmchost
 

@@ -4,6 +4,7 @@
 #include <memory>
 #include <string_view>
 
+#include "format/DocumentLimits.h"
 #include "host/base/Checksum.h"
 #include "host/base/Error.h"
 #include "host/base/Text.h"
@@ -20,6 +21,7 @@ using platform::File;
 using platform::FileLock;
 
 const std::string kKind = "zmcmeta";
+constexpr char kMark = zelm::kUnfinishedDocument;
 const char* const kKeep = "keep a copy of its metadata document";
 
 std::unique_ptr<File> OpenFile(const std::string& path, File::Mode mode) {
@@ -104,7 +106,7 @@ private:
             if (stream->WriteAt(at, bytes.data(), bytes.size()) != bytes.size()) Fail();
         };
         const std::string_view text = record.text;
-        if (!text.empty()) write(record.offset, std::string_view(&kUnfinishedStore, 1));
+        if (!text.empty()) write(record.offset, std::string_view(&kMark, 1));
         const std::uint64_t end = GotTiles(*stream) ? record.offset : record.fileSize;
         if (size > end && !stream->Truncate(end)) Fail();
         if (text.empty()) return;

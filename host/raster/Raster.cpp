@@ -121,8 +121,8 @@ Raster Raster::Open(ModulePtr module, const std::string& file) {
     Raster raster(module, file, connection);
     raster.TakeReader();
     raster.header = header;
-    raster.minLevel = header.minLevel;
-    raster.maxLevel = header.maxLevel;
+    raster.minLevel = header.levelMin;
+    raster.maxLevel = header.levelMax;
     raster.recoveryNote = recovery.text;
     return raster;
 }
@@ -148,8 +148,8 @@ Raster Raster::Create(ModulePtr module, const std::string& file, zelm::RasterPro
     // The module says so too where the file could not be made, so the file is looked at.
     raster.header = PyramidHeader::Read(file);
     raster.maxLevel = maxLevel;
-    if (raster.header->maxLevel != maxLevel || raster.header->width != props.samples ||
-        raster.header->height != props.lines || raster.header->bands != props.bands)
+    if (raster.header->levelMax != maxLevel || raster.header->width != props.samples ||
+        raster.header->height != props.lines || raster.header->bandCount != props.bands)
         throw Error(file, "lay out the raster", "an older file stands in its place");
     platform::RemoveEntry(MetadataJournal::PathFor(file));
     raster.SetNoDataValues(noData);
@@ -173,12 +173,12 @@ std::uint32_t Raster::SampleSize() const { return zelm::PixelSize(props.pixelTyp
 // The module's own sizes ignore the level as long as a file is incomplete.
 std::uint32_t Raster::Width(std::uint32_t level) const {
     CheckLevel(level);
-    return props.samples >> level;
+    return zelm::LevelGeometry::Extent(props.samples, level);
 }
 
 std::uint32_t Raster::Height(std::uint32_t level) const {
     CheckLevel(level);
-    return props.lines >> level;
+    return zelm::LevelGeometry::Extent(props.lines, level);
 }
 
 const PyramidHeader& Raster::Header() const {

@@ -19,6 +19,7 @@
 #include "gdal/SampleType.h"
 #include "host/file/PyramidHeader.h"
 #include "host/journal/MetadataJournal.h"
+#include "tests/support/LenientHeaders.h"
 #include "tests/support/ScratchDirectory.h"
 
 namespace zmcgdal {
@@ -269,6 +270,46 @@ TEST_F(DriverTest, StoreThatWasCutOffIsPutInOrder) {
     EXPECT_EQ(MeanOf(*opened), mean);
     EXPECT_FALSE(fs::exists(zmchost::MetadataJournal::PathFor(name)));
 }
+
+class LenientHeaders : public DriverTest,
+                       public testing::WithParamInterface<support::LenientHeader> {};
+
+// What the module reads in a header is what is shown, and what buffers are made by.
+TEST_P(LenientHeaders, SayTheSameToGdal) {
+    const support::LenientHeader& expected = GetParam();
+    support::WriteText(Path("a.pyr"), expected.File());
+    const DatasetPtr dataset = Open(Path("a.pyr"));
+    ASSERT_TRUE(dataset);
+    EXPECT_EQ(dataset->GetRasterXSize(), static_cast<int>(expected.width));
+    EXPECT_EQ(dataset->GetRasterYSize(), static_cast<int>(expected.height));
+    ASSERT_EQ(dataset->GetRasterCount(), static_cast<int>(support::LenientHeader::kBands));
+    const auto item = [&](const char* name) {
+        return std::string(dataset->GetMetadataItem(name, "ZMCPYRAMID"));
+    };
+    EXPECT_EQ(item("LEVEL_MIN"), std::to_string(expected.levelMin));
+    EXPECT_EQ(item("LEVEL_MAX"), std::to_string(expected.levelMax));
+    EXPECT_EQ(item("COMPLETE"), "YES");
+    GDALRasterBand& band = *dataset->GetRasterBand(2);
+    const GDALDataType type = band.GetRasterDataType();
+    EXPECT_EQ(type, expected.pixelType == 12 ? GDT_UInt16 : GDT_Byte);
+    const auto pixels = static_cast<std::size_t>(expected.width) * expected.height;
+    std::vector<unsigned char> read(pixels * expected.sampleBytes);
+    ASSERT_EQ(band.RasterIO(GF_Read, 0, 0, static_cast<int>(expected.width),
+                            static_cast<int>(expected.height), read.data(),
+                            static_cast<int>(expected.width), static_cast<int>(expected.height),
+                            type, 0, 0, nullptr),
+              CE_None);
+    EXPECT_EQ(std::count(read.begin(), read.end(), 1), static_cast<std::ptrdiff_t>(read.size()));
+    // Levels without pixels are nobody's overview, be their number 32 and more or less.
+    for (int i = 0; i < band.GetOverviewCount(); ++i) {
+        EXPECT_EQ(band.GetOverview(i)->GetXSize(), static_cast<int>(expected.width) >> (i + 1));
+        EXPECT_GT(band.GetOverview(i)->GetYSize(), 0);
+    }
+    EXPECT_EQ(band.GetOverviewCount(), static_cast<int>(std::min(expected.levelMax, 8u)));
+}
+
+INSTANTIATE_TEST_SUITE_P(All, LenientHeaders, testing::ValuesIn(support::kLenientHeaders),
+                         [](const auto& each) { return each.param.name; });
 
 }  // namespace
 }  // namespace zmcgdal

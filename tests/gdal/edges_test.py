@@ -191,7 +191,8 @@ class Headers(FolderTest):
                 "too large": {"PIXEL_WIDTH": 2147483648, "PIXEL_HEIGHT": 1},
                 "number of bands": {"BANDS": 70000},
                 "tiles are too large": {"BANDS": 2000, "TILESIZE": 2048},
-                "is no number": {"BANDS": "many"}}.items():
+                "of its number of bands": {"BANDS": "many"},
+                "tile size is 0": {"TILESIZE": ""}}.items():
             with self.subTest(why):
                 with self.assertRaisesRegex(RuntimeError, why):
                     self.opened(**fields)

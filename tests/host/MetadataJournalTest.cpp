@@ -481,7 +481,7 @@ TEST(MetadataDocument, IsJudgedAsReadersDo) {
         {"<!DOCTYPE DATASET><DATASET/>", "malformed"},
         {"<DATASET>&a;</DATASET>", "malformed"},
         {deep, "too deeply"},
-        {names + "</DATASET>", "too many different names"},
+        {names + "</DATASET>", "too many unknown names"},
         {"<OTHER/>", "no root DATASET"}};
     for (const auto& [text, reason] : wrong)
         EXPECT_THAT(JudgeMetadataText(text), testing::HasSubstr(reason)) << text;

@@ -4,10 +4,8 @@
 
 #include <cstdio>
 #include <fstream>
-#include <stdexcept>
 
 #include "host/base/Error.h"
-#include "host/file/HeaderScanner.h"
 
 namespace zmchost {
 namespace {
@@ -61,12 +59,12 @@ TEST_F(PyramidFileInfoTest, TellsEveryFieldOfTheHeader) {
     const PyramidHeader header = Read({}).header;
     EXPECT_EQ(header.versionMajor, 1u);
     EXPECT_EQ(header.versionMinor, 1u);
-    EXPECT_EQ(header.bands, 3u);
+    EXPECT_EQ(header.bandCount, 3u);
     EXPECT_EQ(header.width, 1000u);
     EXPECT_EQ(header.height, 777u);
     EXPECT_EQ(header.tileSize, 256u);
-    EXPECT_EQ(header.minLevel, 0u);
-    EXPECT_EQ(header.maxLevel, 2u);
+    EXPECT_EQ(header.levelMin, 0u);
+    EXPECT_EQ(header.levelMax, 2u);
     EXPECT_EQ(header.pixelType, 1u);
     EXPECT_EQ(header.interleave, 2);
     EXPECT_EQ(header.tileOrdering, 1u);
@@ -115,20 +113,44 @@ TEST_F(PyramidFileInfoTest, LevelsMayStartAboveZeroAndShrinkToNothing) {
     EXPECT_EQ(info.FindLevel(9)->width, 1u);
     EXPECT_EQ(info.FindLevel(10)->bytes, 0u);
     EXPECT_EQ(info.FindLevel(40)->bytes, 0u);
-    EXPECT_EQ(info.FindLevel(40)->width, 1000u >> 8);
+    // Nor does one that would look like the first.
+    EXPECT_EQ(info.FindLevel(9)->height, 1u);
+    for (const std::uint32_t level : {31u, 32u, 40u}) {
+        EXPECT_EQ(info.FindLevel(level)->width, 0u) << level;
+        EXPECT_EQ(info.FindLevel(level)->height, 0u) << level;
+        EXPECT_EQ(info.FindLevel(level)->tilesAcross, 0u) << level;
+        EXPECT_EQ(info.FindLevel(level)->tilesDown, 0u) << level;
+    }
 }
 
 TEST_F(PyramidFileInfoTest, RefusesHeadersThatNobodyCanReadBy) {
     const std::pair<std::string Fields::*, const char*> cases[] = {
-        {&Fields::tileSize, "0"},  {&Fields::tileSize, "2049"},   {&Fields::levelMax, "64"},
+        {&Fields::tileSize, "0"},  {&Fields::tileSize, "2049"},   {&Fields::levelMax, "1024"},
         {&Fields::levelMin, "3"},  {&Fields::height, "<a>1</b>"}, {&Fields::height, "&x;"},
-        {&Fields::type, "Nibble"}, {&Fields::width, "-1"},        {&Fields::width, "4294967296"},
-        {&Fields::width, ""}};
+        {&Fields::type, "Nibble"}, {&Fields::height, "\x01"},     {&Fields::levelMax, "4294967295"},
+        {&Fields::tileSize, ""}};
     for (const auto& [field, value] : cases) {
         Fields fields;
         fields.*field = value;
         EXPECT_THROW(Read(fields), Error) << value;
     }
+}
+
+// Numbers are read as the module reads them.
+TEST_F(PyramidFileInfoTest, NumbersThatAreNone) {
+    const std::pair<const char*, std::uint32_t> cases[] = {
+        {"", 0}, {"many", 0}, {"-1", 4294967295}, {"4294967297", 1}, {" 12.9", 12}};
+    for (const auto& [text, number] : cases) {
+        Fields fields;
+        fields.width = text;
+        EXPECT_EQ(Read(fields).header.width, number) << text;
+    }
+}
+
+TEST_F(PyramidFileInfoTest, TheLastLevelThatThereCanBe) {
+    Fields fields;
+    fields.levelMax = "1023";
+    EXPECT_EQ(Read(fields).levels.size(), 1024u);
 }
 
 TEST_F(PyramidFileInfoTest, RefusesEveryCutFile) {
@@ -166,23 +188,6 @@ TEST_F(PyramidFileInfoTest, NamesTheFileInFailures) {
     } catch (const Error& error) {
         EXPECT_EQ(error.File(), name);
     }
-}
-
-TEST(HeaderScanner, ReadsCommentsEntitiesAndEmptyElements) {
-    const auto values = ScanHeaderDocument(
-        "\xEF\xBB\xBF<?xml version='1.0'?><!-- > -->\n<DATASET><HEADER><A> x &lt;<!-- -->y </A>"
-        "<B/></HEADER><OTHER><A>2</A></OTHER></DATASET>\n");
-    EXPECT_EQ(values.size(), 2u);
-    EXPECT_EQ(values.at("A"), "x <y");
-    EXPECT_EQ(values.at("B"), "");
-}
-
-TEST(HeaderScanner, RefusesWhatIsNotWellFormed) {
-    for (const char* document :
-         {"", " ", "<DATASET>", "<DATASET></HEADER>", "<HEADER/>", "<DATASET/><DATASET/>",
-          "<!DOCTYPE a [<!ENTITY b 'c'>]><DATASET/>", "<DATASET>text</DATASET>", "</>",
-          "<DATASET><A><B><C/></B></A></DATASET>", "<DATASET/>trailing", "<DATASET", "<>"})
-        EXPECT_THROW((void)ScanHeaderDocument(document), std::runtime_error) << document;
 }
 
 TEST(PyramidFileInfo, KnowsAPyramidByItsStart) {
