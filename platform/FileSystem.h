@@ -25,6 +25,8 @@ struct FileStatus {
 };
 
 std::string LastErrorText();
+// The text of an error number of the system, as operations on open files tell it.
+std::string ErrorText(int error);
 
 FileStatus StatusOf(const std::string& path);
 

@@ -43,7 +43,9 @@ bool Sync(const std::string& path, int flags) {
 
 }  // namespace
 
-std::string LastErrorText() { return std::generic_category().message(errno); }
+std::string ErrorText(int error) { return std::generic_category().message(error); }
+
+std::string LastErrorText() { return ErrorText(errno); }
 
 FileStatus StatusOf(const std::string& path) {
     FileStatus status;
