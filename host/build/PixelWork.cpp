@@ -212,6 +212,8 @@ public:
             tile.height, allBands, static_cast<std::int32_t>(level), Samples(pixels), cleanMask);
     }
 
+    std::string Failure() override { return target.TakeFailure(); }
+
     void StoreStatistics() override { harvest.Store(target); }
     std::uint64_t StatisticsMemory() const override { return harvest.Memory(); }
 

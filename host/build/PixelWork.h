@@ -10,6 +10,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <memory>
+#include <string>
 
 #include "host/raster/RasterSource.h"
 #include "host/reduce/Reduction.h"
@@ -47,7 +48,10 @@ public:
     virtual void TakeCounts(std::uint32_t lane, const std::byte* row, const unsigned char* mask,
                             std::uint32_t width) = 0;
 
-    // Whole tiles with all bands, through the module's reader. False if the module says so.
+    // Whole tiles with all bands, through the module's reader. False if the module says so, which
+    // it does not where the disk failed: Failure tells why that did not do all that was asked of it
+    // since the last question, and is empty if it did.
+    virtual std::string Failure() = 0;
     virtual bool ReadTile(std::uint32_t level, const Window& tile, std::byte* pixels) = 0;
     virtual bool WriteTile(std::uint32_t level, const Window& tile, std::byte* pixels,
                            unsigned char* cleanMask) = 0;

@@ -1,9 +1,8 @@
 // TileStore: the tiles of the file that is being built.
 //
 // Writes rows of tiles from strips and reads windows of finished levels back. The module says true
-// for a write that the disk refused, so every tile is read back at once, while the system still
-// holds it in memory, and compared. Reads and writes may come from several threads; one at a time
-// goes on, as the module wants it.
+// for a write that the disk refused; what the disk said is asked for behind every tile. Reads and
+// writes may come from several threads; one at a time goes on, as the module wants it.
 #ifndef ZMC_HOST_BUILD_TILESTORE_H
 #define ZMC_HOST_BUILD_TILESTORE_H
 
@@ -35,11 +34,11 @@ public:
 
     // Writes the tiles of columns [begin, end) of the strip's level, which the strip holds from
     // column `stripBegin` on. Its lines are whole rows of tiles, and so are the columns. Throws
-    // Error for a tile that is not in the file afterwards.
+    // Error for a tile that the disk did not take.
     void Write(const Strip& strip, std::uint32_t stripBegin, std::uint32_t begin,
                std::uint32_t end);
 
-    // Reads a window of a level whose tiles were all written.
+    // Reads a window of a level whose tiles were all written. Throws Error, as the next does.
     void Read(std::uint32_t level, const Window& window, std::byte* pixels);
 
     // Reads one whole tile; the buffer has room for a full one.
@@ -52,11 +51,12 @@ public:
 private:
     void WriteTile(const Strip& strip, std::uint32_t stripBegin, std::uint32_t column,
                    std::uint32_t row);
+    void Check(const char* operation, bool done);
 
     TileStoreSetup setup;
     PixelWork& work;
     std::mutex mutex;
-    MeteredBytes buffer, readBack;
+    MeteredBytes buffer;
     std::vector<unsigned char> cleanMask;
 };
 

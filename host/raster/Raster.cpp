@@ -7,6 +7,7 @@
 #include "core/PixelVocabulary.h"
 #include "host/base/Text.h"
 #include "host/journal/MetadataJournal.h"
+#include "host/raster/LentFile.h"
 #include "host/raster/NoData.h"
 #include "platform/FileSystem.h"
 
@@ -111,19 +112,32 @@ void Raster::TakeReader() {
 
 // Here and below the caller's hold on the module outlasts the connection, whatever is thrown.
 Raster Raster::Open(ModulePtr module, const std::string& file) {
-    const platform::FileStatus status = platform::StatusOf(file);
-    if (!status.exists) throw Error(file, "open the raster", "there is no such file");
-    if (!status.isRegular) throw Error(file, "open the raster", "it is not a file");
+    const auto opened = std::make_shared<LentFile>(OpenPlainFile(file, true), file);
     const Recovery recovery = RecoverMetadata(file);
-    PyramidHeader header = PyramidHeader::Read(file);
-    zelm::RasterDataConnectionPtr connection = module->OpenPyramid(file);
-    if (!connection) throw Error(file, "open the raster", "the module refuses it");
-    Raster raster(module, file, connection);
+    opened->Accept();
+    Raster raster = OpenLent(std::move(module), file, opened);
+    raster.recoveryNote = recovery.text;
+    return raster;
+}
+
+Raster Raster::Open(ModulePtr module, std::shared_ptr<zelm::files::ByteSource> source,
+                    const std::string& name) {
+    if (!source) throw Error(name, "open the raster", "there is no source");
+    return OpenLent(std::move(module), name, std::make_shared<LentFile>(std::move(source), name));
+}
+
+Raster Raster::OpenLent(ModulePtr module, const std::string& name, std::shared_ptr<LentFile> file) {
+    const PyramidHeader header = file->ReadHeader();
+    const zelm::RasterDataConnectionPtr connection = module->OpenPyramid(file->Name());
+    const std::string failure = file->TakeFailure();
+    if (!connection || !failure.empty())
+        throw Error(name, "open the raster", failure.empty() ? "the module refuses it" : failure);
+    Raster raster(module, name, connection);
     raster.TakeReader();
+    raster.file = std::move(file);
     raster.header = header;
     raster.minLevel = header.levelMin;
     raster.maxLevel = header.levelMax;
-    raster.recoveryNote = recovery.text;
     return raster;
 }
 
@@ -135,23 +149,27 @@ Raster Raster::Create(ModulePtr module, const std::string& file, zelm::RasterPro
     if (status.exists && (status.readOnly || !status.isRegular))
         throw Error(file, "create the raster",
                     status.isRegular ? "the file is read-only" : "it is not a file");
-    const zelm::RasterDataConnectionPtr connection = module->CreatePyramid(file, props);
+    const std::shared_ptr<LentFile> opened = LentFile::Create(file);
+    const zelm::RasterDataConnectionPtr connection = module->CreatePyramid(opened->Name(), props);
     if (!connection) throw Error(file, "create the raster", "the module refuses it");
     Raster raster(module, file, connection);
     raster.TakeReader();
+    raster.file = opened;
     bool built = false;
     const std::int32_t pair[] = {2, 2};
     raster.Visit([&](auto& typed) {
         built = typed.BuildPyramid(0, static_cast<std::int32_t>(maxLevel), 0, pair);
     });
     if (!built) throw Error(file, "lay out the raster", "the module refuses it");
-    // The module says so too where the file could not be made, so the file is looked at.
-    raster.header = PyramidHeader::Read(file);
+    raster.CheckDisk("lay out the raster");
+    // The module says so too where it makes no such file, so the file is looked at.
+    raster.header = opened->ReadHeader();
     raster.maxLevel = maxLevel;
     if (raster.header->levelMax != maxLevel || raster.header->width != props.samples ||
         raster.header->height != props.lines || raster.header->bandCount != props.bands)
         throw Error(file, "lay out the raster", "an older file stands in its place");
     platform::RemoveEntry(MetadataJournal::PathFor(file));
+    opened->Accept();
     raster.SetNoDataValues(noData);
     return raster;
 }
@@ -213,11 +231,21 @@ bool Raster::IsComplete() {
         typed.RefreshPyramidState();
         complete = typed.HasPyramid();
     });
-    header->fileSize = platform::StatusOf(name).size;
+    header->fileSize = file->Size();
+    CheckDisk("look at its size");
     return complete;
 }
 
-bool Raster::IsWritable() const { return !header || !platform::StatusOf(name).readOnly; }
+bool Raster::IsWritable() const { return !file || file->IsWritable(); }
+
+std::string Raster::Change() const { return file ? file->Change() : ""; }
+
+std::string Raster::TakeFailure() const { return file ? file->TakeFailure() : ""; }
+
+void Raster::CheckDisk(const std::string& operation) const {
+    if (const std::string failure = TakeFailure(); !failure.empty())
+        throw Error(name, operation, failure);
+}
 
 std::optional<double> Raster::NoDataValue(std::uint32_t band) const {
     if (!props.HasNoDataValue(band)) return std::nullopt;
@@ -265,6 +293,8 @@ void Raster::CheckWindow(const char* operation, std::uint32_t level, const Windo
 
 void Raster::CheckWritable(const char* operation) const {
     if (!IsWritable()) throw Error(name, operation, "the file is read-only");
+    const std::string loss = file ? file->LossOfName() : "";
+    if (!loss.empty()) throw Error(name, operation, loss);
 }
 
 void Raster::ReadTile(std::uint32_t level, const Window& window,
@@ -277,6 +307,7 @@ void Raster::ReadTile(std::uint32_t level, const Window& window,
                            window.width, window.height, list, static_cast<std::int32_t>(level),
                            static_cast<T*>(pixels), nullptr);
     });
+    CheckDisk("read " + Describe(window));
     if (!read) throw Error(name, "read " + Describe(window), "the module refuses");
 }
 
@@ -342,10 +373,8 @@ void Raster::WriteTile(std::uint32_t level, const Window& window,
                                   list, static_cast<std::int32_t>(level),
                                   static_cast<T*>(static_cast<void*>(pixels.data())), mask.data());
     });
-    std::vector<unsigned char> stored(pixels.size());
-    if (written) ReadTile(level, window, AllBands(), stored.data());
-    if (!written || stored != pixels)
-        throw Error(name, "write " + Describe(window), "it did not reach the file (disk full?)");
+    CheckDisk("write " + Describe(window));
+    if (!written) throw Error(name, "write " + Describe(window), "the module refuses");
 }
 
 void Raster::MergeTile(std::uint32_t level, const Window& tile, const Window& window,
@@ -399,11 +428,13 @@ void Raster::Write(std::uint32_t level, const Window& window, std::span<const st
         for (std::uint32_t column = window.x / side;
              column * std::uint64_t{side} < window.x + window.width; ++column)
             MergeTile(level, Tile(level, column, row), window, bands, samples.data());
+    file->Accept();
 }
 
 bool Raster::HasStatistics(std::uint32_t band) const {
     bool has = false;
     Visit([&](auto& typed) { has = typed.HasBandStats(band); });
+    CheckDisk("read the statistics");
     return has;
 }
 
@@ -424,6 +455,7 @@ zelm::RasterBandStats<T> Raster::Statistics(std::uint32_t band) const {
     zelm::RasterBandStats<T> record = typed.GetBandStats(band);
     for (std::uint32_t place = 0; record.band != band && place < Bands(); ++place)
         record = typed.GetBandStats(place);
+    CheckDisk("read the statistics of band " + std::to_string(band));
     if (record.band != band)
         throw Error(name, "read the statistics of band " + std::to_string(band),
                     "the module does not find the record that the file has");
@@ -431,13 +463,15 @@ zelm::RasterBandStats<T> Raster::Statistics(std::uint32_t band) const {
 }
 
 void Raster::Store(const std::function<void()>& action) {
-    if (!keepsCopies || !header) {
-        action();
-        return;
-    }
-    MetadataJournal copy(name);
+    if (!file) return action();
+    CheckWritable("store into its metadata document");
+    std::optional<MetadataJournal> copy;
+    if (keepsCopies)
+        if (const std::string plain = file->PlainName(); !plain.empty()) copy.emplace(plain);
     action();
-    copy.Finish();
+    CheckDisk("store into its metadata document");
+    if (copy) copy->Finish();
+    file->Accept();
 }
 
 template <class T>
@@ -451,15 +485,17 @@ void Raster::SetStatistics(const std::vector<zelm::RasterBandStats<T>>& records)
         throw Error(name, "store statistics", "it has some already, and a file keeps the oldest");
     Store([&] {
         typed.SetBandStats(ToArray(records));
+        CheckDisk("store statistics");
         bool has = true;
         for (std::uint32_t band = 0; has && band < Bands(); ++band) has = HasStatistics(band);
-        if (!has) throw Error(name, "store statistics", "they did not reach the file (disk full?)");
+        if (!has) throw Error(name, "store statistics", "the module did not store them");
     });
 }
 
 template <class T>
 std::vector<zelm::RasterBandHistogram<T>> Raster::Histograms() const {
     const zelm::Array<zelm::RasterBandHistogram<T>> stored = Typed<T>().GetHistograms();
+    CheckDisk("read the histograms");
     return {stored.data, stored.data + stored.shape.elements};
 }
 
@@ -470,15 +506,15 @@ void Raster::SetHistograms(const std::vector<zelm::RasterBandHistogram<T>>& hist
     const zelm::Array<zelm::RasterBandHistogram<T>> given = ToArray(histograms);
     for (std::size_t i = 0; i < histograms.size(); ++i)
         if (!given.data || !HaveSameCounts(given.data[i], histograms[i])) throw std::bad_alloc();
-    const std::size_t before = typed.GetHistograms().shape.elements;
+    const std::size_t before = Histograms<T>().size();
     Store([&] {
         typed.SetHistograms(given);
+        CheckDisk("store histograms");
         const zelm::Array<zelm::RasterBandHistogram<T>> stored = typed.GetHistograms();
         bool same = stored.shape.elements == before + histograms.size();
         for (std::size_t i = 0; same && i < histograms.size(); ++i)
             same = HaveSameCounts(stored.data[before + i], histograms[i]);
-        if (!same)
-            throw Error(name, "store histograms", "they did not reach the file (disk full?)");
+        if (!same) throw Error(name, "store histograms", "the module did not store them");
     });
 }
 
@@ -491,6 +527,7 @@ zelm::PalettePtr Raster::BandPalette(std::uint32_t band) const {
         palette.Reset(new zelm::Palette);
         stored->CopyTo(*palette);
     });
+    CheckDisk("read the palette of band " + std::to_string(band));
     return palette;
 }
 
@@ -499,9 +536,10 @@ void Raster::SetBandPalette(std::uint32_t band, const zelm::Palette& palette) {
     if (band >= Bands()) throw Error(name, "store a palette", "there is no such band");
     Store([&] {
         Visit([&](auto& typed) { typed.SetPalette(band, palette); });
+        CheckDisk("store a palette");
         const zelm::PalettePtr stored = BandPalette(band);
         if ((stored ? stored->nextIndex : 0) != palette.nextIndex)
-            throw Error(name, "store a palette", "it did not reach the file (disk full?)");
+            throw Error(name, "store a palette", "the module did not store it");
     });
 }
 

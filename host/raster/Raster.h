@@ -1,8 +1,14 @@
 // Raster: one raster of the module, pyramid file or memory, with errors instead of silence.
 //
-// The module answers true where nothing was stored, drops writes that its layout does not take, and
+// The module answers true whatever the disk did, drops writes that its layout does not take, and
 // reads what is not in the file as whatever was in the buffer. This class looks: it refuses what
-// the module would drop, reads back what it wrote, and throws Error with the reason.
+// the module would drop, and throws Error with the reason that the system gave for whatever failed
+// below the module, at which offset.
+//
+// A raster opens its file once. What it reads and writes stays that file, whatever happens to its
+// name: a file that takes the name is not touched, and one that was replaced or removed is read on,
+// but not written, since nobody would find that. Change tells of it. Reading a file that was cut
+// throws.
 //
 // Levels count from 0, the finest; bands from 0. Samples of a pyramid are pixel-interleaved: lines
 // from the top, each pixel the samples of the bands asked for, in that order. A memory raster moves
@@ -15,11 +21,13 @@
 #include <cstdint>
 #include <functional>
 #include <map>
+#include <memory>
 #include <optional>
 #include <span>
 #include <string>
 #include <vector>
 
+#include "files/ByteSource.h"
 #include "host/base/Error.h"
 #include "host/file/PyramidHeader.h"
 #include "host/raster/Module.h"
@@ -27,16 +35,23 @@
 
 namespace zmchost {
 
+class LentFile;
+
 class Raster {
 public:
     // Opens a pyramid file, for writing too where the file allows it. What a store with a copy
     // (KeepCopies) left behind when it was cut off is put in order first; RecoveryNote tells of it.
     static Raster Open(ModulePtr module, const std::string& file);
+    // The same from an open source, which `name` stands for in messages: a file of another kind, or
+    // one that the caller has looked at already. Nothing is put in order, and copies are kept of
+    // plain files alone (FileSource.h).
+    static Raster Open(ModulePtr module, std::shared_ptr<zelm::files::ByteSource> source,
+                       const std::string& name);
 
     // Lays out a new pyramid with the levels from 0 to maxLevel, replacing a file of that name. Of
     // `props` the size, bands, pixel type, tileLines (above 1: ordering Blocked) and no-data values
     // count; the file is always pixel-interleaved. Nothing protects the old file: to replace one
-    // safely, build beside it, as PyramidBuilder does.
+    // safely, build beside it, as PyramidBuilder does. A new file that fails goes again.
     static Raster Create(ModulePtr module, const std::string& file, zelm::RasterProps props,
                          std::uint32_t maxLevel);
 
@@ -70,7 +85,11 @@ public:
 
     // Whether all levels are in the file, looked at anew. A memory raster is always complete.
     bool IsComplete();
+    // Whether the file could be opened for writing. A memory raster always is.
     bool IsWritable() const;
+    // What others have done to the file since it was opened, or last written to by this object, for
+    // people: that it was cut, replaced, removed or written to. Empty if nothing is to be seen.
+    std::string Change() const;
 
     std::optional<double> NoDataValue(std::uint32_t band) const;
     // By band; they live in this object, since files have no place for them. A value that the pixel
@@ -83,8 +102,8 @@ public:
               void* pixels, unsigned char* mask = nullptr);
 
     // Writes a window of a level, whatever its place: tiles that it covers in part are read and
-    // written whole. Marked samples become the band's no-data value, if it has one. What was
-    // written is read back and compared.
+    // written whole. Marked samples become the band's no-data value, if it has one. What a write
+    // that was cut short leaves in its tile is anything.
     void Write(std::uint32_t level, const Window& window, std::span<const std::uint32_t> bands,
                const void* pixels, const unsigned char* mask = nullptr);
 
@@ -139,9 +158,16 @@ public:
         if (!reader->Visit(std::forward<Visitor>(visit)))
             throw Error(name, "use the raster", "the module has no reader for its pixel type");
     }
+    // Why the file did not do all that was asked of it since the last question, in words; empty if
+    // it did. For those who work with the module's reader; the operations of this class ask.
+    std::string TakeFailure() const;
+    // The same thrown as an Error; `operation` is a verb with its object.
+    void CheckDisk(const std::string& operation) const;
 
 private:
     Raster(ModulePtr holder, std::string rasterName, zelm::RasterDataConnectionPtr opened);
+    static Raster OpenLent(ModulePtr module, const std::string& name,
+                           std::shared_ptr<LentFile> file);
     void TakeReader();
     void CheckType(std::uint32_t pixelType) const;
     void CheckLevel(std::uint32_t level) const;
@@ -164,6 +190,7 @@ private:
     zelm::RasterDataConnectionPtr connection;
     zelm::RasterReaderDispatchPtr reader;
     zelm::RasterProps props;
+    std::shared_ptr<LentFile> file;  // null of a memory raster
     std::optional<PyramidHeader> header;
     std::uint32_t minLevel = 0;
     std::uint32_t maxLevel = 0;

@@ -226,8 +226,8 @@ TEST_F(BuildSafety, ReadOnlyDiskIsRefused) {
     EXPECT_THAT(FailureOf(folder / "disk/new.zmc", {}), testing::HasSubstr("Read-only"));
 }
 
-// A module whose disk loses the end of every second tile without a word.
-class LosingWork : public PixelWork {
+// A module that answers true on a disk that takes no tile, or gives none.
+class FailingWork : public PixelWork {
 public:
     bool NeedsMasks() const override { return false; }
     bool MarkRow(const std::byte*, unsigned char*, std::uint32_t) const override { return false; }
@@ -238,37 +238,47 @@ public:
     void BeginSecondWalk() override {}
     void TakeCounts(std::uint32_t, const std::byte*, const unsigned char*, std::uint32_t) override {
     }
-    bool ReadTile(std::uint32_t, const Window& tile, std::byte* pixels) override {
-        std::copy_n(stored.begin(), std::size_t{tile.width} * tile.height, pixels);
-        return true;
+    bool ReadTile(std::uint32_t, const Window&, std::byte*) override { return answer; }
+    bool WriteTile(std::uint32_t, const Window&, std::byte*, unsigned char*) override {
+        return answer;
     }
-    bool WriteTile(std::uint32_t, const Window& tile, std::byte* pixels, unsigned char*) override {
-        const std::size_t size = std::size_t{tile.width} * tile.height;
-        stored.assign(pixels, pixels + size);
-        std::fill_n(stored.end() - static_cast<std::ptrdiff_t>(lost), lost, std::byte{0});
-        return true;
-    }
+    std::string Failure() override { return failure; }
     void StoreStatistics() override {}
     std::uint64_t StatisticsMemory() const override { return 0; }
 
-    std::size_t lost = 0;
-    std::vector<std::byte> stored;
+    bool answer = true;
+    std::string failure;
 };
 
-TEST(TileStore, SeesWhatTheDiskLost) {
-    for (const std::size_t lost : {0u, 1u, 4096u, 65000u}) {
-        LosingWork work;
-        work.lost = lost;
-        MemoryMeter meter;
-        TileStore store({"x", 256, 256, 0, 1, 1}, work, meter);
-        Strip strip(meter, 0, 65536, 1, 0, 256);
-        strip.Begin(0, 256, 256);
-        std::fill_n(strip.Row(0), 65536, std::byte{200});
-        if (lost == 0)
-            EXPECT_NO_THROW(store.Write(strip, 0, 0, 256));
-        else
-            EXPECT_THROW(store.Write(strip, 0, 0, 256), Error);
-    }
+TEST(TileStore, TellsWhatTheDiskSaidBehindAnAnswerOfTrue) {
+    FailingWork work;
+    MemoryMeter meter;
+    TileStore store({"x", 256, 256, 0, 1, 1}, work, meter);
+    Strip strip(meter, 0, 65536, 1, 0, 256);
+    strip.Begin(0, 256, 256);
+    std::vector<std::byte> pixels(65536);
+    const auto failures = [&] {
+        std::vector<std::string> found;
+        const auto note = [&](auto&& action) {
+            try {
+                action();
+            } catch (const Error& error) {
+                found.push_back(error.what());
+            }
+        };
+        note([&] { store.Write(strip, 0, 0, 256); });
+        note([&] { store.Read(0, {0, 0, 256, 256}, pixels.data()); });
+        note([&] { store.ReadTile(0, {0, 0, 256, 256}, pixels.data()); });
+        return found;
+    };
+    EXPECT_THAT(failures(), testing::IsEmpty());
+    work.failure = "the disk is full";
+    EXPECT_THAT(failures(), testing::ElementsAre("x: cannot write a tile: the disk is full",
+                                                 "x: cannot read a tile back: the disk is full",
+                                                 "x: cannot read a tile back: the disk is full"));
+    work.failure.clear();
+    work.answer = false;
+    EXPECT_THAT(failures(), testing::SizeIs(3));
 }
 
 }  // namespace

@@ -439,7 +439,7 @@ TEST_F(MetadataJournalTest, NamesThatAreLongOrLinksHaveCopiesToo) {
 
 TEST_F(MetadataJournalTest, DiscardingMakesRoomForNewStatistics) {
     support::WriteText(file, before.substr(0, front) + "\x1A<DATASET/>");
-    EXPECT_THAT(FailureOf([&] { Store(Open()); }), testing::HasSubstr("did not reach the file"));
+    EXPECT_THAT(FailureOf([&] { Store(Open()); }), testing::HasSubstr("did not store them"));
     DiscardMetadata(file);
     EXPECT_EQ(support::ReadText(file), before.substr(0, front));
     Store(Open());
