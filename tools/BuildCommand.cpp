@@ -28,7 +28,7 @@ class BuildCommand final : public Command {
 public:
     const char* Name() const override { return "build"; }
     const char* Summary() const override { return "Make a pyramid of any raster that GDAL reads"; }
-    void Describe(CLI::App& app) override;
+    void Describe(OptionTable& table) override;
     ExitStatus Run() override;
 
 private:
@@ -53,40 +53,43 @@ private:
     void Report(const zmchost::BuildReport& report, std::uint32_t pixelType) const;
 };
 
-void BuildCommand::Describe(CLI::App& app) {
-    app.add_option("SOURCE", source, "Raster to read: a file or any other name that GDAL knows")
-        ->required();
-    app.add_option("TARGET", target, "Pyramid file to make")->required();
-    app.add_option("--levels", levels,
-                   "Coarsest level; 0 makes the finest only, auto goes on until a level fits one "
-                   "tile (default auto)")
-        ->type_name("auto|N");
-    app.add_option("--resampling", resampling,
-                   "How levels are reduced (default average, and mode for rasters with a palette)")
-        ->type_name("METHOD")
-        ->check(CLI::IsMember(MethodNames()));
-    app.add_option("--ordering", ordering,
-                   "Order of the tiles in the file; more than eight bands are always in the Morton "
-                   "ordering (default auto)")
-        ->type_name("ORDERING")
-        ->check(CLI::IsMember(std::vector<std::string>{"auto", "scanline", "blocked"}));
-    app.add_option("--nodata", noData,
-                   "Value that marks samples without data in all bands; none: there is no such "
-                   "value (default: what the source says)")
-        ->type_name("V|none");
-    app.add_option("--bands", bands,
-                   "Bands of the source in the order wanted, counted from 1 (default all)")
-        ->type_name("3,2,1");
-    app.add_option("--bins", bins,
-                   "Bins of a histogram; 8-bit types have one per value (default 256)")
-        ->type_name("N");
-    app.add_flag("--no-statistics", noStatistics, "Leave out statistics and histograms");
-    app.add_option("--threads", threads, "Threads to work with (default: all processors)")
-        ->type_name("N");
-    app.add_option("--memory", memory, "Memory for pixels, such as 64M or 2G (default 256M)")
-        ->type_name("SIZE");
-    app.add_flag("--overwrite", overwrite, "Replace TARGET if it exists");
-    app.footer(
+void BuildCommand::Describe(OptionTable& table) {
+    table.Text("SOURCE", source, "Raster to read: a file or any other name that GDAL knows")
+        .Required();
+    table.Text("TARGET", target, "Pyramid file to make").Required();
+    table
+        .Text("--levels", levels,
+              "Coarsest level; 0 makes the finest only, auto goes on until a level fits one "
+              "tile (default auto)")
+        .Named("auto|N");
+    table
+        .Text("--resampling", resampling,
+              "How levels are reduced (default average, and mode for rasters with a palette)")
+        .Named("METHOD")
+        .OneOf(MethodNames());
+    table
+        .Text("--ordering", ordering,
+              "Order of the tiles in the file; more than eight bands are always in the Morton "
+              "ordering (default auto)")
+        .Named("ORDERING")
+        .OneOf({"auto", "scanline", "blocked"});
+    table
+        .Text("--nodata", noData,
+              "Value that marks samples without data in all bands; none: there is no such "
+              "value (default: what the source says)")
+        .Named("V|none");
+    table
+        .Text("--bands", bands,
+              "Bands of the source in the order wanted, counted from 1 (default all)")
+        .Named("3,2,1");
+    table.Text("--bins", bins, "Bins of a histogram; 8-bit types have one per value (default 256)")
+        .Named("N");
+    table.Flag("--no-statistics", noStatistics, "Leave out statistics and histograms");
+    table.Text("--threads", threads, "Threads to work with (default: all processors)").Named("N");
+    table.Text("--memory", memory, "Memory for pixels, such as 64M or 2G (default 256M)")
+        .Named("SIZE");
+    table.Flag("--overwrite", overwrite, "Replace TARGET if it exists");
+    table.Footer(
         "Examples:\n"
         "  zmcraster build scene.tif scene.pyr\n"
         "  zmcraster build landsat.vrt rgb.pyr --bands 3,2,1 --nodata 0 --threads 4\n"

@@ -1,14 +1,14 @@
 // Command: one of the things that zmcraster does. Help, man page and completion are all made from
-// what Describe tells CLI11.
+// what Describe tells.
 #ifndef ZMC_TOOLS_COMMAND_H
 #define ZMC_TOOLS_COMMAND_H
 
-#include <CLI/CLI.hpp>
 #include <memory>
 #include <vector>
 
 #include "tools/JsonNumbers.h"
 #include "tools/Message.h"
+#include "tools/OptionTable.h"
 
 namespace zmctools {
 
@@ -19,7 +19,7 @@ public:
     virtual ~Command() = default;
 
     // Adds the command's options to its part of the command line. The footer holds its examples.
-    virtual void Describe(CLI::App& app) = 0;
+    virtual void Describe(OptionTable& table) = 0;
     // Does it. Throws Failure, UsageError, Interruption or what the libraries throw.
     virtual ExitStatus Run() = 0;
 

@@ -14,7 +14,7 @@ class CompareCommand final : public Command {
 public:
     const char* Name() const override { return "compare"; }
     const char* Summary() const override { return "Compare two rasters, pixel for pixel"; }
-    void Describe(CLI::App& app) override;
+    void Describe(OptionTable& table) override;
     ExitStatus Run() override;
 
 private:
@@ -26,13 +26,14 @@ private:
                       const SampleDifferences& samples) const;
 };
 
-void CompareCommand::Describe(CLI::App& app) {
-    app.add_option("A", first, "Pyramid, or any other raster that GDAL reads")->required();
-    app.add_option("B", second, "The other one")->required();
-    app.add_option("--tolerance", tolerance,
-                   "Absolute difference of two samples that is let pass (default 0)")
-        ->type_name("V");
-    app.footer(
+void CompareCommand::Describe(OptionTable& table) {
+    table.Text("A", first, "Pyramid, or any other raster that GDAL reads").Required();
+    table.Text("B", second, "The other one").Required();
+    table
+        .Text("--tolerance", tolerance,
+              "Absolute difference of two samples that is let pass (default 0)")
+        .Named("V");
+    table.Footer(
         "Examples:\n"
         "  zmcraster compare scene.tif scene.pyr\n"
         "  zmcraster compare before.pyr after.pyr --tolerance 0.5\n"

@@ -21,7 +21,7 @@ class ExportCommand final : public Command {
 public:
     const char* Name() const override { return "export"; }
     const char* Summary() const override { return "Write a level or a part of it in any format"; }
-    void Describe(CLI::App& app) override;
+    void Describe(OptionTable& table) override;
     ExitStatus Run() override;
 
 private:
@@ -36,19 +36,17 @@ private:
     void Translate(GDALDataset& dataset, const std::vector<std::string>& arguments) const;
 };
 
-void ExportCommand::Describe(CLI::App& app) {
-    app.add_option("FILE", file, "Pyramid to read")->required();
-    app.add_option("TARGET", target, "Raster to write; a file of that name is replaced")
-        ->required();
-    part.Describe(app);
-    app.add_option("--format", format,
-                   "GDAL's short name of the format (default: what the ending of TARGET tells)")
-        ->type_name("NAME");
-    app.add_option("--co", creationOptions, "Creation option of the format, also written -co")
-        ->type_name("K=V")
-        ->type_size(1)
-        ->allow_extra_args(false);
-    app.footer(
+void ExportCommand::Describe(OptionTable& table) {
+    table.Text("FILE", file, "Pyramid to read").Required();
+    table.Text("TARGET", target, "Raster to write; a file of that name is replaced").Required();
+    part.Describe(table);
+    table
+        .Text("--format", format,
+              "GDAL's short name of the format (default: what the ending of TARGET tells)")
+        .Named("NAME");
+    table.Texts("--co", creationOptions, "Creation option of the format, also written -co")
+        .Named("K=V");
+    table.Footer(
         "Examples:\n"
         "  zmcraster export scene.pyr overview.png --level 3\n"
         "  zmcraster export scene.pyr part.tif --window 1000,2000,512,512 -co COMPRESS=DEFLATE\n"

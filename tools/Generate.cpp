@@ -1,5 +1,6 @@
 #include "tools/Generate.h"
 
+#include <CLI/CLI.hpp>
 #include <sstream>
 
 namespace zmctools {

@@ -2,8 +2,11 @@
 #ifndef ZMC_TOOLS_GENERATE_H
 #define ZMC_TOOLS_GENERATE_H
 
-#include <CLI/CLI.hpp>
 #include <string>
+
+namespace CLI {
+class App;
+}
 
 namespace zmctools {
 

@@ -17,7 +17,7 @@ class HashCommand final : public Command {
 public:
     const char* Name() const override { return "hash"; }
     const char* Summary() const override { return "Compute the SHA-256 of a raster's samples"; }
-    void Describe(CLI::App& app) override;
+    void Describe(OptionTable& table) override;
     ExitStatus Run() override;
 
 private:
@@ -25,10 +25,10 @@ private:
     PartOptions part;
 };
 
-void HashCommand::Describe(CLI::App& app) {
-    app.add_option("FILE", file, "Pyramid, or any other raster that GDAL reads")->required();
-    part.Describe(app);
-    app.footer(
+void HashCommand::Describe(OptionTable& table) {
+    table.Text("FILE", file, "Pyramid, or any other raster that GDAL reads").Required();
+    part.Describe(table);
+    table.Footer(
         "Examples:\n"
         "  zmcraster hash scene.pyr\n"
         "  zmcraster hash scene.pyr --level 2 --window 0,0,256,256 --bands 1\n"

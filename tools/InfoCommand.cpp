@@ -15,16 +15,16 @@ class InfoCommand final : public Command {
 public:
     const char* Name() const override { return "info"; }
     const char* Summary() const override { return "Show what is in a pyramid file"; }
-    void Describe(CLI::App& app) override;
+    void Describe(OptionTable& table) override;
     ExitStatus Run() override;
 
 private:
     std::string file;
 };
 
-void InfoCommand::Describe(CLI::App& app) {
-    app.add_option("FILE", file, "Pyramid to look at")->required();
-    app.footer(
+void InfoCommand::Describe(OptionTable& table) {
+    table.Text("FILE", file, "Pyramid to look at").Required();
+    table.Footer(
         "Examples:\n"
         "  zmcraster info scene.pyr\n"
         "  zmcraster info scene.pyr --json\n"

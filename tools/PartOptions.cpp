@@ -4,13 +4,12 @@
 
 namespace zmctools {
 
-void PartOptions::Describe(CLI::App& app) {
-    app.add_option("--level", level, "Level, counted from 0, the finest (default 0)")
-        ->type_name("N");
-    app.add_option("--window", window, "Part of the level, in its pixels (default all)")
-        ->type_name("X,Y,W,H");
-    app.add_option("--bands", bands, "Bands in the order wanted, counted from 1 (default all)")
-        ->type_name("3,2,1");
+void PartOptions::Describe(OptionTable& table) {
+    table.Text("--level", level, "Level, counted from 0, the finest (default 0)").Named("N");
+    table.Text("--window", window, "Part of the level, in its pixels (default all)")
+        .Named("X,Y,W,H");
+    table.Text("--bands", bands, "Bands in the order wanted, counted from 1 (default all)")
+        .Named("3,2,1");
 }
 
 std::uint32_t PartOptions::Level() const {

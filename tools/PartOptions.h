@@ -2,9 +2,10 @@
 #ifndef ZMC_TOOLS_PARTOPTIONS_H
 #define ZMC_TOOLS_PARTOPTIONS_H
 
-#include <CLI/CLI.hpp>
 #include <cstdint>
 #include <string>
+
+#include "tools/OptionTable.h"
 
 namespace zmctools {
 
@@ -14,7 +15,7 @@ struct PartOptions {
     std::string bands;   // empty: all of them
 
     // Adds the three options to the command line.
-    void Describe(CLI::App& app);
+    void Describe(OptionTable& table);
     // The level as a number. Throws UsageError for what no pyramid can have.
     std::uint32_t Level() const;
 };

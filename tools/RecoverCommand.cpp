@@ -16,7 +16,7 @@ public:
     const char* Summary() const override {
         return "Put statistics in order whose store was cut off";
     }
-    void Describe(CLI::App& app) override;
+    void Describe(OptionTable& table) override;
     ExitStatus Run() override;
 
 private:
@@ -28,12 +28,12 @@ private:
     void Discard() const;
 };
 
-void RecoverCommand::Describe(CLI::App& app) {
-    app.add_option("FILE", file, "Pyramid to put in order")->required();
-    app.add_flag("--discard", discard,
-                 "Remove statistics, histograms and palettes that are damaged and of which there "
-                 "is no copy, so that new ones can be stored");
-    app.footer(
+void RecoverCommand::Describe(OptionTable& table) {
+    table.Text("FILE", file, "Pyramid to put in order").Required();
+    table.Flag("--discard", discard,
+               "Remove statistics, histograms and palettes that are damaged and of which there "
+               "is no copy, so that new ones can be stored");
+    table.Footer(
         "Examples:\n"
         "  zmcraster recover scene.pyr\n"
         "  zmcraster recover scene.pyr --discard\n"

@@ -18,7 +18,7 @@ public:
     const char* Summary() const override {
         return "Check a pyramid file against itself and a source";
     }
-    void Describe(CLI::App& app) override;
+    void Describe(OptionTable& table) override;
     ExitStatus Run() override;
 
 private:
@@ -32,19 +32,20 @@ private:
     ExitStatus Report() const;
 };
 
-void VerifyCommand::Describe(CLI::App& app) {
-    app.add_option("FILE", file, "Pyramid to check")->required();
-    app.add_option("--resampling", resampling,
-                   "Method that the levels were made by (default average, and mode for rasters "
-                   "with a palette)")
-        ->type_name("METHOD")
-        ->check(CLI::IsMember(MethodNames()));
-    app.add_option("--against", source, "Raster that level 0 must be equal to")
-        ->type_name("SOURCE");
-    app.add_option("--bands", bands,
-                   "Bands of SOURCE that the file was built from, counted from 1 (default all)")
-        ->type_name("3,2,1");
-    app.footer(
+void VerifyCommand::Describe(OptionTable& table) {
+    table.Text("FILE", file, "Pyramid to check").Required();
+    table
+        .Text("--resampling", resampling,
+              "Method that the levels were made by (default average, and mode for rasters "
+              "with a palette)")
+        .Named("METHOD")
+        .OneOf(MethodNames());
+    table.Text("--against", source, "Raster that level 0 must be equal to").Named("SOURCE");
+    table
+        .Text("--bands", bands,
+              "Bands of SOURCE that the file was built from, counted from 1 (default all)")
+        .Named("3,2,1");
+    table.Footer(
         "Examples:\n"
         "  zmcraster verify scene.pyr\n"
         "  zmcraster verify scene.pyr --against scene.tif\n"

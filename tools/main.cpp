@@ -1,5 +1,6 @@
 // zmcraster: build pyramids, look inside, compare. One command per source file; this one is the
 // table of them and turns what they throw into messages and exit statuses.
+#include <CLI/CLI.hpp>
 #include <cstdio>
 #include <cstring>
 #include <new>
@@ -65,9 +66,10 @@ Program::Program() {
 
 void Program::Add(std::unique_ptr<Command> command) {
     CLI::App* const part = app.add_subcommand(command->Name(), command->Summary());
-    command->Describe(*part);
-    part->add_flag("--json", command->json, "Print one JSON document instead of text");
-    part->add_flag("--quiet,-q", command->quiet, "No progress bar, no warnings, errors only");
+    OptionTable table(*part);
+    command->Describe(table);
+    table.Flag("--json", command->json, "Print one JSON document instead of text");
+    table.Flag("--quiet,-q", command->quiet, "No progress bar, no warnings, errors only");
     parts.push_back(part);
     commands.push_back(std::move(command));
 }
