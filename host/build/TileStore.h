@@ -12,6 +12,7 @@
 #include <string>
 #include <vector>
 
+#include "format/LevelGeometry.h"
 #include "host/build/PixelWork.h"
 #include "host/build/Strip.h"
 
@@ -50,6 +51,7 @@ public:
     std::uint32_t TilesDown(std::uint32_t level) const;
 
 private:
+    zelm::LevelGeometry Geometry(std::uint32_t level) const;
     void WriteTile(const Strip& strip, std::uint32_t stripBegin, std::uint32_t column,
                    std::uint32_t row);
 

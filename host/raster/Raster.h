@@ -143,6 +143,7 @@ public:
 private:
     Raster(ModulePtr holder, std::string rasterName, zelm::RasterDataConnectionPtr opened);
     void TakeReader();
+    zelm::LevelGeometry Geometry(std::uint32_t level) const;
     void CheckType(std::uint32_t pixelType) const;
     void CheckLevel(std::uint32_t level) const;
     void CheckWindow(const char* operation, std::uint32_t level, const Window& window,
