@@ -1,6 +1,8 @@
 #include "format/HeaderParser.h"
 
+#include <atomic>
 #include <locale>
+#include <memory>
 #include <sstream>
 #include <utility>
 
@@ -30,6 +32,30 @@ protected:
         TakeHeaderText(record, name, text);
     }
 };
+
+// A header that was read. The files of a mosaic have one text between them, a file is opened more
+// than once, and to parse costs more than all the rest of looking at a header. Taken out while it
+// is looked at: who finds none parses. The last is not destroyed, since others may still be at
+// work.
+struct KnownHeader {
+    std::string text;
+    PyramidHeaderRecord record;
+};
+constexpr std::size_t kMaxKnownText = 4096;
+std::atomic<KnownHeader*> lastHeader = nullptr;
+
+void Keep(std::unique_ptr<KnownHeader> header) {
+    const std::unique_ptr<KnownHeader> other(lastHeader.exchange(header.release()));
+}
+
+bool Recall(std::string_view text, PyramidHeaderRecord& record) {
+    std::unique_ptr<KnownHeader> last(lastHeader.exchange(nullptr));
+    if (!last) return false;
+    const bool known = last->text == text;
+    if (known) record = last->record;
+    Keep(std::move(last));
+    return known;
+}
 
 }  // namespace
 
@@ -73,11 +99,15 @@ void TakeHeaderText(PyramidHeaderRecord& record, ElementName name, std::string_v
     }
 }
 
-std::string ParseHeaderText(std::string text, PyramidHeaderRecord& record) {
+std::string ParseHeaderText(std::string_view text, PyramidHeaderRecord& record) {
+    if (Recall(text, record)) return "";
     HeaderReader reader;
-    std::string wrong = ParseDocumentText(std::move(text), reader);
-    if (wrong.empty()) record = reader.record;
-    return wrong;
+    std::string wrong = ParseDocumentText(std::string(text), reader);
+    if (!wrong.empty()) return wrong;
+    record = reader.record;
+    if (text.size() <= kMaxKnownText)
+        Keep(std::make_unique<KnownHeader>(KnownHeader{std::string(text), record}));
+    return "";
 }
 
 }  // namespace zelm

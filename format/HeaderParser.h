@@ -23,7 +23,7 @@ void TakeHeaderText(PyramidHeaderRecord& record, ElementName name, std::string_v
 // Reads the values of a header document. What is wrong with it, for people, with `record` as it
 // was; empty if nothing. A text may be anything. Throws std::bad_alloc. Xerces-C++ has been started
 // by the caller; any thread.
-std::string ParseHeaderText(std::string text, PyramidHeaderRecord& record);
+std::string ParseHeaderText(std::string_view text, PyramidHeaderRecord& record);
 
 }  // namespace zelm
 

@@ -9,6 +9,7 @@
 
 #include "core/PixelVocabulary.h"
 #include "format/LevelGeometry.h"
+#include "format/PyramidFront.h"
 #include "format/PyramidLimits.h"
 #include "fuzz/support/Expect.h"
 #include "fuzz/support/Host.h"
@@ -109,7 +110,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     file.Assign(zelm::test::FileWithHeader(text));
     PyramidDataset dataset{String(file.Name().c_str())};
     const bool failed = dataset.ReadHeader();
-    ZMC_EXPECT(dataset.TileDataStart == 20 + size);
+    ZMC_EXPECT(dataset.TileDataStart == zelm::PyramidFront::kHeaderOffset + size);
     if (dataset.TileSize > PyramidDataset::kMaxTileSize) {
         ZMC_EXPECT(!failed && !dataset.LevelOffsets);
         return 0;

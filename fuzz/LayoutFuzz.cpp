@@ -35,7 +35,7 @@ using zelm::ArrayShape;
 using zelm::LevelGeometry;
 using zelm::PyramidDataset;
 using zelm::PyramidHeaderRecord;
-using zelm::TilePiece;
+using zelm::TilePart;
 using zmcfuzz::HeaderFields;
 using zmcfuzz::InputBytes;
 using zmcfuzz::NaiveAxis;
@@ -201,15 +201,16 @@ public:
     }
 
     // Pieces come tile row by tile row, so none can be missing or come twice.
-    void Take(const TilePiece& piece) {
-        ZMC_EXPECT(piece.tileX == nextX && piece.tileY == nextY);
-        ZMC_EXPECT(piece.tileWidth == across.TileExtent(nextX));
-        ZMC_EXPECT(piece.tileHeight == down.TileExtent(nextY));
-        ExpectSpan(window.x, window.width, nextX * across.tile, piece.tileWidth, piece.firstColumn,
-                   piece.columns, piece.outColumn);
-        ExpectSpan(window.y, window.height, nextY * down.tile, piece.tileHeight, piece.firstRow,
-                   piece.rows, piece.outRow);
-        pixels += Wide{piece.columns} * piece.rows;
+    void Take(const TilePart& piece) {
+        const zelm::Rectangle &tile = piece.tile, &part = piece.part;
+        ZMC_EXPECT(piece.column == nextX && piece.row == nextY);
+        ZMC_EXPECT(tile.x == nextX * across.tile && tile.width == across.TileExtent(nextX));
+        ZMC_EXPECT(tile.y == nextY * down.tile && tile.height == down.TileExtent(nextY));
+        ExpectSpan(window.x, window.width, tile.x, tile.width, piece.FirstColumn(), part.width,
+                   part.x - window.x);
+        ExpectSpan(window.y, window.height, tile.y, tile.height, piece.FirstLine(), part.height,
+                   part.y - window.y);
+        pixels += Wide{part.width} * part.height;
         ++taken;
         if (nextX++ != LastTile(window.x, window.width)) return;
         nextX = window.x / across.tile;
@@ -250,15 +251,15 @@ void ExpectWalk(const NaiveLayout& layout, const Window& window, std::uint32_t s
     const HeaderFields& f = layout.fields;
     const LevelGeometry geometry(f.samples, f.lines, f.tile,
                                  static_cast<std::uint32_t>(window.level));
-    const zelm::TileRect rect{window.x, window.y, window.width, window.height};
-    ZMC_EXPECT(zelm::VisitPieces(geometry, rect, [&](const TilePiece& piece) {
+    const zelm::Rectangle rect{window.x, window.y, window.width, window.height};
+    ZMC_EXPECT(zelm::VisitTiles(geometry, rect, [&](const TilePart& piece) {
         pieces.Take(piece);
         return true;
     }));
     pieces.ExpectAll();
     std::uint32_t visits = 0;
     const bool all =
-        zelm::VisitPieces(geometry, rect, [&](const TilePiece&) { return visits++ != stopAfter; });
+        zelm::VisitTiles(geometry, rect, [&](const TilePart&) { return visits++ != stopAfter; });
     ZMC_EXPECT(all == (stopAfter >= pieces.Count()));
     ZMC_EXPECT(visits == std::min<Wide>(pieces.Count(), Wide{stopAfter} + 1));
 }

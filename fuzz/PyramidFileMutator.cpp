@@ -9,11 +9,13 @@
 #include <string>
 #include <string_view>
 
+#include "format/PyramidFront.h"
+
 extern "C" std::size_t LLVMFuzzerMutate(std::uint8_t* data, std::size_t size, std::size_t maxSize);
 
 namespace {
 
-constexpr std::size_t kFront = 20;
+constexpr std::size_t kFront = zelm::PyramidFront::kHeaderOffset;
 
 const char* const kFields[] = {"BANDS",      "PIXEL_HEIGHT", "PIXEL_WIDTH",   "TILESIZE",
                                "LEVELMIN",   "LEVELMAX",     "VERSION_MAJOR", "VERSION_MINOR",
@@ -76,7 +78,7 @@ struct Parts {
 
     std::size_t Write(std::uint8_t* data, std::size_t maxSize) {
         front.resize(kFront);
-        std::memcpy(front.data(), "KOBT", 4);
+        std::memcpy(front.data(), zelm::PyramidFront::kMagic, sizeof zelm::PyramidFront::kMagic);
         const std::uint64_t start = kFront + header.size();
         for (std::size_t i = 0; i < 8; ++i) front[4 + i] = static_cast<char>(start >> (8 * i));
         script.resize(std::min<std::size_t>(script.size(), 255));

@@ -79,15 +79,17 @@ CPLErr Band::IReadBlock(int blockX, int blockY, void* data) {
         return CE_None;
     }
     TileReader& tiles = owner.File().tiles;
-    const Window tile = tiles.TileAt(owner.Level(), blockX, blockY);
+    const zelm::Rectangle tile = tiles.TileAt(owner.Level(), blockX, blockY);
     const auto size = static_cast<GSpacing>(GDALGetDataTypeSizeBytes(eDataType));
     const int band = static_cast<int>(index);
     // Blocks at the right and bottom edge are padded with zeros.
-    if (tile.width < nBlockXSize || tile.height < nBlockYSize)
+    if (tile.width < static_cast<std::uint32_t>(nBlockXSize) ||
+        tile.height < static_cast<std::uint32_t>(nBlockYSize))
         std::memset(data, 0,
                     static_cast<std::size_t>(nBlockXSize) * static_cast<std::size_t>(nBlockYSize) *
                         static_cast<std::size_t>(size));
-    if (tiles.Read(tile, &band, 1, {data, eDataType, size, size * nBlockXSize, 0})) return CE_None;
+    if (tiles.Read(owner.Level(), tile, &band, 1, {data, eDataType, size, size * nBlockXSize, 0}))
+        return CE_None;
     ReportError(CE_Failure, CPLE_FileIO, "the raster module did not read tile %d, %d", blockX,
                 blockY);
     return CE_Failure;
@@ -106,20 +108,20 @@ void Band::FillUnwritten(void* samples, std::size_t stride, std::size_t count) {
 }
 
 // Copies the part of a padded block that lies in the tile, at `stride` bytes per pixel.
-void Band::CopyFromBlock(const void* block, const Window& tile, unsigned char* samples,
+void Band::CopyFromBlock(const void* block, const zelm::Rectangle& tile, unsigned char* samples,
                          std::size_t stride) const {
     const int size = GDALGetDataTypeSizeBytes(eDataType);
     const auto* line = static_cast<const unsigned char*>(block);
-    for (int y = 0; y < tile.height; ++y, line += std::ptrdiff_t{size} * nBlockXSize) {
+    for (std::uint32_t y = 0; y < tile.height; ++y, line += std::ptrdiff_t{size} * nBlockXSize) {
         GDALCopyWords64(line, eDataType, size, samples, eDataType, static_cast<int>(stride),
                         tile.width);
-        samples += stride * static_cast<std::size_t>(tile.width);
+        samples += stride * tile.width;
     }
 }
 
 // Puts this band's samples of a tile where they belong in whole pixels: from a block that waits in
 // the cache, which is written by this, else from the file, else what an unwritten block holds.
-void Band::CompleteTile(int blockX, int blockY, const Window& tile, unsigned char* samples,
+void Band::CompleteTile(int blockX, int blockY, const zelm::Rectangle& tile, unsigned char* samples,
                         std::size_t stride) {
     if (GDALRasterBlock* const block = TryGetLockedBlockRef(blockX, blockY)) {
         CopyFromBlock(block->GetDataRef(), tile, samples, stride);
@@ -130,20 +132,19 @@ void Band::CompleteTile(int blockX, int blockY, const Window& tile, unsigned cha
     }
     const Creation* const creation = owner.UnderCreation();
     if (creation && !creation->IsWritten(BlockNumber(blockX, blockY), index)) {
-        FillUnwritten(samples, stride,
-                      static_cast<std::size_t>(tile.width) * static_cast<std::size_t>(tile.height));
+        FillUnwritten(samples, stride, tile.Pixels());
         return;
     }
     const int band = static_cast<int>(index);
     const auto pixelSpace = static_cast<GSpacing>(stride);
     const Target target{samples, eDataType, pixelSpace, pixelSpace * tile.width, 0};
-    if (!owner.File().tiles.Read(tile, &band, 1, target))
+    if (!owner.File().tiles.Read(owner.Level(), tile, &band, 1, target))
         throw zmchost::Error(owner.GetDescription(), "write a block",
                              "the rest of its tile cannot be read");
 }
 
 // The tile as the file holds it, with all bands where they lie together; `bands` tells which.
-std::vector<unsigned char> Band::GatherTile(int blockX, int blockY, const Window& tile,
+std::vector<unsigned char> Band::GatherTile(int blockX, int blockY, const zelm::Rectangle& tile,
                                             const void* data, std::vector<std::uint32_t>& bands) {
     const zmchost::Raster& raster = owner.File().raster.Get();
     if (owner.File().tiles.IsPixelInterleaved())
@@ -152,8 +153,7 @@ std::vector<unsigned char> Band::GatherTile(int blockX, int blockY, const Window
         bands = {index};
     const auto size = static_cast<std::size_t>(GDALGetDataTypeSizeBytes(eDataType));
     const std::size_t stride = size * bands.size();
-    std::vector<unsigned char> samples(static_cast<std::size_t>(tile.width) *
-                                       static_cast<std::size_t>(tile.height) * stride);
+    std::vector<unsigned char> samples(tile.Pixels() * stride);
     unsigned char* first = samples.data();
     for (const std::uint32_t band : bands) {
         if (band == index)
@@ -177,15 +177,11 @@ void Band::DropSidecarStatistics() {
 
 CPLErr Band::IWriteBlock(int blockX, int blockY, void* data) {
     TileReader& tiles = owner.File().tiles;
-    const Window tile = tiles.TileAt(owner.Level(), blockX, blockY);
-    const auto positive = [](int value) { return static_cast<std::uint32_t>(value); };
+    const zelm::Rectangle tile = tiles.TileAt(owner.Level(), blockX, blockY);
     try {
         std::vector<std::uint32_t> bands;
         const auto samples = GatherTile(blockX, blockY, tile, data, bands);
-        owner.File().raster.Get().Write(
-            owner.Level(),
-            {positive(tile.x), positive(tile.y), positive(tile.width), positive(tile.height)},
-            bands, samples.data());
+        owner.File().raster.Get().Write(owner.Level(), tile, bands, samples.data());
         tiles.Forget();
         DropSidecarStatistics();
         if (Creation* const creation = owner.UnderCreation())
@@ -212,7 +208,8 @@ CPLErr Band::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, voi
         owner.ReadsDirectly(x, y, width, height)) {
         const int band = static_cast<int>(index);
         const Target target{data, bufferType, pixelSpace, lineSpace, 0};
-        if (owner.File().tiles.Read({owner.Level(), x, y, width, height}, &band, 1, target))
+        if (owner.File().tiles.Read(owner.Level(), RectangleOf(x, y, width, height), &band, 1,
+                                    target))
             return CE_None;
         ReportError(CE_Failure, CPLE_FileIO, "the raster module did not read level %u",
                     owner.Level());

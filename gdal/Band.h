@@ -77,11 +77,11 @@ private:
 
     std::size_t BlockNumber(int blockX, int blockY) const;
     void FillUnwritten(void* samples, std::size_t stride, std::size_t count);
-    void CopyFromBlock(const void* block, const Window& tile, unsigned char* samples,
+    void CopyFromBlock(const void* block, const zelm::Rectangle& tile, unsigned char* samples,
                        std::size_t stride) const;
-    void CompleteTile(int blockX, int blockY, const Window& tile, unsigned char* samples,
+    void CompleteTile(int blockX, int blockY, const zelm::Rectangle& tile, unsigned char* samples,
                       std::size_t stride);
-    std::vector<unsigned char> GatherTile(int blockX, int blockY, const Window& tile,
+    std::vector<unsigned char> GatherTile(int blockX, int blockY, const zelm::Rectangle& tile,
                                           const void* data, std::vector<std::uint32_t>& bands);
 
     void DropSidecarStatistics();

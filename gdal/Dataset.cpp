@@ -168,7 +168,8 @@ CPLErr Dataset::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, 
         std::vector<int> bands(bandMap, bandMap + bandCount);
         for (int& band : bands) --band;
         const Target target{data, bufferType, pixelSpace, lineSpace, bandSpace};
-        if (file->tiles.Read({level, x, y, width, height}, bands.data(), bandCount, target))
+        if (file->tiles.Read(level, RectangleOf(x, y, width, height), bands.data(), bandCount,
+                             target))
             return CE_None;
         ReportError(CE_Failure, CPLE_FileIO, "the raster module did not read level %u", level);
         return CE_Failure;

@@ -6,6 +6,7 @@
 #include <optional>
 #include <set>
 
+#include "format/TileWalk.h"
 #include "gdal/NoDataValues.h"
 #include "gdal/Options.h"
 #include "host/build/LevelReduction.h"
@@ -73,13 +74,13 @@ bool MakeLevels(zmchost::Raster& raster, zmchost::Resampling method,
     TileMaker<T> maker(raster, method);
     const auto total = static_cast<double>(TilesOf(raster, levels));
     double done = 0;
-    for (const std::uint32_t level : levels)
-        for (std::uint32_t row = 0; row < raster.TilesDown(level); ++row)
-            for (std::uint32_t column = 0; column < raster.TilesAcross(level); ++column) {
-                maker.Make(level, raster.Tile(level, column, row));
-                if (progress && !progress(++done / total, "", progressData)) return false;
-            }
-    return true;
+    return std::all_of(levels.begin(), levels.end(), [&](std::uint32_t level) {
+        const zelm::LevelGeometry geometry = raster.Header().Geometry(level);
+        return zelm::VisitTiles(geometry, geometry.Whole(), [&](const zelm::TilePart& part) {
+            maker.Make(level, part.tile);
+            return !progress || progress(++done / total, "", progressData);
+        });
+    });
 }
 
 // The reducers go by the no-data values that GDAL's user sees.

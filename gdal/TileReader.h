@@ -12,19 +12,17 @@
 #include <cstdint>
 #include <vector>
 
+#include "format/Rectangle.h"
 #include "gdal/LazyRaster.h"
 #include "host/file/PyramidFileInfo.h"
 
 namespace zmcgdal {
 
-// A rectangle of one level, in pixels; it lies within the level.
-struct Window {
-    std::uint32_t level = 0;
-    int x = 0;
-    int y = 0;
-    int width = 0;
-    int height = 0;
-};
+// GDAL counts with a sign, and has looked at its numbers when it asks.
+inline zelm::Rectangle RectangleOf(int x, int y, int width, int height) {
+    const auto positive = [](int number) { return static_cast<std::uint32_t>(number); };
+    return {positive(x), positive(y), positive(width), positive(height)};
+}
 
 // A caller's buffer in GDAL's terms: steps in bytes between pixels, lines and bands.
 struct Target {
@@ -44,15 +42,16 @@ public:
     // The samples of all bands of a pixel lie together in the file.
     bool IsPixelInterleaved() const;
 
-    // Reads the bands (from 0) of a window; false if the module refused it. What an incomplete
-    // file does not hold reads as zeros.
-    bool Read(const Window& window, const int* bands, int bandCount, const Target& target);
+    // Reads the bands (from 0) of a window inside a level; false if the module refused it. What an
+    // incomplete file does not hold reads as zeros.
+    bool Read(std::uint32_t level, const zelm::Rectangle& window, const int* bands, int bandCount,
+              const Target& target);
 
     // Must be called when the file has changed.
     void Forget() { held = heldApart = TileKey(); }
 
     // The tile of the grid of `level`, clipped to the level.
-    Window TileAt(std::uint32_t level, int tileX, int tileY) const;
+    zelm::Rectangle TileAt(std::uint32_t level, int tileX, int tileY) const;
 
 private:
     LazyRaster& raster;
@@ -60,7 +59,7 @@ private:
     GDALDataType sampleType;
     std::size_t rawSampleSize;
     std::size_t sampleSize;
-    int tileSize;
+    std::uint32_t tileSize;
     int fileBands;
     std::vector<int> allBands;
     std::vector<unsigned char> scratch;  // one tile as GDAL sees its samples
@@ -69,8 +68,8 @@ private:
 
     struct TileKey {
         std::uint32_t level = UINT32_MAX;
-        int x = 0;
-        int y = 0;
+        std::uint32_t x = 0;
+        std::uint32_t y = 0;
         int band = 0;  // 0 where all bands lie together
         friend bool operator==(const TileKey&, const TileKey&) = default;
     };
@@ -78,20 +77,24 @@ private:
     TileKey heldApart;   // tile in `planes`, and the
     int planeAway = -1;  // band whose plane went straight to a caller
 
-    bool ReadRaw(const Window& tile, const int* bands, int bandCount, void* buffer);
-    bool FitsTarget(const Window& window, const int* bands, int bandCount,
+    bool ReadRaw(std::uint32_t level, const zelm::Rectangle& tile, const int* bands, int bandCount,
+                 void* buffer);
+    bool FitsTarget(const zelm::Rectangle& window, const int* bands, int bandCount,
                     const Target& target) const;
-    const unsigned char* LoadTile(const Window& tile, int band);
-    const unsigned char* LoadPlane(const Window& tile, int band);
-    bool SplitTile(const Window& tile, int band, void* out);
-    bool IsPlainPlane(const Window& window, int bandCount, const Target& target) const;
+    const unsigned char* LoadTile(std::uint32_t level, const zelm::Rectangle& tile, int band);
+    const unsigned char* LoadPlane(std::uint32_t level, const zelm::Rectangle& tile, int band);
+    bool SplitTile(std::uint32_t level, const zelm::Rectangle& tile, int band, void* out);
+    bool IsWholeTile(const zelm::Rectangle& window) const;
+    bool CopyPart(std::uint32_t level, const zelm::Rectangle& tile, const zelm::Rectangle& window,
+                  const int* bands, int bandCount, const Target& target);
+    bool IsPlainPlane(const zelm::Rectangle& window, int bandCount, const Target& target) const;
     bool SplitsIntoPlanes(int bandCount) const;
-    void CopyTile(const Window& tile, const unsigned char* samples, int samplesPerPixel,
-                  const Window& window, const int* bands, int bandCount,
+    void CopyTile(const zelm::Rectangle& tile, const unsigned char* samples, int samplesPerPixel,
+                  const zelm::Rectangle& window, const int* bands, int bandCount,
                   const Target& target) const;
-    bool CopyAllBandsApart(const Window& tile, const unsigned char* samples, const Window& part,
-                           const Window& window, const int* bands, int bandCount,
-                           const Target& target) const;
+    bool CopyAllBandsApart(const zelm::Rectangle& tile, const unsigned char* samples,
+                           const zelm::Rectangle& part, const zelm::Rectangle& window,
+                           const int* bands, int bandCount, const Target& target) const;
 };
 
 }  // namespace zmcgdal

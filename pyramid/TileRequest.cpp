@@ -27,12 +27,9 @@ bool HoldsBands(const Array<int>& bandList, std::uint32_t bandCount) {
     return std::none_of(bandList.data, bandList.data + bandList.shape.elements, outside);
 }
 
-bool Contains(const LevelGeometry& level, const TileRect& rect) {
-    const auto inside = [](std::uint64_t start, std::uint64_t extent, std::uint64_t whole) {
-        return start + extent <= whole;
-    };
-    // The second test is for sizes so close to 2^32 that the tile count wraps.
-    return inside(rect.x, rect.width, level.samples) && inside(rect.y, rect.height, level.lines) &&
+// The second test is for sizes so close to 2^32 that the tile count wraps.
+bool Contains(const LevelGeometry& level, const Rectangle& rect) {
+    return level.Whole().Contains(rect) &&
            level.HasTile((rect.x + rect.width - 1u) / level.tileSize,
                          (rect.y + rect.height - 1u) / level.tileSize);
 }
@@ -43,10 +40,10 @@ bool StaysInRange(std::initializer_list<std::uint64_t> factors) {
 
 }  // namespace
 
-bool TileRequest::IsServed(const PyramidHeaderRecord& header, const TileRect& rect,
+bool TileRequest::IsServed(const PyramidHeaderRecord& header, const Rectangle& rect,
                            const Array<int>& bandList, std::int32_t level) {
     const auto at = static_cast<std::uint32_t>(level);
-    const bool planar = header.tileOrdering >= TileOrder::Morton;
+    const bool planar = header.IsPlanar();
     if (header.bandCount == 0 || header.tileSize == 0 ||
         header.tileSize > PyramidLimits::kMaxTileSize || level < 0 || at < header.levelMin ||
         at > header.levelMax || at >= LevelGeometry::kLevelsWithPixels)
@@ -56,19 +53,19 @@ bool TileRequest::IsServed(const PyramidHeaderRecord& header, const TileRect& re
     const std::uint64_t sampleBytes = PixelSize(header.pixelType);
     const std::uint64_t listed = bandList.shape.elements;
     const std::uint64_t wide = std::max<std::uint64_t>(listed, planar ? 0 : header.bandCount);
-    const LevelGeometry base(header.width, header.height, header.tileSize, 0);
-    return Contains(LevelGeometry(header.width, header.height, header.tileSize, at), rect) &&
-           base.tilesAcross != 0 && base.tilesDown != 0 && HoldsBands(bandList, header.bandCount) &&
+    const LevelGeometry base = header.Geometry(0);
+    return Contains(header.Geometry(at), rect) && base.tilesAcross != 0 && base.tilesDown != 0 &&
+           HoldsBands(bandList, header.bandCount) &&
            StaysInRange({rect.width, rect.height, wide, sampleBytes}) &&
            StaysInRange({header.tileSize, planar ? 1 : header.bandCount, sampleBytes});
 }
 
-TileRequest::TileRequest(const PyramidHeaderRecord& header, const TileRect& rectangle,
+TileRequest::TileRequest(const PyramidHeaderRecord& header, const Rectangle& rectangle,
                          const Array<int>& bandList, std::uint32_t atLevel)
-    : geometry(header.width, header.height, header.tileSize, atLevel),
+    : geometry(header.Geometry(atLevel)),
       rect(rectangle),
       level(atLevel),
-      planar(header.tileOrdering >= TileOrder::Morton),
+      planar(header.IsPlanar()),
       list(bandList.data),
       allInOrder(bandList.shape.elements == 0 || IsIdentity(bandList, header.bandCount)),
       bands(allInOrder ? header.bandCount : bandList.shape.elements),

@@ -3,9 +3,9 @@
 //
 // Pure arithmetic: no file and no samples. A tile's data is one plane of whole pixels in the
 // orderings Scanline and Blocked, and one plane for each band in the ordering Morton. A rectangle
-// falls apart into pieces, one for each tile that it touches, and a piece into segments: runs of
-// bytes that are contiguous in the plane and move in one step. Reading and writing both walk the
-// same segments, and know no other case.
+// falls apart into pieces, one for each tile that it touches (TileWalk.h), and a piece into
+// segments: runs of bytes that are contiguous in the plane and move in one step. Reading and
+// writing both walk the same segments, and know no other case.
 #ifndef ZMC_PYRAMID_TILEREQUEST_H
 #define ZMC_PYRAMID_TILEREQUEST_H
 
@@ -15,72 +15,9 @@
 #include "core/Array.h"
 #include "format/LevelGeometry.h"
 #include "format/PyramidHeaderRecord.h"
+#include "format/TileWalk.h"
 
 namespace zelm {
-
-// A rectangle of a level, in pixels of that level. It has at least one pixel, and lies inside.
-struct TileRect {
-    std::uint32_t x;
-    std::uint32_t y;
-    std::uint32_t width;
-    std::uint32_t height;
-};
-
-// What one tile holds of a rectangle.
-struct TilePiece {
-    std::uint32_t tileX;
-    std::uint32_t tileY;
-    std::uint32_t tileWidth;  // of this tile: those at the right and bottom edge are smaller
-    std::uint32_t tileHeight;
-    std::uint32_t firstColumn;  // of the piece in its tile
-    std::uint32_t firstRow;
-    std::uint32_t columns;
-    std::uint32_t rows;
-    std::uint32_t outColumn;  // of the piece in the rectangle
-    std::uint32_t outRow;
-};
-
-// Extent of a piece along one axis.
-struct TileSpan {
-    std::uint32_t first;  // in the tile
-    std::uint32_t count;
-
-    TileSpan(std::uint32_t tile, std::uint32_t tileSize, std::uint32_t tileExtent,
-             std::uint32_t start, std::uint32_t extent) {
-        const std::uint32_t tileStart = tile * tileSize;
-        first = start > tileStart ? start - tileStart : 0;
-        count = std::min(tileExtent, start + extent - tileStart) - first;
-    }
-};
-
-// Calls visit(const TilePiece&) for every tile that the rectangle touches, tile rows from the top,
-// tiles from the left, until a call answers false; the answer is whether none did.
-template <class Visit>
-bool VisitPieces(const LevelGeometry& level, const TileRect& rect, Visit&& visit) {
-    const std::uint32_t side = level.tileSize;
-    const std::uint32_t lastX = (rect.x + rect.width - 1u) / side;
-    const std::uint32_t lastY = (rect.y + rect.height - 1u) / side;
-    for (std::uint32_t tileY = rect.y / side; tileY <= lastY; ++tileY) {
-        const std::uint32_t tileHeight = level.TileHeight(tileY);
-        const TileSpan down(tileY, side, tileHeight, rect.y, rect.height);
-        for (std::uint32_t tileX = rect.x / side; tileX <= lastX; ++tileX) {
-            const std::uint32_t tileWidth = level.TileWidth(tileX);
-            const TileSpan across(tileX, side, tileWidth, rect.x, rect.width);
-            const TilePiece piece{tileX,
-                                  tileY,
-                                  tileWidth,
-                                  tileHeight,
-                                  across.first,
-                                  down.first,
-                                  across.count,
-                                  down.count,
-                                  tileX * side + across.first - rect.x,
-                                  tileY * side + down.first - rect.y};
-            if (!visit(piece)) return false;
-        }
-    }
-    return true;
-}
 
 // A run of bytes of a tile's plane, or the same run of several planes, and the block of samples of
 // the caller's buffer that it holds.
@@ -106,7 +43,7 @@ struct TileRequest {
     static constexpr std::uint32_t kPlanesTogether = 16;
 
     LevelGeometry geometry;
-    TileRect rect;
+    Rectangle rect;
     std::uint32_t level;
     bool planar;           // a plane for each band
     const int* list;       // the caller's band list, which outlives the request
@@ -122,11 +59,11 @@ struct TileRequest {
     // Whether a file with this header can serve a request: the rectangle inside the level, the
     // level laid out and addressable, every band in the file, and less than 4 GiB in all. In the
     // ordering Morton the list has to name its bands.
-    static bool IsServed(const PyramidHeaderRecord& header, const TileRect& rect,
+    static bool IsServed(const PyramidHeaderRecord& header, const Rectangle& rect,
                          const Array<int>& bandList, std::int32_t level);
 
     // Needs a request that is served.
-    TileRequest(const PyramidHeaderRecord& header, const TileRect& rectangle,
+    TileRequest(const PyramidHeaderRecord& header, const Rectangle& rectangle,
                 const Array<int>& bandList, std::uint32_t atLevel);
 
     std::uint32_t FirstTileX() const { return rect.x / geometry.tileSize; }
@@ -166,34 +103,21 @@ struct TileRequest {
     // Room for the longest run of any segment; 0 where all of them are straight.
     std::uint64_t RunBytes() const;
 
-    // Calls visit(const TilePiece&, const TileSegment&) for all segments: pieces as VisitPieces has
+    // Calls visit(const TilePart&, const TileSegment&) for all segments: pieces as VisitTiles has
     // them, the planes of a piece in list order, those of a group from its top.
     template <class Visit>
     void VisitSegments(Visit&& visit) const {
         if (block) return VisitPiece(AsPiece(), visit);
-        VisitPieces(geometry, rect, [&](const TilePiece& piece) {
-            VisitPiece(piece, visit);
-            return true;
-        });
+        VisitTiles(geometry, rect, [&](const TilePart& piece) { VisitPiece(piece, visit); });
     }
 
 private:
-    TilePiece AsPiece() const {
-        return {FirstTileX(),
-                FirstTileY(),
-                rect.width,
-                rect.height,
-                0,
-                0,
-                rect.width,
-                rect.height,
-                0,
-                0};
-    }
+    // The rectangle as if it were its first tile.
+    TilePart AsPiece() const { return {FirstTileX(), FirstTileY(), rect, rect}; }
 
-    std::uint64_t BufferOffset(const TilePiece& piece, std::uint32_t row) const {
-        const std::uint64_t line = std::uint64_t{piece.outRow} + row;
-        return (line * rect.width + piece.outColumn) * bufferPixelBytes;
+    std::uint64_t BufferOffset(const TilePart& piece, std::uint32_t row) const {
+        const std::uint64_t line = std::uint64_t{piece.part.y - rect.y} + row;
+        return (line * rect.width + (piece.part.x - rect.x)) * bufferPixelBytes;
     }
 
     static TileSegment Straight(std::uint64_t offset, std::uint64_t bytes, std::uint64_t inBuffer) {
@@ -202,10 +126,10 @@ private:
 
     // Rows of the plane are rows of the buffer; or they fit in a run; or they are cut in parts.
     template <class Visit>
-    void VisitPiece(const TilePiece& piece, Visit& visit) const {
-        const std::uint64_t rowBytes = piece.tileWidth * tilePixelBytes;
-        if (LiesAlike() && piece.columns == piece.tileWidth && piece.columns == rect.width)
-            return visit(piece, Straight(piece.firstRow * rowBytes, piece.rows * rowBytes,
+    void VisitPiece(const TilePart& piece, Visit& visit) const {
+        const std::uint64_t rowBytes = piece.tile.width * tilePixelBytes;
+        if (LiesAlike() && piece.part.width == piece.tile.width && piece.part.width == rect.width)
+            return visit(piece, Straight(piece.FirstLine() * rowBytes, piece.part.height * rowBytes,
                                          BufferOffset(piece, 0)));
         // In the ordering Morton rows are short.
         if (planar || rowBytes <= kRunBytes) return VisitRows(piece, rowBytes, visit);
@@ -213,25 +137,26 @@ private:
     }
 
     template <class Visit>
-    void VisitRows(const TilePiece& piece, std::uint64_t rowBytes, Visit& visit) const {
+    void VisitRows(const TilePart& piece, std::uint64_t rowBytes, Visit& visit) const {
         for (std::uint32_t first = 0; first < planes; first += planesTogether) {
             const std::uint32_t count = std::min(planes - first, planesTogether);
             const std::uint64_t fit = std::max<std::uint64_t>(kRunBytes / (rowBytes * count), 1);
-            const auto step = static_cast<std::uint32_t>(std::min<std::uint64_t>(fit, piece.rows));
-            for (std::uint32_t row = 0; row < piece.rows; row += step) {
-                const std::uint32_t rows = std::min(step, piece.rows - row);
+            const auto step =
+                static_cast<std::uint32_t>(std::min<std::uint64_t>(fit, piece.part.height));
+            for (std::uint32_t row = 0; row < piece.part.height; row += step) {
+                const std::uint32_t rows = std::min(step, piece.part.height - row);
                 const TileSegment segment{
-                    (std::uint64_t{piece.firstRow} + row) * rowBytes,
+                    (std::uint64_t{piece.FirstLine()} + row) * rowBytes,
                     rows * rowBytes,
                     BufferOffset(piece, row) + first * std::uint64_t{sampleBytes},
                     false,
-                    piece.firstColumn * tilePixelBytes,
+                    piece.FirstColumn() * tilePixelBytes,
                     rowBytes,
                     rows,
-                    piece.columns,
+                    piece.part.width,
                     first,
                     count,
-                    (planar || allInOrder) && piece.columns == piece.tileWidth};
+                    (planar || allInOrder) && piece.part.width == piece.tile.width};
                 visit(piece, segment);
             }
         }
@@ -241,21 +166,21 @@ private:
     // more than what is asked of it. With all bands the part of a row that is asked for is
     // straight.
     template <class Visit>
-    void VisitRowParts(const TilePiece& piece, Visit& visit) const {
-        const std::uint64_t fit = allInOrder ? piece.columns : kRunBytes / tilePixelBytes;
+    void VisitRowParts(const TilePart& piece, Visit& visit) const {
+        const std::uint64_t fit = allInOrder ? piece.part.width : kRunBytes / tilePixelBytes;
         const auto step =
-            static_cast<std::uint32_t>(std::clamp<std::uint64_t>(fit, 1, piece.columns));
-        for (std::uint32_t row = 0; row < piece.rows; ++row)
-            for (std::uint32_t column = 0; column < piece.columns; column += step)
-                VisitRowPart(piece, row, column, std::min(step, piece.columns - column), visit);
+            static_cast<std::uint32_t>(std::clamp<std::uint64_t>(fit, 1, piece.part.width));
+        for (std::uint32_t row = 0; row < piece.part.height; ++row)
+            for (std::uint32_t column = 0; column < piece.part.width; column += step)
+                VisitRowPart(piece, row, column, std::min(step, piece.part.width - column), visit);
     }
 
     template <class Visit>
-    void VisitRowPart(const TilePiece& piece, std::uint32_t row, std::uint32_t column,
+    void VisitRowPart(const TilePart& piece, std::uint32_t row, std::uint32_t column,
                       std::uint32_t pixels, Visit& visit) const {
-        const std::uint64_t line = std::uint64_t{piece.firstRow} + row;
+        const std::uint64_t line = std::uint64_t{piece.FirstLine()} + row;
         const std::uint64_t offset =
-            (line * piece.tileWidth + piece.firstColumn + column) * tilePixelBytes;
+            (line * piece.tile.width + piece.FirstColumn() + column) * tilePixelBytes;
         const std::uint64_t bytes = pixels * tilePixelBytes;
         const std::uint64_t inBuffer = BufferOffset(piece, row) + column * bufferPixelBytes;
         if (allInOrder) return visit(piece, Straight(offset, bytes, inBuffer));

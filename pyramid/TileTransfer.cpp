@@ -37,9 +37,9 @@ protected:
     }
 
     // Where the run of a segment starts in the i-th of its planes.
-    std::uint64_t RunStart(const TilePiece& piece, const TileSegment& segment,
+    std::uint64_t RunStart(const TilePart& piece, const TileSegment& segment,
                            std::uint32_t i = 0) const {
-        return PlaneStart(segment.plane + i, piece.tileX, piece.tileY) + segment.offset;
+        return PlaneStart(segment.plane + i, piece.column, piece.row) + segment.offset;
     }
 
     // Moves the samples of a segment between the work space, where its planes lie one after the
@@ -96,14 +96,14 @@ public:
         const std::uint64_t runBytes = request.RunBytes();
         unsigned char* const work = runBytes == 0 ? nullptr : WorkSpace(runBytes);
         if (runBytes != 0 && !work) return false;
-        request.VisitSegments([&](const TilePiece& piece, const TileSegment& segment) {
+        request.VisitSegments([&](const TilePart& piece, const TileSegment& segment) {
             ReadSegment(piece, segment, work, buffer);
         });
         return true;
     }
 
 private:
-    void ReadSegment(const TilePiece& piece, const TileSegment& segment, unsigned char* work,
+    void ReadSegment(const TilePart& piece, const TileSegment& segment, unsigned char* work,
                      unsigned char* buffer) const {
         if (segment.straight)
             return ReadOrZero(RunStart(piece, segment), buffer + segment.inBuffer, segment.bytes);
@@ -162,7 +162,7 @@ private:
         if (workBytes != 0 && !work) return false;
         if (!ReadOld(work) || !CopyBehind(work)) return true;
         unsigned char* old = work;
-        plan.VisitSegments([&](const TilePiece& piece, const TileSegment& segment) {
+        plan.VisitSegments([&](const TilePart& piece, const TileSegment& segment) {
             unsigned char* const run = NeedsOld(segment) ? old : work + oldBytes;
             if (NeedsOld(segment)) old += segment.bytes;
             WriteSegment(piece, segment, run, buffer);
@@ -174,7 +174,7 @@ private:
 
     std::uint64_t OldBytes() const {
         std::uint64_t bytes = 0;
-        plan.VisitSegments([&](const TilePiece&, const TileSegment& segment) {
+        plan.VisitSegments([&](const TilePart&, const TileSegment& segment) {
             if (NeedsOld(segment)) bytes += segment.bytes;
         });
         return bytes;
@@ -182,7 +182,7 @@ private:
 
     bool ReadOld(unsigned char* old) const {
         bool read = true;
-        plan.VisitSegments([&](const TilePiece& piece, const TileSegment& segment) {
+        plan.VisitSegments([&](const TilePart& piece, const TileSegment& segment) {
             if (!read || !NeedsOld(segment)) return;
             read = ReadExisting(RunStart(piece, segment), old, segment.bytes);
             old += segment.bytes;
@@ -211,7 +211,7 @@ private:
         return true;
     }
 
-    void WriteSegment(const TilePiece& piece, const TileSegment& segment, unsigned char* run,
+    void WriteSegment(const TilePart& piece, const TileSegment& segment, unsigned char* run,
                       const unsigned char* buffer) const {
         if (segment.straight) {
             file.WriteAt(RunStart(piece, segment) + shift, buffer + segment.inBuffer,

@@ -1,6 +1,7 @@
 #include <algorithm>
 #include <cstring>
 
+#include "format/TileWalk.h"
 #include "host/build/LevelReduction.h"
 #include "tools/Interrupt.h"
 #include "tools/Message.h"
@@ -33,15 +34,12 @@ public:
                             std::uint64_t total) {
         const std::uint32_t code = zelm::ElementTraits<T>::code;
         SampleDifferences differences(code, code, bands, 0);
-        const std::uint32_t side = BlockSide();
-        for (std::uint32_t y = 0; y < raster.Height(level); y += side)
-            for (std::uint32_t x = 0; x < raster.Width(level); x += side) {
-                const zmchost::Window block{x, y, std::min(side, raster.Width(level) - x),
-                                            std::min(side, raster.Height(level) - y)};
-                CheckBlock(level, block, differences);
-                done += std::uint64_t{block.width} * block.height;
-                if (!bar.Show(done, total)) throw Interruption(raster.Name());
-            }
+        const zelm::LevelGeometry blocks(raster.Width(level), raster.Height(level), BlockSide(), 0);
+        zelm::VisitTiles(blocks, blocks.Whole(), [&](const zelm::TilePart& block) {
+            CheckBlock(level, block.tile, differences);
+            done += block.tile.Pixels();
+            if (!bar.Show(done, total)) throw Interruption(raster.Name());
+        });
         return differences;
     }
 

@@ -1,8 +1,8 @@
 #include "host/build/TileStore.h"
 
-#include <algorithm>
 #include <cstring>
 
+#include "format/TileWalk.h"
 #include "host/base/Error.h"
 #include "host/build/BuildPlan.h"
 
@@ -31,19 +31,18 @@ std::uint64_t TileStore::WorkMemory(const TileStoreSetup& setup) {
     return kTilePixels * (std::uint64_t{setup.pixelBytes} + setup.bands);
 }
 
-std::uint32_t TileStore::TilesAcross(std::uint32_t level) const {
-    return TilesAlong(setup.width >> level);
+zelm::LevelGeometry TileStore::Geometry(std::uint32_t level) const {
+    return {setup.width, setup.height, kTileSide, level};
 }
 
-std::uint32_t TileStore::TilesDown(std::uint32_t level) const {
-    return TilesAlong(setup.height >> level);
+std::uint32_t TileStore::TilesAcross(std::uint32_t level) const {
+    return Geometry(level).tilesAcross;
 }
+
+std::uint32_t TileStore::TilesDown(std::uint32_t level) const { return Geometry(level).tilesDown; }
 
 Window TileStore::Tile(std::uint32_t level, std::uint32_t column, std::uint32_t row) const {
-    const std::uint32_t x = column * kTileSide;
-    const std::uint32_t y = row * kTileSide;
-    return {x, y, std::min(kTileSide, (setup.width >> level) - x),
-            std::min(kTileSide, (setup.height >> level) - y)};
+    return Geometry(level).Tile(column, row);
 }
 
 void TileStore::Write(const Strip& strip, std::uint32_t stripBegin, std::uint32_t begin,
@@ -78,17 +77,16 @@ void TileStore::ReadTile(std::uint32_t level, const Window& tile, std::byte* pix
 void TileStore::Read(std::uint32_t level, const Window& window, std::byte* pixels) {
     const std::lock_guard<std::mutex> lock(mutex);
     const std::size_t windowStride = std::size_t{window.width} * setup.pixelBytes;
-    const std::uint32_t right = window.x + window.width;
-    for (std::uint32_t column = window.x / kTileSide; column < TilesAlong(right); ++column) {
-        const Window tile = Tile(level, column, window.y / kTileSide);
-        Check("read a tile back", work.ReadTile(level, tile, buffer.Data()));
-        const std::uint32_t begin = std::max(tile.x, window.x);
-        const std::uint32_t end = std::min(tile.x + tile.width, right);
-        CopyLines(pixels + std::size_t{begin - window.x} * setup.pixelBytes, windowStride,
-                  buffer.Data() + std::size_t{begin - tile.x} * setup.pixelBytes,
-                  std::size_t{tile.width} * setup.pixelBytes,
-                  std::size_t{end - begin} * setup.pixelBytes, window.height);
-    }
+    zelm::VisitTiles(Geometry(level), window, [&](const zelm::TilePart& tile) {
+        Check("read a tile back", work.ReadTile(level, tile.tile, buffer.Data()));
+        const std::size_t tileStride = std::size_t{tile.tile.width} * setup.pixelBytes;
+        CopyLines(pixels + (tile.part.y - window.y) * windowStride +
+                      std::size_t{tile.part.x - window.x} * setup.pixelBytes,
+                  windowStride,
+                  buffer.Data() + tile.FirstLine() * tileStride +
+                      std::size_t{tile.FirstColumn()} * setup.pixelBytes,
+                  tileStride, std::size_t{tile.part.width} * setup.pixelBytes, tile.part.height);
+    });
 }
 
 }  // namespace zmchost

@@ -11,6 +11,7 @@
 #include <string>
 #include <vector>
 
+#include "format/LevelGeometry.h"
 #include "host/build/PixelWork.h"
 #include "host/build/Strip.h"
 
@@ -49,6 +50,7 @@ public:
     std::uint32_t TilesDown(std::uint32_t level) const;
 
 private:
+    zelm::LevelGeometry Geometry(std::uint32_t level) const;
     void WriteTile(const Strip& strip, std::uint32_t stripBegin, std::uint32_t column,
                    std::uint32_t row);
     void Check(const char* operation, bool done);

@@ -90,7 +90,7 @@ PyramidHeader PyramidHeader::Parse(const std::string& name, std::string_view sta
     InitialiseXerces();
     const std::string_view text = start.substr(0, static_cast<std::size_t>(header.tileDataStart))
                                       .substr(zelm::PyramidFront::kHeaderOffset);
-    if (const std::string wrong = zelm::ParseHeaderText(std::string(text), header); !wrong.empty())
+    if (const std::string wrong = zelm::ParseHeaderText(text, header); !wrong.empty())
         Refuse(name, wrong);
     Check(name, header);
     header.tileDataEnd = header.tileDataStart + header.TileDataBytes();

@@ -5,6 +5,7 @@
 #include <sstream>
 
 #include "core/PixelVocabulary.h"
+#include "format/TileWalk.h"
 #include "host/base/Text.h"
 #include "host/journal/MetadataJournal.h"
 #include "host/raster/LentFile.h"
@@ -21,17 +22,6 @@ zelm::Array<int> BandList(std::span<const std::uint32_t> bands) {
     std::transform(bands.begin(), bands.end(), list.data,
                    [](std::uint32_t band) { return static_cast<int>(band); });
     return list;
-}
-
-Window Intersection(const Window& a, const Window& b) {
-    const std::uint32_t x = std::max(a.x, b.x);
-    const std::uint32_t y = std::max(a.y, b.y);
-    return {x, y, std::min(a.x + a.width, b.x + b.width) - x,
-            std::min(a.y + a.height, b.y + b.height) - y};
-}
-
-bool Same(const Window& a, const Window& b) {
-    return a.x == b.x && a.y == b.y && a.width == b.width && a.height == b.height;
 }
 
 std::string Describe(const Window& window) {
@@ -208,6 +198,10 @@ std::uint32_t Raster::TileSide() const {
     return header ? header->tileSize : std::max({props.samples, props.lines, 1u});
 }
 
+zelm::LevelGeometry Raster::Geometry(std::uint32_t level) const {
+    return {Width(level), Height(level), TileSide(), 0};
+}
+
 std::uint32_t Raster::TilesAcross(std::uint32_t level) const {
     return static_cast<std::uint32_t>((std::uint64_t{Width(level)} + TileSide() - 1) / TileSide());
 }
@@ -219,9 +213,7 @@ std::uint32_t Raster::TilesDown(std::uint32_t level) const {
 Window Raster::Tile(std::uint32_t level, std::uint32_t column, std::uint32_t row) const {
     if (column >= TilesAcross(level) || row >= TilesDown(level))
         throw Error(name, "find a tile", "the level has no such tile");
-    const std::uint32_t side = TileSide();
-    return {column * side, row * side, std::min(side, Width(level) - column * side),
-            std::min(side, Height(level) - row * side)};
+    return Geometry(level).Tile(column, row);
 }
 
 bool Raster::IsComplete() {
@@ -279,9 +271,7 @@ void Raster::CheckLevel(std::uint32_t level) const {
 
 void Raster::CheckWindow(const char* operation, std::uint32_t level, const Window& window,
                          std::span<const std::uint32_t> bands) const {
-    const bool fits = window.x <= Width(level) && window.width <= Width(level) - window.x &&
-                      window.y <= Height(level) && window.height <= Height(level) - window.y;
-    if (!fits)
+    if (!Window{0, 0, Width(level), Height(level)}.Contains(window))
         throw Error(name, operation + (' ' + Describe(window)),
                     "level " + std::to_string(level) + " has " + std::to_string(Width(level)) +
                         " x " + std::to_string(Height(level)));
@@ -315,22 +305,18 @@ void Raster::ReadTile(std::uint32_t level, const Window& window,
 void Raster::ReadTiles(std::uint32_t level, const Window& window,
                        std::span<const std::uint32_t> bands, unsigned char* pixels) const {
     const std::size_t pixelBytes = bands.size() * SampleSize();
-    const std::uint32_t side = TileSide();
-    std::vector<unsigned char> part;
-    for (std::uint32_t row = window.y / side; row * std::uint64_t{side} < window.y + window.height;
-         ++row)
-        for (std::uint32_t column = window.x / side;
-             column * std::uint64_t{side} < window.x + window.width; ++column) {
-            const Window piece = Intersection(Tile(level, column, row), window);
-            if (Same(piece, window)) return ReadTile(level, window, bands, pixels);
-            const std::size_t rowBytes = piece.width * pixelBytes;
-            part.resize(rowBytes * piece.height);
-            ReadTile(level, piece, bands, part.data());
-            unsigned char* to = pixels + OffsetIn(window, piece, pixelBytes);
-            for (std::uint32_t line = 0; line < piece.height; ++line)
-                std::memcpy(to + std::size_t{line} * window.width * pixelBytes,
-                            part.data() + line * rowBytes, rowBytes);
-        }
+    std::vector<unsigned char> samples;
+    zelm::VisitTiles(Geometry(level), window, [&](const zelm::TilePart& tile) {
+        const Window& part = tile.part;
+        if (part == window) return ReadTile(level, window, bands, pixels);
+        const std::size_t rowBytes = part.width * pixelBytes;
+        samples.resize(rowBytes * part.height);
+        ReadTile(level, part, bands, samples.data());
+        unsigned char* to = pixels + OffsetIn(window, part, pixelBytes);
+        for (std::uint32_t line = 0; line < part.height; ++line)
+            std::memcpy(to + std::size_t{line} * window.width * pixelBytes,
+                        samples.data() + line * rowBytes, rowBytes);
+    });
 }
 
 void Raster::Read(std::uint32_t level, const Window& window, std::span<const std::uint32_t> bands,
@@ -384,8 +370,7 @@ void Raster::MergeTile(std::uint32_t level, const Window& tile, const Window& wi
     const std::size_t windowPixel = bands.size() * size;
     std::vector<unsigned char> whole(std::size_t{tile.width} * tile.height * tilePixel);
     const Window piece = Intersection(tile, window);
-    if (!Same(piece, tile) || bands.size() != Bands())
-        ReadTile(level, tile, AllBands(), whole.data());
+    if (piece != tile || bands.size() != Bands()) ReadTile(level, tile, AllBands(), whole.data());
     for (std::uint32_t line = 0; line < piece.height; ++line) {
         const Window row{piece.x, piece.y + line, piece.width, 1};
         unsigned char* to = whole.data() + OffsetIn(tile, row, tilePixel);
@@ -422,12 +407,9 @@ void Raster::Write(std::uint32_t level, const Window& window, std::span<const st
         });
         return;
     }
-    const std::uint32_t side = TileSide();
-    for (std::uint32_t row = window.y / side; row * std::uint64_t{side} < window.y + window.height;
-         ++row)
-        for (std::uint32_t column = window.x / side;
-             column * std::uint64_t{side} < window.x + window.width; ++column)
-            MergeTile(level, Tile(level, column, row), window, bands, samples.data());
+    zelm::VisitTiles(Geometry(level), window, [&](const zelm::TilePart& part) {
+        MergeTile(level, part.tile, window, bands, samples.data());
+    });
     file->Accept();
 }
 

@@ -169,6 +169,7 @@ private:
     static Raster OpenLent(ModulePtr module, const std::string& name,
                            std::shared_ptr<LentFile> file);
     void TakeReader();
+    zelm::LevelGeometry Geometry(std::uint32_t level) const;
     void CheckType(std::uint32_t pixelType) const;
     void CheckLevel(std::uint32_t level) const;
     void CheckWindow(const char* operation, std::uint32_t level, const Window& window,

@@ -11,17 +11,13 @@
 #include <string>
 
 #include "colour/Palette.h"
+#include "format/Rectangle.h"
 #include "raster/RasterProps.h"
 
 namespace zmchost {
 
-// A rectangle of pixels: columns [x, x + width) and lines [y, y + height).
-struct Window {
-    std::uint32_t x = 0;
-    std::uint32_t y = 0;
-    std::uint32_t width = 0;
-    std::uint32_t height = 0;
-};
+// Columns [x, x + width) and lines [y, y + height) of a level or of a source, in pixels.
+using Window = zelm::Rectangle;
 
 class RasterSource {
 public:

@@ -129,6 +129,26 @@ TEST_F(HeaderParser, ManyNamesCostNothingLater) {
     }
 }
 
+// What was read is kept, and given to the same text alone.
+TEST_F(HeaderParser, TextsThatAreAlikeAndNearlySo) {
+    const auto read = [&](const std::string& text) {
+        record = PyramidHeaderRecord();
+        return ParseHeaderText(text, record).empty() ? static_cast<int>(record.bandCount) : -1;
+    };
+    const std::string five = "<D><HEADER_BANDS>5</HEADER_BANDS></D>";
+    const std::string six = "<D><HEADER_BANDS>6</HEADER_BANDS></D>";
+    for (int round = 0; round < 2; ++round) {
+        EXPECT_EQ(read(five), 5);
+        EXPECT_EQ(read(five), 5);
+        EXPECT_EQ(read(five + '\0'), -1);
+        EXPECT_EQ(read(five.substr(0, five.size() - 1)), -1);
+        EXPECT_EQ(read(five), 5);
+        EXPECT_EQ(read(six), 6);
+        EXPECT_EQ(read(six + std::string(5000, '\n')), 6);
+        EXPECT_EQ(read(six), 6);
+    }
+}
+
 TEST_F(HeaderParser, ListensToNobody) {
     PyramidHeaderRecord plain;
     TakeHeaderText(plain, ElementName::PALETTE_BAND, "5");
