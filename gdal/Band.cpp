@@ -88,8 +88,6 @@ CPLErr Band::IReadBlock(int blockX, int blockY, void* data) {
                     static_cast<std::size_t>(nBlockXSize) * static_cast<std::size_t>(nBlockYSize) *
                         static_cast<std::size_t>(size));
     if (tiles.Read(tile, &band, 1, {data, eDataType, size, size * nBlockXSize, 0})) return CE_None;
-    ReportError(CE_Failure, CPLE_FileIO, "the raster module did not read tile %d, %d", blockX,
-                blockY);
     return CE_Failure;
 }
 
@@ -214,8 +212,6 @@ CPLErr Band::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, voi
         const Target target{data, bufferType, pixelSpace, lineSpace, 0};
         if (owner.File().tiles.Read({owner.Level(), x, y, width, height}, &band, 1, target))
             return CE_None;
-        ReportError(CE_Failure, CPLE_FileIO, "the raster module did not read level %u",
-                    owner.Level());
         return CE_Failure;
     }
     return GDALPamRasterBand::IRasterIO(mode, x, y, width, height, data, bufferWidth, bufferHeight,

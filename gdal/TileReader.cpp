@@ -65,13 +65,16 @@ bool TileReader::ReadRaw(const Window& tile, const int* bands, int bandCount, vo
     // A short read leaves the buffer as it was.
     if (!layout.complete) std::memset(buffer, 0, samples * rawSampleSize);
     bool done = false;
-    raster.Visit([&]<class T>(zelm::RasterReader<T>& reader) {
+    const bool told = raster.Visit([&]<class T>(zelm::RasterReader<T>& reader) {
         done = reader.ReadTile(tile.x, tile.y, static_cast<std::uint32_t>(tile.width),
                                static_cast<std::uint32_t>(tile.height), ListOf(bands, bandCount),
                                static_cast<std::int32_t>(tile.level), static_cast<T*>(buffer),
                                nullptr);
     });
-    return done;
+    if (told && !done)
+        CPLError(CE_Failure, CPLE_FileIO, "the raster module refuses a tile of level %u",
+                 tile.level);
+    return told && done;
 }
 
 bool TileReader::FitsTarget(const Window& window, const int* bands, int bandCount,

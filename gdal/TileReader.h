@@ -44,8 +44,8 @@ public:
     // The samples of all bands of a pixel lie together in the file.
     bool IsPixelInterleaved() const;
 
-    // Reads the bands (from 0) of a window; false if the module refused it. What an incomplete
-    // file does not hold reads as zeros.
+    // Reads the bands (from 0) of a window; false, reported to GDAL, if the module refused it or
+    // the disk failed. What an incomplete file does not hold reads as zeros.
     bool Read(const Window& window, const int* bands, int bandCount, const Target& target);
 
     // Must be called when the file has changed.
