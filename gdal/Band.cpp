@@ -90,8 +90,6 @@ CPLErr Band::IReadBlock(int blockX, int blockY, void* data) {
                         static_cast<std::size_t>(size));
     if (tiles.Read(owner.Level(), tile, &band, 1, {data, eDataType, size, size * nBlockXSize, 0}))
         return CE_None;
-    ReportError(CE_Failure, CPLE_FileIO, "the raster module did not read tile %d, %d", blockX,
-                blockY);
     return CE_Failure;
 }
 
@@ -211,8 +209,6 @@ CPLErr Band::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, voi
         if (owner.File().tiles.Read(owner.Level(), RectangleOf(x, y, width, height), &band, 1,
                                     target))
             return CE_None;
-        ReportError(CE_Failure, CPLE_FileIO, "the raster module did not read level %u",
-                    owner.Level());
         return CE_Failure;
     }
     return GDALPamRasterBand::IRasterIO(mode, x, y, width, height, data, bufferWidth, bufferHeight,

@@ -5,6 +5,7 @@
 #include <new>
 
 #include "core/PixelVocabulary.h"
+#include "files/Lending.h"
 #include "gdal/Band.h"
 #include "gdal/Dataset.h"
 #include "gdal/GdalRasterSource.h"
@@ -46,7 +47,7 @@ void UseProgress(zmchost::BuildOptions& options, GDALProgressFunc progress, void
 }
 
 std::unique_ptr<Dataset> OpenForUpdate(const std::string& name) {
-    auto file = std::make_shared<OpenFile>(name, OpenOptions{});
+    auto file = std::make_shared<OpenFile>(name, GA_Update, OpenOptions{});
     auto dataset = Dataset::FromFile(std::move(file), GA_Update);
     dataset->LoadSidecar(name.c_str(), nullptr);
     return dataset;
@@ -82,7 +83,7 @@ GDALDataset* OpenSpool(const std::string& target, const zmchost::Raster& raster,
     OpenOptions open;
     if (options.signedByte) open.signedByteAs = SignedByteAs::FlaggedByte;
     const std::size_t blocks = std::size_t{raster.TilesAcross()} * raster.TilesDown();
-    auto file = std::make_shared<OpenFile>(spool->Path(), open);
+    auto file = std::make_shared<OpenFile>(spool->Path(), GA_Update, open);
     auto dataset = Dataset::FromFile(std::move(file), GA_Update);
     dataset->SetDescription(target.c_str());
     dataset->BeginCreation(std::make_unique<Creation>(target, std::move(options), std::move(spool),
@@ -90,10 +91,17 @@ GDALDataset* OpenSpool(const std::string& target, const zmchost::Raster& raster,
     return dataset.release();
 }
 
+bool RefuseLent(const char* target) {
+    if (!zelm::files::LooksLent(target)) return false;
+    CPLError(CE_Failure, CPLE_IllegalArg, "%s: names of lent sources are not taken here", target);
+    return true;
+}
+
 }  // namespace
 
 GDALDataset* CreateCopy(const char* target, GDALDataset* source, int strict, char** options,
                         GDALProgressFunc progress, void* progressData) {
+    if (RefuseLent(target)) return nullptr;
     auto parsed = ParseCreationOptions(options);
     if (!parsed) return nullptr;
     return Reporting([&] {
@@ -103,6 +111,7 @@ GDALDataset* CreateCopy(const char* target, GDALDataset* source, int strict, cha
 
 GDALDataset* CreateNew(const char* target, int width, int height, int bands, GDALDataType type,
                        char** options) {
+    if (RefuseLent(target)) return nullptr;
     auto parsed = ParseCreationOptions(options);
     if (!parsed) return nullptr;
     return Reporting([&]() -> GDALDataset* {

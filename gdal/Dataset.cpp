@@ -8,6 +8,8 @@
 #include "gdal/Band.h"
 #include "gdal/Create.h"
 #include "gdal/LevelRefresh.h"
+#include "gdal/VsiSource.h"
+#include "host/raster/LentFile.h"
 
 namespace zmcgdal {
 namespace {
@@ -36,13 +38,10 @@ zmchost::PyramidFileInfo CheckedInfo(const std::string& fileName,
 
 }  // namespace
 
-OpenFile::OpenFile(const std::string& fileName, const OpenOptions& options)
-    : OpenFile(fileName, zmchost::PyramidHeader::Read(fileName), options) {}
-
-OpenFile::OpenFile(const std::string& fileName, const zmchost::PyramidHeader& header,
-                   const OpenOptions& options)
-    : raster(fileName, options.keepCopies),
-      info(CheckedInfo(fileName, header)),
+OpenFile::OpenFile(const std::string& fileName, GDALAccess access, const OpenOptions& options)
+    : source(OpenByName(fileName, access == GA_Update)),
+      info(CheckedInfo(fileName, zmchost::PyramidHeader::Read(*source, fileName))),
+      raster(fileName, source, info.header, options.keepCopies),
       tiles(raster, info, GdalTypeOf(info.header.pixelType, options.signedByteAs)),
       archive(raster, info.HasMetadataDocument()) {}
 
@@ -171,7 +170,6 @@ CPLErr Dataset::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, 
         if (file->tiles.Read(level, RectangleOf(x, y, width, height), bands.data(), bandCount,
                              target))
             return CE_None;
-        ReportError(CE_Failure, CPLE_FileIO, "the raster module did not read level %u", level);
         return CE_Failure;
     }
     return GDALPamDataset::IRasterIO(mode, x, y, width, height, data, bufferWidth, bufferHeight,

@@ -27,14 +27,13 @@ class Creation;
 // What all levels of an open file share.
 class OpenFile {
 public:
-    // Throws zmchost::Error if the file is no pyramid, or one that GDAL cannot hold.
-    OpenFile(const std::string& fileName, const OpenOptions& options);
-    // The same with the header at hand.
-    OpenFile(const std::string& fileName, const zmchost::PyramidHeader& header,
-             const OpenOptions& options);
+    // Opens the file once, for all that is read from it and written to it. Throws zmchost::Error if
+    // it cannot be opened, is no pyramid, or one that GDAL cannot hold.
+    OpenFile(const std::string& fileName, GDALAccess access, const OpenOptions& options);
 
-    LazyRaster raster;
+    const std::shared_ptr<zelm::files::ByteSource> source;
     const zmchost::PyramidFileInfo info;
+    LazyRaster raster;
     TileReader tiles;
     Archive archive;
 };

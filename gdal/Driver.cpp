@@ -5,9 +5,11 @@
 #include <exception>
 #include <memory>
 
+#include "files/Lending.h"
 #include "gdal/Create.h"
 #include "gdal/Dataset.h"
 #include "gdal/Options.h"
+#include "gdal/VsiSource.h"
 #include "host/base/Xerces.h"
 #include "host/file/PyramidFileInfo.h"
 #include "host/journal/MetadataJournal.h"
@@ -23,8 +25,11 @@ std::string_view StartOf(const GDALOpenInfo& info) {
             static_cast<std::size_t>(info.nHeaderBytes)};
 }
 
+// Names of lent sources are made and used within code of one process: one that comes from a user of
+// GDAL is nobody's.
 int Identify(GDALOpenInfo* info) {
-    return zmchost::LooksLikePyramid(StartOf(*info)) ? TRUE : FALSE;
+    const bool lent = zelm::files::LooksLent(info->pszFilename);
+    return !lent && zmchost::LooksLikePyramid(StartOf(*info)) ? TRUE : FALSE;
 }
 
 void WarnIfIncomplete(const Dataset& dataset, const zmchost::PyramidFileInfo& info) {
@@ -33,14 +38,6 @@ void WarnIfIncomplete(const Dataset& dataset, const zmchost::PyramidFileInfo& in
              "%s: the pyramid is incomplete, " CPL_FRMT_GUIB
              " bytes are missing; only its finest level is shown",
              dataset.GetDescription(), static_cast<GUIntBig>(info.bytesMissing));
-}
-
-// GDAL has read the beginning of the file already, which holds the header as a rule.
-zmchost::PyramidHeader HeaderOf(GDALOpenInfo& info) {
-    const std::string_view start = StartOf(info);
-    if (info.fpL && zmchost::PyramidHeader::IsWhole(start) && VSIFSeekL(info.fpL, 0, SEEK_END) == 0)
-        return zmchost::PyramidHeader::Parse(info.pszFilename, start, VSIFTellL(info.fpL));
-    return zmchost::PyramidHeader::Read(info.pszFilename);
 }
 
 // What a store that was cut off has left: statistics that GDAL stores into it now would be lost
@@ -55,8 +52,8 @@ void PutInOrder(const std::string& name) {
 }
 
 std::unique_ptr<Dataset> OpenDataset(GDALOpenInfo* info) {
-    PutInOrder(info->pszFilename);
-    auto file = std::make_shared<OpenFile>(info->pszFilename, HeaderOf(*info),
+    if (!IsVirtualName(info->pszFilename)) PutInOrder(info->pszFilename);
+    auto file = std::make_shared<OpenFile>(info->pszFilename, info->eAccess,
                                            OpenOptionsFrom(info->papszOpenOptions));
     const zmchost::PyramidFileInfo layout = file->info;
     auto dataset = Dataset::FromFile(std::move(file), info->eAccess);

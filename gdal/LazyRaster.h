@@ -1,13 +1,16 @@
-// LazyRaster: the module's view of a file, opened when it is first needed.
+// LazyRaster: the module's view of a file, made when it is first needed.
 //
 // GDAL opens many files only to look at their size and place, and the header tells those; the
-// module parses the file's statistics as well. What it refuses then fails the read that asked.
+// module parses the file's statistics as well. What it refuses then fails the read that asked. The
+// bytes come from the source that the header came from, so that a file that takes the name in
+// between is not met; and what the module finds in it has to be what the header said.
 #ifndef ZMC_GDAL_LAZYRASTER_H
 #define ZMC_GDAL_LAZYRASTER_H
 
 #include <cpl_error.h>
 
 #include <exception>
+#include <memory>
 #include <optional>
 #include <string>
 #include <utility>
@@ -24,25 +27,35 @@ inline const zmchost::ModulePtr& SharedModule() {
 
 class LazyRaster {
 public:
-    // With `keepCopies` its stores keep the document of before until they have reached the disk.
-    LazyRaster(std::string fileName, bool keepCopies)
-        : name(std::move(fileName)), keepsCopies(keepCopies) {}
+    // `told` is the header in the source. With `keepCopies` stores into a plain file keep the
+    // document of before until they have reached the disk.
+    LazyRaster(std::string fileName, std::shared_ptr<zelm::files::ByteSource> byteSource,
+               const zmchost::PyramidHeader& told, bool keepCopies)
+        : name(std::move(fileName)),
+          source(std::move(byteSource)),
+          header(told),
+          keepsCopies(keepCopies) {}
 
-    // Throws zmchost::Error, each time anew, if the module does not open the file.
+    // Throws zmchost::Error, each time anew, if the module does not open the file, or as another
+    // raster than the header told.
     zmchost::Raster& Get() {
         if (!raster) {
-            raster.emplace(zmchost::Raster::Open(SharedModule(), name));
+            zmchost::Raster opened = zmchost::Raster::Open(SharedModule(), source, name);
+            if (!IsTheOneTold(opened))
+                throw zmchost::Error(name, "open the raster", "it has changed since it was opened");
+            raster.emplace(std::move(opened));
             raster->KeepCopies(keepsCopies);
         }
         return *raster;
     }
 
     // Calls visit(zelm::RasterReader<T>&) with the module's reader. What is thrown goes to GDAL as
-    // a failure, and the answer is false.
+    // a failure, as does what the source told of the disk, and the answer is false.
     template <class Visitor>
     bool Visit(Visitor&& visit) {
         try {
             Get().Visit(std::forward<Visitor>(visit));
+            raster->CheckDisk("read it");
             return true;
         } catch (const std::exception& error) {
             CPLError(CE_Failure, CPLE_AppDefined, "%s", error.what());
@@ -51,7 +64,20 @@ public:
     }
 
 private:
+    // Buffers are made by the header that was told.
+    bool IsTheOneTold(const zmchost::Raster& opened) const {
+        const zmchost::PyramidHeader& now = opened.Header();
+        return opened.PixelType() == header.pixelType && opened.Bands() == header.bandCount &&
+               opened.Props().samples == header.width && opened.Props().lines == header.height &&
+               now.tileSize == header.tileSize && now.tileOrdering == header.tileOrdering &&
+               now.levelMin == header.levelMin && now.levelMax == header.levelMax &&
+               now.tileDataStart == header.tileDataStart &&
+               now.BytesMissing() <= header.BytesMissing();
+    }
+
     std::string name;
+    std::shared_ptr<zelm::files::ByteSource> source;
+    zmchost::PyramidHeader header;
     bool keepsCopies;
     std::optional<zmchost::Raster> raster;
 };

@@ -55,12 +55,14 @@ bool TileReader::ReadRaw(std::uint32_t level, const Rectangle& tile, const int* 
     // A short read leaves the buffer as it was.
     if (!layout.complete) std::memset(buffer, 0, samples * rawSampleSize);
     bool done = false;
-    raster.Visit([&]<class T>(zelm::RasterReader<T>& reader) {
+    const bool told = raster.Visit([&]<class T>(zelm::RasterReader<T>& reader) {
         done = reader.ReadTile(static_cast<std::int32_t>(tile.x), static_cast<std::int32_t>(tile.y),
                                tile.width, tile.height, ListOf(bands, bandCount),
                                static_cast<std::int32_t>(level), static_cast<T*>(buffer), nullptr);
     });
-    return done;
+    if (told && !done)
+        CPLError(CE_Failure, CPLE_FileIO, "the raster module refuses a tile of level %u", level);
+    return told && done;
 }
 
 bool TileReader::FitsTarget(const Rectangle& window, const int* bands, int bandCount,

@@ -42,8 +42,8 @@ public:
     // The samples of all bands of a pixel lie together in the file.
     bool IsPixelInterleaved() const;
 
-    // Reads the bands (from 0) of a window inside a level; false if the module refused it. What an
-    // incomplete file does not hold reads as zeros.
+    // Reads the bands (from 0) of a window inside a level; false, reported to GDAL, if the module
+    // refused it or the disk failed. What an incomplete file does not hold reads as zeros.
     bool Read(std::uint32_t level, const zelm::Rectangle& window, const int* bands, int bandCount,
               const Target& target);
 

@@ -6,6 +6,7 @@
 #include <new>
 #include <xercesc/util/XercesVersion.hpp>
 
+#include "files/Lending.h"
 #include "host/base/Error.h"
 #include "platform/Interrupts.h"
 #include "tools/Command.h"
@@ -21,6 +22,18 @@ constexpr const char* kFormatVersion = "1.1";
 std::string Version() {
     return std::string("zmcraster " ZMC_VERSION "\npyramid format ") + kFormatVersion +
            "\nXerces-C++ " XERCES_FULLVERSIONDOT "\nGDAL " + GDALVersionInfo("RELEASE_NAME");
+}
+
+// A name of a lent source is good in the process that made it; one that is given here is nobody's,
+// and must reach nothing.
+CLI::Validator NotLent() {
+    return CLI::Validator(
+        [](std::string& text) {
+            return zelm::files::LooksLent(text)
+                       ? text + ": names of lent sources are not taken here"
+                       : std::string();
+        },
+        "");
 }
 
 class Program {
@@ -68,6 +81,7 @@ void Program::Add(std::unique_ptr<Command> command) {
     CLI::App* const part = app.add_subcommand(command->Name(), command->Summary());
     OptionTable table(*part);
     command->Describe(table);
+    for (CLI::Option* const option : part->get_options()) option->check(NotLent());
     table.Flag("--json", command->json, "Print one JSON document instead of text");
     table.Flag("--quiet,-q", command->quiet, "No progress bar, no warnings, errors only");
     parts.push_back(part);

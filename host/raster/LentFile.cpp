@@ -18,10 +18,6 @@ using zelm::files::FileSource;
 using zelm::files::OpenMode;
 using zelm::files::Operation;
 
-// Holds the header of every file that is written; and of every one that is read.
-constexpr std::uint64_t kUsualStart = 1024;
-constexpr std::uint64_t kLongestStart = (std::uint64_t{1} << 20) + 20;
-
 std::string ReasonNotToOpen(int error) {
     if (error == ENOENT) return "there is no such file";
     if (error == EISDIR || error == EINVAL) return "it is not a file";
@@ -67,20 +63,6 @@ std::shared_ptr<FileSource> OpenPlainFile(const std::string& file, bool forUpdat
     if (error == ENOMEM) throw std::bad_alloc();
     if (!source) throw Error(file, "open the raster", ReasonNotToOpen(error));
     return source;
-}
-
-PyramidHeader HeaderIn(ByteSource& source, const std::string& name) {
-    std::uint64_t size = 0;
-    std::string start;
-    int error = 0;
-    source.TellSize(size, &error);
-    for (const std::uint64_t length : {kUsualStart, kLongestStart}) {
-        if (error != 0 || PyramidHeader::IsWhole(start)) break;
-        start.resize(static_cast<std::size_t>(std::min(size, length)));
-        start.resize(source.ReadAt(0, start.data(), start.size(), &error));
-    }
-    if (error != 0) throw Error(name, "read the header", platform::ErrorText(error));
-    return PyramidHeader::Parse(name, start, size);
 }
 
 std::shared_ptr<LentFile> LentFile::Create(const std::string& file) {

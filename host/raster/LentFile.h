@@ -24,9 +24,6 @@ namespace zmchost {
 // read-only, else for reading. A name that looks lent is the name of a file here. Throws Error.
 std::shared_ptr<zelm::files::FileSource> OpenPlainFile(const std::string& file, bool forUpdate);
 
-// The header in a source, which `name` stands for in messages. Throws Error.
-PyramidHeader HeaderIn(zelm::files::ByteSource& source, const std::string& name);
-
 class LentFile {
 public:
     // Opens a file that is to be laid out anew, as it is. One that is missing is made, and goes
@@ -44,7 +41,7 @@ public:
     // Bytes; 0 if that cannot be told, which TakeFailure then tells.
     std::uint64_t Size() const;
 
-    PyramidHeader ReadHeader() const { return HeaderIn(*recording, file); }
+    PyramidHeader ReadHeader() const { return PyramidHeader::Read(*recording, file); }
     // The name in the file system; empty for a source of another kind.
     std::string PlainName() const;
 

@@ -158,6 +158,16 @@ class FilesThatAreNoMore(FolderTest):
         dataset = gdal.Open(path)
         band = dataset.GetRasterBand(1)
         os.remove(path)
+        np.testing.assert_array_equal(band.ReadAsArray(), array[0])
+        np.testing.assert_array_equal(dataset.ReadAsArray(), array)
+        self.assertTrue((band.GetMaskBand().ReadAsArray() == 255).all())
+        self.assertRaises(RuntimeError, gdal.Open, path)
+
+    def test_reading_a_file_that_was_cut(self):
+        path = self.copy(memory_dataset(samples(gdal.GDT_Float32, 300, 300, 2), gdal.GDT_Float32))
+        dataset = gdal.Open(path)
+        band = dataset.GetRasterBand(1)
+        os.truncate(path, 2000)
         self.assertRaises(RuntimeError, band.ReadAsArray)
         self.assertRaises(RuntimeError, dataset.ReadAsArray)
         self.assertRaises(RuntimeError, band.GetMaskBand)

@@ -35,6 +35,19 @@ class Usage(ToolTest):
             done = self.run_tool(command, "a", "b", "c", "--nonesuch")
             self.assertEqual((done.returncode, done.stderr.count("\n")), (2, 1))
 
+    def test_names_of_lent_sources_reach_nothing(self):
+        self.pyramid()
+        name = "zmc-lent:0123456789abcdef0123456789abcdef"
+        os.rename(self.path("picture.pyr"), self.path(name))
+        for words in (["info", name], ["export", name, "a.tif"], ["hash", name], ["verify", name],
+                      ["recover", name], ["compare", name, "a"], ["compare", "a", name],
+                      ["verify", "a.pyr", "--against", name], ["build", name, "a.pyr"],
+                      ["build", "a.tif", name], ["export", "a.pyr", name]):
+            done = self.run_tool(*words)
+            self.assertEqual((done.returncode, done.stdout), (2, ""), words)
+            self.assertIn(name + ": names of lent sources are not taken here", done.stderr)
+        self.good("info", "./" + name)
+
     def test_options_of_build(self):
         self.picture()
         tail = "; see zmcraster build --help"
