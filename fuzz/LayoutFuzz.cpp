@@ -22,6 +22,7 @@
 #include "fuzz/support/LayoutFields.h"
 #include "fuzz/support/NaiveLayout.h"
 #include "fuzz/support/ScratchFolder.h"
+#include "platform/File.h"
 #include "pyramid/LevelGeometry.h"
 #include "pyramid/PyramidDataset.h"
 #include "pyramid/PyramidLimits.h"
