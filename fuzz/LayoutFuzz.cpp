@@ -24,6 +24,7 @@
 #include "fuzz/support/LayoutFields.h"
 #include "fuzz/support/NaiveLayout.h"
 #include "fuzz/support/ScratchFolder.h"
+#include "platform/File.h"
 #include "pyramid/PyramidDataset.h"
 #include "pyramid/TileGather.h"
 #include "pyramid/TileRequest.h"

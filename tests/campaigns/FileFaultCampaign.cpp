@@ -54,7 +54,8 @@ protected:
     // The short form leaves calls out, above all of the files whose bands lie apart, which take
     // many times as many.
     static std::size_t Stride(std::size_t shortForm = 1) {
-        const std::size_t times = GetParam().bands > 8 ? 7 : 1;
+        std::size_t times = GetParam().bands > 8 ? 7 : 1;
+        if (GetParam().lent) times *= 5;
         return zmctest::CampaignLength<std::size_t>(shortForm * times, 1);
     }
 
@@ -237,6 +238,7 @@ TEST_P(BuildFaultCampaign, ProcessesThatEndInBuilds) {
 
 std::string NameOf(const testing::TestParamInfo<Layout>& info) { return info.param.name; }
 INSTANTIATE_TEST_SUITE_P(Layouts, FileFaultCampaign, testing::ValuesIn(kLayouts), NameOf);
+INSTANTIATE_TEST_SUITE_P(Lent, FileFaultCampaign, testing::ValuesIn(kLentLayouts), NameOf);
 INSTANTIATE_TEST_SUITE_P(Layouts, BuildFaultCampaign, testing::ValuesIn(kLayouts), NameOf);
 
 }  // namespace

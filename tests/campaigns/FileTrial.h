@@ -1,10 +1,14 @@
 // One file put before the module, as a host would, and its answers against FileOracle's.
+//
+// A file reaches the module by its name, or from a source that is lent. The short form takes one of
+// the two ways for each file, which goes by its bytes; the full form takes both.
 #ifndef ZMC_TESTS_CAMPAIGNS_FILETRIAL_H
 #define ZMC_TESTS_CAMPAIGNS_FILETRIAL_H
 
 #include <string>
 
 #include "connection/DataConnectionFactory.h"
+#include "files/Lending.h"
 #include "tests/campaigns/AnyReader.h"
 #include "tests/campaigns/Campaign.h"
 #include "tests/campaigns/FileOracle.h"
@@ -44,6 +48,7 @@ public:
 
 private:
     struct Session;  // a connection with its reader
+    Verdict TryOnce(const Bytes& file, const Depth& depth);
     void Put(const Bytes& file);
     Bytes Take() const;
     void Look(const FileOracle& oracle, const Depth& depth, Verdict& verdict);
@@ -61,6 +66,8 @@ private:
     LoadedModule module;
     support::ScratchDirectory folder;
     std::string path;
+    zelm::files::LentName lent;
+    std::string name;  // what the module opens: `path`, or the name of the loan
     int descriptor = -1;
 };
 

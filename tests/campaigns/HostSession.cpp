@@ -6,6 +6,7 @@
 #include <stdexcept>
 #include <utility>
 
+#include "files/FileSource.h"
 #include "tests/support/MemorySource.h"
 #include "tests/support/PyramidFiles.h"
 
@@ -151,9 +152,16 @@ HostSession::HostSession(const Layout& ofFile)
     if (documents.size() != kAllStores + 1) throw std::runtime_error("stores leave no trace");
 }
 
+HostSession::Way::Way(const HostSession& session, zelm::files::OpenMode mode) : name(session.path) {
+    if (!session.layout.lent) return;
+    lent = zelm::files::Lend(zelm::files::FileSource::Open(name.c_str(), mode));
+    name = lent ? lent.Utf8() : std::string(zelm::files::kLentPrefix);
+}
+
 void HostSession::Create() const {
+    const Way way(*this, zelm::files::OpenMode::Create);
     zelm::RasterDataConnectionPtr connection = module->CreatePyramid(
-        path, zelm::test::PyramidProps(kSamples, kLines, layout.bands, 1, layout.tileLines));
+        way.name, zelm::test::PyramidProps(kSamples, kLines, layout.bands, 1, layout.tileLines));
     WithReader(connection, [&](Reader& reader) {
         const std::int32_t pair[] = {2, 2};
         if (!Calling([&] { return reader.BuildPyramid(0, kMaxLevel, 0, pair); })) return;
@@ -165,7 +173,8 @@ void HostSession::Create() const {
 }
 
 void HostSession::Update(unsigned stores) const {
-    WithReader(module->OpenPyramid(path), [&](Reader& reader) {
+    const Way way(*this, zelm::files::OpenMode::Update);
+    WithReader(module->OpenPyramid(way.name), [&](Reader& reader) {
         const zelm::Array<int> list = BandList(layout.bands);
         for (const Rectangle& tile : Tiles()) ReadTile(reader, list, tile);
         WriteTile(reader, list, Tiles()[0], 1);
@@ -182,7 +191,8 @@ void HostSession::Update(unsigned stores) const {
 }
 
 void HostSession::Delete() const {
-    WithReader(module->OpenPyramid(path),
+    const Way way(*this, zelm::files::OpenMode::Update);
+    WithReader(module->OpenPyramid(way.name),
                [](Reader& reader) { Calling([&] { return reader.DeletePyramid(); }); });
 }
 

@@ -9,6 +9,8 @@
 #include <string>
 #include <vector>
 
+#include "files/ByteSource.h"
+#include "files/Lending.h"
 #include "host/raster/Module.h"
 #include "tests/support/ScratchDirectory.h"
 
@@ -18,11 +20,14 @@ struct Layout {
     const char* name;
     std::uint32_t bands;
     std::uint32_t tileLines;  // of the properties that the file is made from
+    bool lent = false;        // the module gets the file from a source, not by its name
 };
 // For the names of tests.
 inline void PrintTo(const Layout& layout, std::ostream* out) { *out << layout.name; }
 
 inline constexpr Layout kLayouts[] = {{"Scanline", 2, 1}, {"Blocked", 2, 256}, {"Morton", 9, 256}};
+inline constexpr Layout kLentLayouts[] = {
+    {"LentScanline", 2, 1, true}, {"LentBlocked", 2, 256, true}, {"LentMorton", 9, 256, true}};
 
 // Stores of a session, as bits.
 enum Stores : unsigned { kStatistics = 1, kHistograms = 2, kPalette = 4, kAllStores = 7 };
@@ -59,6 +64,13 @@ public:
     std::string FaultAfterCreate(std::string& outcome) const;
 
 private:
+    // How the module comes to the file, for one piece of work: its name, or that of a loan, which
+    // is nobody's where the source does not open.
+    struct Way {
+        Way(const HostSession& session, zelm::files::OpenMode mode);
+        std::string name;
+        zelm::files::LentName lent;
+    };
     std::string DocumentOf(const std::string& file) const;
     bool TellsOfRecords() const;
 
