@@ -3,6 +3,9 @@
 #include <algorithm>
 #include <bit>
 #include <cstddef>
+#include <cstring>
+#include <tuple>
+#include <type_traits>
 
 #include "core/ElementTypes.h"
 #include "core/PixelVocabulary.h"
@@ -14,18 +17,20 @@ namespace {
 constexpr unsigned kMarkedBit = 1;
 constexpr unsigned kOtherBits = 0xFE;
 
-// What the loops take a sample for: signed integers are equal where their bits are, and need no
-// loops of their own.
-template <class T, bool kIsInteger = std::is_integral_v<T>>
-struct SampleOf {
-    using Type = T;
+// What stamping takes a sample for: it moves bits, and knows no more of a sample than their count.
+struct WideBits {
+    std::uint64_t low;
+    std::uint64_t high;
+    bool operator==(const WideBits&) const = default;
 };
 template <class T>
-struct SampleOf<T, true> {
-    using Type = std::make_unsigned_t<T>;
-};
+using Bits = std::tuple_element_t<
+    static_cast<std::size_t>(std::countr_zero(sizeof(T))),
+    std::tuple<std::uint8_t, std::uint16_t, std::uint32_t, std::uint64_t, WideBits>>;
+
+// What marking takes a sample for: integers are equal where their bits are.
 template <class T>
-using Sample = typename SampleOf<T>::Type;
+using Sample = std::conditional_t<std::is_integral_v<T>, Bits<T>, T>;
 
 // Loops of comparisons that decide on bytes become vector code up to 32 bits. Wider integers are
 // compared by halves. Of wider reals the outcome is a number, which narrows: a finite sample times
@@ -51,20 +56,25 @@ bool IsMarked(const S& x, const S& value) {
     }
 }
 
-// The value where `bit` is 1, else the sample. Wide samples are put together from bits or parts,
-// for the loops' sake.
-template <class S>
-S Stamped(unsigned bit, const S& value, const S& x) {
-    if constexpr (std::is_same_v<S, std::uint64_t>)
-        return x ^ ((x ^ value) & (std::uint64_t{0} - bit));
-    else if constexpr (std::is_same_v<S, Complex<float>>)
-        return std::bit_cast<S>(
-            Stamped(bit, std::bit_cast<std::uint64_t>(value), std::bit_cast<std::uint64_t>(x)));
-    else
-        return bit != 0 ? value : x;
+// Puts the value in the sample's place where `bit` is 1. Vector code writes every sample, and takes
+// those of 8 bytes by their bits; the widest have no vector code to gain, and are left alone.
+template <class B>
+void Stamp(unsigned bit, const B& value, unsigned char* sample) {
+    if constexpr (std::is_same_v<B, WideBits>) {
+        if (bit != 0) std::memcpy(sample, &value, sizeof(B));
+    } else {
+        B x;
+        std::memcpy(&x, sample, sizeof(B));
+        if constexpr (sizeof(B) == 8)
+            x ^= (x ^ value) & (B{0} - bit);
+        else
+            x = bit != 0 ? value : x;
+        std::memcpy(sample, &x, sizeof(B));
+    }
 }
 
-// Asks a reader for the rule of the band in one place of a tile, whatever the sign of its samples.
+// Asks a reader for the rule of the band in one place of a tile, told in what a loop takes samples
+// for.
 // A floating band without a value gets one that no sample equals.
 template <class S>
 class RuleSource {
@@ -83,39 +93,51 @@ private:
     template <class T>
     static NoDataRule<S> Ask(const BasicRasterReader* source, std::uint32_t band) {
         const auto& typed = static_cast<const RasterReader<T>&>(*source);
-        if (typed.HasNoDataValue(band)) return {true, static_cast<S>(typed.GetNoDataValue(band))};
+        if (typed.HasNoDataValue(band)) return {true, std::bit_cast<S>(typed.GetNoDataValue(band))};
         if constexpr (std::is_integral_v<T>)
             return {};
         else
-            return {false, NoDataRule<T>::Unmatched()};
+            return {false, std::bit_cast<S>(NoDataRule<T>::Unmatched())};
     }
 };
 
 // The rules of a run of samples, by the sample's place in the run: those of a run of one band.
 template <class S>
 struct BandRules {
-    static constexpr unsigned Has(std::size_t) { return 1; }
+    static constexpr unsigned Has(std::size_t) { return kMarkedBit; }
     S Value(std::size_t) const { return rule.value; }
     bool HasAny() const { return rule.hasValue; }
 
     NoDataRule<S> rule;
 };
 
-// Narrow samples are compared so fast that one more look for each of them shows.
+// Those of a run of several bands.
 template <class S>
-constexpr bool kIsNarrow = std::is_integral_v<S> && sizeof(S) <= 2;
-
-// Those of a run of several bands of narrow samples that all have a value.
-template <class S>
-struct ValueRules {
-    static constexpr unsigned Has(std::size_t) { return 1; }
+struct ManyRules {
+    unsigned Has(std::size_t at) const { return has[at]; }
     S Value(std::size_t at) const { return values[at]; }
     static constexpr bool HasAny() { return true; }
 
     const S* values;
+    const unsigned char* has;
 };
 
-// Those of neighbouring bands of a pixel-interleaved tile, repeated over as many pixels as fit.
+// The same for a short run whose length the compiler knows, so that its loops have no rest and keep
+// the values of small samples in registers: as many as are whole vectors and, of the usual counts
+// of bands, whole pixels.
+template <class S>
+struct BlockRules {
+    static constexpr std::size_t kLength = sizeof(S) <= 8 ? 48 : 3;
+
+    unsigned Has(std::size_t at) const { return has[at]; }
+    S Value(std::size_t at) const { return values[at]; }
+    static constexpr bool HasAny() { return true; }
+
+    S values[kLength];
+    unsigned char has[kLength];
+};
+
+// The rules of neighbouring bands of a pixel-interleaved tile, repeated over as many pixels as fit.
 template <class S>
 class PixelRules {
 public:
@@ -126,24 +148,29 @@ public:
         for (std::size_t band = 0; band < bands; ++band) {
             const NoDataRule<S> rule = source.RuleOf(first + band);
             values[band] = rule.value;
-            has[band] = rule.hasValue ? 1 : 0;
-            complete = complete && rule.hasValue;
+            has[band] = rule.hasValue ? kMarkedBit : 0;
             uniform =
                 uniform && has[band] == has[0] && (!rule.hasValue || values[band] == values[0]);
         }
         if (bands == bandCount && !uniform) Repeat(pixelCount);
     }
 
-    unsigned Has(std::size_t at) const { return has[at]; }
-    S Value(std::size_t at) const { return values[at]; }
-    static constexpr bool HasAny() { return true; }
-
     std::size_t Bands() const { return bands; }
     std::size_t Pixels() const { return pixels; }
     bool IsUniform() const { return uniform; }
-    bool IsComplete() const { return complete; }
-    ValueRules<S> Values() const { return {values}; }
+    ManyRules<S> All() const { return {values, has}; }
     BandRules<S> First() const { return {{has[0] != 0, values[0]}}; }
+    // A block is the first samples, if they are whole pixels: of all bands, and as many as it
+    // takes.
+    bool HasBlock() const {
+        return pixels * bands >= BlockRules<S>::kLength && BlockRules<S>::kLength % bands == 0;
+    }
+    BlockRules<S> Block() const {
+        BlockRules<S> block;
+        std::copy_n(values, BlockRules<S>::kLength, block.values);
+        std::copy_n(has, BlockRules<S>::kLength, block.has);
+        return block;
+    }
 
 private:
     static constexpr std::size_t kMost = 4096 / sizeof(S);
@@ -154,8 +181,7 @@ private:
     unsigned char has[kMost];
     std::size_t bands;
     std::size_t pixels = 1;
-    bool complete = true;  // all of the bands have a value
-    bool uniform = true;   // all have the same, or none has one
+    bool uniform = true;  // all bands have the same, or none has one
 
     void Repeat(std::size_t pixelCount) {
         pixels = std::min(kMost / bands, pixelCount);
@@ -184,6 +210,10 @@ struct Runs {
     std::size_t step;
 };
 
+// Reals take longer to compare than to look up what with, and go without blocks.
+template <class S>
+constexpr bool kBlocks = std::is_integral_v<S> || std::is_same_v<S, WideBits>;
+
 // Calls visit(rules, place of the first sample, runs) for all samples of a tile of several
 // pixel-interleaved bands.
 template <class S, class Visit>
@@ -192,13 +222,18 @@ void VisitPixels(const RuleSource<S>& source, const TileShape& tile, const Visit
     for (std::size_t first = 0; first < tile.bands;) {
         const PixelRules<S> rules(source, first, tile.bands, pixels);
         const std::size_t samples = pixels * rules.Bands();
-        if (rules.IsUniform() && rules.Bands() == tile.bands)
+        const bool hasPixels = rules.Bands() == tile.bands;
+        if (hasPixels && rules.IsUniform())
             return visit(rules.First(), 0, Runs{samples, samples, samples});
-        const Runs runs{samples, rules.Pixels() * rules.Bands(), rules.Pixels() * tile.bands};
-        if (kIsNarrow<S> && rules.IsComplete())
-            visit(rules.Values(), first, runs);
-        else
-            visit(rules, first, runs);
+        std::size_t done = 0;
+        if constexpr (kBlocks<S>) {
+            if (hasPixels && rules.HasBlock()) {
+                done = samples - samples % BlockRules<S>::kLength;
+                visit(rules.Block(), 0, Runs{done, BlockRules<S>::kLength, BlockRules<S>::kLength});
+            }
+        }
+        visit(rules.All(), first + done,
+              Runs{samples - done, rules.Pixels() * rules.Bands(), rules.Pixels() * tile.bands});
         first += rules.Bands();
     }
 }
@@ -218,13 +253,24 @@ void VisitRuns(const RuleSource<S>& source, const TileShape& tile, const Visit& 
               Runs{plane, length, bands * length});
 }
 
+// The samples of the next run.
+template <class Rules>
+std::size_t LengthOf(const Rules&, const Runs& runs, std::size_t left) {
+    return std::min(runs.length, left);
+}
+template <class S>
+std::size_t LengthOf(const BlockRules<S>&, const Runs&, std::size_t) {
+    return BlockRules<S>::kLength;
+}
+
 template <class S, class Rules>
-[[gnu::noinline]] void MarkSamples(const Rules& rules, const S* __restrict samples,
+[[gnu::noinline]] void MarkSamples(Rules rules, const S* __restrict samples,
                                    unsigned char* __restrict mask, const Runs& runs) {
-    for (std::size_t left = runs.samples, length = runs.length; left != 0; left -= length) {
-        length = std::min(length, left);
+    for (std::size_t left = runs.samples; left != 0;) {
+        const std::size_t length = LengthOf(rules, runs, left);
+        left -= length;
         for (std::size_t i = 0; i < length; ++i) {
-            const unsigned mark = std::is_integral_v<S> ? rules.Has(i) : 1;
+            const unsigned mark = std::is_integral_v<S> ? rules.Has(i) : kMarkedBit;
             const unsigned marked = IsMarked(samples[i], rules.Value(i)) ? mark : 0;
             mask[i] = static_cast<unsigned char>((mask[i] & kOtherBits) | marked);
         }
@@ -233,14 +279,15 @@ template <class S, class Rules>
     }
 }
 
-template <class S, class Rules>
-[[gnu::noinline]] void StampSamples(const Rules& rules, S* __restrict samples,
+template <class B, class Rules>
+[[gnu::noinline]] void StampSamples(Rules rules, unsigned char* __restrict samples,
                                     const unsigned char* __restrict mask, const Runs& runs) {
-    for (std::size_t left = runs.samples, length = runs.length; left != 0; left -= length) {
-        length = std::min(length, left);
+    for (std::size_t left = runs.samples; left != 0;) {
+        const std::size_t length = LengthOf(rules, runs, left);
+        left -= length;
         for (std::size_t i = 0; i < length; ++i)
-            samples[i] = Stamped(mask[i] & kMarkedBit & rules.Has(i), rules.Value(i), samples[i]);
-        samples += runs.step;
+            Stamp<B>(mask[i] & rules.Has(i), rules.Value(i), samples + i * sizeof(B));
+        samples += runs.step * sizeof(B);
         mask += runs.step;
     }
 }
@@ -266,11 +313,11 @@ template <class S>
     });
 }
 
-template <class S>
-[[gnu::noinline]] void StampTile(const RuleSource<S>& source, const TileShape& tile, S* samples,
-                                 const unsigned char* mask) {
+template <class B>
+[[gnu::noinline]] void StampTile(const RuleSource<B>& source, const TileShape& tile,
+                                 unsigned char* samples, const unsigned char* mask) {
     VisitRuns(source, tile, [=](const auto& rules, std::size_t at, const Runs& runs) {
-        if (rules.HasAny()) StampSamples(rules, samples + at, mask + at, runs);
+        if (rules.HasAny()) StampSamples<B>(rules, samples + at * sizeof(B), mask + at, runs);
     });
 }
 
@@ -292,8 +339,8 @@ template <class T>
 void ApplyNoDataMask(const RasterReader<T>& reader, std::uint32_t width, std::uint32_t height,
                      std::uint32_t bandCount, T* pixels, const unsigned char* mask) {
     if (!pixels || !mask) return;
-    StampTile(RuleSource<Sample<T>>(reader), {InterleaveOf(reader), width, height, bandCount},
-              reinterpret_cast<Sample<T>*>(pixels), mask);
+    StampTile(RuleSource<Bits<T>>(reader), {InterleaveOf(reader), width, height, bandCount},
+              reinterpret_cast<unsigned char*>(pixels), mask);
 }
 
 #define ZMC_X(type, name, code)                                                                    \

@@ -171,6 +171,11 @@ TYPED_TEST(NoDataMaskShapes, MoreBandsThanAreTakenAtOnce) {
         this->ExpectAll({2, 2, bands});
 }
 
+TYPED_TEST(NoDataMaskShapes, BandsLeftOverThatAreAsManyAsABlock) {
+    for (const std::size_t bands : {259u, 560u, 1072u, 2096u, 4144u})
+        this->ExpectAll({2, 2, bands});
+}
+
 TYPED_TEST(NoDataMaskShapes, NoBandsLeaveBothBuffersAlone) {
     using T = TypeParam;
     for (const std::int32_t interleave : {Interleave::BIP, Interleave::BIL, Interleave::BSQ}) {
