@@ -221,7 +221,7 @@ INSTANTIATE_TEST_SUITE_P(
     testing::Values(std::pair(Resampling::Nearest, false), std::pair(Resampling::Average, false),
                     std::pair(Resampling::Median, false), std::pair(Resampling::Bilinear, true),
                     std::pair(Resampling::Lanczos, true)),
-    [](const auto& info) { return std::string(ResamplingName(info.param.first)); });
+    [](const auto& each) { return std::string(ResamplingName(each.param.first)); });
 
 }  // namespace
 }  // namespace zmchost
