@@ -51,6 +51,23 @@ void KeepParser(std::unique_ptr<xercesc::SAXParser> parser) {
     const std::unique_ptr<xercesc::SAXParser> other(keptParser.exchange(parser.release()));
 }
 
+// Guards a text, and parses it with the kept parser.
+bool ParseWithKept(unsigned char* bytes, std::size_t size, xercesc::HandlerBase& handlers,
+                   const std::function<void(const xercesc::XMLException&)>& report) {
+    GuardText(bytes, size);
+    std::unique_ptr<xercesc::SAXParser> parser = TakeParser();
+    ParseEnd end;
+    try {
+        const xercesc::MemBufInputSource source(bytes, size, "document");
+        end = RunParser(*parser, &handlers, source, report);
+    } catch (const xercesc::OutOfMemoryException&) {
+        throw std::bad_alloc();
+    }
+    if (!end.thrown) KeepParser(std::move(parser));
+    if (end.kind == ParseEnd::Kind::OutOfMemory) throw std::bad_alloc();
+    return end.kind == ParseEnd::Kind::Parsed;
+}
+
 }  // namespace
 
 std::unique_ptr<xercesc::SAXParser> MakeDocumentParser() {
@@ -100,22 +117,16 @@ void FaultReader::fatalError(const xercesc::SAXParseException& exception) { erro
 void FaultReader::TakeText(ElementName, std::string_view) {}
 
 std::string ParseDocumentText(std::string text, FaultReader& reader) {
-    auto* const bytes = reinterpret_cast<unsigned char*>(text.data());
-    GuardText(bytes, text.size());
-    std::unique_ptr<xercesc::SAXParser> parser = TakeParser();
-    ParseEnd end;
-    try {
-        const xercesc::MemBufInputSource source(bytes, text.size(), "document");
-        end = RunParser(*parser, &reader, source, [&](const xercesc::XMLException& exception) {
-            reader.fault = ToNarrow(exception.getMessage());
-        });
-    } catch (const xercesc::OutOfMemoryException&) {
-        throw std::bad_alloc();
-    }
-    if (!end.thrown) KeepParser(std::move(parser));
-    if (end.kind == ParseEnd::Kind::OutOfMemory) throw std::bad_alloc();
-    if (end.kind == ParseEnd::Kind::Parsed) return "";
+    const bool parsed = ParseWithKept(reinterpret_cast<unsigned char*>(text.data()), text.size(),
+                                      reader, [&](const xercesc::XMLException& exception) {
+                                          reader.fault = ToNarrow(exception.getMessage());
+                                      });
+    if (parsed) return "";
     return reader.fault.empty() ? "it cannot be parsed" : reader.fault;
+}
+
+bool ParseDocumentBytes(unsigned char* bytes, std::size_t size, xercesc::HandlerBase& handlers) {
+    return ParseWithKept(bytes, size, handlers, [](const xercesc::XMLException&) {});
 }
 
 }  // namespace zelm

@@ -60,6 +60,9 @@ protected:
 // Parses a text of any kind: guarded, by a parser that is kept for the next caller. What is wrong
 // with it, for people; empty if nothing. Throws std::bad_alloc. Any thread.
 std::string ParseDocumentText(std::string text, FaultReader& reader);
+// The same over bytes of the caller's, which are changed, with handlers of any kind; true if
+// nothing is wrong with the text.
+bool ParseDocumentBytes(unsigned char* bytes, std::size_t size, xercesc::HandlerBase& handlers);
 
 }  // namespace zelm
 

@@ -5,13 +5,12 @@
 
 #include "core/ElementTypes.h"
 #include "gdal/NearestValue.h"
+#include "host/file/StoredRecords.h"
 
 namespace zmcgdal {
 namespace {
 
 constexpr std::uint32_t kMaxColors = 65536;
-// Each place costs a parse; a file that was updated more often shows an older record.
-constexpr std::uint32_t kMaxUpdates = 1024;
 
 template <class T>
 double ToDouble(const T& value) {
@@ -70,6 +69,21 @@ GDALColorEntry EntryOf(const zelm::Color& color) {
     return {color.red, color.green, color.blue, color.alpha};
 }
 
+// Colours that the palette lacks are transparent black, as GDAL fills gaps. The last one comes
+// first, so that the table grows once.
+std::unique_ptr<GDALColorTable> TableOf(const zelm::Palette& palette) {
+    auto table = std::make_unique<GDALColorTable>();
+    const std::uint32_t count = std::min(palette.nextIndex, kMaxColors);
+    const GDALColorEntry gap{};
+    table->SetColorEntry(static_cast<int>(count) - 1, &gap);
+    for (const auto& [index, color] : palette.colors) {
+        if (index >= count || !color) continue;
+        const GDALColorEntry entry = EntryOf(*color);
+        table->SetColorEntry(static_cast<int>(index), &entry);
+    }
+    return table;
+}
+
 void AddEntry(zelm::Palette& palette, const GDALColorEntry& entry) {
     unsigned char components[] = {
         static_cast<unsigned char>(entry.c1), static_cast<unsigned char>(entry.c2),
@@ -95,33 +109,23 @@ const StoredStatistics* Archive::Statistics(std::uint32_t band) {
     return found->second ? &*found->second : nullptr;
 }
 
-// A reader fetches statistics by their place in the document. As a rule all bands were stored at
-// once and in order, so the band's record is at its own place and the place behind the last band is
-// empty; everything else takes a walk over all places.
-std::optional<StoredStatistics> Archive::FetchStatistics(std::uint32_t band) {
+template <class Look>
+void Archive::LookAtRecords(Look&& look) const {
+    raster.Visit([&]<class T>(zelm::RasterReader<T>&) { look(*raster.Get().Records<T>()); });
+}
+
+std::optional<StoredStatistics> Archive::FetchStatistics(std::uint32_t band) const {
     std::optional<StoredStatistics> newest;
-    raster.Visit([&]<class T>(zelm::RasterReader<T>& reader) {
-        if (!severalSets) severalSets = reader.GetBandStats(reader.GetBands()).flags != 0;
-        if (!*severalSets) {
-            const auto record = reader.GetBandStats(band);
-            if (record.band == band && record.flags != 0) newest = Convert(record);
-            if (newest || !reader.HasBandStats(band)) return;
-        }
-        for (std::uint32_t place = 0; place < reader.GetBands() + kMaxUpdates; ++place) {
-            const auto record = reader.GetBandStats(place);
-            if (record.flags == 0) return;
-            if (record.band == band) newest = Convert(record);
-        }
+    LookAtRecords([&](const auto& records) {
+        if (const auto* const record = records.NewestStatistics(band)) newest = Convert(*record);
     });
     return newest;
 }
 
 std::vector<StoredHistogram> Archive::FetchHistograms() const {
     std::vector<StoredHistogram> found;
-    raster.Visit([&]<class T>(zelm::RasterReader<T>& reader) {
-        const auto records = reader.GetHistograms();
-        for (std::uint32_t i = 0; records.data && i < records.shape.elements; ++i)
-            found.push_back(Convert(records.data[i]));
+    LookAtRecords([&](const auto& records) {
+        for (const auto& record : records.Histograms()) found.push_back(Convert(record));
     });
     return found;
 }
@@ -144,15 +148,9 @@ GDALColorTable* Archive::ColorTable(std::uint32_t band) {
 
 std::unique_ptr<GDALColorTable> Archive::FetchColorTable(std::uint32_t band) const {
     std::unique_ptr<GDALColorTable> table;
-    raster.Visit([&](auto& reader) {
-        const zelm::PalettePtr palette = reader.GetPalette(band);
-        if (!palette || palette->nextIndex == 0) return;
-        table = std::make_unique<GDALColorTable>();
-        for (std::uint32_t i = 0; i < std::min(palette->nextIndex, kMaxColors); ++i)
-            if (const zelm::Color* const color = palette->GetColor(i)) {
-                const GDALColorEntry entry = EntryOf(*color);
-                table->SetColorEntry(static_cast<int>(i), &entry);
-            }
+    LookAtRecords([&](const auto& records) {
+        if (const zelm::Palette* const palette = records.BandPalette(band))
+            table = TableOf(*palette);
     });
     return table;
 }
@@ -183,7 +181,6 @@ bool Archive::StoreStatistics(std::uint32_t band, const StoredStatistics& given)
         zelm::Array<zelm::RasterBandStats<T>> records;
         return records.Append(record) && reader.SetBandStats(records);
     });
-    severalSets.reset();
     statistics.clear();
     return stored;
 }

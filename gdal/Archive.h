@@ -1,8 +1,8 @@
 // Archive: the statistics, histograms and palettes that a pyramid file keeps, in GDAL's terms.
 //
-// Everything is fetched when it is first asked for and then remembered, since each fetch parses the
-// whole document of the file. Bands count from 0. A file keeps every record ever stored; the newest
-// one of a band counts here.
+// Everything is fetched when it is first asked for and then remembered; the document is parsed once
+// for all bands (Raster::Records). Bands count from 0. A file keeps every record ever stored; the
+// newest one of a band counts here.
 #ifndef ZMC_GDAL_ARCHIVE_H
 #define ZMC_GDAL_ARCHIVE_H
 
@@ -59,14 +59,16 @@ private:
     LazyRaster& raster;
     bool documentExists;
     std::map<std::uint32_t, std::optional<StoredStatistics>> statistics;
-    std::optional<bool> severalSets;
     std::optional<std::vector<StoredHistogram>> histograms;
     std::map<std::uint32_t, std::unique_ptr<GDALColorTable>> colorTables;
 
     // Lets `setter(reader)` store; false where the file cannot be written or it answers false.
     template <class Setter>
     bool Store(Setter&& setter);
-    std::optional<StoredStatistics> FetchStatistics(std::uint32_t band);
+    // Calls look(zmchost::StoredRecords<T>). What is thrown goes to GDAL as a failure.
+    template <class Look>
+    void LookAtRecords(Look&& look) const;
+    std::optional<StoredStatistics> FetchStatistics(std::uint32_t band) const;
     std::vector<StoredHistogram> FetchHistograms() const;
     std::unique_ptr<GDALColorTable> FetchColorTable(std::uint32_t band) const;
 };

@@ -6,7 +6,7 @@
 
 #include "core/ElementTypes.h"
 #include "pyramid/PyramidDataset.h"
-#include "pyramid/PyramidXMLReaderHandlers.h"
+#include "format/PyramidXMLReaderHandlers.h"
 
 namespace zelm {
 namespace {

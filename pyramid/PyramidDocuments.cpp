@@ -11,7 +11,7 @@
 #include "format/PyramidFront.h"
 #include "format/XercesText.h"
 #include "pyramid/PyramidDataset.h"
-#include "pyramid/PyramidXMLReaderHandlers.h"
+#include "format/PyramidXMLReaderHandlers.h"
 
 namespace zelm {
 namespace {

@@ -19,7 +19,7 @@
 #include "fuzz/support/Expect.h"
 #include "fuzz/support/InputBytes.h"
 #include "pyramid/PyramidDataset.h"
-#include "pyramid/PyramidXMLReaderHandlers.h"
+#include "format/PyramidXMLReaderHandlers.h"
 #include "raster/RasterReader.h"
 
 namespace zmcfuzz {

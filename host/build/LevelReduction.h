@@ -23,7 +23,11 @@ template <class T>
 class LevelReduction {
 public:
     LevelReduction(Raster& finer, Resampling resampling)
-        : raster(finer), method(resampling), halo(ReductionHalo(resampling)), bands(finer.Bands()) {
+        : raster(finer),
+          method(resampling),
+          halo(ReductionHalo(resampling)),
+          margin((halo + 1) / 2),
+          bands(finer.Bands()) {
         for (std::uint32_t band = 0; band < bands; ++band)
             rules.push_back(RuleOfBand<T>(finer.Props(), band));
     }
@@ -61,13 +65,12 @@ public:
     }
 
 private:
-    // Columns and rows of the coarser level that are made beyond the window and dropped: the widest
-    // kernel reaches 5 finer pixels over the edge of its cell.
-    static constexpr std::uint32_t kMargin = 3;
-
     Raster& raster;
     Resampling method;
     std::uint32_t halo;
+    // Columns and rows of the coarser level that are made beyond the window and dropped: the cells
+    // that the halo touches. None of a method that goes by a cell's own samples.
+    std::uint32_t margin;
     std::uint32_t bands;
     std::vector<zelm::NoDataRule<T>> rules;
     Window window{}, source{};
@@ -79,11 +82,11 @@ private:
     // First and extent of the finer pixels that [start, start + extent) depends on. They begin at
     // an even coordinate, so that cells are those of the whole level; an odd last line belongs to
     // no cell, but wide kernels tap it.
-    static std::pair<std::uint32_t, std::uint32_t> Reach(std::uint32_t start, std::uint32_t extent,
-                                                         std::uint32_t limit) {
-        const std::uint32_t first = start > kMargin ? start - kMargin : 0;
+    std::pair<std::uint32_t, std::uint32_t> Reach(std::uint32_t start, std::uint32_t extent,
+                                                  std::uint32_t limit) const {
+        const std::uint32_t first = start > margin ? start - margin : 0;
         const std::uint64_t end =
-            std::min<std::uint64_t>((std::uint64_t{start} + extent + kMargin) * 2, limit);
+            std::min<std::uint64_t>((std::uint64_t{start} + extent + margin) * 2, limit);
         return {first * 2, static_cast<std::uint32_t>(end - std::uint64_t{first} * 2)};
     }
 };

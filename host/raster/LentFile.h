@@ -42,6 +42,8 @@ public:
     std::uint64_t Size() const;
 
     PyramidHeader ReadHeader() const { return PyramidHeader::Read(*recording, file); }
+    // For reading it without the module; what fails there is told by TakeFailure as well.
+    zelm::files::ByteSource& Source() const { return *recording; }
     // The name in the file system; empty for a source of another kind.
     std::string PlainName() const;
 

@@ -7,6 +7,7 @@
 #include "core/PixelVocabulary.h"
 #include "format/TileWalk.h"
 #include "host/base/Text.h"
+#include "host/file/StoredRecords.h"
 #include "host/journal/MetadataJournal.h"
 #include "host/raster/LentFile.h"
 #include "host/raster/NoData.h"
@@ -36,12 +37,20 @@ std::size_t OffsetIn(const Window& whole, const Window& part, std::size_t pixelB
     return (std::size_t{part.y - whole.y} * whole.width + (part.x - whole.x)) * pixelBytes;
 }
 
+// Once for all samples: a rule is looked up in a map.
+template <class T>
+std::vector<zelm::NoDataRule<T>> RulesOf(const zelm::RasterProps& props,
+                                         std::span<const std::uint32_t> bands) {
+    std::vector<zelm::NoDataRule<T>> rules;
+    for (const std::uint32_t band : bands) rules.push_back(RuleOfBand<T>(props, band));
+    return rules;
+}
+
 // A sample of floating type is marked without a no-data value too, if it is not finite.
 template <class T>
 void MarkSamples(const zelm::RasterProps& props, std::span<const std::uint32_t> bands,
                  std::uint64_t pixels, const T* samples, unsigned char* mask) {
-    std::vector<zelm::NoDataRule<T>> rules;
-    for (const std::uint32_t band : bands) rules.push_back(RuleOfBand<T>(props, band));
+    const auto rules = RulesOf<T>(props, bands);
     for (std::uint64_t i = 0; i < pixels; ++i)
         for (const auto& rule : rules) {
             const unsigned char bit = rule.Marks(*samples++) ? 1 : 0;
@@ -53,17 +62,26 @@ void MarkSamples(const zelm::RasterProps& props, std::span<const std::uint32_t> 
 template <class T>
 void StampSamples(const zelm::RasterProps& props, std::span<const std::uint32_t> bands,
                   std::uint64_t pixels, const unsigned char* mask, T* samples) {
-    for (std::uint64_t i = 0; i < pixels * bands.size(); ++i) {
-        const auto rule = RuleOfBand<T>(props, bands[i % bands.size()]);
-        if ((mask[i] & 1) != 0 && rule.hasValue) samples[i] = rule.value;
-    }
+    const auto rules = RulesOf<T>(props, bands);
+    for (std::uint64_t i = 0; i < pixels; ++i)
+        for (const auto& rule : rules) {
+            if ((*mask++ & 1) != 0 && rule.hasValue) *samples = rule.value;
+            ++samples;
+        }
 }
+
+// Whatever a store does, it may have changed the document.
+struct Forgetting {
+    std::shared_ptr<const DocumentRecords>& records;
+    ~Forgetting() { records.reset(); }
+};
 
 template <class Record>
 zelm::Array<Record> ToArray(const std::vector<Record>& records) {
     zelm::Array<Record> array;
-    for (const Record& record : records)
-        if (!array.Append(record)) throw std::bad_alloc();
+    if (!array.SetShape(zelm::ArrayShape(static_cast<std::uint32_t>(records.size()))))
+        throw std::bad_alloc();
+    std::copy(records.begin(), records.end(), array.data);
     return array;
 }
 
@@ -413,11 +431,27 @@ void Raster::Write(std::uint32_t level, const Window& window, std::span<const st
     file->Accept();
 }
 
+template <class T>
+std::shared_ptr<const StoredRecords<T>> Raster::Records() const {
+    CheckType(zelm::ElementTraits<T>::code);
+    return std::static_pointer_cast<const StoredRecords<T>>(AnyRecords());
+}
+
+// What is not settled is looked at again.
+std::shared_ptr<const DocumentRecords> Raster::AnyRecords() const {
+    if (!file || records) return records;
+    std::shared_ptr<const DocumentRecords> read;
+    zelm::VisitElementType(props.pixelType, [&]<class T>(std::type_identity<T>) {
+        read = StoredRecords<T>::Read(file->Source(), header->tileDataEnd);
+    });
+    CheckDisk("read its metadata document");
+    if (read->IsSettled()) records = read;
+    return read;
+}
+
 bool Raster::HasStatistics(std::uint32_t band) const {
-    bool has = false;
-    Visit([&](auto& typed) { has = typed.HasBandStats(band); });
-    CheckDisk("read the statistics");
-    return has;
+    const auto stored = AnyRecords();
+    return stored && stored->HasStatistics(band);
 }
 
 template <class T>
@@ -426,22 +460,16 @@ zelm::RasterReader<T>& Raster::Typed() const {
     return *reader->template As<T>();
 }
 
-// The module fetches by the place of the record in the file, and tells by number whether there is
-// one; a file that was written band by band has them in another order.
+// The module fetches by the place of the record in the file: what stands at a band's own place is
+// what any host gets for it. A file that was written band by band has them in another order.
 template <class T>
 zelm::RasterBandStats<T> Raster::Statistics(std::uint32_t band) const {
-    zelm::RasterReader<T>& typed = Typed<T>();
-    if (!typed.HasBandStats(band))
+    const auto stored = Records<T>();
+    if (!stored || !stored->HasStatistics(band))
         throw Error(name, "read the statistics of band " + std::to_string(band),
                     "the file has none");
-    zelm::RasterBandStats<T> record = typed.GetBandStats(band);
-    for (std::uint32_t place = 0; record.band != band && place < Bands(); ++place)
-        record = typed.GetBandStats(place);
-    CheckDisk("read the statistics of band " + std::to_string(band));
-    if (record.band != band)
-        throw Error(name, "read the statistics of band " + std::to_string(band),
-                    "the module does not find the record that the file has");
-    return record;
+    const auto all = stored->Statistics();
+    return band < all.size() && all[band].band == band ? all[band] : *stored->FirstStatistics(band);
 }
 
 void Raster::Store(const std::function<void()>& action) {
@@ -450,6 +478,8 @@ void Raster::Store(const std::function<void()>& action) {
     std::optional<MetadataJournal> copy;
     if (keepsCopies)
         if (const std::string plain = file->PlainName(); !plain.empty()) copy.emplace(plain);
+    const Forgetting after{records};
+    records.reset();
     action();
     CheckDisk("store into its metadata document");
     if (copy) copy->Finish();
@@ -457,16 +487,16 @@ void Raster::Store(const std::function<void()>& action) {
 }
 
 template <class T>
-void Raster::SetStatistics(const std::vector<zelm::RasterBandStats<T>>& records) {
+void Raster::SetStatistics(const std::vector<zelm::RasterBandStats<T>>& given) {
     zelm::RasterReader<T>& typed = Typed<T>();
     CheckWritable("store statistics");
-    for (std::uint32_t band = 0; band < records.size(); ++band)
-        if (records[band].band != band || records.size() != Bands())
+    for (std::uint32_t band = 0; band < given.size(); ++band)
+        if (given[band].band != band || given.size() != Bands())
             throw Error(name, "store statistics", "they are not those of all bands in order");
     if (HasStatistics(0))
         throw Error(name, "store statistics", "it has some already, and a file keeps the oldest");
     Store([&] {
-        typed.SetBandStats(ToArray(records));
+        typed.SetBandStats(ToArray(given));
         CheckDisk("store statistics");
         bool has = true;
         for (std::uint32_t band = 0; has && band < Bands(); ++band) has = HasStatistics(band);
@@ -476,9 +506,10 @@ void Raster::SetStatistics(const std::vector<zelm::RasterBandStats<T>>& records)
 
 template <class T>
 std::vector<zelm::RasterBandHistogram<T>> Raster::Histograms() const {
-    const zelm::Array<zelm::RasterBandHistogram<T>> stored = Typed<T>().GetHistograms();
-    CheckDisk("read the histograms");
-    return {stored.data, stored.data + stored.shape.elements};
+    const auto stored = Records<T>();
+    if (!stored) return {};
+    const auto histograms = stored->Histograms();
+    return {histograms.begin(), histograms.end()};
 }
 
 template <class T>
@@ -488,28 +519,29 @@ void Raster::SetHistograms(const std::vector<zelm::RasterBandHistogram<T>>& hist
     const zelm::Array<zelm::RasterBandHistogram<T>> given = ToArray(histograms);
     for (std::size_t i = 0; i < histograms.size(); ++i)
         if (!given.data || !HaveSameCounts(given.data[i], histograms[i])) throw std::bad_alloc();
-    const std::size_t before = Histograms<T>().size();
+    const auto old = Records<T>();
+    const std::size_t before = old ? old->Histograms().size() : 0;
     Store([&] {
         typed.SetHistograms(given);
         CheckDisk("store histograms");
-        const zelm::Array<zelm::RasterBandHistogram<T>> stored = typed.GetHistograms();
-        bool same = stored.shape.elements == before + histograms.size();
+        const auto now = Records<T>();
+        const auto stored =
+            now ? now->Histograms() : std::span<const zelm::RasterBandHistogram<T>>();
+        bool same = stored.size() == before + histograms.size();
         for (std::size_t i = 0; same && i < histograms.size(); ++i)
-            same = HaveSameCounts(stored.data[before + i], histograms[i]);
+            same = HaveSameCounts(stored[before + i], histograms[i]);
         if (!same) throw Error(name, "store histograms", "the module did not store them");
     });
 }
 
-// A copy of this library's making: the module's own palette must not outlive the module.
+// A copy, for whatever its holder does with it. No memory raster has one.
 zelm::PalettePtr Raster::BandPalette(std::uint32_t band) const {
     zelm::PalettePtr palette;
-    Visit([&](auto& typed) {
-        if (!typed.HasPalette(band)) return;
-        const zelm::PalettePtr stored = typed.GetPalette(band);
-        palette.Reset(new zelm::Palette);
-        stored->CopyTo(*palette);
-    });
-    CheckDisk("read the palette of band " + std::to_string(band));
+    const auto stored = AnyRecords();
+    const zelm::Palette* const found = stored ? stored->BandPalette(band) : nullptr;
+    if (!found) return palette;
+    palette.Reset(new zelm::Palette);
+    found->CopyTo(*palette);
     return palette;
 }
 
@@ -519,13 +551,15 @@ void Raster::SetBandPalette(std::uint32_t band, const zelm::Palette& palette) {
     Store([&] {
         Visit([&](auto& typed) { typed.SetPalette(band, palette); });
         CheckDisk("store a palette");
-        const zelm::PalettePtr stored = BandPalette(band);
-        if ((stored ? stored->nextIndex : 0) != palette.nextIndex)
+        const auto stored = AnyRecords();
+        const zelm::Palette* const found = stored ? stored->BandPalette(band) : nullptr;
+        if ((found ? found->nextIndex : 0) != palette.nextIndex)
             throw Error(name, "store a palette", "the module did not store it");
     });
 }
 
 #define ZMC_X(type, word, code)                                                           \
+    template std::shared_ptr<const StoredRecords<type>> Raster::Records() const;          \
     template zelm::RasterBandStats<type> Raster::Statistics(std::uint32_t) const;         \
     template void Raster::SetStatistics(const std::vector<zelm::RasterBandStats<type>>&); \
     template std::vector<zelm::RasterBandHistogram<type>> Raster::Histograms() const;     \

@@ -35,7 +35,10 @@
 
 namespace zmchost {
 
+class DocumentRecords;
 class LentFile;
+template <class T>
+class StoredRecords;
 
 class Raster {
 public:
@@ -128,8 +131,14 @@ public:
     // A process that dies or a power failure then loses nothing of the old statistics. Off at
     // first: it costs some flushes of the disk for each store.
     void KeepCopies(bool keep) { keepsCopies = keep; }
-    // Runs `action`, which stores through the module's reader, and throws where it has failed.
+    // Runs `action`, which stores through the module's reader, and throws where it has failed. What
+    // was read of the document before is forgotten.
     void Store(const std::function<void()>& action);
+
+    // All records of the file's document, parsed when they are first asked for and kept until this
+    // object stores something; null of a memory raster. T is the raster's type.
+    template <class T>
+    std::shared_ptr<const StoredRecords<T>> Records() const;
 
     bool HasStatistics(std::uint32_t band) const;
     // The record of a band. Throws if there is none.
@@ -184,6 +193,7 @@ private:
                    std::span<const std::uint32_t> bands, const unsigned char* pixels);
     template <class T>
     zelm::RasterReader<T>& Typed() const;
+    std::shared_ptr<const DocumentRecords> AnyRecords() const;
 
     // In this order: the module goes last.
     ModulePtr module;
@@ -197,6 +207,7 @@ private:
     std::uint32_t maxLevel = 0;
     std::string recoveryNote;
     bool keepsCopies = false;
+    mutable std::shared_ptr<const DocumentRecords> records;  // null: to be read
 };
 
 }  // namespace zmchost

@@ -20,6 +20,7 @@
 #include "host/file/PyramidHeader.h"
 #include "host/journal/MetadataJournal.h"
 #include "tests/support/LenientHeaders.h"
+#include "tests/support/ParseCounter.h"
 #include "tests/support/ScratchDirectory.h"
 
 namespace zmcgdal {
@@ -88,6 +89,42 @@ protected:
         return Path(name);
     }
 };
+
+TEST_F(DriverTest, OneParseOfTheDocumentServesAllBandsAfterAnUpdateToo) {
+    constexpr int kBands = 200;
+    const std::string name = Path("a.pyr");
+    DatasetPtr(Driver().CreateCopy(name.c_str(), Memory(4, 4, kBands, GDT_Byte).get(), FALSE,
+                                   nullptr, nullptr, nullptr));
+    {
+        const DatasetPtr updated(Open(name, GDAL_OF_RASTER | GDAL_OF_UPDATE));
+        ASSERT_TRUE(updated);
+        for (const int band : {1, 90, 1})
+            EXPECT_EQ(updated->GetRasterBand(band)->SetStatistics(1, 2, band + 0.5, 0.25), CE_None);
+    }
+    const DatasetPtr dataset = Open(name);
+    ASSERT_TRUE(dataset);
+    double mean = 0;
+    EXPECT_EQ(dataset->GetRasterBand(1)->GetStatistics(0, 0, nullptr, nullptr, &mean, nullptr),
+              CE_None);
+    EXPECT_EQ(mean, 1.5);
+    const std::size_t before = support::DocumentParses();
+    EXPECT_GT(before, 0u);
+    for (int band = 2; band <= kBands; ++band) {
+        GDALRasterBand& each = *dataset->GetRasterBand(band);
+        const CPLErr has = each.GetStatistics(0, 0, nullptr, nullptr, &mean, nullptr);
+        if (band == 90) {
+            EXPECT_EQ(has, CE_None);
+            EXPECT_EQ(mean, 90.5);
+        }
+        EXPECT_EQ(each.GetColorTable(), nullptr);
+        double low = 0, high = 0;
+        int buckets = 0;
+        GUIntBig* counts = nullptr;
+        each.GetDefaultHistogram(&low, &high, &buckets, &counts, FALSE, nullptr, nullptr);
+        CPLFree(counts);
+    }
+    EXPECT_EQ(support::DocumentParses(), before);
+}
 
 TEST_F(DriverTest, RegistersOnce) {
     const int before = GetGDALDriverManager()->GetDriverCount();

@@ -9,7 +9,7 @@
 
 #include "format/NumberText.h"
 #include "format/PyramidLimits.h"
-#include "pyramid/PyramidXMLReaderHandlers.h"
+#include "format/PyramidXMLReaderHandlers.h"
 #include "pyramid/TileGather.h"
 #include "tests/support/PyramidFileTest.h"
 

@@ -1,4 +1,4 @@
-#include "pyramid/PyramidXMLReaderHandlers.h"
+#include "format/PyramidXMLReaderHandlers.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

@@ -1,10 +1,12 @@
 """What info tells, against the file itself."""
 import json
 import os
+import subprocess
+import unittest
 
 import numpy as np
 
-from frame import COUNT, REAL, ToolTest, geotiff, samples
+from frame import COUNT, REAL, TOOL, ToolTest, geotiff, samples
 from pyramid import Pyramid
 
 OPTIONAL = (int, float, str, None)
@@ -48,6 +50,27 @@ class Info(ToolTest):
         for band, record in enumerate(info["histograms"]):
             counts = np.bincount(pixels[:, :, band].ravel(), minlength=256)
             self.assertEqual(record["counts"], counts.tolist())
+
+    def parses(self, *arguments):
+        """How many documents the tool parses for a command."""
+        count = self.path("parses")
+        environment = dict(os.environ, LD_PRELOAD=os.environ["ZMC_PARSE_COUNTER"],
+                           ZMC_PARSE_COUNT=count)
+        subprocess.run([TOOL, *arguments], env=environment, cwd=self.folder, check=True,
+                       stdout=subprocess.DEVNULL)
+        with open(count, encoding="ascii") as file:
+            return int(file.read())
+
+    @unittest.skipUnless("ZMC_PARSE_COUNTER" in os.environ, "this build cannot count them")
+    def test_one_parse_of_a_document_serves_any_number_of_bands(self):
+        for bands in (2, 200):
+            geotiff(self.path("source.tif"), samples("Byte", 4, 4, bands))
+            self.good("build", "source.tif", f"made{bands}.pyr")
+            self.assertEqual(len(self.document("info", f"made{bands}.pyr")["statistics"]), bands)
+        for command in ("info", "verify"):
+            few = self.parses(command, "made2.pyr")
+            self.assertEqual(self.parses(command, "made200.pyr"), few)
+            self.assertLess(few, 10)
 
     def test_the_ordering_morton_has_no_offsets(self):
         geotiff(self.path("source.tif"), samples("Byte", 40, 50, 9))

@@ -1,4 +1,4 @@
-#include "pyramid/PyramidXMLReaderHandlers.h"
+#include "format/PyramidXMLReaderHandlers.h"
 
 #include <algorithm>
 #include <new>

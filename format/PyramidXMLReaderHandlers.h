@@ -7,8 +7,8 @@
 // again from the first entry.
 //
 // Nothing here allocates by a number from the file: see CountList.
-#ifndef ZMC_PYRAMID_PYRAMIDXMLREADERHANDLERS_H
-#define ZMC_PYRAMID_PYRAMIDXMLREADERHANDLERS_H
+#ifndef ZMC_FORMAT_PYRAMIDXMLREADERHANDLERS_H
+#define ZMC_FORMAT_PYRAMIDXMLREADERHANDLERS_H
 
 #include <cstdint>
 #include <map>

@@ -1,0 +1,227 @@
+// What a raster's document is parsed for, and how much of a level is read to make another.
+#include <gtest/gtest.h>
+
+#include <fstream>
+#include <memory>
+#include <numeric>
+#include <utility>
+
+#include "files/FileSource.h"
+#include "host/build/LevelReduction.h"
+#include "host/file/StoredRecords.h"
+#include "host/raster/Raster.h"
+#include "tests/support/MemorySource.h"
+#include "tests/support/ParseCounter.h"
+#include "tests/support/ScratchDirectory.h"
+
+namespace zmchost {
+namespace {
+
+using support::DocumentParses;
+using support::TestModule;
+using zelm::files::FileSource;
+using Pixel = unsigned char;
+using Stats = zelm::RasterBandStats<Pixel>;
+
+Stats Mean(std::uint32_t band, double mean) {
+    Stats stats;
+    stats.band = band;
+    stats.flags = zelm::StatsFlag::Mean;
+    stats.mean = mean;
+    return stats;
+}
+
+class StoredRecordsTest : public testing::Test {
+protected:
+    Raster Make(std::uint32_t bands) {
+        const support::MemorySource<Pixel> source(4, 4, bands);
+        Raster raster = Raster::Create(TestModule(), file, source.props, 0);
+        raster.Write<Pixel>(0, {0, 0, 4, 4}, std::vector<Pixel>(16 * bands, 1));
+        return raster;
+    }
+    // One record at a time, in that order, as a host does that goes through the module's reader.
+    static void Append(Raster& raster, const std::vector<Stats>& records) {
+        for (const Stats& record : records)
+            raster.Store([&] {
+                raster.Visit([&]<class T>(zelm::RasterReader<T>& reader) {
+                    if constexpr (std::is_same_v<T, Pixel>) {
+                        zelm::Array<Stats> array;
+                        array.Append(record);
+                        reader.SetBandStats(array);
+                    }
+                });
+            });
+    }
+    static void SetColors(Raster& raster, std::uint32_t band, unsigned count) {
+        zelm::Palette palette;
+        for (unsigned i = 0; i < count; ++i) palette.AddColor(zelm::Color());
+        raster.SetBandPalette(band, palette);
+    }
+
+    support::ScratchDirectory folder;
+    const std::string file = folder / "a.pyr";
+};
+
+TEST_F(StoredRecordsTest, OneParseServesAllBandsAndKindsOfRecords) {
+    constexpr std::uint32_t kBands = 200;
+    {
+        Raster raster = Make(kBands);
+        std::vector<Stats> records;
+        std::vector<zelm::RasterBandHistogram<Pixel>> histograms(kBands);
+        for (std::uint32_t band = 0; band < kBands; ++band) {
+            records.push_back(Mean(band, band));
+            histograms[band].band = band;
+        }
+        raster.SetStatistics(records);
+        raster.SetHistograms(histograms);
+        SetColors(raster, 7, 3);
+    }
+    const Raster raster = Raster::Open(TestModule(), file);
+    const std::size_t before = DocumentParses();
+    for (std::uint32_t band = 0; band < kBands; ++band) {
+        EXPECT_TRUE(raster.HasStatistics(band));
+        EXPECT_EQ(raster.Statistics<Pixel>(band).mean, band);
+        const zelm::PalettePtr palette = raster.BandPalette(band);
+        EXPECT_EQ(palette ? palette->nextIndex : 0, band == 7 ? 3 : 0);
+        EXPECT_EQ(raster.Histograms<Pixel>().size(), kBands);
+    }
+    EXPECT_EQ(DocumentParses() - before, 1u);
+}
+
+TEST_F(StoredRecordsTest, CheckBehindAStoreParsesOnceForAllBands) {
+    Raster raster = Make(50);
+    std::vector<Stats> records;
+    for (std::uint32_t band = 0; band < 50; ++band) records.push_back(Mean(band, band));
+    const std::size_t before = DocumentParses();
+    raster.SetStatistics(records);
+    EXPECT_EQ(DocumentParses() - before, 1u) << "there was no document ahead of it";
+}
+
+TEST_F(StoredRecordsTest, StoreIsSeenByTheNextQuestion) {
+    Raster raster = Make(2);
+    EXPECT_FALSE(raster.HasStatistics(0));
+    raster.SetStatistics<Pixel>({Mean(0, 1), Mean(1, 2)});
+    EXPECT_EQ(raster.Statistics<Pixel>(1).mean, 2);
+    EXPECT_FALSE(raster.BandPalette(1));
+    SetColors(raster, 1, 3);
+    ASSERT_TRUE(raster.BandPalette(1));
+    EXPECT_EQ(raster.BandPalette(1)->nextIndex, 3u);
+    SetColors(raster, 1, 0);
+    EXPECT_FALSE(raster.BandPalette(1)) << "an empty palette hides those before it";
+    EXPECT_TRUE(raster.Histograms<Pixel>().empty());
+    raster.SetHistograms<Pixel>({{}});
+    EXPECT_EQ(raster.Histograms<Pixel>().size(), 1u);
+    EXPECT_EQ(raster.Histograms<Pixel>().size(), 1u);
+}
+
+TEST_F(StoredRecordsTest, OldestRecordOfABandCountsAndTheNewestIsThereToo) {
+    Raster raster = Make(3);
+    Append(raster, {Mean(2, 20), Mean(0, 1), Mean(2, 21), Mean(0, 2)});
+    EXPECT_EQ(raster.Statistics<Pixel>(0).mean, 1);
+    EXPECT_FALSE(raster.HasStatistics(1));
+    EXPECT_THROW(raster.Statistics<Pixel>(1), Error);
+    const auto records = raster.Records<Pixel>();
+    EXPECT_EQ(records->Statistics().size(), 4u);
+    EXPECT_EQ(records->FirstStatistics(2)->mean, 20);
+    EXPECT_EQ(records->NewestStatistics(2)->mean, 21);
+    EXPECT_EQ(records->NewestStatistics(0)->mean, 2);
+    EXPECT_EQ(records->NewestStatistics(1), nullptr);
+}
+
+// The module fetches by place, and what it gives for a band counts.
+TEST_F(StoredRecordsTest, RecordAtTheBandsOwnPlaceComesFirst) {
+    Raster raster = Make(3);
+    Append(raster, {Mean(2, 20), Mean(0, 1), Mean(2, 21)});
+    EXPECT_EQ(raster.Statistics<Pixel>(2).mean, 21);
+}
+
+TEST_F(StoredRecordsTest, PaletteThatIsHandedOutIsTheHoldersOwn) {
+    Raster raster = Make(1);
+    SetColors(raster, 0, 2);
+    raster.BandPalette(0)->Clear();
+    EXPECT_EQ(raster.BandPalette(0)->nextIndex, 2u);
+}
+
+TEST_F(StoredRecordsTest, MalformedDocumentKeepsNothing) {
+    {
+        Raster raster = Make(1);
+        raster.SetStatistics<Pixel>({Mean(0, 1)});
+    }
+    std::ofstream(file, std::ios::app) << "<";
+    const Raster raster = Raster::Open(TestModule(), file);
+    testing::internal::CaptureStderr();
+    EXPECT_FALSE(raster.HasStatistics(0));
+    EXPECT_TRUE(raster.Histograms<Pixel>().empty());
+    EXPECT_FALSE(raster.BandPalette(0));
+    EXPECT_EQ(testing::internal::GetCapturedStderr(), "");
+    EXPECT_TRUE(raster.Records<Pixel>()->IsSettled());
+}
+
+TEST_F(StoredRecordsTest, DocumentThatIsNotThereIsLookedForAgain) {
+    Raster raster = Make(1);
+    EXPECT_FALSE(raster.HasStatistics(0));
+    EXPECT_FALSE(raster.Records<Pixel>()->IsSettled());
+    Raster other = Raster::Open(TestModule(), file);
+    other.SetStatistics<Pixel>({Mean(0, 1)});
+    EXPECT_TRUE(raster.HasStatistics(0));
+}
+
+// --- what is read to make a level anew ---
+
+class CountingSource : public zelm::files::ByteSource {
+public:
+    explicit CountingSource(std::shared_ptr<ByteSource> source) : inner(std::move(source)) {}
+    std::uint64_t bytes = 0;
+
+protected:
+    zelm::files::Transfer DoReadAt(std::uint64_t offset, void* buffer, std::size_t size) override {
+        zelm::files::Transfer done;
+        done.bytes = inner->ReadAt(offset, buffer, size, &done.error);
+        bytes += done.bytes;
+        return done;
+    }
+    int DoTellSize(std::uint64_t& size) const override {
+        size = inner->Size();
+        return 0;
+    }
+
+private:
+    std::shared_ptr<ByteSource> inner;
+};
+
+class LevelReductionTest : public StoredRecordsTest,
+                           public testing::WithParamInterface<std::pair<Resampling, bool>> {};
+
+TEST_P(LevelReductionTest, ReadsNoHaloForAMethodThatNeedsNone) {
+    constexpr std::uint32_t kSide = 2048;
+    const auto [method, hasHalo] = GetParam();
+    {
+        const support::MemorySource<Pixel> source(kSide, kSide, 1);
+        Raster raster = Raster::Create(TestModule(), file, source.props, 1);
+        for (std::uint32_t level = 0; level < 2; ++level) {
+            const std::uint32_t side = kSide >> level;
+            raster.Write<Pixel>(level, {0, 0, side, side},
+                                std::vector<Pixel>(std::size_t{side} * side));
+        }
+    }
+    const auto source = std::make_shared<CountingSource>(
+        FileSource::Open(file.c_str(), zelm::files::OpenMode::Read));
+    Raster raster = Raster::Open(TestModule(), source, "a raster");
+    LevelReduction<Pixel> reduction(raster, method);
+    const std::uint32_t side = raster.TileSide();
+    source->bytes = 0;
+    reduction.Load(1, {side, side, side, side});
+    const std::uint64_t own = std::uint64_t{4} * side * side;
+    EXPECT_EQ(source->bytes > own, hasHalo) << source->bytes << " bytes for " << own;
+    EXPECT_GE(source->bytes, own);
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Methods, LevelReductionTest,
+    testing::Values(std::pair(Resampling::Nearest, false), std::pair(Resampling::Average, false),
+                    std::pair(Resampling::Median, false), std::pair(Resampling::Bilinear, true),
+                    std::pair(Resampling::Lanczos, true)),
+    [](const auto& each) { return std::string(ResamplingName(each.param.first)); });
+
+}  // namespace
+}  // namespace zmchost
