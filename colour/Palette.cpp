@@ -24,8 +24,9 @@ Color* Palette::GetColor(std::uint32_t index) {
     return entry.Get();
 }
 
+// As a rule the new entry is the last one, and an empty pointer to fill would be an allocation.
 void Palette::AddColor(const Color& color) {
-    colors[nextIndex].Reset(new (std::nothrow) Color(color));
+    colors.insert_or_assign(colors.end(), nextIndex, ColorPtr(new (std::nothrow) Color(color)));
     ++nextIndex;
 }
 
@@ -41,7 +42,7 @@ void Palette::CopyTo(Palette& target) const {
     if (this == &target) return;
     std::map<std::uint32_t, ColorPtr> copies;
     for (const auto& [index, color] : colors)
-        if (color) copies[index] = WholeCopy(*color);
+        if (color) copies.emplace_hint(copies.end(), index, WholeCopy(*color));
     target.colors.swap(copies);
     target.nextIndex = nextIndex;
 }
