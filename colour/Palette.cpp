@@ -1,5 +1,6 @@
 #include "colour/Palette.h"
 
+#include <iterator>
 #include <new>
 
 namespace zelm {
@@ -24,9 +25,12 @@ Color* Palette::GetColor(std::uint32_t index) {
     return entry.Get();
 }
 
-// As a rule the new entry is the last one, and an empty pointer to fill would be an allocation.
+// The place is told, because as a rule the new entry is the last one, or the last but one where
+// somebody has looked up the colour behind all. An empty pointer to fill would be an allocation.
 void Palette::AddColor(const Color& color) {
-    colors.insert_or_assign(colors.end(), nextIndex, ColorPtr(new (std::nothrow) Color(color)));
+    auto place = colors.end();
+    if (!colors.empty() && std::prev(place)->first > nextIndex) --place;
+    colors.insert_or_assign(place, nextIndex, ColorPtr(new (std::nothrow) Color(color)));
     ++nextIndex;
 }
 
