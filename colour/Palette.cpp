@@ -1,5 +1,6 @@
 #include "colour/Palette.h"
 
+#include <iterator>
 #include <new>
 
 namespace zelm {
@@ -24,8 +25,12 @@ Color* Palette::GetColor(std::uint32_t index) {
     return entry.Get();
 }
 
+// The place is told, because as a rule the new entry is the last one, or the last but one where
+// somebody has looked up the colour behind all. An empty pointer to fill would be an allocation.
 void Palette::AddColor(const Color& color) {
-    colors[nextIndex].Reset(new (std::nothrow) Color(color));
+    auto place = colors.end();
+    if (!colors.empty() && std::prev(place)->first > nextIndex) --place;
+    colors.insert_or_assign(place, nextIndex, ColorPtr(new (std::nothrow) Color(color)));
     ++nextIndex;
 }
 
@@ -41,7 +46,7 @@ void Palette::CopyTo(Palette& target) const {
     if (this == &target) return;
     std::map<std::uint32_t, ColorPtr> copies;
     for (const auto& [index, color] : colors)
-        if (color) copies[index] = WholeCopy(*color);
+        if (color) copies.emplace_hint(copies.end(), index, WholeCopy(*color));
     target.colors.swap(copies);
     target.nextIndex = nextIndex;
 }

@@ -74,9 +74,9 @@ static_assert(kElementNameCount == 39);
 
 // Position of the name in the list, or -1.
 constexpr int FindElementName(std::u16string_view name) {
-    for (int i = 0; i < kElementNameCount; ++i)
-        if (kElementNames[i] == name) return i;
-    return -1;
+    int i = kElementNameCount - 1;  // from the last on: of colours there are many
+    while (i >= 0 && kElementNames[i] != name) --i;
+    return i;
 }
 
 }  // namespace zelm

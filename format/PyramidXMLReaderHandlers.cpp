@@ -151,11 +151,13 @@ void PyramidXMLReaderCore::Leave(std::int32_t state) {
     } else if (state == StateOf(HISTOGRAMS)) {
         EndHistogram();
     } else if (state == StateOf(PALETTE)) {
-        Palette& kept = palettes[paletteBand];
-        currentPalette.CopyTo(kept);
-        if (!IsWhole(currentPalette) || !IsWhole(kept)) throw std::bad_alloc();
+        if (!IsWhole(currentPalette)) throw std::bad_alloc();
+        KeepPalette(palettes[paletteBand]);
     }
 }
+
+// CopyTo throws where memory runs out.
+void PyramidXMLReaderCore::KeepPalette(Palette& kept) { currentPalette.CopyTo(kept); }
 
 void PyramidXMLReaderCore::TakeText(ElementName name, std::string_view text) {
     if (name < HIST_LEVEL)
@@ -184,7 +186,11 @@ void PyramidXMLReaderCore::TakePaletteText(ElementName name, std::string_view te
             channels[i] =
                 static_cast<unsigned char>(TruncateToSigned<std::int64_t>(ReadReal(token)));
         }
-        currentPalette.AddColor(RGBAColor(Array<unsigned char>(channels, ArrayShape(4))));
+        color.red = channels[0];
+        color.green = channels[1];
+        color.blue = channels[2];
+        color.alpha = channels[3];
+        currentPalette.AddColor(color);
     }
 }
 

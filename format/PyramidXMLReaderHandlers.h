@@ -17,6 +17,7 @@
 #include <string_view>
 #include <utility>
 
+#include "colour/Color.h"
 #include "colour/Palette.h"
 #include "core/Array.h"
 #include "format/ElementReader.h"
@@ -82,6 +83,10 @@ protected:
     void Leave(std::int32_t state) override;
     void TakeText(ElementName name, std::string_view text) override;
 
+    // The palette in hand has come to its end, and is kept as this. Colours without a palette
+    // around them, and those of one around it, are added to the one in hand: it stays.
+    virtual void KeepPalette(Palette& kept);
+
     virtual void BeginStats() = 0;
     virtual void EndStats() = 0;
     virtual void BeginHistogram() = 0;
@@ -94,6 +99,9 @@ protected:
 
 private:
     void TakePaletteText(ElementName name, std::string_view text);
+
+    // The colour in hand: its name, the same of all, is made once.
+    RGBAColor color{Array<unsigned char>()};
 };
 
 template <class T>

@@ -9,9 +9,9 @@
 #include "format/DocumentParse.h"
 #include "format/DocumentText.h"
 #include "format/PyramidFront.h"
+#include "format/PyramidXMLReaderHandlers.h"
 #include "format/XercesText.h"
 #include "pyramid/PyramidDataset.h"
-#include "format/PyramidXMLReaderHandlers.h"
 
 namespace zelm {
 namespace {

@@ -1,5 +1,6 @@
 #include "host/file/StoredRecords.h"
 
+#include <algorithm>
 #include <utility>
 
 #include "core/ElementTypes.h"
@@ -13,12 +14,24 @@ namespace {
 
 // Says nothing on the standard error stream: hosts that want to know what is wrong with a document
 // ask for it (MetadataDocument.h).
+//
+// Nobody looks at the palette in hand afterwards, so one that is not inside another is not copied.
 template <class T>
 class QuietReader : public zelm::PyramidXMLReaderHandlers<T> {
 public:
     void warning(const xercesc::SAXParseException&) override {}
     void error(const xercesc::SAXParseException&) override {}
     void fatalError(const xercesc::SAXParseException&) override {}
+
+protected:
+    void KeepPalette(zelm::Palette& kept) override {
+        constexpr auto palette = zelm::StateOf(zelm::ElementName::PALETTE);
+        if (std::count(this->stateStack.begin(), this->stateStack.end(), palette) != 0)
+            return zelm::PyramidXMLReaderHandlers<T>::KeepPalette(kept);
+        kept.Clear();
+        kept.colors.swap(this->currentPalette.colors);
+        std::swap(kept.nextIndex, this->currentPalette.nextIndex);
+    }
 };
 
 template <class Record>

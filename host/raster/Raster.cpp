@@ -461,7 +461,8 @@ zelm::RasterReader<T>& Raster::Typed() const {
 }
 
 // The module fetches by the place of the record in the file: what stands at a band's own place is
-// what any host gets for it. A file that was written band by band has them in another order.
+// what any host gets for it. A file that was written band by band has them in another order; a host
+// that looks for it there ends at the place of the last band.
 template <class T>
 zelm::RasterBandStats<T> Raster::Statistics(std::uint32_t band) const {
     const auto stored = Records<T>();
@@ -469,7 +470,12 @@ zelm::RasterBandStats<T> Raster::Statistics(std::uint32_t band) const {
         throw Error(name, "read the statistics of band " + std::to_string(band),
                     "the file has none");
     const auto all = stored->Statistics();
-    return band < all.size() && all[band].band == band ? all[band] : *stored->FirstStatistics(band);
+    if (band < all.size() && all[band].band == band) return all[band];
+    const zelm::RasterBandStats<T>* const first = stored->FirstStatistics(band);
+    if (first - all.data() >= std::int64_t{Bands()})
+        throw Error(name, "read the statistics of band " + std::to_string(band),
+                    "the module does not find the record that the file has");
+    return *first;
 }
 
 void Raster::Store(const std::function<void()>& action) {

@@ -142,6 +142,41 @@ TEST_F(StoredRecordsTest, PaletteThatIsHandedOutIsTheHoldersOwn) {
     EXPECT_EQ(raster.BandPalette(0)->nextIndex, 2u);
 }
 
+// Colours of a palette inside another belong to both, as the module has it.
+TEST_F(StoredRecordsTest, PalettesWithinPalettesAreThoseOfTheModule) {
+    Raster raster = Make(3);
+    const std::string colour = "<PALETTE_RGBA>1|2|3|4</PALETTE_RGBA>";
+    const auto band = [](int number) {
+        return "<PALETTE_BAND>" + std::to_string(number) + "</PALETTE_BAND>";
+    };
+    std::ofstream(file, std::ios::app)
+        << "<DATASET><PALETTE>" << band(0) << "<PALETTE>" << band(1) << colour << "</PALETTE>"
+        << band(2) << colour << "</PALETTE>" << colour << "<PALETTE></PALETTE></DATASET>";
+    const Raster read = Raster::Open(TestModule(), file);
+    for (std::uint32_t number = 0; number < 3; ++number) {
+        const zelm::PalettePtr palette = read.BandPalette(number);
+        read.Visit([&](auto& reader) {
+            EXPECT_EQ(palette ? palette->nextIndex : 0, reader.GetPalette(number)->nextIndex);
+        });
+        EXPECT_EQ(palette ? palette->nextIndex : 0, number == 1 ? 1 : 0) << number;
+    }
+}
+
+TEST_F(StoredRecordsTest, PaletteAroundAnotherHasItsColoursToo) {
+    Raster raster = Make(3);
+    const std::string colour = "<PALETTE_RGBA>1|2|3|4</PALETTE_RGBA>";
+    std::ofstream(file, std::ios::app)
+        << "<DATASET><PALETTE><PALETTE><PALETTE_BAND>1</PALETTE_BAND>" << colour
+        << "</PALETTE><PALETTE_BAND>2</PALETTE_BAND>" << colour << "</PALETTE></DATASET>";
+    const Raster read = Raster::Open(TestModule(), file);
+    EXPECT_FALSE(read.BandPalette(0));
+    EXPECT_EQ(read.BandPalette(1)->nextIndex, 1u);
+    ASSERT_TRUE(read.BandPalette(2));
+    EXPECT_EQ(read.BandPalette(2)->nextIndex, 2u);
+    EXPECT_EQ(read.BandPalette(2)->colors.at(1)->blue, 3u);
+    EXPECT_EQ(read.BandPalette(2)->colors.at(1)->alpha, 4u);
+}
+
 TEST_F(StoredRecordsTest, MalformedDocumentKeepsNothing) {
     {
         Raster raster = Make(1);
