@@ -5,8 +5,8 @@
 #include <xercesc/framework/MemBufInputSource.hpp>
 
 #include "core/ElementTypes.h"
-#include "pyramid/PyramidDataset.h"
 #include "format/PyramidXMLReaderHandlers.h"
+#include "pyramid/PyramidDataset.h"
 
 namespace zelm {
 namespace {

@@ -16,10 +16,10 @@
 #include <vector>
 
 #include "core/ElementTypes.h"
+#include "format/PyramidXMLReaderHandlers.h"
 #include "fuzz/support/Expect.h"
 #include "fuzz/support/InputBytes.h"
 #include "pyramid/PyramidDataset.h"
-#include "format/PyramidXMLReaderHandlers.h"
 #include "raster/RasterReader.h"
 
 namespace zmcfuzz {
