@@ -49,7 +49,6 @@ TEST(FileSystemMemory, TextsAreWholeOrThrown) {
     ExpectWholeOrThrown([&] { return JoinPath(".", kLong); });
     ExpectWholeOrThrown([&] { return ResolveLinks(path); });
     ExpectWholeOrThrown([] { return SystemRun(); });
-    ExpectWholeOrThrown([] { return FileOfCode(reinterpret_cast<const void*>(&FileOfCode)); });
     ExpectWholeOrThrown([] {
         errno = ENAMETOOLONG;
         return LastErrorText();
