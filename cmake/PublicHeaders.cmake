@@ -83,7 +83,8 @@ set(ZMC_PUBLIC_HEADERS
     # Members of what is above.
     platform/CriticalSection.h
     platform/FileLock.h
-    platform/LoadableLibrary.h)
+    platform/LoadableLibrary.h
+    platform/Mutex.h)
 
 # Below this folder they stand as they are installed.
 set(ZMC_PUBLIC_INCLUDE "${PROJECT_BINARY_DIR}/include")

@@ -32,8 +32,10 @@ std::string WhyNotLoaded(const std::string& path) {
 LoadedModule OpenFile(const std::string& path) {
     LoadedModule module;
     module.path = path;
-    const zelm::String wide(path.c_str());
-    if (const char* const narrow = wide.GetUtf8(); !narrow || path != narrow)
+    // What the module needs stands beside it, and not beside a link to it.
+    const std::string file = platform::IsAbsolutePath(path) ? platform::ResolveLinks(path) : path;
+    const zelm::String wide(file.c_str());
+    if (const char* const narrow = wide.GetUtf8(); !narrow || file != narrow)
         return Refused(path, "its name is not valid UTF-8");
     module.library = platform::LoadLibraryFile(wide.wide);
     if (!module) return Refused(path, WhyNotLoaded(path));
