@@ -93,6 +93,7 @@ TEST(Terminal, TextsGoOutWhole) {
 TEST(Interrupts, TheFirstSetsAMarkAndTheSecondEndsTheProcess) {
     EXPECT_EXIT(
         {
+            std::signal(SIGTERM, SIG_DFL);  // whoever runs the tests may ignore it
             CatchInterrupts();
             const bool before = IsInterrupted();
             std::raise(SIGTERM);
@@ -101,6 +102,7 @@ TEST(Interrupts, TheFirstSetsAMarkAndTheSecondEndsTheProcess) {
         testing::ExitedWithCode(7), "");
     EXPECT_EXIT(
         {
+            std::signal(SIGINT, SIG_DFL);
             CatchInterrupts();
             std::raise(SIGINT);
             std::raise(SIGINT);
