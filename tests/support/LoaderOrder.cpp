@@ -14,22 +14,25 @@ std::recursive_mutex& Order() {
     return *order;
 }
 
-}  // namespace
-
-extern "C" {
-
-void* __real_dlopen(const char* name, int mode);
-int __real_dlclose(void* library);
-void* __wrap_dlopen(const char* name, int mode);
-int __wrap_dlclose(void* library);
-
-void* __wrap_dlopen(const char* name, int mode) {
-    const std::lock_guard<std::recursive_mutex> lock(Order());
-    return __real_dlopen(name, mode);
+template <class Function>
+Function* Next(const char* name) {
+    return reinterpret_cast<Function*>(dlsym(RTLD_NEXT, name));
 }
 
-int __wrap_dlclose(void* library) {
+}  // namespace
+
+// In the place of the system's own, for the shared libraries of the program too.
+extern "C" {
+
+__attribute__((visibility("default"))) void* dlopen(const char* name, int mode) noexcept {
+    static const auto next = Next<void*(const char*, int)>("dlopen");
     const std::lock_guard<std::recursive_mutex> lock(Order());
-    return __real_dlclose(library);
+    return next(name, mode);
+}
+
+__attribute__((visibility("default"))) int dlclose(void* library) noexcept {
+    static const auto next = Next<int(void*)>("dlclose");
+    const std::lock_guard<std::recursive_mutex> lock(Order());
+    return next(library);
 }
 }
