@@ -13,6 +13,7 @@
 #include "host/raster/Raster.h"
 #include "platform/File.h"
 #include "platform/FileSystem.h"
+#include "tests/support/FailureOf.h"
 #include "tests/support/FileFaults.h"
 #include "tests/support/MemorySource.h"
 #include "tests/support/ScratchDirectory.h"
@@ -20,6 +21,7 @@
 namespace zmchost {
 namespace {
 
+using support::FailureOf;
 using Outcome = Recovery::Outcome;
 using testsupport::FileFault;
 using testsupport::FileFaultAction;
@@ -29,16 +31,6 @@ using Pixel = unsigned char;
 std::string Trimmed(std::string text) {
     while (text.ends_with('\n')) text.pop_back();
     return text;
-}
-
-template <class Action>
-std::string FailureOf(Action&& action) {
-    try {
-        action();
-        return "no failure";
-    } catch (const Error& error) {
-        return error.what();
-    }
 }
 
 // A pyramid, and in it as many histograms as stores went through.

@@ -13,6 +13,7 @@
 #include "files/Lending.h"
 #include "files/MemorySource.h"
 #include "host/raster/Raster.h"
+#include "tests/support/FailureOf.h"
 #include "tests/support/FaultySource.h"
 #include "tests/support/FileFaults.h"
 #include "tests/support/MemorySource.h"
@@ -21,6 +22,7 @@
 namespace zmchost {
 namespace {
 
+using support::FailureOf;
 using support::FaultySource;
 using support::SourceFault;
 using support::TestModule;
@@ -31,16 +33,6 @@ using zelm::files::ByteSource;
 using zelm::files::FileSource;
 using zelm::files::OpenMode;
 using Pixel = unsigned char;
-
-template <class Action>
-std::string FailureOf(Action&& action) {
-    try {
-        action();
-        return "no failure";
-    } catch (const Error& error) {
-        return error.what();
-    }
-}
 
 class RasterFileTest : public testing::Test {
 protected:

@@ -9,6 +9,7 @@
 #include "core/PixelVocabulary.h"
 #include "host/build/PyramidBuilder.h"
 #include "host/raster/Raster.h"
+#include "tests/support/FailureOf.h"
 #include "tests/support/FileFaults.h"
 #include "tests/support/MemorySource.h"
 #include "tests/support/PyramidFiles.h"
@@ -17,22 +18,13 @@
 namespace zmchost {
 namespace {
 
+using support::FailureOf;
 using support::MemorySource;
 using support::TestModule;
 using testing::HasSubstr;
 using testsupport::FileFault;
 using testsupport::FileFaults;
 using Pixel = unsigned char;
-
-template <class Action>
-std::string FailureOf(Action&& action) {
-    try {
-        action();
-        return "no failure";
-    } catch (const Error& error) {
-        return error.what();
-    }
-}
 
 class HostRefusal : public testing::Test {
 protected:
