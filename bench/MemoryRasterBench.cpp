@@ -20,10 +20,10 @@
 namespace zelm {
 namespace {
 
-using test::Argument;
-using test::ListView;
-using test::MemoryRasterText;
-using test::Samples;
+using zmctest::Argument;
+using zmctest::ListView;
+using zmctest::MemoryRasterText;
+using zmctest::Samples;
 
 constexpr std::uint32_t kSamples = 512, kLines = 256, kBands = 3, kFirstLine = 32, kTileLines = 192;
 
@@ -62,7 +62,7 @@ struct Raster {
 template <class T>
 void WholeLines(benchmark::State& state, std::int32_t interleave) {
     Raster<T> raster(interleave);
-    std::vector<int> list = test::AllBands(kBands);
+    std::vector<int> list = zmctest::AllBands(kBands);
     std::vector<T> other(raster.tile.size());
     const std::size_t bands = interleave == Interleave::None ? 1 : kBands;
     const std::size_t bytes = std::size_t{kSamples} * kTileLines * bands * sizeof(T);
@@ -341,7 +341,7 @@ void RegisterMasks() {
 
 // One element type for each sample size: tiles know no more of a type.
 [[maybe_unused]] const bool registered = [] {
-    for (const std::int32_t interleave : test::kInterleaves) {
+    for (const std::int32_t interleave : zmctest::kInterleaves) {
         RegisterTiles<unsigned char>(interleave);
         RegisterTiles<unsigned short>(interleave);
         RegisterTiles<float>(interleave);

@@ -70,7 +70,7 @@ void AskForTable(PyramidDataset& dataset) {
 void WriteAgain(const PyramidDataset& read, std::uint32_t ordering) {
     static MemoryFile file;
     zelm::RasterProps props =
-        zelm::test::PyramidProps(read.Samples, read.Lines, read.BandCount, read.PixelType);
+        zmctest::PyramidProps(read.Samples, read.Lines, read.BandCount, read.PixelType);
     props.interleave = read.Interleave;
     PyramidDataset made{String(file.Name().c_str()), props};
     made.TileSize = read.TileSize;
@@ -108,7 +108,7 @@ void WriteAgain(const PyramidDataset& read, std::uint32_t ordering) {
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
     static MemoryFile file;
     const std::string text(reinterpret_cast<const char*>(data), size);
-    file.Assign(zelm::test::FileWithHeader(text));
+    file.Assign(zmctest::FileWithHeader(text));
     PyramidDataset dataset{String(file.Name().c_str())};
     const bool failed = dataset.ReadHeader();
     // What is refused settles nothing.

@@ -75,7 +75,7 @@ void UseOpenDataset(MemoryFile& file, InputBytes& input) {
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
     static MemoryFile file;
-    static const std::string front = zelm::test::HeaderText{.width = 1, .height = 1}.File();
+    static const std::string front = zmctest::HeaderText{.width = 1, .height = 1}.File();
     const std::string_view text(reinterpret_cast<const char*>(data), size);
     const std::size_t type = size % 12;
     file.Assign(front + std::string(text));

@@ -14,12 +14,12 @@
 #include "tests/support/AllocationFaults.h"
 #include "tests/support/CampaignLength.h"
 
-namespace campaigns {
+namespace zmctest {
 namespace {
 
-using testsupport::AllocationFaults;
-using testsupport::FaultMode;
-using testsupport::FaultScope;
+using zmctest::AllocationFaults;
+using zmctest::FaultMode;
+using zmctest::FaultScope;
 
 class AllocationFaultCampaign : public testing::TestWithParam<Layout> {
 protected:
@@ -120,4 +120,4 @@ INSTANTIATE_TEST_SUITE_P(Layouts, AllocationFaultCampaign, testing::ValuesIn(kLa
 INSTANTIATE_TEST_SUITE_P(Layouts, BuildAllocationCampaign, testing::ValuesIn(kLayouts), NameOf);
 
 }  // namespace
-}  // namespace campaigns
+}  // namespace zmctest

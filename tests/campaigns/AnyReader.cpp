@@ -5,7 +5,7 @@
 #include "core/ElementTypes.h"
 #include "core/NumericConversion.h"
 
-namespace campaigns {
+namespace zmctest {
 namespace {
 
 using namespace zelm;
@@ -133,4 +133,4 @@ std::unique_ptr<AnyReader> AnyReader::Over(const RasterReaderDispatchPtr& dispat
     return any;
 }
 
-}  // namespace campaigns
+}  // namespace zmctest

@@ -10,7 +10,7 @@
 #include "dispatch/RasterReaderDispatch.h"
 #include "tests/campaigns/FileOracle.h"
 
-namespace campaigns {
+namespace zmctest {
 
 class AnyReader {
 public:
@@ -32,6 +32,6 @@ public:
     virtual bool AsPixel(double& value) const = 0;
 };
 
-}  // namespace campaigns
+}  // namespace zmctest
 
 #endif

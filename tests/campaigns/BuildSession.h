@@ -13,7 +13,7 @@
 #include "tests/campaigns/HostSession.h"
 #include "tests/support/MemorySource.h"
 
-namespace campaigns {
+namespace zmctest {
 
 class BuildSession {
 public:
@@ -30,14 +30,14 @@ public:
         Prepare(false);
         Build();
         if (!Failure().empty()) throw std::runtime_error(Failure());
-        built = support::ReadText(target);
+        built = zmctest::ReadText(target);
     }
 
     void Prepare(bool withOld) {
         old = withOld;
         for (const auto& entry : std::filesystem::directory_iterator(folder))
             std::filesystem::remove(entry.path());
-        if (old) support::WriteText(target, kOldText);
+        if (old) zmctest::WriteText(target, kOldText);
     }
 
     void Build() {
@@ -58,7 +58,7 @@ public:
             outcome = "absent";
             return old ? "the old file is gone" : "";
         }
-        const std::string bytes = support::ReadText(target);
+        const std::string bytes = zmctest::ReadText(target);
         outcome = bytes == built ? "new" : "old";
         if (bytes == built || (old && bytes == kOldText)) return "";
         const auto first = std::mismatch(bytes.begin(), bytes.end(), built.begin(), built.end());
@@ -85,14 +85,14 @@ public:
 private:
     static constexpr const char* kOldText = "the old file";
 
-    support::MemorySource<unsigned char> source;
-    zmchost::PyramidBuilder builder{support::TestModule()};
+    zmctest::MemorySource<unsigned char> source;
+    zmchost::PyramidBuilder builder{zmctest::TestModule()};
     zmchost::BuildOptions options;
     std::string folder, target, built;
     char reason[200] = {};  // kept without memory
     bool old = false;
 };
 
-}  // namespace campaigns
+}  // namespace zmctest
 
 #endif

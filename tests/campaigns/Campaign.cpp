@@ -17,7 +17,7 @@
 #include "tests/support/CampaignLength.h"
 #include "tests/support/MemoryMeter.h"
 
-namespace campaigns {
+namespace zmctest {
 namespace {
 
 constexpr std::uint64_t kMostFailuresTold = 10;
@@ -113,19 +113,19 @@ std::string Megabytes(std::int64_t bytes) {
 
 }  // namespace
 
-void Cost::NewVariant() { testsupport::MemoryMeter::Reset(); }
+void Cost::NewVariant() { zmctest::MemoryMeter::Reset(); }
 
 void Cost::Start() {
     wallStart = Seconds(CLOCK_MONOTONIC);
     cpuStart = Seconds(CLOCK_THREAD_CPUTIME_ID);
-    testsupport::MemoryMeter::Switch(true);
+    zmctest::MemoryMeter::Switch(true);
 }
 
 void Cost::Stop() {
-    testsupport::MemoryMeter::Switch(false);
+    zmctest::MemoryMeter::Switch(false);
     cpuSeconds = std::max(cpuSeconds, Seconds(CLOCK_THREAD_CPUTIME_ID) - cpuStart);
     wallSeconds = std::max(wallSeconds, Seconds(CLOCK_MONOTONIC) - wallStart);
-    peakBytes = std::max(peakBytes, testsupport::MemoryMeter::Peak());
+    peakBytes = std::max(peakBytes, zmctest::MemoryMeter::Peak());
 }
 
 std::optional<std::uint64_t> Campaign::Only() {
@@ -214,4 +214,4 @@ void Campaign::Judge(const std::string& part, std::uint64_t number, const Verdic
     ADD_FAILURE() << text << again;
 }
 
-}  // namespace campaigns
+}  // namespace zmctest

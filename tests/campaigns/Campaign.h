@@ -20,7 +20,7 @@
 #include <string>
 #include <vector>
 
-namespace campaigns {
+namespace zmctest {
 
 // What one variant cost: its slowest request, by the thread's own processor time and by the wall's
 // clock, and the most memory of all requests together by MemoryMeter.
@@ -87,6 +87,6 @@ private:
     double seconds = 0;
 };
 
-}  // namespace campaigns
+}  // namespace zmctest
 
 #endif

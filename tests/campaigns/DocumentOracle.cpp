@@ -7,7 +7,7 @@
 #include <cstring>
 #include <set>
 
-namespace campaigns {
+namespace zmctest {
 namespace {
 
 constexpr std::uint64_t kMaxBytes = std::uint64_t{256} << 20;
@@ -513,4 +513,4 @@ double RealOf(std::string_view text) { return std::strtod(std::string(text).c_st
 
 DocumentOracle::DocumentOracle(std::string_view text) { Scanner(text, *this).Run(); }
 
-}  // namespace campaigns
+}  // namespace zmctest

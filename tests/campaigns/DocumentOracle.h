@@ -13,7 +13,7 @@
 #include <string_view>
 #include <vector>
 
-namespace campaigns {
+namespace zmctest {
 
 enum class Trust {
     Sound,      // well-formed, and within the limits
@@ -65,6 +65,6 @@ struct DocumentOracle {
 std::uint32_t IntegerOf(std::string_view text);
 double RealOf(std::string_view text);
 
-}  // namespace campaigns
+}  // namespace zmctest
 
 #endif

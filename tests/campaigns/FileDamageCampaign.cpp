@@ -9,7 +9,7 @@
 #include "tests/campaigns/Samples.h"
 #include "tests/support/XercesEnvironment.h"
 
-namespace campaigns {
+namespace zmctest {
 namespace {
 
 constexpr std::uint64_t kWindowsOfASample = 8000;
@@ -79,4 +79,4 @@ TEST(FileDamage, WindowsOverwritten) {
 }
 
 }  // namespace
-}  // namespace campaigns
+}  // namespace zmctest

@@ -15,12 +15,12 @@
 #include "tests/support/CampaignLength.h"
 #include "tests/support/FileFaults.h"
 
-namespace campaigns {
+namespace zmctest {
 namespace {
 
-using testsupport::FileFault;
-using testsupport::FileFaultAction;
-using testsupport::FileFaults;
+using zmctest::FileFault;
+using zmctest::FileFaultAction;
+using zmctest::FileFaults;
 
 struct Failing {
     const char* name;
@@ -28,13 +28,12 @@ struct Failing {
     int error;
     bool fromThenOn;
     bool harmless;  // to be got over: the result is as if nothing had happened
-    unsigned calls = testsupport::kAnyCall;
+    unsigned calls = zmctest::kAnyCall;
 };
 
 // A call that a signal interrupts is made again, and no signal interrupts for ever.
-constexpr unsigned kInterruptible = testsupport::kOpenCall | testsupport::kReadCall |
-                                    testsupport::kWriteCall | testsupport::kResizeCall |
-                                    testsupport::kSyncCall;
+constexpr unsigned kInterruptible = zmctest::kOpenCall | zmctest::kReadCall | zmctest::kWriteCall |
+                                    zmctest::kResizeCall | zmctest::kSyncCall;
 constexpr Failing kFailings[] = {
     {"EIO once", FileFaultAction::Error, EIO, false, false},
     {"EIO from then on", FileFaultAction::Error, EIO, true, false},
@@ -91,8 +90,7 @@ protected:
             prepare();
             const pid_t child = fork();
             if (child == 0) {
-                FileFaults faults(
-                    {session.Folder(), testsupport::kChangingCall, n, false, action, 0});
+                FileFaults faults({session.Folder(), zmctest::kChangingCall, n, false, action, 0});
                 work();
                 _exit(0);
             }
@@ -206,7 +204,7 @@ TEST_P(BuildFaultCampaign, Builds) {
                     if (!fault.empty()) return fault;
                     if (harmless && !build.Failure().empty())
                         return "it was not got over: " + build.Failure();
-                    const bool removable = (failedKinds & testsupport::kRemoveCall) == 0;
+                    const bool removable = (failedKinds & zmctest::kRemoveCall) == 0;
                     return removable && build.Leavings() != 0 ? "temporary files stay" : "";
                 }));
         }
@@ -242,4 +240,4 @@ INSTANTIATE_TEST_SUITE_P(Lent, FileFaultCampaign, testing::ValuesIn(kLentLayouts
 INSTANTIATE_TEST_SUITE_P(Layouts, BuildFaultCampaign, testing::ValuesIn(kLayouts), NameOf);
 
 }  // namespace
-}  // namespace campaigns
+}  // namespace zmctest

@@ -4,7 +4,7 @@
 #include <cstring>
 #include <string_view>
 
-namespace campaigns {
+namespace zmctest {
 namespace {
 
 // Where the walk of the model would take too long, nothing is said about places in the file.
@@ -219,4 +219,4 @@ void FileOracle::Copy(std::uint64_t offset, unsigned char* sample, bool keeps) c
     if (!keeps && known < sampleBytes) std::memset(sample + known, 0, sampleBytes - known);
 }
 
-}  // namespace campaigns
+}  // namespace zmctest

@@ -12,7 +12,7 @@
 #include "tests/campaigns/DocumentOracle.h"
 #include "tests/support/PyramidModel.h"
 
-namespace campaigns {
+namespace zmctest {
 
 using zmctest::Bytes;
 
@@ -82,6 +82,6 @@ private:
     std::unique_ptr<zmctest::MortonModel> morton;
 };
 
-}  // namespace campaigns
+}  // namespace zmctest
 
 #endif

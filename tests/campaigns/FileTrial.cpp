@@ -18,7 +18,7 @@
 #include "tests/support/CampaignLength.h"
 #include "tests/support/Sanitizers.h"
 
-namespace campaigns {
+namespace zmctest {
 namespace {
 
 // Rectangles up to this size are read; of larger ones the corners.
@@ -144,7 +144,7 @@ Bytes FileTrial::Take() const {
 }
 
 Verdict FileTrial::Try(const Bytes& file, const Depth& depth) {
-    if (Campaign::Only()) support::WriteText("damaged.pyr", std::string(file.begin(), file.end()));
+    if (Campaign::Only()) zmctest::WriteText("damaged.pyr", std::string(file.begin(), file.end()));
     const bool both = zmctest::IsFullCampaign() || Campaign::Only();
     const bool lentAlone = std::accumulate(file.begin(), file.end(), 0u) % 2 != 0;
     Verdict verdict;
@@ -481,4 +481,4 @@ void FileTrial::WriteTile(const Bytes& before, const FileOracle& oracle, Verdict
     if (Take() != expected) verdict.Complain("writing a tile has not changed that tile alone");
 }
 
-}  // namespace campaigns
+}  // namespace zmctest

@@ -14,7 +14,7 @@
 #include "tests/campaigns/FileOracle.h"
 #include "tests/support/ScratchDirectory.h"
 
-namespace campaigns {
+namespace zmctest {
 
 // The module by its two exported functions. It stays loaded.
 class LoadedModule {
@@ -64,13 +64,13 @@ private:
     void WriteTile(const Bytes& before, const FileOracle& oracle, Verdict& verdict);
 
     LoadedModule module;
-    support::ScratchDirectory folder;
+    zmctest::ScratchDirectory folder;
     std::string path;
     zelm::files::LentName lent;
     std::string name;  // what the module opens: `path`, or the name of the loan
     int descriptor = -1;
 };
 
-}  // namespace campaigns
+}  // namespace zmctest
 
 #endif

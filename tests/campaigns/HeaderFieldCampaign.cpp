@@ -13,7 +13,7 @@
 #include "tests/support/Sanitizers.h"
 #include "tests/support/XercesEnvironment.h"
 
-namespace campaigns {
+namespace zmctest {
 namespace {
 
 constexpr std::size_t kFields = 11;
@@ -59,7 +59,7 @@ Bytes WithHeader(const Sample& sample, const std::array<std::string, kFields>& v
         text +=
             std::string("<HEADER_") + kNames[i] + ">" + values[i] + "</HEADER_" + kNames[i] + ">";
     text += "</HEADER></DATASET>";
-    const std::string front = zelm::test::FileWithHeader(text, sample.model.tileDataEnd);
+    const std::string front = zmctest::FileWithHeader(text, sample.model.tileDataEnd);
     Bytes file(front.begin(), front.end());
     const Bytes old = sample.File();
     file.insert(file.end(), old.begin() + static_cast<std::ptrdiff_t>(sample.model.tileDataStart),
@@ -129,4 +129,4 @@ TEST(HeaderFields, LargeTables) {
 }
 
 }  // namespace
-}  // namespace campaigns
+}  // namespace zmctest

@@ -10,7 +10,7 @@
 #include "tests/support/MemorySource.h"
 #include "tests/support/PyramidFiles.h"
 
-namespace campaigns {
+namespace zmctest {
 namespace {
 
 using Sample = unsigned char;
@@ -135,7 +135,7 @@ std::string Stripped(std::string text) {
 
 HostSession::HostSession(const Layout& ofFile)
     : layout(ofFile),
-      module(support::TestModule()),
+      module(zmctest::TestModule()),
       folderName(folder.String()),
       path(folder / "scene.pyr") {
     Create();
@@ -161,7 +161,7 @@ HostSession::Way::Way(const HostSession& session, zelm::files::OpenMode mode) : 
 void HostSession::Create() const {
     const Way way(*this, zelm::files::OpenMode::Create);
     zelm::RasterDataConnectionPtr connection = module->CreatePyramid(
-        way.name, zelm::test::PyramidProps(kSamples, kLines, layout.bands, 1, layout.tileLines));
+        way.name, zmctest::PyramidProps(kSamples, kLines, layout.bands, 1, layout.tileLines));
     WithReader(connection, [&](Reader& reader) {
         const std::int32_t pair[] = {2, 2};
         if (!Calling([&] { return reader.BuildPyramid(0, kMaxLevel, 0, pair); })) return;
@@ -258,4 +258,4 @@ std::string Figures(const std::map<std::string, std::size_t>& outcomes) {
     return text;
 }
 
-}  // namespace campaigns
+}  // namespace zmctest

@@ -14,7 +14,7 @@
 #include "host/raster/Module.h"
 #include "tests/support/ScratchDirectory.h"
 
-namespace campaigns {
+namespace zmctest {
 
 struct Layout {
     const char* name;
@@ -44,8 +44,8 @@ public:
     const std::string& OldFile() const { return oldFile; }
     const std::string& NewFile() const { return newFile; }
     const std::string& CreatedFile() const { return createdFile; }
-    void Put(const std::string& bytes) const { support::WriteText(path, bytes); }
-    std::string Take() const { return support::ReadText(path); }
+    void Put(const std::string& bytes) const { zmctest::WriteText(path, bytes); }
+    std::string Take() const { return zmctest::ReadText(path); }
 
     // Opens the file, reads all tiles, writes one, stores, fetches, refreshes.
     void Update(unsigned stores = kAllStores) const;
@@ -76,7 +76,7 @@ private:
 
     Layout layout;
     zmchost::ModulePtr module;
-    support::ScratchDirectory folder;
+    zmctest::ScratchDirectory folder;
     std::string folderName, path;
     std::uint64_t documentOffset = 0;
     std::string oldFile, newFile, createdFile;
@@ -89,6 +89,6 @@ std::size_t OpenDescriptors();
 // "old 3, new 4" of counted outcomes.
 std::string Figures(const std::map<std::string, std::size_t>& outcomes);
 
-}  // namespace campaigns
+}  // namespace zmctest
 
 #endif

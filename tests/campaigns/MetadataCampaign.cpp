@@ -12,7 +12,7 @@
 #include "tests/support/CampaignLength.h"
 #include "tests/support/XercesEnvironment.h"
 
-namespace campaigns {
+namespace zmctest {
 namespace {
 
 // One element of the sample's document, from the first character of its start tag to behind its
@@ -266,4 +266,4 @@ TEST(Metadata, DocumentsAtTheLimits) {
 }
 
 }  // namespace
-}  // namespace campaigns
+}  // namespace zmctest

@@ -8,7 +8,7 @@
 
 #include "tests/support/PyramidModel.h"
 
-namespace campaigns {
+namespace zmctest {
 
 struct Sample {
     std::string name;
@@ -65,6 +65,6 @@ inline std::vector<Sample> Samples() {
             MakeSample("Morton", 2, 1, 45, 37, 3)};
 }
 
-}  // namespace campaigns
+}  // namespace zmctest
 
 #endif

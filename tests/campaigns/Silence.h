@@ -8,7 +8,7 @@
 #include <cstdio>
 #include <cstdlib>
 
-namespace campaigns {
+namespace zmctest {
 
 class Silence {
 public:
@@ -28,6 +28,6 @@ private:
     int kept;
 };
 
-}  // namespace campaigns
+}  // namespace zmctest
 
 #endif

@@ -23,7 +23,7 @@ constexpr std::uint32_t kBuilders = 2;
 template <class T>
 void BuildTwice(const zmchost::ModulePtr& module, const std::string& path, std::uint32_t bands,
                 unsigned seed, std::uint32_t threads) {
-    support::MemorySource<T> source(560, 540, bands);
+    zmctest::MemorySource<T> source(560, 540, bands);
     source.FillWithNoise(seed);
     BuildOptions options;
     options.overwrite = true;
@@ -36,13 +36,13 @@ void BuildTwice(const zmchost::ModulePtr& module, const std::string& path, std::
     PyramidBuilder(module).Build(source, path + "2", options);
     EXPECT_GT(calls, 0);
     if (!options.noData) {
-        EXPECT_EQ(support::ReadText(path + "1"), support::ReadText(path + "2"));
+        EXPECT_EQ(zmctest::ReadText(path + "1"), zmctest::ReadText(path + "2"));
     }
 }
 
 TEST(BuilderThreads, BuildSideBySide) {
-    const support::ScratchDirectory folder;
-    const zmchost::ModulePtr module = support::TestModule();
+    const zmctest::ScratchDirectory folder;
+    const zmchost::ModulePtr module = zmctest::TestModule();
     const auto end = std::chrono::steady_clock::now() +
                      CampaignLength(std::chrono::seconds(4), std::chrono::seconds(60));
     std::atomic<int> builds{0};

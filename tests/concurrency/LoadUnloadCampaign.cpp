@@ -41,7 +41,7 @@ using namespace zelm;
 int Rounds() { return IsSanitized() ? CampaignLength(30, 300) : CampaignLength(200, 1000); }
 
 bool IsModuleMapped() {
-    return support::ReadText("/proc/self/maps").find("libzmcraster.so") != std::string::npos;
+    return zmctest::ReadText("/proc/self/maps").find("libzmcraster.so") != std::string::npos;
 }
 
 // What the process holds: descriptors, mappings, bytes on the heap.
@@ -61,7 +61,7 @@ Holdings HeldNow() {
     Holdings held{};
     for ([[maybe_unused]] const auto& entry : std::filesystem::directory_iterator("/proc/self/fd"))
         ++held.descriptors;
-    const std::string maps = support::ReadText("/proc/self/maps");
+    const std::string maps = zmctest::ReadText("/proc/self/maps");
     held.mappings = std::count(maps.begin(), maps.end(), '\n');
     held.heap = HeapBytes();
     return held;
@@ -100,13 +100,13 @@ RasterDataConnection& AsRaster(const DataConnectionPtr& connection) {
 
 class LoadUnload : public testing::Test {
 protected:
-    support::ScratchDirectory folder;
+    zmctest::ScratchDirectory folder;
     std::vector<unsigned char> pixels = std::vector<unsigned char>(24, 7);
 
-    std::string MemoryText() const { return test::MemoryRasterText(pixels.data()).Text(); }
+    std::string MemoryText() const { return zmctest::MemoryRasterText(pixels.data()).Text(); }
 
     DataConnectionPtr OpenMemory(const LoadedModule& module, GeoRefPtr geoRef = GeoRefPtr()) const {
-        return module.factory->Open(test::Argument({"MemoryRaster", MemoryText()}), geoRef,
+        return module.factory->Open(zmctest::Argument({"MemoryRaster", MemoryText()}), geoRef,
                                     MetadataPtr());
     }
 
@@ -150,9 +150,9 @@ TEST_F(LoadUnload, WithNothingButTheFactory) {
 TEST_F(LoadUnload, AfterARefusedOpen) {
     ExpectNothingStays([&](int) {
         const LoadedModule module;
-        EXPECT_FALSE(module.factory->Open(test::Argument({"Pyramid", folder / "none"}), GeoRefPtr(),
-                                          MetadataPtr()));
-        EXPECT_FALSE(module.factory->Open(test::Argument({"MemoryRaster", "SAMPLES=1"}),
+        EXPECT_FALSE(module.factory->Open(zmctest::Argument({"Pyramid", folder / "none"}),
+                                          GeoRefPtr(), MetadataPtr()));
+        EXPECT_FALSE(module.factory->Open(zmctest::Argument({"MemoryRaster", "SAMPLES=1"}),
                                           GeoRefPtr(), MetadataPtr()));
     });
 }
@@ -192,7 +192,7 @@ TEST_F(LoadUnload, WithAPyramidItsRecordsAndItsPalette) {
         props.formatName = "Pyramid";
         PalettePtr palette;
         if (i % 2 == 0) {
-            const DataConnectionPtr made = module.factory->Create(test::Argument({path}), props);
+            const DataConnectionPtr made = module.factory->Create(zmctest::Argument({path}), props);
             ASSERT_TRUE(made);
             auto& reader = *AsRaster(made).GetReader()->As<unsigned char>();
             const std::int32_t pair[2] = {1, 1};
@@ -203,7 +203,7 @@ TEST_F(LoadUnload, WithAPyramidItsRecordsAndItsPalette) {
             EXPECT_TRUE(reader.SetBandStats(Array<RasterBandStats<unsigned char>>()));
         }
         const DataConnectionPtr opened =
-            module.factory->Open(test::Argument({"Pyramid", path}), GeoRefPtr(), MetadataPtr());
+            module.factory->Open(zmctest::Argument({"Pyramid", path}), GeoRefPtr(), MetadataPtr());
         ASSERT_TRUE(opened);
         palette = AsRaster(opened).GetReader()->As<unsigned char>()->GetPalette(0);
         EXPECT_EQ(palette->nextIndex, 1u);
@@ -215,7 +215,7 @@ TEST_F(LoadUnload, WithTheHostsOwnObjectsAlive) {
     const Metadata metadata;
     Array<String> parameters;
     String name;
-    const GeoRefPtr geoRef(new testsupport::CountingGeoRef);
+    const GeoRefPtr geoRef(new zmctest::CountingGeoRef);
     ExpectNothingStays([&](int) {
         {
             const LoadedModule module;
@@ -226,7 +226,7 @@ TEST_F(LoadUnload, WithTheHostsOwnObjectsAlive) {
         }
         EXPECT_TRUE(parameters.data[0] == "MemoryRaster");
         EXPECT_TRUE(name == "MemoryRaster");
-        EXPECT_EQ(testsupport::CountingGeoRef::living, 1);
+        EXPECT_EQ(zmctest::CountingGeoRef::living, 1);
     });
     EXPECT_TRUE(metadata.IsValid());
 }
@@ -277,20 +277,20 @@ TEST_F(LoadUnload, FactoryThatNobodyDeletesIsALossAndNoMore) {
 // A process that has nothing of ours but the path: the libraries under the module come and go too.
 TEST_F(LoadUnload, InAProcessWithoutItsLibraries) {
     const std::string rounds = std::to_string(Rounds());
-    const support::ChildResult result =
-        support::RunChild({ZMC_BARE_LOAD_PROBE, ZMC_MODULE_PATH, rounds});
+    const zmctest::ChildResult result =
+        zmctest::RunChild({ZMC_BARE_LOAD_PROBE, ZMC_MODULE_PATH, rounds});
     EXPECT_EQ(result.status, 0) << result.out << result.err;
     std::printf("%s", result.out.c_str());
 }
 
 // The log that the module made is the process's: the host writes on, and so does the next module.
 TEST_F(LoadUnload, WhileTheParseLogThatItMadeIsInUse) {
-    const support::ChildResult result =
-        support::RunChild({ZMC_PARSE_LOG_UNLOAD_PROBE, ZMC_MODULE_PATH},
+    const zmctest::ChildResult result =
+        zmctest::RunChild({ZMC_PARSE_LOG_UNLOAD_PROBE, ZMC_MODULE_PATH},
                           {"metadata_parse_log_dir=" + folder.String(),
                            "metadata_parse_log_level=2", "metadata_parse_log_console=1"});
     EXPECT_EQ(result.status, 0) << result.err;
-    const std::string log = support::ReadText(folder / "metadata_parse_log.log");
+    const std::string log = zmctest::ReadText(folder / "metadata_parse_log.log");
     EXPECT_NE(log.find("Log Level is set to: 2\n\n"), std::string::npos) << log;
     const std::string lines = log.substr(log.find("to: 2\n\n") + 7);
     EXPECT_EQ(lines,

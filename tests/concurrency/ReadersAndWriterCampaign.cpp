@@ -105,7 +105,7 @@ public:
         : board(sharedBoard),
           tally(sharedBoard.tallies[number]),
           folder(std::move(filesFolder)),
-          module(support::TestModule()),
+          module(zmctest::TestModule()),
           random(number + 1) {}
 
     void Run() {
@@ -266,7 +266,7 @@ void Do(Progress& progress, Write write) {
 
 class ReadersAndWriter : public testing::TestWithParam<FileKind> {
 protected:
-    support::ScratchDirectory folder;
+    zmctest::ScratchDirectory folder;
     SharedBoard board;
 
     void WriteRound(const zmchost::ModulePtr& module, std::uint32_t number) {
@@ -320,7 +320,7 @@ TEST_P(ReadersAndWriter, SeeOldOrNewOrNoRecordsAndExactPixels) {
     const auto end =
         Clock::now() + CampaignLength(std::chrono::seconds(4), std::chrono::seconds(90));
     ReaderProcesses readers(*board, folder.String());
-    const zmchost::ModulePtr module = support::TestModule();
+    const zmchost::ModulePtr module = zmctest::TestModule();
     std::uint32_t number = 0;
     while (Clock::now() < end && number + 1 < kMaxRounds && !HasFailure()) {
         WriteRound(module, ++number);

@@ -64,8 +64,8 @@ void PrepareFile(const zmchost::ModulePtr& module, const std::string& path, cons
 
 // What the threads share.
 struct World {
-    support::ScratchDirectory folder;
-    zmchost::ModulePtr module = support::TestModule();
+    zmctest::ScratchDirectory folder;
+    zmchost::ModulePtr module = zmctest::TestModule();
     std::string sharedFile = folder / "shared.pyr";
     Pointer<Derived> object{new Derived};
     Box<Pointer<Counted>> objects;
@@ -155,7 +155,7 @@ bool ShareColours(Worker& me) {
 
 bool ReadMemoryRaster(Worker& me) {
     World& world = me.world;
-    const std::string text = test::MemoryRasterText(world.pixels.data()).Text();
+    const std::string text = zmctest::MemoryRasterText(world.pixels.data()).Text();
     const RasterDataConnectionPtr raster = world.module->OpenMemoryRaster(text);
     if (!raster) return false;
     int bands[] = {1, 0};
@@ -187,8 +187,8 @@ bool ReadPyramid(Worker& me) {
 }
 
 bool LoadModule(Worker& me) {
-    const zmchost::ModulePtr again = support::TestModule();
-    const std::string text = test::MemoryRasterText(me.world.pixels.data()).Text();
+    const zmchost::ModulePtr again = zmctest::TestModule();
+    const std::string text = zmctest::MemoryRasterText(me.world.pixels.data()).Text();
     const RasterDataConnectionPtr raster = again->OpenMemoryRaster(text);
     return raster && raster->IsReadable();
 }
@@ -234,9 +234,9 @@ constexpr Work kWork[] = {{"pointers", CopyPointers, 5},   {"arrays", CopyArrays
 
 class ThreadsCampaign : public testing::Test {
 protected:
-    support::ScratchDirectory folder;
+    zmctest::ScratchDirectory folder;
 
-    ThreadsCampaign() { support::WriteText(folder / "pelog.txt", "0110,0000,0000,0000\n"); }
+    ThreadsCampaign() { zmctest::WriteText(folder / "pelog.txt", "0110,0000,0000,0000\n"); }
 
     void FillSettings() const {
         const Environment environment;
@@ -285,12 +285,12 @@ TEST_F(ThreadsCampaign, EverythingAtOnce) {
 // What happens once in a process needs a process each time.
 TEST_F(ThreadsCampaign, FirstUsesAtTheSameMoment) {
     const std::string file = folder / "first.pyr";
-    PrepareFile(support::TestModule(), file, kFileKinds[1]);
+    PrepareFile(zmctest::TestModule(), file, kFileKinds[1]);
     const int rounds = CampaignLength(4, 100);
     for (int i = 0; i < rounds && !HasFailure(); ++i) {
         std::vector<std::string> environment = ParseLogOn();
         if (i % 2 != 0) environment = {"metadata_parse_log_dir"};
-        const support::ChildResult result = support::RunChild(
+        const zmctest::ChildResult result = zmctest::RunChild(
             {ZMC_FIRST_USE_PROBE, file, ZMC_ENGINE_DIRECTORY, folder.String()}, environment);
         EXPECT_EQ(result.status, 0) << "round " << i << ":\n" << result.err;
     }

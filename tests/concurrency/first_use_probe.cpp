@@ -32,8 +32,8 @@ constexpr std::size_t kThreads = 8;
 
 bool UseMemoryRaster() {
     std::vector<unsigned char> pixels(24, 7), tile(24);
-    const zmchost::ModulePtr module = support::TestModule();
-    const auto raster = module->OpenMemoryRaster(test::MemoryRasterText(pixels.data()).Text());
+    const zmchost::ModulePtr module = zmctest::TestModule();
+    const auto raster = module->OpenMemoryRaster(zmctest::MemoryRasterText(pixels.data()).Text());
     if (!raster) return false;
     int bands[] = {0, 1};
     const auto dispatch = raster->GetReader();
@@ -43,7 +43,7 @@ bool UseMemoryRaster() {
 }
 
 bool UsePyramid(const std::string& path) {
-    zmctest::GenerationFile file(support::TestModule(), path);
+    zmctest::GenerationFile file(zmctest::TestModule(), path);
     if (!file.IsOpen()) return false;
     std::string fault;
     const auto sets = file.Count(1, fault);
@@ -52,7 +52,7 @@ bool UsePyramid(const std::string& path) {
 
 bool UseModuleTwice() {
     for (int i = 0; i < 2; ++i)
-        if (!support::TestModule()) return false;
+        if (!zmctest::TestModule()) return false;
     return true;
 }
 

@@ -34,7 +34,7 @@ bool OpenARaster(void* module) {
     bool opened = false;
     {
         const DataConnectionPtr connection = factory->Open(
-            test::Argument({"MemoryRaster", test::MemoryRasterText(pixels.data()).Text()}),
+            zmctest::Argument({"MemoryRaster", zmctest::MemoryRasterText(pixels.data()).Text()}),
             GeoRefPtr(), MetadataPtr());
         opened = connection && connection->IsOpen();
     }

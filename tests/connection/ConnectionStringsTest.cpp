@@ -11,7 +11,9 @@
 #include "core/ElementTypes.h"
 #include "tests/support/MemoryRaster.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 namespace {
 
 std::string Find(const String& source, const String& key, bool expected) {
@@ -388,4 +390,4 @@ RC_GTEST_PROP(ConnectionStrings, AnyTextIsAnswered, (const std::string& text)) {
 }
 
 }  // namespace
-}  // namespace zelm::test
+}  // namespace zmctest

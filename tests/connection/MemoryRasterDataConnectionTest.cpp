@@ -11,7 +11,9 @@
 #include "tests/support/MemoryRaster.h"
 #include "tests/support/TileModel.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 namespace {
 
 // Records the sizes that it is told; `throws` makes the next call on it, or on a clone, throw.
@@ -353,4 +355,4 @@ TYPED_TEST(TypedMemoryConnection, GivesTheReaderOfItsType) {
 }
 
 }  // namespace
-}  // namespace zelm::test
+}  // namespace zmctest

@@ -7,7 +7,7 @@
 namespace {
 
 TEST(ModuleSymbols, AreExactlyTheTwoFunctions) {
-    const support::ElfFile module(ZMC_MODULE_PATH);
+    const zmctest::ElfFile module(ZMC_MODULE_PATH);
     ASSERT_TRUE(module.IsElf());
     EXPECT_THAT(module.DefinedNames(),
                 ::testing::UnorderedElementsAre("CreateDataConnectionFactory",

@@ -12,7 +12,9 @@
 #include "tests/support/MemoryRaster.h"
 #include "tests/support/TileModel.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 namespace {
 
 class Module : public ::testing::Test {
@@ -175,4 +177,4 @@ TEST_F(Module, CanBeLoadedAndUnloadedAgain) {
 }
 
 }  // namespace
-}  // namespace zelm::test
+}  // namespace zmctest

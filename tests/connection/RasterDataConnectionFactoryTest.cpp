@@ -8,7 +8,9 @@
 #include "tests/support/MemoryRaster.h"
 #include "tests/support/XercesEnvironment.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 namespace {
 
 class Factory : public ::testing::Test {
@@ -111,4 +113,4 @@ TEST_F(Factory, ConnectionsOutliveIt) {
 }
 
 }  // namespace
-}  // namespace zelm::test
+}  // namespace zmctest

@@ -10,11 +10,11 @@
 namespace zelm {
 namespace {
 
-using support::ChildResult;
-using support::ReadText;
-using support::ScratchDirectory;
 using testing::HasSubstr;
 using testing::Not;
+using zmctest::ChildResult;
+using zmctest::ReadText;
+using zmctest::ScratchDirectory;
 
 const std::string kRule = ";" + std::string(77, '-');
 
@@ -69,7 +69,7 @@ TEST_F(CoordSysFactoryRun, MissingLibraryIsLogged) {
 }
 
 TEST_F(CoordSysFactoryRun, FileThatIsNoLibraryIsLogged) {
-    support::WriteText(scratch / "libzmcpe.so", "not a library");
+    zmctest::WriteText(scratch / "libzmcpe.so", "not a library");
     const ChildResult result = RunProbe({"factory", Pe(), Pe(), "-"});
     EXPECT_THAT(result.err, HasSubstr("factory=1 module=0 pointers=0000 mutex=0 log=1\ninit=1"));
     EXPECT_THAT(

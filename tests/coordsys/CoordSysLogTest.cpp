@@ -17,15 +17,15 @@
 namespace zelm {
 namespace {
 
-using support::ChildResult;
-using support::ReadText;
-using support::ScratchDirectory;
-using support::SmallDisk;
-using support::WriteText;
 using testing::EndsWith;
 using testing::HasSubstr;
 using testing::MatchesRegex;
 using testing::Not;
+using zmctest::ChildResult;
+using zmctest::ReadText;
+using zmctest::ScratchDirectory;
+using zmctest::SmallDisk;
+using zmctest::WriteText;
 
 const std::string kFirst = "logs/zmcpe_pe_1.log";
 const std::string kSecond = "logs/zmcpe_pe_2.log";
@@ -164,7 +164,7 @@ TEST_F(CoordSysLogRun, MissingDirectoryMeansNoLog) {
 TEST_F(CoordSysLogRun, DirectoryOutsideAsciiNeedsALocaleThatHoldsIt) {
     const std::string directory = scratch / "pe\xC3\xA4";
     std::filesystem::create_directory(directory);
-    support::WriteText(directory + "/pelog.txt", "0110,0000,0000,0000\n");
+    zmctest::WriteText(directory + "/pelog.txt", "0110,0000,0000,0000\n");
     EXPECT_EQ(RunProbe({"log", directory, "1", "8192", "5"}).err, "no log\nno log\n");
     EXPECT_THAT(RunProbe({"utf8", "log", directory, "1", "8192", "5"}).err,
                 HasSubstr("sequence=1"));

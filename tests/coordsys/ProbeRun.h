@@ -9,9 +9,9 @@
 
 namespace zelm {
 
-inline support::ChildResult RunProbe(std::vector<std::string> words) {
+inline zmctest::ChildResult RunProbe(std::vector<std::string> words) {
     words.insert(words.begin(), ZMC_COORDSYS_PROBE);
-    support::ChildResult result = support::RunChild(words);
+    zmctest::ChildResult result = zmctest::RunChild(words);
     EXPECT_EQ(result.status, 0) << result.err;
     return result;
 }
@@ -22,8 +22,8 @@ inline std::string StubDirectory(int lacks) {
     return ZMC_STUB_DIRECTORY "/stub" + std::to_string(lacks);
 }
 
-inline void WriteControlLine(const support::ScratchDirectory& directory, const std::string& line) {
-    support::WriteText(directory / "pelog.txt", "# notes\n" + line + "\n");
+inline void WriteControlLine(const zmctest::ScratchDirectory& directory, const std::string& line) {
+    zmctest::WriteText(directory / "pelog.txt", "# notes\n" + line + "\n");
 }
 
 }  // namespace zelm

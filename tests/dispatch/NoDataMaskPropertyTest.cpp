@@ -11,7 +11,9 @@
 #include "tests/support/ElementTypeList.h"
 #include "tests/support/TileModel.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 namespace {
 
 // Few values, so that samples equal no-data values often, and all the special ones.
@@ -153,4 +155,4 @@ TYPED_TEST(NoDataMasks, AreAppliedAsTheModelSays) {
 }
 
 }  // namespace
-}  // namespace zelm::test
+}  // namespace zmctest

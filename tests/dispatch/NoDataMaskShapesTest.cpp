@@ -14,7 +14,9 @@
 #include "tests/support/ElementTypeList.h"
 #include "tests/support/TileModel.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 namespace {
 
 // Which bands have a no-data value, and which.
@@ -206,4 +208,4 @@ TYPED_TEST(NoDataMaskShapes, NullBuffersAreIgnored) {
 }
 
 }  // namespace
-}  // namespace zelm::test
+}  // namespace zmctest

@@ -9,7 +9,9 @@
 #include "tests/dispatch/PropsReader.h"
 #include "tests/support/TileModel.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 namespace {
 
 using Bytes = std::vector<unsigned char>;
@@ -251,4 +253,4 @@ TEST(NoDataMask, NullBuffersAreIgnored) {
 }
 
 }  // namespace
-}  // namespace zelm::test
+}  // namespace zmctest

@@ -4,7 +4,9 @@
 
 #include "raster/ReaderRasterMemory.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 
 template <class T>
 ReaderRasterMemory<T> PropsReader(std::int32_t interleave, std::uint32_t bands = 3) {
@@ -15,6 +17,6 @@ ReaderRasterMemory<T> PropsReader(std::int32_t interleave, std::uint32_t bands =
     return ReaderRasterMemory<T>(nullptr, props);
 }
 
-}  // namespace zelm::test
+}  // namespace zmctest
 
 #endif

@@ -9,11 +9,13 @@
 #include "tests/support/CountingGeoRef.h"
 #include "tests/support/ElementTypeList.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 namespace {
 
-using testsupport::CountingGeoRef;
-using testsupport::ThrowingClones;
+using zmctest::CountingGeoRef;
+using zmctest::ThrowingClones;
 
 int BoundMembers(const RasterReaderDispatch& dispatch) {
     int bound = 0;
@@ -126,4 +128,4 @@ TYPED_TEST(TypedDispatch, CopiedPointersShareOneDispatch) {
 }
 
 }  // namespace
-}  // namespace zelm::test
+}  // namespace zmctest

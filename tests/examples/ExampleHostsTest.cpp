@@ -17,7 +17,7 @@ std::string GdalInfo(const std::string& file, const std::vector<std::string>& op
     std::vector<std::string> command = {"gdalinfo"};
     command.insert(command.end(), options.begin(), options.end());
     command.push_back(file);
-    const auto result = support::RunChild(command, {"GDAL_PAM_ENABLED=NO"});
+    const auto result = zmctest::RunChild(command, {"GDAL_PAM_ENABLED=NO"});
     EXPECT_EQ(result.status, 0) << result.err;
     return result.out;
 }
@@ -33,9 +33,9 @@ std::string NumberAfter(const std::string& text, const std::string& label) {
 }
 
 TEST(MemoryHost, TableAgreesWithGdalinfo) {
-    const support::ScratchDirectory scratch;
+    const zmctest::ScratchDirectory scratch;
     const auto host =
-        support::RunChild({ZMC_MEMORY_HOST, ZMC_MODULE_PATH, ZMC_GRID, scratch / "geoid.png"});
+        zmctest::RunChild({ZMC_MEMORY_HOST, ZMC_MODULE_PATH, ZMC_GRID, scratch / "geoid.png"});
     ASSERT_EQ(host.status, 0) << host.err;
     const std::string gdal = GdalInfo(ZMC_GRID, {"-stats"});
     EXPECT_THAT(host.out, HasSubstr("size 1440 x 721\ntype Single\nvalid samples 1038240 "));
@@ -48,9 +48,9 @@ TEST(MemoryHost, TableAgreesWithGdalinfo) {
 }
 
 TEST(MemoryHost, WindowIsTheSameInEveryInterleave) {
-    const support::ScratchDirectory scratch;
+    const zmctest::ScratchDirectory scratch;
     const auto host =
-        support::RunChild({ZMC_MEMORY_HOST, ZMC_MODULE_PATH, ZMC_GRID, scratch / "geoid.png"});
+        zmctest::RunChild({ZMC_MEMORY_HOST, ZMC_MODULE_PATH, ZMC_GRID, scratch / "geoid.png"});
     ASSERT_EQ(host.status, 0) << host.err;
     const std::string label = ": checksum of a window in the bands (2, 0): ";
     const std::string sum = NumberAfter(host.out, "BIP" + label);
@@ -61,8 +61,8 @@ TEST(MemoryHost, WindowIsTheSameInEveryInterleave) {
 }
 
 TEST(PyramidHost, LevelsAndArchiveComeBack) {
-    const support::ScratchDirectory scratch;
-    const auto host = support::RunChild(
+    const zmctest::ScratchDirectory scratch;
+    const auto host = zmctest::RunChild(
         {ZMC_PYRAMID_HOST, ZMC_MODULE_PATH, ZMC_GRID, scratch / "geoid.pyr", scratch / "geoid"});
     ASSERT_EQ(host.status, 0) << host.err;
     EXPECT_THAT(host.out, HasSubstr(" 1440 x  721     18 "));
@@ -78,7 +78,7 @@ TEST(PyramidHost, LevelsAndArchiveComeBack) {
 
 TEST(ExampleHosts, FailWithOneLine) {
     const auto host =
-        support::RunChild({ZMC_MEMORY_HOST, "/no/module.so", ZMC_GRID, "/no/picture"});
+        zmctest::RunChild({ZMC_MEMORY_HOST, "/no/module.so", ZMC_GRID, "/no/picture"});
     EXPECT_EQ(host.status, 1);
     EXPECT_THAT(host.err, HasSubstr("/no/module.so"));
     EXPECT_EQ(std::count(host.err.begin(), host.err.end(), '\n'), 1);

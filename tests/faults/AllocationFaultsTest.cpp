@@ -8,7 +8,7 @@
 #include <thread>
 #include <vector>
 
-namespace testsupport {
+namespace zmctest {
 namespace {
 
 // Keeps the compiler from leaving out an allocation that nobody uses.
@@ -115,4 +115,4 @@ TEST(AllocationFaults, ReachTheModulesThatAProgramLoads) {
 }
 
 }  // namespace
-}  // namespace testsupport
+}  // namespace zmctest

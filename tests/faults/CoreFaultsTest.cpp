@@ -14,9 +14,9 @@
 namespace zelm {
 namespace {
 
-using testsupport::AllocationFaults;
-using testsupport::FaultMode;
-using testsupport::ForEachAllocationFailing;
+using zmctest::AllocationFaults;
+using zmctest::FaultMode;
+using zmctest::ForEachAllocationFailing;
 
 const WideChar* const kWide = reinterpret_cast<const WideChar*>(u"wide text");
 

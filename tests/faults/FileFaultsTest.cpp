@@ -14,7 +14,7 @@
 #include "tests/support/ChildProcess.h"
 #include "tests/support/ScratchDirectory.h"
 
-namespace testsupport {
+namespace zmctest {
 namespace {
 
 using platform::File;
@@ -28,7 +28,7 @@ protected:
     }
     std::unique_ptr<File> Make() { return File::Open(wide.c_str(), File::Mode::Create); }
 
-    support::ScratchDirectory folder;
+    zmctest::ScratchDirectory folder;
     std::string name;
     std::u16string wide;
     char bytes[10] = "abcdefghi";
@@ -56,16 +56,16 @@ TEST_F(FileFaultsTest, CountsTheCallsOfEachKind) {
 }
 
 TEST_F(FileFaultsTest, FilesElsewhereDoNotCount) {
-    support::ScratchDirectory other;
+    zmctest::ScratchDirectory other;
     FileFaults faults(Fault(kAnyCall, 1, FileFaultAction::Error, EIO));
-    support::WriteText(other / "file", "text");
-    EXPECT_EQ(support::ReadText(other / "file"), "text");
+    zmctest::WriteText(other / "file", "text");
+    EXPECT_EQ(zmctest::ReadText(other / "file"), "text");
     EXPECT_EQ(faults.Count(), 0u);
 }
 
 TEST_F(FileFaultsTest, StreamsOfTheLibraryCountToo) {
     FileFaults faults(Fault(kWriteCall, 1, FileFaultAction::Error, ENOSPC));
-    support::WriteText(name, "text");
+    zmctest::WriteText(name, "text");
     EXPECT_EQ(faults.Failed(), 1u);
     EXPECT_EQ(std::filesystem::file_size(name), 0u);
 }
@@ -121,13 +121,13 @@ TEST_F(FileFaultsTest, EveryCallOfALifeIsMadeAgainWhenInterrupted) {
 }
 
 TEST_F(FileFaultsTest, OpenThatCannotLookOrEmptyGivesNothing) {
-    support::WriteText(name, "old");
+    zmctest::WriteText(name, "old");
     for (const unsigned kind : {kOpenCall, kStatusCall, kResizeCall}) {
         FileFaults faults(Fault(kind, 1, FileFaultAction::Error, EIO));
         EXPECT_FALSE(Make());
         EXPECT_EQ(faults.Failed(), 1u);
     }
-    EXPECT_EQ(support::ReadText(name), "old");
+    EXPECT_EQ(zmctest::ReadText(name), "old");
 }
 
 TEST_F(FileFaultsTest, ProcessEndsInTheMiddleOfAWrite) {
@@ -142,22 +142,22 @@ TEST_F(FileFaultsTest, ProcessEndsInTheMiddleOfAWrite) {
     int status = 0;
     waitpid(child, &status, 0);
     EXPECT_TRUE(WIFSIGNALED(status));
-    EXPECT_EQ(support::ReadText(name), "ab34");
+    EXPECT_EQ(zmctest::ReadText(name), "ab34");
 }
 
 TEST_F(FileFaultsTest, ChildrenTakeTheirOrderFromTheEnvironment) {
 #if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
     GTEST_SKIP() << "the preloaded library must not come before the sanitizer's";
 #endif
-    support::ScratchDirectory other;
+    zmctest::ScratchDirectory other;
     const auto order =
         FileFaults::ForChild(Fault(kWriteCall, 1, FileFaultAction::Error, ENOSPC), other / "count");
-    const support::ChildResult result =
-        support::RunChild({"/bin/cp", "/proc/self/status", name}, order);
+    const zmctest::ChildResult result =
+        zmctest::RunChild({"/bin/cp", "/proc/self/status", name}, order);
     EXPECT_EQ(result.status, 1);
     EXPECT_NE(result.err.find("No space left"), std::string::npos) << result.err;
-    EXPECT_EQ(support::ReadText(other / "count"), "1\n");
+    EXPECT_EQ(zmctest::ReadText(other / "count"), "1\n");
 }
 
 }  // namespace
-}  // namespace testsupport
+}  // namespace zmctest

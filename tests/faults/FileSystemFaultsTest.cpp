@@ -14,8 +14,8 @@
 namespace platform {
 namespace {
 
-using testsupport::AllocationFaults;
-using testsupport::ForEachAllocationFailing;
+using zmctest::AllocationFaults;
+using zmctest::ForEachAllocationFailing;
 
 // Calls `answer` with each allocation failing in turn: it throws std::bad_alloc, or gives what it
 // gives otherwise.
@@ -56,8 +56,8 @@ TEST(FileSystemMemory, TextsAreWholeOrThrown) {
 }
 
 TEST(FileSystemMemory, LinksAreResolvedOrThrown) {
-    const support::ScratchDirectory folder;
-    support::WriteText(folder / kLong, "text");
+    const zmctest::ScratchDirectory folder;
+    zmctest::WriteText(folder / kLong, "text");
     ASSERT_EQ(::symlink((folder / kLong).c_str(), (folder / "far").c_str()), 0);
     ASSERT_EQ(::symlink("far", (folder / "near").c_str()), 0);
     ASSERT_EQ(::symlink("circle", (folder / "circle").c_str()), 0);
@@ -66,18 +66,18 @@ TEST(FileSystemMemory, LinksAreResolvedOrThrown) {
 }
 
 TEST(FileSystemMemory, AFolderIsListedWholeOrThrown) {
-    const support::ScratchDirectory folder;
-    for (const char* const end : {"a", "b", "c"}) support::WriteText(folder / (kLong + end), "");
+    const zmctest::ScratchDirectory folder;
+    for (const char* const end : {"a", "b", "c"}) zmctest::WriteText(folder / (kLong + end), "");
     ExpectWholeOrThrown([path = folder.String()] { return ListFolder(path); });
 }
 
 TEST(FileSystemMemory, OperationsTakeNoMemory) {
-    const support::ScratchDirectory folder;
+    const zmctest::ScratchDirectory folder;
     const std::string path = folder / "file";
     const std::string other = folder / "other";
     const std::string place = folder.String();
     bool answers[9] = {};
-    const std::size_t allocations = testsupport::CountAllocations([&] {
+    const std::size_t allocations = zmctest::CountAllocations([&] {
         answers[0] = CreateNewFile(path);
         answers[1] = StatusOf(path).exists;
         answers[2] = ReserveSpace(path, 1000);

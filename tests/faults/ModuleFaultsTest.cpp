@@ -16,9 +16,9 @@
 namespace zelm {
 namespace {
 
-using testsupport::AllocationFaults;
-using testsupport::CountingGeoRef;
-using testsupport::ForEachAllocationFailing;
+using zmctest::AllocationFaults;
+using zmctest::CountingGeoRef;
+using zmctest::ForEachAllocationFailing;
 
 constexpr std::uint32_t kSamples = 4;
 constexpr std::uint32_t kLines = 3;

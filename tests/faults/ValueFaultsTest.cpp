@@ -17,10 +17,10 @@
 namespace zelm {
 namespace {
 
-using testsupport::AllocationFaults;
-using testsupport::CountingGeoRef;
-using testsupport::FaultMode;
-using testsupport::ForEachAllocationFailing;
+using zmctest::AllocationFaults;
+using zmctest::CountingGeoRef;
+using zmctest::FaultMode;
+using zmctest::ForEachAllocationFailing;
 
 RGBAColor Grey(unsigned char value) {
     unsigned char bytes[4] = {value, value, value, 255};

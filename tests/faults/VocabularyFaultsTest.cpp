@@ -11,8 +11,8 @@
 namespace zelm {
 namespace {
 
-using testsupport::AllocationFaults;
-using testsupport::FaultMode;
+using zmctest::AllocationFaults;
+using zmctest::FaultMode;
 
 // What is read out of a word when no allocation succeeds.
 template <class Code>

@@ -18,8 +18,8 @@
 namespace zelm::files {
 namespace {
 
-using support::FaultySource;
-using support::SourceFault;
+using zmctest::FaultySource;
+using zmctest::SourceFault;
 
 std::shared_ptr<MemorySource> Holding(const std::string& text) {
     return std::make_shared<MemorySource>(MemorySource::Bytes(text.begin(), text.end()));

@@ -26,12 +26,12 @@ namespace zelm::files {
 namespace {
 
 using SourcePtr = std::shared_ptr<ByteSource>;
-using support::FaultySource;
-using support::SourceFault;
+using zmctest::FaultySource;
+using zmctest::SourceFault;
 
 // What a source needs while it lives.
 struct World {
-    support::ScratchDirectory folder;
+    zmctest::ScratchDirectory folder;
     std::vector<LentName> names;
 };
 
@@ -49,7 +49,7 @@ SourcePtr EmptyFile(World& world) {
 }
 
 SourcePtr ReadOnlyFile(World& world, const std::string& content) {
-    support::WriteText(world.folder / "source", content);
+    zmctest::WriteText(world.folder / "source", content);
     return FileSource::Open((world.folder / "source").c_str(), OpenMode::Read);
 }
 

@@ -21,11 +21,11 @@
 namespace zelm::files {
 namespace {
 
-using support::ReadText;
-using support::WriteText;
-using testsupport::FileFault;
-using testsupport::FileFaultAction;
-using testsupport::FileFaults;
+using zmctest::FileFault;
+using zmctest::FileFaultAction;
+using zmctest::FileFaults;
+using zmctest::ReadText;
+using zmctest::WriteText;
 
 class FileSourceTest : public testing::Test {
 protected:
@@ -43,7 +43,7 @@ protected:
         return {folder.String(), calls, 1, true, action, number};
     }
 
-    support::ScratchDirectory folder;
+    zmctest::ScratchDirectory folder;
     const std::string path = folder / "file";
     int error = -1;
 };
@@ -148,7 +148,7 @@ TEST_F(FileSourceTest, TellsWhatTheDiskSays) {
     char buffer[4];
     std::uint64_t size = 0;
     {
-        FileFaults faults(Fault(testsupport::kAnyCall, EIO));
+        FileFaults faults(Fault(zmctest::kAnyCall, EIO));
         EXPECT_EQ(source->ReadAt(0, buffer, 4, &error), 0U);
         EXPECT_EQ(error, EIO);
         EXPECT_FALSE(source->TellSize(size, &(error = 0)));
@@ -160,7 +160,7 @@ TEST_F(FileSourceTest, TellsWhatTheDiskSays) {
         EXPECT_FALSE(FileSource::Open(path.c_str(), OpenMode::Read, &(error = 0)));
         EXPECT_EQ(error, EIO);
     }
-    FileFaults faults(Fault(testsupport::kChangingCall, ENOSPC));
+    FileFaults faults(Fault(zmctest::kChangingCall, ENOSPC));
     EXPECT_EQ(source->WriteAt(0, "abcd", 4, &(error = 0)), 0U);
     EXPECT_EQ(error, ENOSPC);
     EXPECT_FALSE(source->Truncate(9, &(error = 0)));
@@ -172,7 +172,7 @@ TEST_F(FileSourceTest, TellsWhatTheDiskSays) {
 
 TEST_F(FileSourceTest, AWriteThatTheDiskDropsIsAFailure) {
     const auto source = Open();
-    FileFaults faults(Fault(testsupport::kWriteCall, 0, FileFaultAction::Nothing));
+    FileFaults faults(Fault(zmctest::kWriteCall, 0, FileFaultAction::Nothing));
     EXPECT_EQ(source->WriteAt(0, "abcd", 4, &error), 0U);
     EXPECT_EQ(error, EIO);
 }

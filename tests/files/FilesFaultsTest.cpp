@@ -16,23 +16,23 @@
 namespace zelm::files {
 namespace {
 
-using testsupport::AllocationFaults;
-using testsupport::ForEachAllocationFailing;
+using zmctest::AllocationFaults;
+using zmctest::ForEachAllocationFailing;
 
 TEST(FilesFaults, AFileDoesNotOpenWithoutMemoryAndSaysSo) {
-    const support::ScratchDirectory folder;
+    const zmctest::ScratchDirectory folder;
     const std::string path = folder / "file";
     const String name(path.c_str());
     std::size_t opened = 0;
     const auto points = ForEachAllocationFailing([&](AllocationFaults& faults) {
         faults.Disarm();
-        support::WriteText(path, "text");
+        zmctest::WriteText(path, "text");
         faults.Rearm();
         int error = -1;
         const auto source = OpenSource(name, OpenMode::Create, &error);
         faults.Disarm();
         EXPECT_EQ(error, source ? 0 : ENOMEM);
-        EXPECT_EQ(support::ReadText(path), source ? "" : "text") << "or it stays as it was";
+        EXPECT_EQ(zmctest::ReadText(path), source ? "" : "text") << "or it stays as it was";
         if (source) ++opened;
     });
     EXPECT_GE(points, 4U) << "the source, its name, the narrow name, the file, what counts users";
@@ -59,7 +59,7 @@ TEST(FilesFaults, ASourceThatCannotGrowStaysAsItIs) {
     MemorySource source(MemorySource::Bytes(4, 'x'));
     int writeError = 0, cutError = 0;
     {
-        AllocationFaults faults(1, testsupport::FaultMode::FromThenOn);
+        AllocationFaults faults(1, zmctest::FaultMode::FromThenOn);
         source.WriteAt(1000, "a", 1, &writeError);
         source.Truncate(1000, &cutError);
     }
@@ -70,7 +70,7 @@ TEST(FilesFaults, ASourceThatCannotGrowStaysAsItIs) {
 
 // Nothing needs memory once it is open.
 TEST(FilesFaults, TransfersAndRecordsTakeNoMemory) {
-    const support::ScratchDirectory folder;
+    const zmctest::ScratchDirectory folder;
     const auto file = FileSource::Open((folder / "file").c_str(), OpenMode::Create);
     ASSERT_TRUE(file);
     RecordingSource recording(file);

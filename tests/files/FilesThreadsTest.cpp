@@ -114,7 +114,7 @@ TEST(LendingThreads, ACopyMadeAtAnyMomentCanLend) {
 }
 
 TEST(RecordingThreads, NoFailureIsLostBetweenTwoLooks) {
-    const auto faulty = std::make_shared<support::FaultySource>(std::make_shared<MemorySource>());
+    const auto faulty = std::make_shared<zmctest::FaultySource>(std::make_shared<MemorySource>());
     faulty->n = 1;
     faulty->fromThenOn = true;
     RecordingSource recording(faulty);
@@ -156,7 +156,7 @@ TEST(MemorySourceThreads, AReadSeesAWriteWholeOrNotAtAll) {
 }
 
 TEST(FileSourceThreads, OneFileReadAndWrittenByAll) {
-    const support::ScratchDirectory folder;
+    const zmctest::ScratchDirectory folder;
     const auto source = FileSource::Open((folder / "file").c_str(), OpenMode::Create);
     ASSERT_TRUE(source);
     std::atomic<int> wrong{0};

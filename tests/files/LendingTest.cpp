@@ -316,15 +316,15 @@ TEST(LendingProcesses, ACopyHasWhatWasLentBeforeItAndKeepsItsOwnBooks) {
 
 TEST(LendingProcesses, AProgramThatIsStartedKnowsNone) {
     const LentName name = Lend(Holding("abc"));
-    const auto result = support::RunChild({ZMC_LENT_NAME_PROBE, name.Utf8()});
+    const auto result = zmctest::RunChild({ZMC_LENT_NAME_PROBE, name.Utf8()});
     EXPECT_EQ(result.status, 0);
     EXPECT_EQ(result.out, "looks lent, opens nothing\n") << result.err;
 }
 
 TEST(LendingProcesses, TheExampleOfTheDocumentRuns) {
-    const support::ScratchDirectory folder;
-    support::WriteText(folder / "image.pyr", "KOBT");
-    const auto result = support::RunChild({ZMC_LENDING_GUIDE_EXAMPLE, folder.String()});
+    const zmctest::ScratchDirectory folder;
+    zmctest::WriteText(folder / "image.pyr", "KOBT");
+    const auto result = zmctest::RunChild({ZMC_LENDING_GUIDE_EXAMPLE, folder.String()});
     EXPECT_EQ(result.status, 0);
     EXPECT_EQ(result.err, "") << "nothing failed, nothing changed";
 }

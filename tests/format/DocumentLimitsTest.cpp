@@ -6,7 +6,9 @@
 #include "format/ElementNames.h"
 #include "format/PyramidLimits.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 namespace {
 
 std::u16string Name(std::uint32_t i) {
@@ -80,4 +82,4 @@ TEST(DocumentLimits, EveryNodeCounts) {
 }
 
 }  // namespace
-}  // namespace zelm::test
+}  // namespace zmctest

@@ -107,7 +107,7 @@ TEST_F(DriverTest, OneParseOfTheDocumentServesAllBandsAfterAnUpdateToo) {
     EXPECT_EQ(dataset->GetRasterBand(1)->GetStatistics(0, 0, nullptr, nullptr, &mean, nullptr),
               CE_None);
     EXPECT_EQ(mean, 1.5);
-    const std::size_t before = support::DocumentParses();
+    const std::size_t before = zmctest::DocumentParses();
     EXPECT_GT(before, 0u);
     for (int band = 2; band <= kBands; ++band) {
         GDALRasterBand& each = *dataset->GetRasterBand(band);
@@ -123,7 +123,7 @@ TEST_F(DriverTest, OneParseOfTheDocumentServesAllBandsAfterAnUpdateToo) {
         each.GetDefaultHistogram(&low, &high, &buckets, &counts, FALSE, nullptr, nullptr);
         CPLFree(counts);
     }
-    EXPECT_EQ(support::DocumentParses(), before);
+    EXPECT_EQ(zmctest::DocumentParses(), before);
 }
 
 TEST_F(DriverTest, RegistersOnce) {
@@ -240,7 +240,7 @@ TEST_F(DriverTest, DatasetsInEightThreadsReadTheSame) {
 TEST_F(DriverTest, DamagedFilesDoNoHarm) {
     const DatasetPtr source = Memory(300, 270, 2, GDT_Byte);
     const std::string name = MakeCopy(*source);
-    const std::string whole = support::ReadText(name);
+    const std::string whole = zmctest::ReadText(name);
     std::mt19937 random(11);
     CPLPushErrorHandler(CPLQuietErrorHandler);
     for (int run = 0; run < 150; ++run) {
@@ -309,17 +309,17 @@ TEST_F(DriverTest, StoreThatWasCutOffIsPutInOrder) {
 }
 
 class LenientHeaders : public DriverTest,
-                       public testing::WithParamInterface<support::LenientHeader> {};
+                       public testing::WithParamInterface<zmctest::LenientHeader> {};
 
 // What the module reads in a header is what is shown, and what buffers are made by.
 TEST_P(LenientHeaders, SayTheSameToGdal) {
-    const support::LenientHeader& expected = GetParam();
-    support::WriteText(Path("a.pyr"), expected.File());
+    const zmctest::LenientHeader& expected = GetParam();
+    zmctest::WriteText(Path("a.pyr"), expected.File());
     const DatasetPtr dataset = Open(Path("a.pyr"));
     ASSERT_TRUE(dataset);
     EXPECT_EQ(dataset->GetRasterXSize(), static_cast<int>(expected.width));
     EXPECT_EQ(dataset->GetRasterYSize(), static_cast<int>(expected.height));
-    ASSERT_EQ(dataset->GetRasterCount(), static_cast<int>(support::LenientHeader::kBands));
+    ASSERT_EQ(dataset->GetRasterCount(), static_cast<int>(zmctest::LenientHeader::kBands));
     const auto item = [&](const char* name) {
         return std::string(dataset->GetMetadataItem(name, "ZMCPYRAMID"));
     };
@@ -345,7 +345,7 @@ TEST_P(LenientHeaders, SayTheSameToGdal) {
     EXPECT_EQ(band.GetOverviewCount(), static_cast<int>(std::min(expected.levelMax, 8u)));
 }
 
-INSTANTIATE_TEST_SUITE_P(All, LenientHeaders, testing::ValuesIn(support::kLenientHeaders),
+INSTANTIATE_TEST_SUITE_P(All, LenientHeaders, testing::ValuesIn(zmctest::kLenientHeaders),
                          [](const auto& each) { return each.param.name; });
 
 }  // namespace

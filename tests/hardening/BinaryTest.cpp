@@ -46,7 +46,7 @@ protected:
                            [flag](Elf64_Xword value) { return (value & flag) != 0; });
     }
 
-    const support::ElfFile binary{GetParam().path};
+    const zmctest::ElfFile binary{GetParam().path};
 };
 
 // All names are bound before the first line runs, and the table of them is read-only from then on.

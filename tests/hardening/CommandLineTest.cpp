@@ -23,7 +23,7 @@ TEST(HardeningCommandLine, EverySourceThatIsShippedHasTheFlags) {
 #ifndef ZMC_HARDENED
     GTEST_SKIP() << "not a hardened build";
 #endif
-    const std::string text = support::ReadText(ZMC_BUILD_DIR "/compile_commands.json");
+    const std::string text = zmctest::ReadText(ZMC_BUILD_DIR "/compile_commands.json");
     const auto commands = nlohmann::json::parse(text, nullptr, false);
     ASSERT_TRUE(commands.is_array());
 

@@ -18,13 +18,13 @@ using ::testing::HasSubstr;
 using ::testing::UnorderedElementsAre;
 
 TEST(Exports, OfTheEngineAreItsFourEntryPoints) {
-    EXPECT_THAT(support::ElfFile(ZMC_ENGINE_BINARY).DefinedNames(),
+    EXPECT_THAT(zmctest::ElfFile(ZMC_ENGINE_BINARY).DefinedNames(),
                 UnorderedElementsAre("Esri_Pe_Initialize", "Esri_Pe_CreateFromString",
                                      "Esri_Pe_CreateFromCode", "Esri_Pe_Release"));
 }
 
 TEST(Exports, OfTheLoaderAreItsFourFunctions) {
-    EXPECT_THAT(support::ElfFile(ZMC_LOADER_BINARY).DefinedNames(),
+    EXPECT_THAT(zmctest::ElfFile(ZMC_LOADER_BINARY).DefinedNames(),
                 UnorderedElementsAre(HasSubstr("FindModule"), HasSubstr("OpenModule"),
                                      HasSubstr("CloseModule"), HasSubstr("StartXerces")));
 }
@@ -40,7 +40,7 @@ std::string Readable(const std::string& name) {
 TEST(Exports, OfTheLibraryOfSourcesAreTheClassesAndFunctionsOfItsHeaders) {
     const std::regex ours("(?:(?:vtable|typeinfo|typeinfo name) for )?zelm::files::(\\w+)(.*)");
     std::set<std::string> owners, members;
-    for (const std::string& name : support::ElfFile(ZMC_FILES_BINARY).DefinedNames()) {
+    for (const std::string& name : zmctest::ElfFile(ZMC_FILES_BINARY).DefinedNames()) {
         const std::string text = Readable(name);
         std::smatch parts;
         ASSERT_TRUE(std::regex_match(text, parts, ours)) << text;
@@ -60,7 +60,7 @@ TEST(Exports, OfTheLibraryOfSourcesAreTheClassesAndFunctionsOfItsHeaders) {
 
 #ifdef ZMC_PLUGIN_BINARY
 TEST(Exports, OfThePlugInAreTheFunctionThatGdalCalls) {
-    EXPECT_THAT(support::ElfFile(ZMC_PLUGIN_BINARY).DefinedNames(),
+    EXPECT_THAT(zmctest::ElfFile(ZMC_PLUGIN_BINARY).DefinedNames(),
                 UnorderedElementsAre("GDALRegister_ZMCPyramid"));
 }
 #endif

@@ -20,9 +20,9 @@
 namespace zmchost {
 namespace {
 
-using support::MemorySource;
-using support::ScratchDirectory;
-using support::TestModule;
+using zmctest::MemorySource;
+using zmctest::ScratchDirectory;
+using zmctest::TestModule;
 
 std::vector<std::string> NamesIn(const std::string& folder) {
     std::vector<std::string> names;
@@ -48,11 +48,11 @@ class BuildSafety : public testing::Test {
 protected:
     BuildSafety() : source(900, 1300, 2), target(folder / "old.zmc") {
         source.FillWithNoise(3);
-        support::WriteText(target, "the old file");
+        zmctest::WriteText(target, "the old file");
     }
 
     void ExpectNothingChanged() {
-        EXPECT_EQ(support::ReadText(target), "the old file");
+        EXPECT_EQ(zmctest::ReadText(target), "the old file");
         EXPECT_THAT(NamesIn(folder.String()), testing::ElementsAre("old.zmc"));
     }
 
@@ -168,7 +168,7 @@ TEST_F(BuildSafety, KilledBuildLeavesNameThatTheNextOneRemoves) {
     int status = 0;
     waitpid(child, &status, 0);
     ASSERT_TRUE(WIFSIGNALED(status));
-    EXPECT_EQ(support::ReadText(target), "the old file");
+    EXPECT_EQ(zmctest::ReadText(target), "the old file");
     const auto names = NamesIn(folder.String());
     ASSERT_EQ(names.size(), 2u);
     EXPECT_THAT(names[0], testing::StartsWith(".old.zmc.zmcbuild-" + std::to_string(child) + "-"));
@@ -187,8 +187,8 @@ TEST_F(BuildSafety, OnlyLeavingsOfDeadProcessesAreRemoved) {
         ".old.zmc.zmcbuild-" + std::to_string(getppid()) + "-1.tmp",
         ".old.zmc.zmcbuild-" + dead + ".tmp", ".old.zmc.zmcbuild-" + dead + "-1.txt",
         ".other.zmc.zmcbuild-" + dead + "-1.tmp", "old.zmc.zmcbuild-" + dead + "-1.tmp"};
-    support::WriteText(folder / stale, "");
-    for (const std::string& name : kept) support::WriteText(folder / name, "");
+    zmctest::WriteText(folder / stale, "");
+    for (const std::string& name : kept) zmctest::WriteText(folder / name, "");
     builder.Build(source, target, Overwriting());
     const auto names = NamesIn(folder.String());
     EXPECT_THAT(names, testing::Not(testing::Contains(stale)));
@@ -197,18 +197,18 @@ TEST_F(BuildSafety, OnlyLeavingsOfDeadProcessesAreRemoved) {
 
 TEST_F(BuildSafety, FullDiskIsSeenBeforeTheBuild) {
     std::filesystem::create_directory(folder / "disk");
-    support::SmallDisk disk(folder / "disk", "size=2m");
+    zmctest::SmallDisk disk(folder / "disk", "size=2m");
     if (!disk.IsMounted()) GTEST_SKIP() << "mounting a small disk takes the superuser";
-    support::WriteText(folder / "disk/old.zmc", "the old file");
+    zmctest::WriteText(folder / "disk/old.zmc", "the old file");
     EXPECT_THAT(FailureOf(folder / "disk/old.zmc", Overwriting()),
                 testing::HasSubstr("of disk space"));
-    EXPECT_EQ(support::ReadText(folder / "disk/old.zmc"), "the old file");
+    EXPECT_EQ(zmctest::ReadText(folder / "disk/old.zmc"), "the old file");
     EXPECT_THAT(NamesIn(folder / "disk"), testing::ElementsAre("old.zmc"));
 }
 
 TEST_F(BuildSafety, DiskThatFillsUpMeanwhileDoesNotMatter) {
     std::filesystem::create_directory(folder / "disk");
-    support::SmallDisk disk(folder / "disk", "size=9m");
+    zmctest::SmallDisk disk(folder / "disk", "size=9m");
     if (!disk.IsMounted()) GTEST_SKIP() << "mounting a small disk takes the superuser";
     source.beforeRead = [&](const Window& window) {
         if (window.y == 256) disk.Fill();
@@ -220,7 +220,7 @@ TEST_F(BuildSafety, DiskThatFillsUpMeanwhileDoesNotMatter) {
 
 TEST_F(BuildSafety, ReadOnlyDiskIsRefused) {
     std::filesystem::create_directory(folder / "disk");
-    support::SmallDisk disk(folder / "disk", "size=9m");
+    zmctest::SmallDisk disk(folder / "disk", "size=9m");
     if (!disk.IsMounted()) GTEST_SKIP() << "mounting a small disk takes the superuser";
     ASSERT_TRUE(disk.MakeReadOnly());
     EXPECT_THAT(FailureOf(folder / "disk/new.zmc", {}), testing::HasSubstr("Read-only"));

@@ -19,9 +19,9 @@
 namespace zmchost {
 namespace {
 
-using support::MemorySource;
-using support::ScratchDirectory;
-using support::TestModule;
+using zmctest::MemorySource;
+using zmctest::ScratchDirectory;
+using zmctest::TestModule;
 
 constexpr Resampling kMethods[] = {Resampling::Nearest, Resampling::Average,  Resampling::Rms,
                                    Resampling::Mode,    Resampling::Minimum,  Resampling::Maximum,
@@ -44,7 +44,7 @@ void ExpectPyramidOf(const MemorySource<T>& source, const std::string& file, Res
     std::vector<T> expected = source.pixels;
     for (std::uint32_t level = 0; level <= raster.MaxLevel(); ++level) {
         if (level > 0)
-            expected = support::NaiveReduce(expected, raster.Width(level - 1),
+            expected = zmctest::NaiveReduce(expected, raster.Width(level - 1),
                                             raster.Height(level - 1), method, rules);
         const std::vector<T> stored =
             raster.Read<T>(level, {0, 0, raster.Width(level), raster.Height(level)});
@@ -201,7 +201,7 @@ TEST(PyramidBuilder, GivesTheSameFileOnAnyNumberOfThreads) {
         options.overwrite = true;
         options.resampling = Resampling::Cubic;
         builder.Build(source, folder / "a.zmc", options);
-        const std::string bytes = support::ReadText(folder / "a.zmc");
+        const std::string bytes = zmctest::ReadText(folder / "a.zmc");
         if (first.empty()) first = bytes;
         EXPECT_EQ(bytes == first, true) << threads;
     }

@@ -18,10 +18,10 @@
 namespace zmchost {
 namespace {
 
-using testsupport::AllocationFaults;
-using testsupport::FaultMode;
-using testsupport::FaultScope;
-using testsupport::ForEachAllocationFailing;
+using zmctest::AllocationFaults;
+using zmctest::FaultMode;
+using zmctest::FaultScope;
+using zmctest::ForEachAllocationFailing;
 
 // The result of `call`; none if there was no memory for it. Whatever else is thrown fails the test.
 template <class Call>
@@ -120,10 +120,10 @@ protected:
     using Record = zelm::RasterBandHistogram<unsigned char>;
 
     HistogramFaults() {
-        const support::MemorySource<unsigned char> source(20, 10, 2);
-        Raster raster = Raster::Create(support::TestModule(), file, source.props, 0);
+        const zmctest::MemorySource<unsigned char> source(20, 10, 2);
+        Raster raster = Raster::Create(zmctest::TestModule(), file, source.props, 0);
         raster.Write<unsigned char>(0, {0, 0, 20, 10}, std::vector<unsigned char>(400, 7));
-        before = support::ReadText(file);
+        before = zmctest::ReadText(file);
         for (std::uint32_t band = 0; band < 2; ++band) {
             Record record;
             record.band = band;
@@ -136,14 +136,14 @@ protected:
     // What a reader finds in the file, by band.
     std::vector<std::vector<std::uint64_t>> Stored() const {
         std::vector<std::vector<std::uint64_t>> lists;
-        const Raster raster = Raster::Open(support::TestModule(), file);
+        const Raster raster = Raster::Open(zmctest::TestModule(), file);
         for (const Record& record : raster.Histograms<unsigned char>())
             lists.emplace_back(record.counts.data,
                                record.counts.data + record.counts.shape.elements);
         return lists;
     }
 
-    const support::ScratchDirectory folder;
+    const zmctest::ScratchDirectory folder;
     const std::string file = folder / "a.zmc";
     std::string before;
     std::vector<Record> records;
@@ -158,8 +158,8 @@ TEST_F(HistogramFaults, CountsAreStoredOrTheCallFails) {
         bool reached = true;
         for (std::size_t n = 1; reached; n += mode == FaultMode::Once ? 1 : 7) {
             SCOPED_TRACE(n);
-            support::WriteText(file, before);
-            auto raster = std::make_optional(Raster::Open(support::TestModule(), file));
+            zmctest::WriteText(file, before);
+            auto raster = std::make_optional(Raster::Open(zmctest::TestModule(), file));
             bool told = false;
             AllocationFaults faults(n, mode, FaultScope::Process);
             try {

@@ -15,12 +15,12 @@
 namespace zmchost {
 namespace {
 
-using support::LenientHeader;
+using zmctest::LenientHeader;
 
 class LenientHeaders : public testing::TestWithParam<LenientHeader> {
 protected:
-    void SetUp() override { support::WriteText(file, GetParam().File()); }
-    support::ScratchDirectory folder;
+    void SetUp() override { zmctest::WriteText(file, GetParam().File()); }
+    zmctest::ScratchDirectory folder;
     const std::string file = folder / "a.pyr";
 };
 
@@ -35,7 +35,7 @@ TEST_P(LenientHeaders, SayTheSameToModuleAndHost) {
     EXPECT_EQ(header.pixelType, expected.pixelType);
     EXPECT_EQ(header.tileDataEnd - header.tileDataStart, expected.TileBytes());
 
-    const ModulePtr module = support::TestModule();
+    const ModulePtr module = zmctest::TestModule();
     const zelm::RasterDataConnectionPtr connection = module->OpenPyramid(file);
     ASSERT_TRUE(connection);
     const zelm::RasterReaderDispatchPtr reader = connection->GetReader();
@@ -55,7 +55,7 @@ TEST_P(LenientHeaders, SayTheSameToModuleAndHost) {
 
 TEST_P(LenientHeaders, GiveBuffersOfTheRightSize) {
     const LenientHeader& expected = GetParam();
-    Raster raster = Raster::Open(support::TestModule(), file);
+    Raster raster = Raster::Open(zmctest::TestModule(), file);
     const std::size_t bytes = std::size_t{expected.width} * expected.height *
                               LenientHeader::kBands * expected.sampleBytes;
     ASSERT_EQ(std::size_t{raster.Width()} * raster.Height() * raster.Bands() * raster.SampleSize(),
@@ -80,7 +80,7 @@ TEST_P(LenientHeaders, AreReadFromSources) {
     EXPECT_EQ(PyramidHeader::Parse("start", start, bytes.size()).tileDataEnd, bytes.size());
 }
 
-INSTANTIATE_TEST_SUITE_P(All, LenientHeaders, testing::ValuesIn(support::kLenientHeaders),
+INSTANTIATE_TEST_SUITE_P(All, LenientHeaders, testing::ValuesIn(zmctest::kLenientHeaders),
                          [](const auto& each) { return each.param.name; });
 
 }  // namespace

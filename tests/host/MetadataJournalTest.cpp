@@ -21,11 +21,11 @@
 namespace zmchost {
 namespace {
 
-using support::FailureOf;
+using zmctest::FailureOf;
 using Outcome = Recovery::Outcome;
-using testsupport::FileFault;
-using testsupport::FileFaultAction;
-using testsupport::FileFaults;
+using zmctest::FileFault;
+using zmctest::FileFaultAction;
+using zmctest::FileFaults;
 using Pixel = unsigned char;
 
 std::string Trimmed(std::string text) {
@@ -39,11 +39,11 @@ protected:
     MetadataJournalTest() {
         Make();
         Store(Open());
-        before = support::ReadText(file);
+        before = zmctest::ReadText(file);
     }
 
     void Make() {
-        const support::MemorySource<Pixel> source(20, 10, 1);
+        const zmctest::MemorySource<Pixel> source(20, 10, 1);
         Raster raster = Raster::Create(TestModule(), file, source.props, 0);
         raster.Write<Pixel>(0, {0, 0, 20, 10}, std::vector<Pixel>(200, 7));
         ASSERT_TRUE(raster.IsComplete());
@@ -51,7 +51,7 @@ protected:
     }
     // The module stays loaded, so that children find it ready.
     static ModulePtr TestModule() {
-        static const ModulePtr module = support::TestModule();
+        static const ModulePtr module = zmctest::TestModule();
         return module;
     }
     Raster Open() { return Raster::Open(TestModule(), file); }
@@ -64,7 +64,7 @@ protected:
         raster.SetHistograms<Pixel>({histogram});
     }
     static std::size_t Stores(const Raster& raster) { return raster.Histograms<Pixel>().size(); }
-    std::string Document() const { return support::ReadText(file).substr(front); }
+    std::string Document() const { return zmctest::ReadText(file).substr(front); }
 
     // What a store with a copy leaves when it is cut off at once.
     void LeaveCopy(const std::string& systemRun = platform::SystemRun()) {
@@ -74,10 +74,10 @@ protected:
             _exit(left ? 0 : 1);
         }
         waitpid(child, nullptr, 0);
-        auto record = JournalRecord::Decode(support::ReadText(copy));
+        auto record = JournalRecord::Decode(zmctest::ReadText(copy));
         ASSERT_TRUE(record);
         record->systemRun = systemRun;
-        support::WriteText(copy, record->Encode());
+        zmctest::WriteText(copy, record->Encode());
     }
 
     FileFault Fault(std::size_t n, FileFaultAction action, int error = EIO) const {
@@ -115,7 +115,7 @@ protected:
         return names;
     }
 
-    support::ScratchDirectory folder;
+    zmctest::ScratchDirectory folder;
     std::string file = folder / "a.pyr";
     std::string copy = folder / "a.pyr.zmcmeta";
     std::string before;
@@ -124,10 +124,10 @@ protected:
 
 TEST_F(MetadataJournalTest, AStoreWithACopyEndsLikeOneWithout) {
     Store(Open());
-    const std::string plain = support::ReadText(file);
-    support::WriteText(file, before);
+    const std::string plain = zmctest::ReadText(file);
+    zmctest::WriteText(file, before);
     Store(Open(), true);
-    EXPECT_EQ(support::ReadText(file), plain);
+    EXPECT_EQ(zmctest::ReadText(file), plain);
     EXPECT_THAT(Names(), testing::ElementsAre("a.pyr"));
     EXPECT_EQ(Open().RecoveryNote(), "");
 }
@@ -136,14 +136,14 @@ TEST_F(MetadataJournalTest, AllThreeStoresKeepCopies) {
     Raster raster = Open();
     raster.KeepCopies(true);
     FileFault fault = Fault(1, FileFaultAction::Error);
-    fault.calls = testsupport::kSyncCall;
+    fault.calls = zmctest::kSyncCall;
     zelm::RasterBandStats<Pixel> stats;
     const FileFaults faults(fault);
     const auto expect = testing::HasSubstr("cannot keep a copy of its metadata document");
     EXPECT_THAT(FailureOf([&] { raster.SetStatistics<Pixel>({stats}); }), expect);
     const FileFaults* const kept = &faults;
     EXPECT_EQ(kept->Failed(), 1u);
-    EXPECT_EQ(support::ReadText(file), before);
+    EXPECT_EQ(zmctest::ReadText(file), before);
     EXPECT_THAT(Names(), testing::ElementsAre("a.pyr"));
 }
 
@@ -163,18 +163,18 @@ TEST_F(MetadataJournalTest, PalettesAndStatisticsGoThrough) {
 
 TEST_F(MetadataJournalTest, KilledAtEveryCallItIsOldOrNew) {
     Store(Open());
-    const std::string after = support::ReadText(file);
+    const std::string after = zmctest::ReadText(file);
     for (const auto how : {FileFaultAction::Kill, FileFaultAction::KillPartway}) {
         std::size_t n = 1, restored = 0;
         for (;; ++n) {
             SCOPED_TRACE(n);
-            support::WriteText(file, before);
+            zmctest::WriteText(file, before);
             if (!KilledAt(n, how, [&] { Store(Open(), true); })) break;
-            EXPECT_EQ(support::ReadText(file).substr(0, front), before.substr(0, front));
+            EXPECT_EQ(zmctest::ReadText(file).substr(0, front), before.substr(0, front));
             const Raster raster = Open();
             const std::size_t stores = Stores(raster);
             restored += raster.RecoveryNote().find("again the one of before") != std::string::npos;
-            EXPECT_EQ(Trimmed(support::ReadText(file)), Trimmed(stores == 1 ? before : after));
+            EXPECT_EQ(Trimmed(zmctest::ReadText(file)), Trimmed(stores == 1 ? before : after));
             EXPECT_FALSE(std::filesystem::exists(copy));
         }
         EXPECT_GT(n, 20u);
@@ -186,11 +186,11 @@ TEST_F(MetadataJournalTest, KilledAtEveryCallItIsOldOrNew) {
 
 TEST_F(MetadataJournalTest, KilledAtEveryCallOfTheFirstStore) {
     std::filesystem::resize_file(file, front);
-    before = support::ReadText(file);
+    before = zmctest::ReadText(file);
     std::size_t n = 1;
     for (;; ++n) {
         SCOPED_TRACE(n);
-        support::WriteText(file, before);
+        zmctest::WriteText(file, before);
         if (!KilledAt(n, FileFaultAction::KillPartway, [&] { Store(Open(), true); })) break;
         const std::size_t stores = Stores(Open());
         EXPECT_EQ(JudgeMetadata(file, PyramidHeader::Read(file)), "");
@@ -214,7 +214,7 @@ TEST_F(MetadataJournalTest, EveryCallThatFailsIsToldOrMakesNoDifference) {
         std::size_t n = 1;
         for (bool reached = true; reached; ++n) {
             SCOPED_TRACE(n);
-            support::WriteText(file, before);
+            zmctest::WriteText(file, before);
             Raster raster = Open();
             std::string failure;
             {
@@ -237,10 +237,10 @@ TEST_F(MetadataJournalTest, EveryCallThatFailsIsToldOrMakesNoDifference) {
 TEST_F(MetadataJournalTest, DamagedDocumentIsPutBack) {
     for (const std::string& rest : {std::string(), std::string(500, 'x'), std::string("\n")}) {
         LeaveCopy();
-        support::WriteText(file, before.substr(0, front) + "\x1A" + rest);
+        zmctest::WriteText(file, before.substr(0, front) + "\x1A" + rest);
         const Raster raster = Open();
         EXPECT_THAT(raster.RecoveryNote(), testing::HasSubstr("again the one of before"));
-        EXPECT_EQ(support::ReadText(file), before);
+        EXPECT_EQ(zmctest::ReadText(file), before);
         EXPECT_THAT(Names(), testing::ElementsAre("a.pyr"));
     }
 }
@@ -249,12 +249,12 @@ TEST_F(MetadataJournalTest, RecoveryThatIsKilledIsRepeated) {
     for (const auto how : {FileFaultAction::Kill, FileFaultAction::KillPartway})
         for (std::size_t n = 1;; ++n) {
             SCOPED_TRACE(n);
-            support::WriteText(file, before);
+            zmctest::WriteText(file, before);
             LeaveCopy();
-            support::WriteText(file, before.substr(0, front) + "\x1A" + std::string(700, 'x'));
+            zmctest::WriteText(file, before.substr(0, front) + "\x1A" + std::string(700, 'x'));
             const bool killed = KilledAt(n, how, [&] { RecoverMetadata(file); });
             RecoverMetadata(file);
-            EXPECT_EQ(support::ReadText(file), before);
+            EXPECT_EQ(zmctest::ReadText(file), before);
             EXPECT_THAT(Names(), testing::ElementsAre("a.pyr"));
             if (!killed) break;
         }
@@ -264,9 +264,9 @@ TEST_F(MetadataJournalTest, RecoveryThatFailsIsTold) {
     bool reached = true;
     for (std::size_t n = 1; reached; ++n) {
         SCOPED_TRACE(n);
-        support::WriteText(file, before);
+        zmctest::WriteText(file, before);
         LeaveCopy();
-        support::WriteText(file, before.substr(0, front) + "\x1A" + std::string(700, 'x'));
+        zmctest::WriteText(file, before.substr(0, front) + "\x1A" + std::string(700, 'x'));
         Recovery recovery;
         {
             const FileFaults faults(Fault(n, FileFaultAction::Error));
@@ -275,34 +275,34 @@ TEST_F(MetadataJournalTest, RecoveryThatFailsIsTold) {
         }
         EXPECT_EQ(recovery.text.empty(), recovery.outcome == Outcome::Nothing);
         RecoverMetadata(file);
-        EXPECT_EQ(support::ReadText(file), before);
+        EXPECT_EQ(zmctest::ReadText(file), before);
     }
 }
 
 // After a power failure a document may be well-formed and a mixture all the same.
 TEST_F(MetadataJournalTest, AfterANewStartOfTheSystemOnlyTheOldTextIsBelieved) {
     Store(Open());
-    const std::string after = support::ReadText(file);
-    support::WriteText(file, before);
+    const std::string after = zmctest::ReadText(file);
+    zmctest::WriteText(file, before);
     LeaveCopy("another start");
-    support::WriteText(file, after);
+    zmctest::WriteText(file, after);
     EXPECT_EQ(RecoverMetadata(file).outcome, Outcome::Restored);
-    EXPECT_EQ(support::ReadText(file), before);
+    EXPECT_EQ(zmctest::ReadText(file), before);
 
     LeaveCopy("another start");
-    support::WriteText(file, before + "\n\n");
+    zmctest::WriteText(file, before + "\n\n");
     EXPECT_EQ(RecoverMetadata(file).outcome, Outcome::Complete) << "the file had grown, no more";
-    EXPECT_EQ(support::ReadText(file), before + "\n\n");
+    EXPECT_EQ(zmctest::ReadText(file), before + "\n\n");
     EXPECT_EQ(RecoverMetadata(file).outcome, Outcome::Nothing);
 }
 
 TEST_F(MetadataJournalTest, InOneRunOfTheSystemAWholeDocumentIsBelieved) {
     if (platform::SystemRun().empty()) GTEST_SKIP() << "the system does not tell its runs";
     Store(Open());
-    const std::string after = support::ReadText(file);
-    support::WriteText(file, before);
+    const std::string after = zmctest::ReadText(file);
+    zmctest::WriteText(file, before);
     LeaveCopy();
-    support::WriteText(file, after);
+    zmctest::WriteText(file, after);
     const Raster raster = Open();
     EXPECT_THAT(raster.RecoveryNote(), testing::HasSubstr("is whole"));
     EXPECT_EQ(Stores(raster), 2u);
@@ -312,9 +312,9 @@ TEST_F(MetadataJournalTest, InOneRunOfTheSystemAWholeDocumentIsBelieved) {
 TEST_F(MetadataJournalTest, FileWithoutADocumentGetsItsEndBack) {
     std::filesystem::resize_file(file, front);
     LeaveCopy();
-    support::WriteText(file, before.substr(0, front) + "\x1A<DATA");
+    zmctest::WriteText(file, before.substr(0, front) + "\x1A<DATA");
     EXPECT_EQ(RecoverMetadata(file).outcome, Outcome::Restored);
-    EXPECT_EQ(support::ReadText(file), before.substr(0, front));
+    EXPECT_EQ(zmctest::ReadText(file), before.substr(0, front));
 }
 
 TEST_F(MetadataJournalTest, UnfinishedFileKeepsTheTilesThatItGotSince) {
@@ -328,7 +328,7 @@ TEST_F(MetadataJournalTest, UnfinishedFileKeepsTheTilesThatItGotSince) {
         stream->WriteAt(front, "\x1A", 1);
         EXPECT_EQ(RecoverMetadata(file).outcome, Outcome::Restored);
         EXPECT_EQ(std::filesystem::file_size(file), tiles ? front : end);
-        EXPECT_EQ(support::ReadText(file).substr(end, 5) == "tiles", tiles);
+        EXPECT_EQ(zmctest::ReadText(file).substr(end, 5) == "tiles", tiles);
     }
 }
 
@@ -336,15 +336,15 @@ TEST_F(MetadataJournalTest, UnfinishedFileKeepsTheTilesThatItGotSince) {
 
 TEST_F(MetadataJournalTest, TornCopyIsNeverUsed) {
     LeaveCopy();
-    const std::string whole = support::ReadText(copy);
+    const std::string whole = zmctest::ReadText(copy);
     const std::string damaged = before.substr(0, front) + "\x1A";
-    support::WriteText(file, damaged);
+    zmctest::WriteText(file, damaged);
     const auto expectUnused = [&](const std::string& bytes) {
-        support::WriteText(copy, bytes);
+        zmctest::WriteText(copy, bytes);
         const Recovery recovery = RecoverMetadata(file);
         ASSERT_EQ(recovery.outcome, Outcome::Unusable);
         ASSERT_THAT(recovery.text, testing::HasSubstr("it is torn"));
-        ASSERT_EQ(support::ReadText(file), damaged);
+        ASSERT_EQ(zmctest::ReadText(file), damaged);
     };
     for (std::size_t size = 0; size < whole.size(); ++size) expectUnused(whole.substr(0, size));
     for (std::size_t at = 0; at < whole.size(); ++at) {
@@ -364,22 +364,22 @@ TEST_F(MetadataJournalTest, CopyOfAnotherFileIsNeverUsed) {
         const Recovery recovery = RecoverMetadata(file);
         EXPECT_EQ(recovery.outcome, Outcome::Unusable);
         EXPECT_THAT(recovery.text, testing::HasSubstr(why));
-        EXPECT_EQ(support::ReadText(file), damaged);
+        EXPECT_EQ(zmctest::ReadText(file), damaged);
     };
     // Another file under its name, of the same shape; the old one lives, so that its number does.
     std::filesystem::rename(file, folder / "old.pyr");
-    support::WriteText(file, damaged);
+    zmctest::WriteText(file, damaged);
     expectUnused("of another file");
     std::filesystem::rename(folder / "old.pyr", file);
-    auto record = JournalRecord::Decode(support::ReadText(copy));
+    auto record = JournalRecord::Decode(zmctest::ReadText(copy));
     for (std::uint64_t* number : {&record->offset, &record->frontSum, &record->frontSize}) {
-        support::WriteText(file, damaged);
+        zmctest::WriteText(file, damaged);
         *number += 1;
-        support::WriteText(copy, record->Encode());
+        zmctest::WriteText(copy, record->Encode());
         expectUnused("of another file");
         *number -= 1;
     }
-    support::WriteText(copy, record->Encode());
+    zmctest::WriteText(copy, record->Encode());
     std::filesystem::resize_file(file, front - 1);
     EXPECT_THAT(RecoverMetadata(file).text, testing::HasSubstr("has lost tiles"));
 }
@@ -394,21 +394,21 @@ TEST_F(MetadataJournalTest, StoreUnderWayIsLeftAlone) {
     const std::string damaged = before.substr(0, front) + "\x1A";
     {
         const MetadataJournal held(file);
-        support::WriteText(file, damaged);
+        zmctest::WriteText(file, damaged);
         EXPECT_EQ(RecoverMetadata(file).outcome, Outcome::UnderWay);
-        EXPECT_EQ(support::ReadText(file), damaged);
+        EXPECT_EQ(zmctest::ReadText(file), damaged);
         EXPECT_THAT(FailureOf([&] { const MetadataJournal second(file); }),
                     testing::HasSubstr("another process is storing"));
         EXPECT_THAT(FailureOf([&] { DiscardMetadata(file); }),
                     testing::HasSubstr("another process is storing"));
         EXPECT_EQ(Open().RecoveryNote(), "");
     }
-    EXPECT_EQ(support::ReadText(file), before) << "it never finished";
+    EXPECT_EQ(zmctest::ReadText(file), before) << "it never finished";
     EXPECT_THAT(Names(), testing::ElementsAre("a.pyr"));
 }
 
 TEST_F(MetadataJournalTest, DamagedDocumentIsNotCopied) {
-    support::WriteText(file, before.substr(0, front) + "\x1A");
+    zmctest::WriteText(file, before.substr(0, front) + "\x1A");
     EXPECT_THAT(FailureOf([&] { const MetadataJournal none(file); }),
                 testing::HasSubstr("a store did not end"));
     EXPECT_THAT(Names(), testing::ElementsAre("a.pyr"));
@@ -430,23 +430,23 @@ TEST_F(MetadataJournalTest, NamesThatAreLongOrLinksHaveCopiesToo) {
 // --- discarding ---
 
 TEST_F(MetadataJournalTest, DiscardingMakesRoomForNewStatistics) {
-    support::WriteText(file, before.substr(0, front) + "\x1A<DATASET/>");
+    zmctest::WriteText(file, before.substr(0, front) + "\x1A<DATASET/>");
     EXPECT_THAT(FailureOf([&] { Store(Open()); }), testing::HasSubstr("did not store them"));
     DiscardMetadata(file);
-    EXPECT_EQ(support::ReadText(file), before.substr(0, front));
+    EXPECT_EQ(zmctest::ReadText(file), before.substr(0, front));
     Store(Open());
-    EXPECT_EQ(support::ReadText(file), before);
+    EXPECT_EQ(zmctest::ReadText(file), before);
 }
 
 TEST_F(MetadataJournalTest, WhatIsGoodIsNotDiscarded) {
     EXPECT_THAT(FailureOf([&] { DiscardMetadata(file); }), testing::HasSubstr("not damaged"));
     LeaveCopy();
-    support::WriteText(file, before.substr(0, front) + "\x1A");
+    zmctest::WriteText(file, before.substr(0, front) + "\x1A");
     EXPECT_THAT(FailureOf([&] { DiscardMetadata(file); }),
                 testing::HasSubstr("which can be put back"));
-    support::WriteText(copy, "torn");
+    zmctest::WriteText(copy, "torn");
     DiscardMetadata(file);
-    EXPECT_EQ(support::ReadText(file), before.substr(0, front));
+    EXPECT_EQ(zmctest::ReadText(file), before.substr(0, front));
     EXPECT_THAT(Names(), testing::ElementsAre("a.pyr"));
 }
 

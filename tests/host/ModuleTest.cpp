@@ -30,8 +30,8 @@ TEST(Module, FailuresNameTheFileAndTheReason) {
     EXPECT_THAT(FailureOf("/no/such/module.so"),
                 testing::AllOf(testing::HasSubstr("/no/such/module.so"),
                                testing::HasSubstr("no such file")));
-    const support::ScratchDirectory folder;
-    support::WriteText(folder / "text.so", "no library");
+    const zmctest::ScratchDirectory folder;
+    zmctest::WriteText(folder / "text.so", "no library");
     EXPECT_THAT(FailureOf(folder / "text.so"), testing::HasSubstr("no loadable library"));
     EXPECT_THAT(FailureOf("libtbb.so.12"), testing::HasSubstr("its two functions are not in it"));
 }
@@ -45,9 +45,9 @@ TEST(Module, EnvironmentNamesTheDefault) {
 }
 
 TEST(Module, StaysLoadedAsLongAsRastersLive) {
-    support::MemorySource<short> source(4, 3, 1);
+    zmctest::MemorySource<short> source(4, 3, 1);
     source.FillWithNoise(1);
-    ModulePtr module = support::TestModule();
+    ModulePtr module = zmctest::TestModule();
     Raster raster = Raster::OfMemory(module, source.pixels.data(), source.props);
     module.reset();
     EXPECT_EQ(raster.Read<short>(0, {0, 0, 4, 3}), source.pixels);
@@ -59,14 +59,14 @@ TEST(Module, LoadsAndUnloadsOnManyThreads) {
         threads.emplace_back([] {
             for (int round = 0; round < 20; ++round) {
                 InitialiseXerces();
-                support::TestModule();
+                zmctest::TestModule();
             }
         });
     for (std::thread& thread : threads) thread.join();
 }
 
 TEST(Module, RefusedConnectionsAreEmpty) {
-    const ModulePtr module = support::TestModule();
+    const ModulePtr module = zmctest::TestModule();
     EXPECT_FALSE(module->OpenPyramid("/no/such/file.zmc"));
     EXPECT_FALSE(module->OpenMemoryRaster("SAMPLES=1"));
 }

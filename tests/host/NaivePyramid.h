@@ -9,7 +9,7 @@
 #include "host/raster/NoData.h"
 #include "host/reduce/Reduction.h"
 
-namespace support {
+namespace zmctest {
 
 template <class T>
 std::vector<unsigned char> NaiveMask(const std::vector<T>& pixels,
@@ -47,6 +47,6 @@ std::vector<T> NaiveReduce(const std::vector<T>& fine, std::uint32_t width, std:
     return coarse;
 }
 
-}  // namespace support
+}  // namespace zmctest
 
 #endif

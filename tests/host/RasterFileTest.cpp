@@ -22,23 +22,23 @@
 namespace zmchost {
 namespace {
 
-using support::FailureOf;
-using support::FaultySource;
-using support::SourceFault;
-using support::TestModule;
 using testing::HasSubstr;
-using testsupport::FileFaultAction;
-using testsupport::FileFaults;
 using zelm::files::ByteSource;
 using zelm::files::FileSource;
 using zelm::files::OpenMode;
+using zmctest::FailureOf;
+using zmctest::FaultySource;
+using zmctest::FileFaultAction;
+using zmctest::FileFaults;
+using zmctest::SourceFault;
+using zmctest::TestModule;
 using Pixel = unsigned char;
 
 class RasterFileTest : public testing::Test {
 protected:
     // A complete file of one level whose samples all have that value.
     void Make(const std::string& name, std::uint32_t side, Pixel value, std::uint32_t bands = 1) {
-        const support::MemorySource<Pixel> source(side, side, bands);
+        const zmctest::MemorySource<Pixel> source(side, side, bands);
         Raster raster = Raster::Create(TestModule(), name, source.props, 0);
         raster.Write<Pixel>(0, {0, 0, side, side},
                             std::vector<Pixel>(std::size_t{side} * side * bands, value));
@@ -60,7 +60,7 @@ protected:
         return std::make_shared<FaultySource>(FileSource::Open(file.c_str(), mode));
     }
 
-    support::ScratchDirectory folder;
+    zmctest::ScratchDirectory folder;
     const std::string file = folder / "a.pyr";
 };
 
@@ -97,14 +97,14 @@ TEST_F(RasterFileTest, WritesNothingOnceAnotherFileHasItsName) {
     Make(folder / "other", 20, 2);
     Raster raster = Raster::Open(TestModule(), file);
     std::filesystem::rename(folder / "other", file);
-    const std::string other = support::ReadText(file);
+    const std::string other = zmctest::ReadText(file);
     const auto refusal = HasSubstr("another file has taken its name");
     EXPECT_THAT(FailureOf([&] { raster.Write<Pixel>(0, {0, 0, 1, 1}, {9}); }), refusal);
     EXPECT_THAT(FailureOf([&] { raster.SetStatistics<Pixel>({Mean(1)}); }), refusal);
     EXPECT_THAT(FailureOf([&] { raster.SetHistograms<Pixel>({}); }), refusal);
     EXPECT_THAT(FailureOf([&] { raster.SetBandPalette(0, zelm::Palette()); }), refusal);
     EXPECT_THAT(FailureOf([&] { raster.Store([] { FAIL(); }); }), refusal);
-    EXPECT_EQ(support::ReadText(file), other);
+    EXPECT_EQ(zmctest::ReadText(file), other);
     EXPECT_EQ(SumOf(raster, {0, 0, 20, 20}), 400u);
 }
 
@@ -152,18 +152,18 @@ TEST_F(RasterFileTest, NameThatLooksLentIsThatOfAFile) {
 }
 
 TEST_F(RasterFileTest, NewFileThatIsRefusedGoesAgainAndAnOldOneStays) {
-    zelm::RasterProps props = support::MemorySource<Pixel>(20, 10, 1).props;
+    zelm::RasterProps props = zmctest::MemorySource<Pixel>(20, 10, 1).props;
     props.bands = 2000000000;
     EXPECT_NE(FailureOf([&] { Raster::Create(TestModule(), file, props, 0); }), "no failure");
     EXPECT_FALSE(std::filesystem::exists(file));
-    support::WriteText(file, "text");
+    zmctest::WriteText(file, "text");
     EXPECT_NE(FailureOf([&] { Raster::Create(TestModule(), file, props, 0); }), "no failure");
-    EXPECT_EQ(support::ReadText(file), "text");
+    EXPECT_EQ(zmctest::ReadText(file), "text");
 }
 
 TEST_F(RasterFileTest, OpensASourceOfTheCaller) {
     Make(file, 20, 3);
-    const std::string text = support::ReadText(file);
+    const std::string text = zmctest::ReadText(file);
     const auto source = std::make_shared<zelm::files::MemorySource>(
         zelm::files::MemorySource::Bytes(text.begin(), text.end()));
     std::filesystem::remove(file);
@@ -188,7 +188,7 @@ TEST_F(RasterFileTest, OpensASourceOfTheCaller) {
 TEST_F(RasterFileTest, FailuresToldByTheDiskAreThrownWithTheirReason) {
     Make(file, 20, 1);
     Raster raster = Raster::Open(TestModule(), file);
-    const std::string before = support::ReadText(file);
+    const std::string before = zmctest::ReadText(file);
     zelm::Palette palette;
     palette.AddColor(zelm::Color());
     const auto failure = [&](unsigned calls, int error, auto&& action) {
@@ -199,35 +199,35 @@ TEST_F(RasterFileTest, FailuresToldByTheDiskAreThrownWithTheirReason) {
         return told;
     };
     const std::string front = file + ": cannot ";
-    EXPECT_THAT(failure(testsupport::kReadCall, EIO,
+    EXPECT_THAT(failure(zmctest::kReadCall, EIO,
                         [&] {
                             SumOf(raster, {0, 0, 20, 20});
                         }),
                 testing::MatchesRegex(front + "read 20 x 20 pixels at \\(0, 0\\): Input/output "
                                               "error \\(reading 400 bytes at offset [0-9]+\\)"));
-    EXPECT_THAT(failure(testsupport::kStatusCall, EIO,
+    EXPECT_THAT(failure(zmctest::kStatusCall, EIO,
                         [&] {
                             SumOf(raster, {0, 0, 20, 20});
                         }),
                 HasSubstr("Input/output error (asking for its size)"));
     const auto full = HasSubstr("No space left on device (writing ");
-    EXPECT_THAT(failure(testsupport::kWriteCall, ENOSPC,
+    EXPECT_THAT(failure(zmctest::kWriteCall, ENOSPC,
                         [&] {
                             raster.Write<Pixel>(0, {0, 0, 20, 20}, std::vector<Pixel>(400, 9));
                         }),
                 full);
-    EXPECT_THAT(failure(testsupport::kReadCall, EIO,
+    EXPECT_THAT(failure(zmctest::kReadCall, EIO,
                         [&] {
                             raster.Write<Pixel>(0, {0, 0, 1, 1}, {9});
                         }),
                 HasSubstr("Input/output error (reading "));
     const auto store = [&](auto&& action) {
-        EXPECT_THAT(failure(testsupport::kWriteCall, ENOSPC, action), full);
+        EXPECT_THAT(failure(zmctest::kWriteCall, ENOSPC, action), full);
     };
     store([&] { raster.SetStatistics<Pixel>({Mean(7)}); });
     store([&] { raster.SetHistograms<Pixel>({{}}); });
     store([&] { raster.SetBandPalette(0, palette); });
-    EXPECT_EQ(support::ReadText(file), before);
+    EXPECT_EQ(zmctest::ReadText(file), before);
     EXPECT_EQ(SumOf(raster, {0, 0, 20, 20}), 400u) << "goes on, once the disk does";
 }
 
@@ -257,9 +257,9 @@ TEST_F(RasterFileTest, RecordsThatCannotBeReadAreNotSaidToBeMissing) {
 TEST_F(RasterFileTest, EndThatIsNoneIsAFailure) {
     Make(file, 20, 1);
     Raster raster = Raster::Open(TestModule(), file);
-    const std::string before = support::ReadText(file);
+    const std::string before = zmctest::ReadText(file);
     for (const bool write : {false, true}) {
-        FileFaults faults = Fail(testsupport::kReadCall, FileFaultAction::Nothing, 0);
+        FileFaults faults = Fail(zmctest::kReadCall, FileFaultAction::Nothing, 0);
         EXPECT_THAT(FailureOf([&] {
                         if (write)
                             raster.Write<Pixel>(0, {0, 0, 1, 1}, {9});
@@ -269,14 +269,14 @@ TEST_F(RasterFileTest, EndThatIsNoneIsAFailure) {
                     HasSubstr("less was read than is there (reading "));
         faults.Disarm();
     }
-    EXPECT_EQ(support::ReadText(file), before);
+    EXPECT_EQ(zmctest::ReadText(file), before);
 }
 
 // --- sources that misbehave ---
 
 TEST_F(RasterFileTest, SourcesThatMisbehaveAreToldOrGotOver) {
     Make(file, 300, 1);
-    const auto before = support::ReadText(file);
+    const auto before = zmctest::ReadText(file);
     for (const SourceFault fault :
          {SourceFault::Fails, SourceFault::FailsPartway, SourceFault::AnswersShort,
           SourceFault::AnswersNothing, SourceFault::AnswersTooMuch, SourceFault::RunsOutOfMemory,
@@ -294,7 +294,7 @@ TEST_F(RasterFileTest, SourcesThatMisbehaveAreToldOrGotOver) {
             if (source->Transfers() < n) break;
             EXPECT_TRUE(failure != "no failure" || sum == 90000u)
                 << static_cast<int>(fault) << ' ' << n;
-            EXPECT_EQ(support::ReadText(file), before) << "ones were written over ones";
+            EXPECT_EQ(zmctest::ReadText(file), before) << "ones were written over ones";
         }
     }
 }

@@ -19,9 +19,9 @@
 namespace zmchost {
 namespace {
 
-using support::MemorySource;
-using support::ScratchDirectory;
-using support::TestModule;
+using zmctest::MemorySource;
+using zmctest::ScratchDirectory;
+using zmctest::TestModule;
 
 template <class Action>
 std::string FailureOf(Action&& action) {
@@ -51,15 +51,15 @@ TEST(Raster, OpeningTellsWhatIsWrong) {
     };
     EXPECT_THAT(open(folder / "missing.zmc"), testing::HasSubstr("there is no such file"));
     EXPECT_THAT(open(folder.String()), testing::HasSubstr("it is not a file"));
-    support::WriteText(folder / "short", "KOBT");
+    zmctest::WriteText(folder / "short", "KOBT");
     EXPECT_THAT(open(folder / "short"), testing::HasSubstr("it is no pyramid file"));
-    support::WriteText(folder / "text", std::string(100, 'x'));
+    zmctest::WriteText(folder / "text", std::string(100, 'x'));
     EXPECT_THAT(open(folder / "text"), testing::HasSubstr("it is no pyramid file"));
-    support::WriteText(folder / "zero", "KOBT" + std::string(96, '\0'));
+    zmctest::WriteText(folder / "zero", "KOBT" + std::string(96, '\0'));
     EXPECT_THAT(open(folder / "zero"), testing::HasSubstr("header is damaged"));
     std::string hostile = "KOBT" + std::string(16, '\0') + "<!DOCTYPE x [<!ENTITY a 'b'>]><x/>";
     hostile[4] = static_cast<char>(hostile.size());
-    support::WriteText(folder / "hostile", hostile);
+    zmctest::WriteText(folder / "hostile", hostile);
     EXPECT_THAT(open(folder / "hostile"), testing::HasSubstr("cannot read the header"));
 }
 

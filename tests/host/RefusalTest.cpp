@@ -18,12 +18,12 @@
 namespace zmchost {
 namespace {
 
-using support::FailureOf;
-using support::MemorySource;
-using support::TestModule;
 using testing::HasSubstr;
-using testsupport::FileFault;
-using testsupport::FileFaults;
+using zmctest::FailureOf;
+using zmctest::FileFault;
+using zmctest::FileFaults;
+using zmctest::MemorySource;
+using zmctest::TestModule;
 using Pixel = unsigned char;
 
 class HostRefusal : public testing::Test {
@@ -59,7 +59,7 @@ protected:
         return stats;
     }
 
-    support::ScratchDirectory folder;
+    zmctest::ScratchDirectory folder;
     const std::string file = folder / "a.pyr";
 };
 
@@ -70,26 +70,26 @@ TEST_F(HostRefusal, FilesThatCannotBeMade) {
     };
     EXPECT_THAT(create(folder.String()), HasSubstr("it is not a file"));
     EXPECT_THAT(create(folder / "no/such.pyr"), HasSubstr("such.pyr"));
-    support::WriteText(file, "text");
+    zmctest::WriteText(file, "text");
     ASSERT_EQ(chmod(file.c_str(), 0444), 0);
     EXPECT_THAT(create(file), HasSubstr("the file is read-only"));
-    EXPECT_EQ(support::ReadText(file), "text");
+    EXPECT_EQ(zmctest::ReadText(file), "text");
     ASSERT_EQ(chmod(file.c_str(), 0644), 0);
     // Nothing is laid out beyond the levels of the format.
     EXPECT_THAT(create(file, 1024), HasSubstr("it is no pyramid file"));
-    EXPECT_EQ(support::ReadText(file), "text");
+    EXPECT_EQ(zmctest::ReadText(file), "text");
     EXPECT_EQ(create(file, 1023), "no failure");
 }
 
 TEST_F(HostRefusal, OlderFilesAreNotTakenForNewOnes) {
     Make();
-    const std::string before = support::ReadText(file);
+    const std::string before = zmctest::ReadText(file);
     const zelm::RasterProps props = MemorySource<Pixel>(21, 10, 1).props;
-    for (const unsigned calls : {testsupport::kOpenCall, testsupport::kResizeCall}) {
+    for (const unsigned calls : {zmctest::kOpenCall, zmctest::kResizeCall}) {
         EXPECT_THAT(FailureWith(
                         calls, [&] { Raster::Create(TestModule(), file, props, 0); }, false),
                     HasSubstr("Input/output error"));
-        EXPECT_EQ(support::ReadText(file), before);
+        EXPECT_EQ(zmctest::ReadText(file), before);
     }
     // What the module does not lay out at all.
     const auto create = [&](std::uint32_t bands, std::uint32_t level) {
@@ -98,7 +98,7 @@ TEST_F(HostRefusal, OlderFilesAreNotTakenForNewOnes) {
         return FailureOf([&] { Raster::Create(TestModule(), file, large, level); });
     };
     EXPECT_THAT(create(2000000000, 0), HasSubstr("an older file stands in its place"));
-    EXPECT_EQ(support::ReadText(file), before);
+    EXPECT_EQ(zmctest::ReadText(file), before);
 }
 
 TEST_F(HostRefusal, MemoryThatIsNoRaster) {
@@ -137,10 +137,10 @@ TEST_F(HostRefusal, MemoryRastersTakePartsAndNothing) {
 }
 
 TEST_F(HostRefusal, LevelsBelowTheFirst) {
-    zelm::test::HeaderText header;
+    zmctest::HeaderText header;
     header.levelMin = 1;
     header.levelMax = 2;
-    support::WriteText(file, header.File());
+    zmctest::WriteText(file, header.File());
     Raster raster = Raster::Open(TestModule(), file);
     EXPECT_EQ(raster.Width(1), 5U);
     EXPECT_THAT(FailureOf([&] { raster.Width(0); }), HasSubstr("it has the levels 1 to 2"));
@@ -150,7 +150,7 @@ TEST_F(HostRefusal, LevelsBelowTheFirst) {
 
 TEST_F(HostRefusal, ADiskThatDoesNotRead) {
     Raster raster = Make();
-    EXPECT_THAT(FailureWith(testsupport::kReadCall,
+    EXPECT_THAT(FailureWith(zmctest::kReadCall,
                             [&] {
                                 raster.Read<Pixel>(0, {0, 0, 20, 10});
                             }),
@@ -160,10 +160,8 @@ TEST_F(HostRefusal, ADiskThatDoesNotRead) {
 
 TEST_F(HostRefusal, ADiskThatTakesNothing) {
     Raster raster = Make();
-    const auto failure = [&](auto&& action) {
-        return FailureWith(testsupport::kWriteCall, action);
-    };
-    const std::string before = support::ReadText(file);
+    const auto failure = [&](auto&& action) { return FailureWith(zmctest::kWriteCall, action); };
+    const std::string before = zmctest::ReadText(file);
     EXPECT_THAT(failure([&] {
                     raster.Write<Pixel>(0, {0, 0, 20, 10}, std::vector<Pixel>(200, 9));
                 }),
@@ -180,7 +178,7 @@ TEST_F(HostRefusal, ADiskThatTakesNothing) {
     palette.AddColor(zelm::Color());
     EXPECT_THAT(failure([&] { raster.SetBandPalette(0, palette); }),
                 HasSubstr("Input/output error (writing "));
-    EXPECT_EQ(support::ReadText(file), before);
+    EXPECT_EQ(zmctest::ReadText(file), before);
     EXPECT_FALSE(raster.BandPalette(0));
 }
 
@@ -205,13 +203,13 @@ TEST_F(HostRefusal, RecordsInAnyOrder) {
         return "<BANDSTATISTICS><RSTC_BAND>" + std::to_string(band) + "</RSTC_BAND><RSTC_MEAN>" +
                std::to_string(mean) + "</RSTC_MEAN></BANDSTATISTICS>";
     };
-    const std::string front = support::ReadText(file);
-    support::WriteText(file, front + "<DATASET>" + record(1, 10) + record(0, 20) + "</DATASET>");
+    const std::string front = zmctest::ReadText(file);
+    zmctest::WriteText(file, front + "<DATASET>" + record(1, 10) + record(0, 20) + "</DATASET>");
     Raster raster = Raster::Open(TestModule(), file);
     EXPECT_EQ(raster.Statistics<Pixel>(0).mean, 20);
     EXPECT_EQ(raster.Statistics<Pixel>(1).mean, 10);
     // A record that stands behind those of as many places as there are bands is not found.
-    support::WriteText(
+    zmctest::WriteText(
         file, front + "<DATASET>" + record(1, 10) + record(1, 11) + record(0, 20) + "</DATASET>");
     Raster other = Raster::Open(TestModule(), file);
     EXPECT_THAT(FailureOf([&] { other.Statistics<Pixel>(0); }), HasSubstr("does not find"));
@@ -256,18 +254,18 @@ TEST_F(HostRefusal, PalettesOfComplexPixels) {
 
 TEST_F(HostRefusal, DisksThatFailABuild) {
     Make();
-    const std::string before = support::ReadText(file);
+    const std::string before = zmctest::ReadText(file);
     MemorySource<Pixel> source(300, 300, 1);
     source.FillWithNoise(5);
     BuildOptions options;
     options.overwrite = true;
     options.threads = 1;
-    for (const unsigned calls : {testsupport::kWriteCall, testsupport::kSyncCall,
-                                 testsupport::kRenameCall, testsupport::kReadCall}) {
+    for (const unsigned calls :
+         {zmctest::kWriteCall, zmctest::kSyncCall, zmctest::kRenameCall, zmctest::kReadCall}) {
         const std::string failure =
             FailureWith(calls, [&] { PyramidBuilder(TestModule()).Build(source, file, options); });
         EXPECT_THAT(failure, HasSubstr("a.pyr")) << calls;
-        EXPECT_EQ(support::ReadText(file), before);
+        EXPECT_EQ(zmctest::ReadText(file), before);
     }
 }
 

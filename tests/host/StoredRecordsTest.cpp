@@ -17,9 +17,9 @@
 namespace zmchost {
 namespace {
 
-using support::DocumentParses;
-using support::TestModule;
 using zelm::files::FileSource;
+using zmctest::DocumentParses;
+using zmctest::TestModule;
 using Pixel = unsigned char;
 using Stats = zelm::RasterBandStats<Pixel>;
 
@@ -34,7 +34,7 @@ Stats Mean(std::uint32_t band, double mean) {
 class StoredRecordsTest : public testing::Test {
 protected:
     Raster Make(std::uint32_t bands) {
-        const support::MemorySource<Pixel> source(4, 4, bands);
+        const zmctest::MemorySource<Pixel> source(4, 4, bands);
         Raster raster = Raster::Create(TestModule(), file, source.props, 0);
         raster.Write<Pixel>(0, {0, 0, 4, 4}, std::vector<Pixel>(16 * bands, 1));
         return raster;
@@ -58,7 +58,7 @@ protected:
         raster.SetBandPalette(band, palette);
     }
 
-    support::ScratchDirectory folder;
+    zmctest::ScratchDirectory folder;
     const std::string file = folder / "a.pyr";
 };
 
@@ -231,7 +231,7 @@ TEST_P(LevelReductionTest, ReadsNoHaloForAMethodThatNeedsNone) {
     constexpr std::uint32_t kSide = 2048;
     const auto [method, hasHalo] = GetParam();
     {
-        const support::MemorySource<Pixel> source(kSide, kSide, 1);
+        const zmctest::MemorySource<Pixel> source(kSide, kSide, 1);
         Raster raster = Raster::Create(TestModule(), file, source.props, 1);
         for (std::uint32_t level = 0; level < 2; ++level) {
             const std::uint32_t side = kSide >> level;

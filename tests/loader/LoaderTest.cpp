@@ -37,13 +37,13 @@ TEST_F(OpenModuleTest, FindsTheModuleBesideItsOwnLibrary) {
 }
 
 TEST_F(OpenModuleTest, LooksNowhereBelowTheWorkingDirectory) {
-    const support::ScratchDirectory folder;
+    const zmctest::ScratchDirectory folder;
     const std::string before = std::filesystem::current_path();
     for (const char* const place : {"zmcraster", "lib", "lib/zmcraster"}) {
         std::filesystem::create_directories(folder / place);
-        support::WriteText(folder / (std::string(place) + "/libzmcraster.so"), "no library");
+        zmctest::WriteText(folder / (std::string(place) + "/libzmcraster.so"), "no library");
     }
-    support::WriteText(folder / "libzmcraster.so", "no library");
+    zmctest::WriteText(folder / "libzmcraster.so", "no library");
     ASSERT_EQ(chdir((folder / ".").c_str()), 0);
     const std::string found = FindModule();
     ASSERT_EQ(chdir(before.c_str()), 0);
@@ -51,7 +51,7 @@ TEST_F(OpenModuleTest, LooksNowhereBelowTheWorkingDirectory) {
 }
 
 TEST_F(OpenModuleTest, TheEnvironmentNamesAnotherByItsAbsolutePath) {
-    const support::ScratchDirectory folder;
+    const zmctest::ScratchDirectory folder;
     const std::string link = folder / "another.so";
     std::filesystem::create_symlink(ZMC_MODULE_PATH, link);
     setenv("ZMCRASTER_MODULE", link.c_str(), 1);
@@ -83,8 +83,8 @@ TEST_F(OpenModuleTest, AnEmptyVariableIsNone) {
 }
 
 TEST_F(OpenModuleTest, TellsWhyAFileIsNoModule) {
-    const support::ScratchDirectory folder;
-    support::WriteText(folder / "text.so", "no library");
+    const zmctest::ScratchDirectory folder;
+    zmctest::WriteText(folder / "text.so", "no library");
     EXPECT_THAT(OpenModule(folder / "missing.so").reason, HasSubstr("no such file"));
     EXPECT_THAT(OpenModule(folder / "text.so").reason, HasSubstr("no loadable library"));
     EXPECT_THAT(OpenModule(folder / "\xff.so").reason, HasSubstr("not valid UTF-8"));

@@ -9,15 +9,15 @@
 
 namespace {
 
-using support::ChildResult;
-using support::ReadText;
-using support::RunChild;
-using support::ScratchDirectory;
 using testing::EndsWith;
 using testing::HasSubstr;
 using testing::MatchesRegex;
 using testing::Not;
 using testing::StartsWith;
+using zmctest::ChildResult;
+using zmctest::ReadText;
+using zmctest::RunChild;
+using zmctest::ScratchDirectory;
 
 const std::string kDir = "metadata_parse_log_dir";
 const std::string kLevel = "metadata_parse_log_level";
@@ -119,7 +119,7 @@ TEST_F(ParseLog, TwoMissingComponentsLeaveTheLogOff) {
 }
 
 TEST_F(ParseLog, DirectoryThatIsAFileLeavesTheLogOff) {
-    support::WriteText(scratch / "file", "");
+    zmctest::WriteText(scratch / "file", "");
     EXPECT_THAT(Run(scratch / "file", "1", "0").err, HasSubstr("level=0 console=0 open=0"));
 }
 
@@ -136,7 +136,7 @@ TEST_F(ParseLog, FailedFileStillLetsLevelZeroReachTheConsole) {
 
 TEST_F(ParseLog, ReadOnlyDirectoryLeavesTheLogOff) {
     std::filesystem::create_directory(scratch / "ro");
-    support::SmallDisk disk(scratch / "ro", "size=64k");
+    zmctest::SmallDisk disk(scratch / "ro", "size=64k");
     if (!disk.IsMounted()) GTEST_SKIP() << "mounting a small disk is not permitted here";
     ASSERT_TRUE(disk.MakeReadOnly());
     EXPECT_THAT(Run(scratch / "ro", "1", "0").err, HasSubstr("level=0 console=0 open=0"));
@@ -145,7 +145,7 @@ TEST_F(ParseLog, ReadOnlyDirectoryLeavesTheLogOff) {
 
 TEST_F(ParseLog, FullDiskShowsNowhere) {
     std::filesystem::create_directory(scratch / "full");
-    support::SmallDisk disk(scratch / "full", "size=64k");
+    zmctest::SmallDisk disk(scratch / "full", "size=64k");
     if (!disk.IsMounted()) GTEST_SKIP() << "mounting a small disk is not permitted here";
     disk.Fill();
     EXPECT_THAT(Run(scratch / "full", "1", "0", {"threads", "100"}).err, HasSubstr("level=1 "));

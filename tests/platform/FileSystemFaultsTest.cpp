@@ -18,12 +18,12 @@
 namespace platform {
 namespace {
 
-using testsupport::FileFault;
-using testsupport::FileFaults;
+using zmctest::FileFault;
+using zmctest::FileFaults;
 
 class FileSystemFaults : public testing::Test {
 protected:
-    FileSystemFaults() { support::WriteText(path, "text"); }
+    FileSystemFaults() { zmctest::WriteText(path, "text"); }
 
     // Runs `call` while every call of that kind fails, or the first alone.
     template <class Call>
@@ -41,7 +41,7 @@ protected:
         return answer;
     }
 
-    support::ScratchDirectory folder;
+    zmctest::ScratchDirectory folder;
     const std::string path = folder / "file";
     const std::string missing = folder / "missing";
 };
@@ -51,12 +51,12 @@ TEST_F(FileSystemFaults, SyncingTellsWhetherItReachedTheDisk) {
     EXPECT_TRUE(SyncFolder(folder.String()));
     EXPECT_FALSE(SyncFile(missing));
     EXPECT_FALSE(SyncFolder(path)) << "it is no folder";
-    EXPECT_FALSE(Failing(testsupport::kSyncCall, EIO, [&] { return SyncFile(path); }));
-    EXPECT_FALSE(Failing(testsupport::kOpenCall, EMFILE, [&] { return SyncFile(path); }));
+    EXPECT_FALSE(Failing(zmctest::kSyncCall, EIO, [&] { return SyncFile(path); }));
+    EXPECT_FALSE(Failing(zmctest::kOpenCall, EMFILE, [&] { return SyncFile(path); }));
 }
 
 TEST_F(FileSystemFaults, AFailureKeepsItsReason) {
-    EXPECT_FALSE(Failing(testsupport::kSyncCall, EIO, [&] {
+    EXPECT_FALSE(Failing(zmctest::kSyncCall, EIO, [&] {
         const bool synced = SyncFile(path);
         EXPECT_EQ(errno, EIO) << "closing comes later, and does not count";
         return synced;
@@ -71,39 +71,38 @@ TEST_F(FileSystemFaults, ReservingFailsForWantOfSpaceAlone) {
     EXPECT_TRUE(reserve());
     EXPECT_EQ(StatusOf(path).size, 4U) << "the file stays as long as it was";
     for (const int error : {ENOSPC, EDQUOT, EFBIG})
-        EXPECT_FALSE(Failing(testsupport::kResizeCall, error, reserve)) << error;
+        EXPECT_FALSE(Failing(zmctest::kResizeCall, error, reserve)) << error;
     for (const int error : {EOPNOTSUPP, EIO})
-        EXPECT_TRUE(Failing(testsupport::kResizeCall, error, reserve)) << error;
+        EXPECT_TRUE(Failing(zmctest::kResizeCall, error, reserve)) << error;
     EXPECT_FALSE(ReserveSpace(missing, size));
 }
 
 TEST_F(FileSystemFaults, ReleasingKeepsTheText) {
     EXPECT_TRUE(ReserveSpace(path, 1 << 20));
     const auto release = [&] { return ReleaseReserve(path); };
-    EXPECT_FALSE(Failing(testsupport::kStatusCall, EIO, release));
-    EXPECT_FALSE(Failing(testsupport::kResizeCall, EIO, release));
+    EXPECT_FALSE(Failing(zmctest::kStatusCall, EIO, release));
+    EXPECT_FALSE(Failing(zmctest::kResizeCall, EIO, release));
     EXPECT_TRUE(release());
-    EXPECT_EQ(support::ReadText(path), "text");
+    EXPECT_EQ(zmctest::ReadText(path), "text");
     EXPECT_FALSE(ReleaseReserve(missing));
 }
 
 TEST_F(FileSystemFaults, NewNamesOnDisksThatDoNotKnowTheService) {
     const std::string other = folder / "other";
     const auto rename = [&] { return RenameToNewName(path, other); };
-    EXPECT_FALSE(Failing(testsupport::kRenameCall, EIO, rename));
+    EXPECT_FALSE(Failing(zmctest::kRenameCall, EIO, rename));
     EXPECT_TRUE(StatusOf(path).exists);
     for (const int error : {EINVAL, ENOSYS}) {
-        support::WriteText(path, "text");
+        zmctest::WriteText(path, "text");
         RemoveEntry(other);
-        EXPECT_FALSE(Failing(testsupport::kRenameCall, error, rename)) << "nor links";
+        EXPECT_FALSE(Failing(zmctest::kRenameCall, error, rename)) << "nor links";
         EXPECT_FALSE(StatusOf(other).exists);
-        EXPECT_TRUE(Failing(testsupport::kRenameCall, error, rename, false));
+        EXPECT_TRUE(Failing(zmctest::kRenameCall, error, rename, false));
         EXPECT_FALSE(StatusOf(path).exists);
-        EXPECT_EQ(support::ReadText(other), "text");
-        support::WriteText(path, "new");
-        EXPECT_FALSE(Failing(testsupport::kRenameCall, error, rename, false))
-            << "the name is taken";
-        EXPECT_EQ(support::ReadText(other), "text");
+        EXPECT_EQ(zmctest::ReadText(other), "text");
+        zmctest::WriteText(path, "new");
+        EXPECT_FALSE(Failing(zmctest::kRenameCall, error, rename, false)) << "the name is taken";
+        EXPECT_EQ(zmctest::ReadText(other), "text");
     }
 }
 
@@ -138,7 +137,7 @@ TEST_F(FileSystemFaults, FoldersAndDisksThatAreNotThere) {
     EXPECT_TRUE(StatusOf(folder.String()).isFolder);
     EXPECT_FALSE(RemoveEntry(missing));
     EXPECT_FALSE(RenameFile(missing, path));
-    EXPECT_EQ(support::ReadText(path), "text");
+    EXPECT_EQ(zmctest::ReadText(path), "text");
 }
 
 TEST_F(FileSystemFaults, ReadOnlyIsWhatNobodyMayWrite) {
@@ -161,9 +160,9 @@ TEST_F(FileSystemFaults, ProcessesThatLiveAndThatDoNot) {
 TEST_F(FileSystemFaults, LocksTellWhyTheyFail) {
     FileLock lock;
     const auto take = [&] { return lock.Take(path); };
-    EXPECT_EQ(Failing(testsupport::kOpenCall, EMFILE, take), FileLock::Result::Failed);
+    EXPECT_EQ(Failing(zmctest::kOpenCall, EMFILE, take), FileLock::Result::Failed);
     EXPECT_EQ(lock.Take(missing), FileLock::Result::Missing);
-    EXPECT_EQ(Failing(testsupport::kStatusCall, EIO, take), FileLock::Result::Missing)
+    EXPECT_EQ(Failing(zmctest::kStatusCall, EIO, take), FileLock::Result::Missing)
         << "it cannot be known to be the file of that name";
     EXPECT_EQ(take(), FileLock::Result::Taken);
 }

@@ -63,9 +63,9 @@ RC_GTEST_PROP(ParseReal, AgreesWithStrtod, ()) {
 }
 
 TEST(ParseReal, DoesNotDependOnTheLocale) {
-    const support::ScratchDirectory scratch;
+    const zmctest::ScratchDirectory scratch;
     const auto made =
-        support::RunChild({"localedef", "-i", "de_DE", "-f", "UTF-8", scratch / "de_DE.UTF-8"});
+        zmctest::RunChild({"localedef", "-i", "de_DE", "-f", "UTF-8", scratch / "de_DE.UTF-8"});
     if (made.status != 0) GTEST_SKIP() << "no locale can be made here: " << made.err;
     ASSERT_EQ(setenv("LOCPATH", scratch.String().c_str(), 1), 0);
     ASSERT_NE(std::setlocale(LC_ALL, "de_DE.UTF-8"), nullptr);

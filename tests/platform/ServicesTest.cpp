@@ -19,7 +19,7 @@
 namespace platform {
 namespace {
 
-using support::ScratchDirectory;
+using zmctest::ScratchDirectory;
 
 std::u16string Wide(const std::string& text) { return {text.begin(), text.end()}; }
 
@@ -43,10 +43,10 @@ TEST(TextStream, OpensByWideNameAndIsNotInherited) {
     std::uint64_t position = 0;
     EXPECT_TRUE(SeekToEnd(stream, position));
     EXPECT_EQ(position, 4u);
-    EXPECT_EQ(support::ReadText(scratch / "\xc3\xa4\xf0\x9f\x8c\x8d"), "text");
+    EXPECT_EQ(zmctest::ReadText(scratch / "\xc3\xa4\xf0\x9f\x8c\x8d"), "text");
     const std::string link = "/proc/self/fdinfo/" + std::to_string(fileno(stream));
     // 02000000 is the flag that closes the descriptor when another program starts.
-    EXPECT_THAT(support::ReadText(link), testing::ContainsRegex("flags:[[:space:]]*02"));
+    EXPECT_THAT(zmctest::ReadText(link), testing::ContainsRegex("flags:[[:space:]]*02"));
     std::fclose(stream);
 }
 
@@ -77,7 +77,7 @@ TEST(LoadableLibrary, LoadsFindsUnloads) {
 
 TEST(LoadableLibrary, RefusesAFileThatIsNoLibrary) {
     const ScratchDirectory scratch;
-    support::WriteText(scratch / "libx.so", "not a library");
+    zmctest::WriteText(scratch / "libx.so", "not a library");
     EXPECT_EQ(LoadLibraryFile(Wide(scratch / "libx.so").c_str()), nullptr);
 }
 

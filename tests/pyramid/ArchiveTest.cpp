@@ -19,7 +19,9 @@
 #include "tests/support/ScratchDirectory.h"
 #include "tests/support/XercesEnvironment.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 namespace {
 
 template <class Record>
@@ -77,15 +79,15 @@ protected:
     }
     // A finished file with this metadata document.
     void WriteFile(const std::string& document) {
-        support::WriteText(name, HeaderText().File() + document);
+        zmctest::WriteText(name, HeaderText().File() + document);
     }
     std::string DocumentText(const PyramidDataset& dataset) {
-        const std::string bytes = support::ReadText(name);
+        const std::string bytes = zmctest::ReadText(name);
         return bytes.size() < dataset.MetaDocumentOffset ? std::string()
                                                          : bytes.substr(dataset.MetaDocumentOffset);
     }
 
-    support::ScratchDirectory folder;
+    zmctest::ScratchDirectory folder;
     std::string name = (folder / "archive.pyr");
 };
 
@@ -280,13 +282,13 @@ TEST_F(ArchiveTest, FetchesComeFromTheFileAndConsecutiveOnesFromTheSource) {
 
 TEST_F(ArchiveTest, ReadOnlyFileStoresNothing) {
     Make()->SetBandStats(ArrayOf({StatsOf<T>(0, 1)}));
-    const std::string before = support::ReadText(name);
+    const std::string before = zmctest::ReadText(name);
     const auto dataset = Open();
     dataset->Writable = false;
     EXPECT_FALSE(dataset->SetBandStats(ArrayOf({StatsOf<T>(1, 1)})));
     EXPECT_FALSE(dataset->SetHistograms(Array<RasterBandHistogram<T>>()));
     EXPECT_FALSE(dataset->SetPalette(0, Palette()));
-    EXPECT_EQ(support::ReadText(name), before);
+    EXPECT_EQ(zmctest::ReadText(name), before);
     EXPECT_TRUE(dataset->HasBandStats<T>(0));
     dataset->Writable = true;
     dataset->File.reset();
@@ -461,7 +463,7 @@ TEST_F(ArchiveTest, UnparsableDocumentLeavesThePixels) {
     for (const std::string& document : documents) {
         SCOPED_TRACE(document);
         WriteFile(document);
-        const std::string before = support::ReadText(name);
+        const std::string before = zmctest::ReadText(name);
         const auto dataset = Open();
         EXPECT_TRUE(dataset->HasPyramid);
         unsigned char pixel = 0;
@@ -472,7 +474,7 @@ TEST_F(ArchiveTest, UnparsableDocumentLeavesThePixels) {
         EXPECT_FALSE(dataset->SetBandStats(ArrayOf({StatsOf<T>(0, 1)})));
         EXPECT_FALSE(dataset->SetHistograms(Array<RasterBandHistogram<T>>()));
         EXPECT_FALSE(dataset->SetPalette(0, Palette()));
-        EXPECT_EQ(support::ReadText(name), before);
+        EXPECT_EQ(zmctest::ReadText(name), before);
         Stderr messages;
         EXPECT_FALSE(dataset->HasBandStats<T>(0));
         EXPECT_EQ(dataset->GetBandStats<T>(0).flags, 0u);
@@ -499,12 +501,12 @@ TEST_F(ArchiveTest, FileOfTooLargeTilesIsNeverStoredTo) {
     header.tileSize = PyramidDataset::kMaxTileSize + 1;
     for (const std::uint64_t offset : {std::uint64_t{0}, std::uint64_t{20}, std::uint64_t{600}}) {
         const std::string before = FileWithHeader(header.Text(), offset) + "<DATASET/>";
-        support::WriteText(name, before);
+        zmctest::WriteText(name, before);
         const auto dataset = Open();
         EXPECT_FALSE(dataset->SetBandStats(ArrayOf({StatsOf<T>(0, 1)})));
         EXPECT_FALSE(dataset->SetHistograms(Array<RasterBandHistogram<T>>()));
         EXPECT_FALSE(dataset->SetPalette(0, Palette()));
-        EXPECT_EQ(support::ReadText(name), before);
+        EXPECT_EQ(zmctest::ReadText(name), before);
     }
 }
 
@@ -539,7 +541,7 @@ TEST_F(ArchiveTest, LongerDocumentOfAnotherWriterIsReplacedWhole) {
 TEST_F(ArchiveTest, TornDocumentIsNeverHalfBelieved) {
     const auto dataset = Make();
     dataset->SetBandStats(ArrayOf({StatsOf<T>(0, 1), StatsOf<T>(1, 1)}));
-    const std::string front = support::ReadText(name).substr(0, dataset->MetaDocumentOffset);
+    const std::string front = zmctest::ReadText(name).substr(0, dataset->MetaDocumentOffset);
     const std::string before = DocumentText(*dataset);
     dataset->SetBandStats(ArrayOf({StatsOf<T>(0, 2), StatsOf<T>(1, 2)}));
     const std::string after = DocumentText(*dataset);
@@ -547,7 +549,7 @@ TEST_F(ArchiveTest, TornDocumentIsNeverHalfBelieved) {
     Stderr messages;
     for (std::size_t written = 0; written <= after.size(); ++written) {
         const std::string rest = written < before.size() ? before.substr(written) : "";
-        support::WriteText(name, front + after.substr(0, written) + rest);
+        zmctest::WriteText(name, front + after.substr(0, written) + rest);
         PyramidDataset torn{String(name.c_str())};
         ASSERT_FALSE(torn.ReadHeader());
         Array<RasterBandStats<T>> stats;
@@ -562,13 +564,13 @@ TEST_F(ArchiveTest, UnfinishedStoreIsNeitherBelievedNorGrown) {
     for (const std::string& document : {std::string("\x1A"), std::string("\x1A") + "DATASET/>",
                                         std::string(" \n\t"), std::string(200, '\n')}) {
         WriteFile(document);
-        const std::string before = support::ReadText(name);
+        const std::string before = zmctest::ReadText(name);
         const auto dataset = Open();
         EXPECT_TRUE(dataset->HasPyramid);
         ASSERT_TRUE(dataset->MetaDocument);
         EXPECT_EQ(dataset->MetaDocument->document, nullptr);
         EXPECT_FALSE(dataset->SetBandStats(ArrayOf({StatsOf<T>(0, 1)})));
-        EXPECT_EQ(support::ReadText(name), before);
+        EXPECT_EQ(zmctest::ReadText(name), before);
         Stderr messages;
         EXPECT_FALSE(dataset->HasBandStats<T>(0));
         EXPECT_THAT(messages.Text(),
@@ -597,7 +599,7 @@ TEST_F(ArchiveTest, TextUnderAStoreIsLoadedAgain) {
 TEST_F(ArchiveTest, FullDiskLosesNothing) {
     const auto dataset = Make();
     dataset->SetBandStats(ArrayOf({StatsOf<T>(0, 1)}));
-    const std::string before = support::ReadText(name);
+    const std::string before = zmctest::ReadText(name);
     rlimit old{};
     ASSERT_EQ(getrlimit(RLIMIT_FSIZE, &old), 0);
     const auto handler = std::signal(SIGXFSZ, SIG_IGN);
@@ -606,7 +608,7 @@ TEST_F(ArchiveTest, FullDiskLosesNothing) {
         ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &tight), 0);
         dataset->SetBandStats(ArrayOf({StatsOf<T>(1, 2)}));
         setrlimit(RLIMIT_FSIZE, &old);
-        EXPECT_EQ(support::ReadText(name), before);
+        EXPECT_EQ(zmctest::ReadText(name), before);
         EXPECT_TRUE(dataset->HasBandStats<T>(0));
         EXPECT_FALSE(dataset->HasBandStats<T>(1));
     }
@@ -624,7 +626,7 @@ TEST_F(ArchiveTest, HeaderDocumentsThatAreRefused) {
                                      good + "\xE5\x9C"};
     for (const std::string& document : documents) {
         SCOPED_TRACE(document);
-        support::WriteText(name, FileWithHeader(document) + std::string(200, 'x'));
+        zmctest::WriteText(name, FileWithHeader(document) + std::string(200, 'x'));
         Stderr messages;
         PyramidDataset dataset{String(name.c_str())};
         EXPECT_TRUE(dataset.ReadHeader()) << "true is failure";
@@ -636,14 +638,14 @@ TEST_F(ArchiveTest, HeaderDocumentsThatAreRefused) {
 TEST_F(ArchiveTest, HeaderRegionsThatAreRefused) {
     const std::uint64_t starts[] = {0, 19, 20, 1000, std::uint64_t{1} << 40, ~std::uint64_t{0}};
     for (const std::uint64_t start : starts) {
-        support::WriteText(name, "KOBT" + Bytes8(start) + Bytes8(0) + HeaderText().Text());
+        zmctest::WriteText(name, "KOBT" + Bytes8(start) + Bytes8(0) + HeaderText().Text());
         PyramidDataset dataset{String(name.c_str())};
         EXPECT_TRUE(dataset.ReadHeader()) << start;
     }
 }
 
 TEST_F(ArchiveTest, HeaderLoadingAnswersInItsOwnSense) {
-    support::WriteText(name, HeaderText().File());
+    zmctest::WriteText(name, HeaderText().File());
     PyramidDataset dataset{String(name.c_str())};
     PyramidHeaderRecord record;
     record.width = 77;
@@ -673,7 +675,7 @@ TEST_F(ArchiveTest, DamagedFilesAreOpenedOrRefused) {
         dataset->SetHistograms(ArrayOf({histogram}));
         dataset->SetPalette(0, palette);
     }
-    const std::string whole = support::ReadText(name);
+    const std::string whole = zmctest::ReadText(name);
     std::mt19937 random(7);
     const auto below = [&](std::size_t n) { return random() % n; };
     Stderr messages;
@@ -700,7 +702,7 @@ TEST_F(ArchiveTest, DamagedFilesAreOpenedOrRefused) {
                     break;
             }
         }
-        support::WriteText(name, bytes);
+        zmctest::WriteText(name, bytes);
         PyramidDataset dataset{String(name.c_str())};
         if (dataset.ReadHeader()) continue;
         ++opened;
@@ -718,4 +720,4 @@ TEST_F(ArchiveTest, DamagedFilesAreOpenedOrRefused) {
 }
 
 }  // namespace
-}  // namespace zelm::test
+}  // namespace zmctest

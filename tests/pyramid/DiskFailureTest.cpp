@@ -11,11 +11,13 @@
 #include "tests/support/ScratchDirectory.h"
 #include "tests/support/XercesEnvironment.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 namespace {
 
-using testsupport::FileFaultAction;
-using testsupport::FileFaults;
+using zmctest::FileFaultAction;
+using zmctest::FileFaults;
 
 class DiskFailureTest : public ::testing::Test {
 protected:
@@ -44,13 +46,13 @@ protected:
             }
     }
 
-    support::ScratchDirectory folder;
+    zmctest::ScratchDirectory folder;
     const std::string name = folder / "scene.pyr";
 };
 
 TEST_F(DiskFailureTest, PixelsAroundAPartialTileAreNotLost) {
     Make(256);
-    const std::string before = support::ReadText(name);
+    const std::string before = zmctest::ReadText(name);
     PyramidDataset dataset{String(name.c_str())};
     ASSERT_FALSE(dataset.ReadHeader());
     Array<int> bands;
@@ -58,27 +60,27 @@ TEST_F(DiskFailureTest, PixelsAroundAPartialTileAreNotLost) {
     bands.Append(1);
     std::vector<unsigned char> pixels(200, 9);
     {
-        const FileFaults faults = Fail(testsupport::kReadCall, 1);
+        const FileFaults faults = Fail(zmctest::kReadCall, 1);
         EXPECT_TRUE(dataset.WriteTileInterleaved(5, 5, 10, 10, bands, 0, pixels.data()));
         EXPECT_EQ(faults.Failed(), 1u);
     }
-    EXPECT_EQ(support::ReadText(name), before);
+    EXPECT_EQ(zmctest::ReadText(name), before);
     EXPECT_TRUE(dataset.WriteTileInterleaved(5, 5, 10, 10, bands, 0, pixels.data()));
-    EXPECT_NE(support::ReadText(name), before);
+    EXPECT_NE(zmctest::ReadText(name), before);
 }
 
 TEST_F(DiskFailureTest, BandsBesideTheListedOnesAreNotInvented) {
     Make(256);
-    const std::string before = support::ReadText(name);
+    const std::string before = zmctest::ReadText(name);
     PyramidDataset dataset{String(name.c_str())};
     ASSERT_FALSE(dataset.ReadHeader());
     Array<int> bands;
     bands.Append(1);
     std::vector<unsigned char> pixels(65536, 9);
-    const FileFaults faults = Fail(testsupport::kReadCall, 1);
+    const FileFaults faults = Fail(zmctest::kReadCall, 1);
     EXPECT_TRUE(dataset.WriteTileInterleaved(0, 0, 256, 256, bands, 0, pixels.data()));
     EXPECT_EQ(faults.Failed(), 1u);
-    EXPECT_EQ(support::ReadText(name), before);
+    EXPECT_EQ(zmctest::ReadText(name), before);
 }
 
 // Whichever of its tiles, and whichever part of a tile, is the one that cannot be read.
@@ -96,7 +98,7 @@ TEST_F(DiskFailureTest, MergeThatCannotReadTheOldSamplesWritesNothing) {
         }
         PyramidDataset dataset{String(name.c_str())};
         ASSERT_FALSE(dataset.ReadHeader());
-        const std::string before = support::ReadText(name);
+        const std::string before = zmctest::ReadText(name);
         Array<int> some;
         some.Append(static_cast<int>(count) - 1);
         Array<int> all;
@@ -112,14 +114,14 @@ TEST_F(DiskFailureTest, MergeThatCannotReadTheOldSamplesWritesNothing) {
             if (c.x + c.width > dataset.Samples) continue;
             std::size_t n = 1;
             for (bool met = true; met; ++n) {
-                FileFaults faults = Fail(testsupport::kReadCall, n);
+                FileFaults faults = Fail(zmctest::kReadCall, n);
                 EXPECT_TRUE(dataset.WriteTileInterleaved(c.x, c.y, c.width, c.height, c.bands, 0,
                                                          pixels.data()));
                 faults.Disarm();
                 met = faults.Failed() != 0;
-                ASSERT_TRUE(!met || support::ReadText(name) == before) << count << ' ' << n;
+                ASSERT_TRUE(!met || zmctest::ReadText(name) == before) << count << ' ' << n;
             }
-            support::WriteText(name, before);
+            zmctest::WriteText(name, before);
         }
     }
 }
@@ -140,8 +142,8 @@ TEST_F(DiskFailureTest, ReadsThatFailAnswerTrueAndInventNothing) {
                 const std::size_t size = std::size_t{side} * side * bands->shape.elements;
                 std::vector<unsigned char> pixels(size, 3);
                 const bool inPlace = side == 256 && count < 9 && bands->shape.elements == count;
-                FileFaults faults({folder.String(), testsupport::kReadCall, 1, true,
-                                   FileFaultAction::Error, EIO});
+                FileFaults faults(
+                    {folder.String(), zmctest::kReadCall, 1, true, FileFaultAction::Error, EIO});
                 EXPECT_TRUE(dataset.ReadTile(0, 0, side, side, *bands, 0, pixels.data()));
                 EXPECT_NE(faults.Failed(), 0u);
                 faults.Disarm();
@@ -170,7 +172,7 @@ TEST_F(DiskFailureTest, ReaderAnswersTrueWhateverTheDiskDid) {
             std::vector<unsigned char> pixels(std::size_t{side} * side, 3);
             std::vector<unsigned char> mask(pixels.size(), 0);
             const FileFaults faults(
-                {folder.String(), testsupport::kAnyCall, 1, true, FileFaultAction::Error, EIO});
+                {folder.String(), zmctest::kAnyCall, 1, true, FileFaultAction::Error, EIO});
             EXPECT_TRUE(reader.ReadTile(0, 0, side, side, first, 0, pixels.data(), mask.data()));
             EXPECT_EQ(mask, std::vector<unsigned char>(mask.size(), 1)) << "made from the zeros";
             mask.assign(mask.size(), 0);
@@ -189,23 +191,23 @@ TEST_F(DiskFailureTest, FileOfUnknownSizeIsNotTakenForAnEmptyOne) {
         ASSERT_FALSE(dataset.ReadHeader());
         ASSERT_TRUE(dataset.SetBandStats(stats));
     }
-    const std::string before = support::ReadText(name);
+    const std::string before = zmctest::ReadText(name);
     std::size_t opened = 0;
     bool met = true;
     for (std::size_t n = 1; met; ++n) {
         PyramidDataset dataset{String(name.c_str())};
-        FileFaults faults = Fail(testsupport::kStatusCall, n);
+        FileFaults faults = Fail(zmctest::kStatusCall, n);
         const bool open = !dataset.ReadHeader();
         faults.Disarm();
         met = faults.Failed() != 0;
         if (!met || !open) continue;
         ++opened;
         dataset.SetBandStats(stats);
-        const std::string after = support::ReadText(name);
+        const std::string after = zmctest::ReadText(name);
         EXPECT_TRUE(after == before ||
                     after.find("<BANDSTATISTICS>") != after.rfind("<BANDSTATISTICS>"))
             << "the old record went, at " << n;
-        support::WriteText(name, before);
+        zmctest::WriteText(name, before);
     }
     EXPECT_GT(opened, 0u);
 }
@@ -214,7 +216,7 @@ TEST_F(DiskFailureTest, HeaderThatCouldNotBeWrittenIsRefused) {
     bool met = true;
     for (std::size_t n = 1; met; ++n) {
         PyramidDataset made(String(name.c_str()), PyramidProps(kSamples, kLines, 2, 1, 256));
-        FileFaults faults = Fail(testsupport::kWriteCall, n);
+        FileFaults faults = Fail(zmctest::kWriteCall, n);
         made.CreateFile(0, 0);
         faults.Disarm();
         met = faults.Failed() != 0;
@@ -241,11 +243,11 @@ TEST_F(DiskFailureTest, RowsOfATileTakeFewCalls) {
             return faults.Count();
         };
         // 200 rows of 512 bytes are less than 128 KiB.
-        EXPECT_EQ(calls(testsupport::kReadCall, false), 1u);
-        EXPECT_EQ(calls(testsupport::kReadCall, true), 1u);
-        EXPECT_EQ(calls(testsupport::kWriteCall, true), 1u);
+        EXPECT_EQ(calls(zmctest::kReadCall, false), 1u);
+        EXPECT_EQ(calls(zmctest::kReadCall, true), 1u);
+        EXPECT_EQ(calls(zmctest::kWriteCall, true), 1u);
     }
 }
 
 }  // namespace
-}  // namespace zelm::test
+}  // namespace zmctest

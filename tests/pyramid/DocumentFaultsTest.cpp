@@ -10,9 +10,9 @@
 namespace zmctest {
 namespace {
 
-using testsupport::AllocationFaults;
-using testsupport::ForEachAllocationFailing;
 using zelm::PyramidXMLDocument;
+using zmctest::AllocationFaults;
+using zmctest::ForEachAllocationFailing;
 
 constexpr char kText[] = "<DATASET/>";
 

@@ -12,7 +12,9 @@
 #include "pyramid/PyramidXMLDocument.h"
 #include "tests/support/XercesEnvironment.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 namespace {
 
 constexpr std::uint64_t kOffset = 40;  // of the documents: they stand behind something
@@ -442,4 +444,4 @@ TEST(DocumentStoreTest, OldTextOfTheGreatestLengthComesBack) {
 }
 
 }  // namespace
-}  // namespace zelm::test
+}  // namespace zmctest

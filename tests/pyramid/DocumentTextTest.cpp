@@ -10,7 +10,9 @@
 
 #include "pyramid/DocumentStore.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 namespace {
 
 constexpr std::uint64_t kOffset = 4;
@@ -191,4 +193,4 @@ TEST(DocumentTextTest, StoresAtAnyPace) {
 }
 
 }  // namespace
-}  // namespace zelm::test
+}  // namespace zmctest

@@ -11,7 +11,9 @@
 #include "tests/support/ScratchDirectory.h"
 #include "tests/support/XercesEnvironment.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 namespace {
 
 class FormatTest : public ::testing::Test {
@@ -20,7 +22,7 @@ protected:
 
     // A dataset on a file of these bytes; null if it does not open.
     std::unique_ptr<PyramidDataset> Open(const std::string& bytes) {
-        support::WriteText(name, bytes);
+        zmctest::WriteText(name, bytes);
         auto dataset = std::make_unique<PyramidDataset>(String(name.c_str()));
         if (dataset->ReadHeader()) return nullptr;
         return dataset;
@@ -34,7 +36,7 @@ protected:
         return Open(HeaderText().File() + document);
     }
 
-    support::ScratchDirectory folder;
+    zmctest::ScratchDirectory folder;
     std::string name = (folder / "format.pyr");
 };
 
@@ -326,4 +328,4 @@ TEST_F(FormatTest, AllHistogramsAreKeptInTheirOrder) {
 }
 
 }  // namespace
-}  // namespace zelm::test
+}  // namespace zmctest

@@ -11,8 +11,8 @@
 namespace zmctest {
 namespace {
 
-using testsupport::AllocationFaults;
-using testsupport::FaultMode;
+using zmctest::AllocationFaults;
+using zmctest::FaultMode;
 
 class LargeFileFaultsTest : public PyramidFileTest {
 protected:
@@ -42,7 +42,7 @@ TEST_F(LargeFileFaultsTest, RowsBeyondTheWorkSpace) {
     PyramidModel model(Wide(20000));
     model.StoreAllImages();
     model.Save(path);
-    const std::string before = support::ReadText(path.string());
+    const std::string before = zmctest::ReadText(path.string());
     const BandList some({5, 2});
     const auto dataset = Open();
     ASSERT_TRUE(dataset);
@@ -52,7 +52,7 @@ TEST_F(LargeFileFaultsTest, RowsBeyondTheWorkSpace) {
     };
     const auto read = [&] { return dataset->ReadTile(1, 1, 2, 1, some.View(), 0, pixels); };
     EXPECT_FALSE(WithoutMemory(merge));
-    EXPECT_TRUE(support::ReadText(path.string()) == before);
+    EXPECT_TRUE(zmctest::ReadText(path.string()) == before);
     EXPECT_FALSE(WithoutMemory(read));
     EXPECT_EQ(pixels[0], 1);
     EXPECT_TRUE(merge());
@@ -66,7 +66,7 @@ TEST_F(LargeFileFaultsTest, PixelsBeyondTheWorkSpace) {
     PyramidModel model(Wide(70000));
     model.StoreAllImages();
     model.Save(path);
-    const std::string before = support::ReadText(path.string());
+    const std::string before = zmctest::ReadText(path.string());
     const BandList some({5, 2});
     const auto dataset = Open();
     ASSERT_TRUE(dataset);
@@ -75,9 +75,9 @@ TEST_F(LargeFileFaultsTest, PixelsBeyondTheWorkSpace) {
         return dataset->WriteTileInterleaved(2, 4, 1, 3, some.View(), 0, pixels);
     };
     EXPECT_FALSE(WithoutMemory(write));
-    EXPECT_TRUE(support::ReadText(path.string()) == before);
+    EXPECT_TRUE(zmctest::ReadText(path.string()) == before);
     EXPECT_TRUE(write());
-    EXPECT_FALSE(support::ReadText(path.string()) == before);
+    EXPECT_FALSE(zmctest::ReadText(path.string()) == before);
 }
 
 // The table of a large grid is made at the first request for a tile.

@@ -11,12 +11,12 @@
 namespace zmctest {
 namespace {
 
-using testsupport::AllocationFaults;
-using testsupport::FileFault;
-using testsupport::FileFaultAction;
-using testsupport::FileFaults;
-using testsupport::ForEachAllocationFailing;
 using zelm::PyramidDataset;
+using zmctest::AllocationFaults;
+using zmctest::FileFault;
+using zmctest::FileFaultAction;
+using zmctest::FileFaults;
+using zmctest::ForEachAllocationFailing;
 
 class LayoutStateTest : public PyramidFileTest, public testing::WithParamInterface<std::uint32_t> {
 protected:
@@ -40,7 +40,7 @@ protected:
         EXPECT_EQ(dataset.TileOffsets.data, nullptr);
         EXPECT_EQ(dataset.TileDataStart + dataset.TileDataEnd + dataset.MetaDocumentOffset, 0u);
         EXPECT_FALSE(dataset.HasPyramid);
-        const std::string before = support::ReadText(path.string());
+        const std::string before = zmctest::ReadText(path.string());
         Bytes pixels(256 * 256 * 2, 7);
         const BandList list({0, 1});
         for (const int level : {0, 1, 8}) {
@@ -51,7 +51,7 @@ protected:
         EXPECT_FALSE(dataset.SetPalette(0, zelm::Palette()));
         EXPECT_TRUE(dataset.RefreshPyramidState());
         EXPECT_FALSE(dataset.HasPyramid);
-        EXPECT_EQ(support::ReadText(path.string()), before);
+        EXPECT_EQ(zmctest::ReadText(path.string()), before);
     }
 
     // All that ReadHeader settles is what a dataset has that was opened just now.
@@ -105,7 +105,7 @@ TEST_P(LayoutStateTest, HeaderThatCannotBeWrittenLeavesNoLayout) {
             FillLevel(*dataset, 0, PyramidModel(Description(0)).Image(0));
             dataset->RefreshPyramidState();
             ASSERT_TRUE(dataset->HasPyramid);
-            FileFaults faults(Fault(testsupport::kWriteCall, n, fromThenOn));
+            FileFaults faults(Fault(zmctest::kWriteCall, n, fromThenOn));
             dataset->CreateFile(0, 8);
             faults.Disarm();
             met = faults.Failed() != 0;
@@ -123,7 +123,7 @@ TEST_P(LayoutStateTest, FileWhoseSizeCannotBeToldHasNoLayout) {
     for (std::size_t n = 1; met; ++n) {
         SCOPED_TRACE("status " + std::to_string(n));
         const auto dataset = Create(Description(0));
-        FileFaults faults(Fault(testsupport::kStatusCall, n));
+        FileFaults faults(Fault(zmctest::kStatusCall, n));
         dataset->CreateFile(0, 8);
         faults.Disarm();
         met = faults.Failed() != 0;
@@ -154,10 +154,10 @@ TEST_P(LayoutStateTest, LevelsThatAreRefusedChangeNothing) {
     const auto dataset = Create(Description(2));
     FillLevel(*dataset, 2, PyramidModel(Description(2)).Image(2));
     dataset->RefreshPyramidState();
-    const std::string before = support::ReadText(path.string());
+    const std::string before = zmctest::ReadText(path.string());
     for (const std::uint32_t levelMax : {1024u, 0xFFFFFFFFu}) {
         dataset->CreateFile(1, levelMax);
-        EXPECT_EQ(support::ReadText(path.string()), before);
+        EXPECT_EQ(zmctest::ReadText(path.string()), before);
         ExpectOpenState(*dataset);
     }
 }
@@ -181,7 +181,7 @@ TEST_P(LayoutStateTest, HeaderThatCannotBeReadAgainChangesNothing) {
     const auto dataset = Open();
     const auto kept = Open();
     ASSERT_TRUE(dataset && kept);
-    const std::string good = support::ReadText(path.string());
+    const std::string good = zmctest::ReadText(path.string());
     const auto expectKept = [&] {
         EXPECT_TRUE(dataset->ReadHeader()) << "true is failure";
         ExpectSameState(*dataset, *kept);
@@ -196,13 +196,13 @@ TEST_P(LayoutStateTest, HeaderThatCannotBeReadAgainChangesNothing) {
           replaced("KOBT", std::string("KOBT\x10", 5)), replaced("</HEADER>", "</HEADEX>"),
           replaced("<HEADER_TILESIZE>256", "<HEADER_TILESIZE>000"),
           replaced("<HEADER_BANDS>2", "<HEADER_BANDS>\xFF")}) {
-        support::WriteText(path.string(), bad);
+        zmctest::WriteText(path.string(), bad);
         expectKept();
     }
-    support::WriteText(path.string(), good);
+    zmctest::WriteText(path.string(), good);
     bool met = true;
     for (std::size_t n = 1; met; ++n) {
-        FileFaults faults(Fault(testsupport::kReadCall, n));
+        FileFaults faults(Fault(zmctest::kReadCall, n));
         const bool failed = dataset->ReadHeader();
         faults.Disarm();
         met = faults.Failed() != 0;
@@ -220,12 +220,12 @@ TEST_P(LayoutStateTest, TilesThatHaveBecomeTooLargeLeaveNoTables) {
     auto large = Description(8);
     large.tile = 2049;
     PyramidModel(large).Save(path);
-    const std::string before = support::ReadText(path.string());
+    const std::string before = zmctest::ReadText(path.string());
     ASSERT_FALSE(dataset->ReadHeader());
     ExpectOpenState(*dataset);
     EXPECT_EQ(dataset->LevelOffsets, nullptr);
     EXPECT_FALSE(dataset->SetPalette(0, zelm::Palette()));
-    EXPECT_EQ(support::ReadText(path.string()), before);
+    EXPECT_EQ(zmctest::ReadText(path.string()), before);
 }
 
 INSTANTIATE_TEST_SUITE_P(Orderings, LayoutStateTest, testing::Values(0u, 1u, 2u));

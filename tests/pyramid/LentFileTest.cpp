@@ -15,8 +15,6 @@
 namespace zmctest {
 namespace {
 
-using support::FaultySource;
-using support::SourceFault;
 using zelm::PyramidDataset;
 using zelm::String;
 using zelm::files::FileSource;
@@ -25,6 +23,8 @@ using zelm::files::LentName;
 using zelm::files::MemorySource;
 using zelm::files::OpenMode;
 using zelm::files::RecordingSource;
+using zmctest::FaultySource;
+using zmctest::SourceFault;
 
 class LentFileTest : public PyramidFileTest {
 protected:

@@ -5,7 +5,9 @@
 #include "tests/support/ScratchDirectory.h"
 #include "tests/support/XercesEnvironment.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 namespace {
 
 // A raster of one edge tile, so that most windows are merged into it.
@@ -47,7 +49,7 @@ public:
     }
 
 private:
-    support::ScratchDirectory folder;
+    zmctest::ScratchDirectory folder;
     PyramidDataConnection connection;
     RasterReaderDispatchPtr dispatch;
 };
@@ -62,4 +64,4 @@ struct FixturesOf<::testing::Types<Ts...>> {
 INSTANTIATE_TYPED_TEST_SUITE_P(Pyramid, ReaderConformance, FixturesOf<AllElementTypes>::Types);
 
 }  // namespace
-}  // namespace zelm::test
+}  // namespace zmctest

@@ -11,7 +11,9 @@
 #include "tests/support/ScratchDirectory.h"
 #include "tests/support/XercesEnvironment.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 namespace {
 
 Array<String> ArrayOf(std::initializer_list<std::string> texts) {
@@ -34,14 +36,14 @@ public:
 
 class PyramidConnectionTest : public ::testing::Test {
 protected:
-    PyramidConnectionTest() { support::WriteText(name, HeaderText().File()); }
+    PyramidConnectionTest() { zmctest::WriteText(name, HeaderText().File()); }
 
     bool Open(PyramidDataConnection& closed, GeoRefPtr geoRef = GeoRefPtr(),
               MetadataPtr metadata = MetadataPtr()) {
         return closed.Open(ArrayOf({name}), geoRef, metadata);
     }
 
-    support::ScratchDirectory folder;
+    zmctest::ScratchDirectory folder;
     std::string name = (folder / "connection.pyr");
     PyramidDataConnection connection;
 };
@@ -94,9 +96,9 @@ TEST_F(PyramidConnectionTest, EmptyNameCloses) {
 
 TEST_F(PyramidConnectionTest, FilesThatDoNotOpen) {
     const std::string other = (folder / "other");
-    support::WriteText(other, "not a pyramid at all, though long enough to be one");
-    support::WriteText((folder / "empty"), "");
-    support::WriteText((folder / "short"), "KOBT\x15");
+    zmctest::WriteText(other, "not a pyramid at all, though long enough to be one");
+    zmctest::WriteText((folder / "empty"), "");
+    zmctest::WriteText((folder / "short"), "KOBT\x15");
     for (const std::string& bad :
          {(folder / "missing"), folder.String(), other, (folder / "empty"), (folder / "short"),
           std::string("/dev/null"), " " + name, name + " "}) {
@@ -116,7 +118,7 @@ TEST_F(PyramidConnectionTest, HeadersThatDoNotOpen) {
     huge.ordering = "Morton";
     huge.width = huge.height = huge.bands = 4000000000u;
     for (const HeaderText& header : {zeroTile, levels, huge}) {
-        support::WriteText(name, FileWithHeader(header.Text()));
+        zmctest::WriteText(name, FileWithHeader(header.Text()));
         EXPECT_FALSE(Open(connection));
     }
 }
@@ -170,7 +172,7 @@ TEST_F(PyramidConnectionTest, ReaderOfEachPixelType) {
         using T = typename decltype(type)::type;
         HeaderText header;
         header.pixelType = ElementTraits<T>::word;
-        support::WriteText(name, header.File());
+        zmctest::WriteText(name, header.File());
         PyramidDataConnection one;
         ASSERT_TRUE(Open(one));
         EXPECT_EQ(one.GetPixelType(), ElementTraits<T>::code);
@@ -183,7 +185,7 @@ TEST_F(PyramidConnectionTest, PixelTypesWithoutAReader) {
     for (const char* word : {"Bool", "Quad", "nonsense"}) {
         HeaderText header;
         header.pixelType = word;
-        support::WriteText(name, header.File());
+        zmctest::WriteText(name, header.File());
         PyramidDataConnection one;
         ASSERT_TRUE(Open(one)) << word;
         EXPECT_EQ(one.GetReader()->pixelType, 0u);
@@ -311,4 +313,4 @@ TEST_F(PyramidConnectionTest, FactoryCreatesPyramidsAlone) {
 }
 
 }  // namespace
-}  // namespace zelm::test
+}  // namespace zmctest

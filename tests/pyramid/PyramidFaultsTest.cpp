@@ -11,13 +11,13 @@
 namespace zmctest {
 namespace {
 
-using testsupport::AllocationFaults;
-using testsupport::FileFault;
-using testsupport::FileFaultAction;
-using testsupport::FileFaults;
-using testsupport::ForEachAllocationFailing;
 using zelm::Array;
 using zelm::PyramidDataset;
+using zmctest::AllocationFaults;
+using zmctest::FileFault;
+using zmctest::FileFaultAction;
+using zmctest::FileFaults;
+using zmctest::ForEachAllocationFailing;
 
 constexpr std::uint32_t kSide = 20;
 
@@ -45,9 +45,9 @@ protected:
         auto dataset = Create(d);
         FillLevel(*dataset, 0, Image(d.bands));
         FillLevel(*dataset, 1, Bytes(std::size_t{kSide / 2} * (kSide / 2) * d.bands, 9));
-        before = support::ReadText(path.string());
+        before = zmctest::ReadText(path.string());
     }
-    void Restore() const { support::WriteText(path.string(), before); }
+    void Restore() const { zmctest::WriteText(path.string(), before); }
 
     // Makes every kind of call on the folder fail in turn while `work` runs on a fresh dataset.
     template <class Work>
@@ -96,7 +96,7 @@ TEST_P(PyramidFaultsTest, OpeningWithoutMemory) {
         }
     });
     EXPECT_GT(points, 0U);
-    EXPECT_EQ(support::ReadText(path.string()), before);
+    EXPECT_EQ(zmctest::ReadText(path.string()), before);
 }
 
 TEST_P(PyramidFaultsTest, MakingAFileWithoutMemory) {
@@ -164,7 +164,7 @@ TEST_P(PyramidFaultsTest, WritingWithoutMemory) {
             faults.Disarm();
             // Several tiles are several steps; a single one is written or not.
             if (!wrote && r.width <= 8) {
-                EXPECT_EQ(support::ReadText(path.string()), before);
+                EXPECT_EQ(zmctest::ReadText(path.string()), before);
             }
         });
 }
@@ -182,7 +182,7 @@ TEST_P(PyramidFaultsTest, ReadingAndMergingOnAFailingDisk) {
         Bytes pixels(std::size_t{4} * 2 * bands, 5);
         made->File->WriteAt(made->TileDataEnd - 1, pixels.data(), 1);
         made.reset();
-        before = support::ReadText(path.string());
+        before = zmctest::ReadText(path.string());
         const auto touch = [&](const BandList& list, bool write) {
             const auto dataset = Open();
             if (!dataset) return;
@@ -215,7 +215,7 @@ TEST_P(PyramidFaultsTest, AFailingReadInventsNothingInAnyRectangle) {
         Bytes out(std::size_t{r.width} * r.height * r.bands.size(), 1);
         FileFault fault;
         fault.folder = directory.string();
-        fault.calls = testsupport::kReadCall;
+        fault.calls = zmctest::kReadCall;
         fault.n = 1;
         fault.fromThenOn = true;
         fault.error = EIO;
@@ -261,7 +261,7 @@ TEST_P(PyramidFaultsTest, StoringAndFetchingWithoutMemory) {
     });
     Restore();
     ASSERT_TRUE(store(*Open()));
-    before = support::ReadText(path.string());
+    before = zmctest::ReadText(path.string());
     ForEachAllocationFailing([&](AllocationFaults& faults) {
         faults.Disarm();
         auto dataset = std::make_unique<PyramidDataset>(zelm::String(path.c_str()));
@@ -274,7 +274,7 @@ TEST_P(PyramidFaultsTest, StoringAndFetchingWithoutMemory) {
         }
         faults.Disarm();
     });
-    EXPECT_EQ(support::ReadText(path.string()), before);
+    EXPECT_EQ(zmctest::ReadText(path.string()), before);
     EXPECT_TRUE(Open()->HasBandStats<unsigned char>(11));
     EXPECT_EQ(Open()->GetHistograms<unsigned char>().shape.elements, 12U);
 }
@@ -302,11 +302,11 @@ TEST_F(WorkSpaceTest, MemoryThatComesBackServes) {
     const BandList one({0}), both({0, 1});
     const unsigned char pixel[] = {77, 78};
     ReadRect(*dataset, 0, 0, 8, 8, one, 0);  // the table is there, and no work space yet
-    const std::string before = support::ReadText(path.string());
+    const std::string before = zmctest::ReadText(path.string());
     const auto write = [&] { return dataset->WriteTileMorton(8, 8, 1, 1, both.View(), 0, pixel); };
     Bytes out(2, 3);
     {
-        AllocationFaults faults(1, testsupport::FaultMode::FromThenOn);
+        AllocationFaults faults(1, zmctest::FaultMode::FromThenOn);
         const bool wrote = write();
         const bool read = dataset->ReadTile(8, 8, 1, 1, both.View(), 0, out.data());
         faults.Disarm();
@@ -314,7 +314,7 @@ TEST_F(WorkSpaceTest, MemoryThatComesBackServes) {
         EXPECT_FALSE(read);
     }
     EXPECT_EQ(out, Bytes(2, 3));
-    EXPECT_EQ(support::ReadText(path.string()), before);
+    EXPECT_EQ(zmctest::ReadText(path.string()), before);
     EXPECT_TRUE(write());
     EXPECT_EQ(ReadRect(*dataset, 8, 8, 1, 1, both, 0), (Bytes{77, 78}));
 }

@@ -11,7 +11,9 @@
 #include "tests/support/ScratchDirectory.h"
 #include "tests/support/XercesEnvironment.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 namespace {
 
 constexpr std::int32_t kPair[] = {2, 2};
@@ -58,7 +60,7 @@ protected:
         EXPECT_TRUE(connection->dataset->RefreshPyramidState());
     }
 
-    support::ScratchDirectory folder;
+    zmctest::ScratchDirectory folder;
     std::string name = (folder / "reader.pyr");
     Pointer<PyramidDataConnection> connection;
 };
@@ -148,9 +150,9 @@ TEST_F(PyramidReaderTest, BuildWantsAPairOfEqualValues) {
     EXPECT_EQ(reader.GetMinLevel(), 0);
     EXPECT_EQ(reader.GetMaxLevel(), 3);
     EXPECT_FALSE(reader.HasPyramid());
-    const std::string before = support::ReadText(name);
+    const std::string before = zmctest::ReadText(name);
     EXPECT_FALSE(reader.BuildPyramid(0, 1, 0, different));
-    EXPECT_EQ(support::ReadText(name), before);
+    EXPECT_EQ(zmctest::ReadText(name), before);
     EXPECT_EQ(reader.GetMaxLevel(), 3);
 }
 
@@ -197,7 +199,7 @@ TEST_F(PyramidReaderTest, RefusalsLeaveBufferAndMask) {
     source.SetBands(3);
     source.SetNoDataValue(0, 5);
     reader.SetNoDataValues(source);
-    const std::string before = support::ReadText(name);
+    const std::string before = zmctest::ReadText(name);
     struct Request {
         std::int32_t x, y;
         std::uint32_t width, height;
@@ -221,7 +223,7 @@ TEST_F(PyramidReaderTest, RefusalsLeaveBufferAndMask) {
         EXPECT_EQ(pixels, std::vector<Byte>(4096, 9)) << "not even stamped";
         EXPECT_EQ(mask, std::vector<Byte>(4096, 0xFF));
     }
-    EXPECT_EQ(support::ReadText(name), before);
+    EXPECT_EQ(zmctest::ReadText(name), before);
 }
 
 TEST_F(PyramidReaderTest, EmptyTilesAndNullBuffers) {
@@ -254,7 +256,7 @@ TEST_F(PyramidReaderTest, EmptyBandListInMortonOrderIsRefused) {
 TEST_F(PyramidReaderTest, TooLargeTilesOpenAndAreRefused) {
     HeaderText header;
     header.tileSize = 2049;
-    support::WriteText(name, header.File());
+    zmctest::WriteText(name, header.File());
     PyramidDataConnection opened;
     ASSERT_TRUE(opened.Open(Name(name), GeoRefPtr(), MetadataPtr()));
     auto& reader = ReaderOf<Byte>(opened);
@@ -283,13 +285,13 @@ TEST_F(PyramidReaderTest, WritingStampsTheBufferAndTheFile) {
     EXPECT_TRUE(reader.ReadTile(0, 0, 4, 1, Bands(list), 0, read, found));
     EXPECT_TRUE(std::equal(pixels, pixels + 4, read));
     EXPECT_EQ(std::vector<Byte>(found, found + 4), (std::vector<Byte>{0xFE, 0xFF, 2, 1}));
-    EXPECT_EQ(static_cast<Byte>(support::ReadText(name).back()), 200);
+    EXPECT_EQ(static_cast<Byte>(zmctest::ReadText(name).back()), 200);
 }
 
 TEST_F(PyramidReaderTest, ReadOnlyFilesDropTheirWritesAndStillStamp) {
     auto& reader = Build(2, 1, 1, 0);
     FinishFile();
-    const std::string before = support::ReadText(name);
+    const std::string before = zmctest::ReadText(name);
     connection->dataset->Writable = false;
     RasterProps source;
     source.SetBands(1);
@@ -311,7 +313,7 @@ TEST_F(PyramidReaderTest, ReadOnlyFilesDropTheirWritesAndStillStamp) {
     palette.nextIndex = 1;
     EXPECT_TRUE(reader.SetPalette(0, palette));
     EXPECT_FALSE(reader.HasPalette(0));
-    EXPECT_EQ(support::ReadText(name), before);
+    EXPECT_EQ(zmctest::ReadText(name), before);
 }
 
 TEST_F(PyramidReaderTest, NoDataValuesLiveInTheReaderAlone) {
@@ -493,4 +495,4 @@ TEST_F(PyramidReaderTest, LevelsTheWrongWayRoundHoldNothing) {
 }
 
 }  // namespace
-}  // namespace zelm::test
+}  // namespace zmctest

@@ -12,7 +12,9 @@
 #include "tests/support/ScratchDirectory.h"
 #include "tests/support/XercesEnvironment.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 namespace {
 
 class Module {
@@ -58,7 +60,7 @@ protected:
         return static_cast<RasterDataConnection*>(connection.Get())->GetReader();
     }
 
-    support::ScratchDirectory folder;
+    zmctest::ScratchDirectory folder;
     DataConnectionFactory* factory = nullptr;
     void (*destroy)(DataConnectionFactory*) = nullptr;
 };
@@ -215,7 +217,7 @@ TEST_F(PyramidSystemTest, RecordsAndMasksThroughTheDispatch) {
 }
 
 TEST_F(PyramidSystemTest, FactoryMayGoBeforeItsConnections) {
-    support::WriteText((folder / "file"), HeaderText().File());
+    zmctest::WriteText((folder / "file"), HeaderText().File());
     const DataConnectionPtr connection = Open((folder / "file").c_str());
     ASSERT_TRUE(connection);
     destroy(factory);
@@ -252,4 +254,4 @@ TEST_F(PyramidSystemTest, FileBeyondFourGigabytes) {
 }
 
 }  // namespace
-}  // namespace zelm::test
+}  // namespace zmctest

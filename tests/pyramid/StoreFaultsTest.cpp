@@ -8,21 +8,23 @@
 #include "tests/support/PyramidFiles.h"
 #include "tests/support/ScratchDirectory.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 namespace {
 
-using testsupport::FileFault;
-using testsupport::FileFaultAction;
-using testsupport::FileFaults;
+using zmctest::FileFault;
+using zmctest::FileFaultAction;
+using zmctest::FileFaults;
 
 class StoreFaultsTest : public ::testing::Test {
 protected:
     StoreFaultsTest() {
-        support::WriteText(name, HeaderText().File());
+        zmctest::WriteText(name, HeaderText().File());
         Store(*Open(), 0);
-        before = support::ReadText(name);
+        before = zmctest::ReadText(name);
         Store(*Open(), 1);
-        after = support::ReadText(name);
+        after = zmctest::ReadText(name);
     }
 
     std::unique_ptr<PyramidDataset> Open() {
@@ -37,7 +39,7 @@ protected:
         dataset.SetBandStats(records);
     }
 
-    support::ScratchDirectory folder;
+    zmctest::ScratchDirectory folder;
     std::string name = folder / "store.pyr";
     std::string before, after;
 };
@@ -50,7 +52,7 @@ TEST_F(StoreFaultsTest, OneCallThatFailsLosesNothing) {
         std::size_t n = 1;
         for (bool reached = true; reached; ++n) {
             SCOPED_TRACE(n);
-            support::WriteText(name, before);
+            zmctest::WriteText(name, before);
             {
                 FileFault fault;
                 fault.folder = folder.String();
@@ -61,7 +63,7 @@ TEST_F(StoreFaultsTest, OneCallThatFailsLosesNothing) {
                 if (const auto dataset = Open()) Store(*dataset, 1);
                 reached = faults.Failed() != 0;
             }
-            const std::string now = support::ReadText(name);
+            const std::string now = zmctest::ReadText(name);
             EXPECT_TRUE(now == before || now == after) << now.substr(HeaderText().File().size());
         }
         EXPECT_GT(n, 12u);
@@ -69,4 +71,4 @@ TEST_F(StoreFaultsTest, OneCallThatFailsLosesNothing) {
 }
 
 }  // namespace
-}  // namespace zelm::test
+}  // namespace zmctest

@@ -12,7 +12,7 @@
 namespace zmctest {
 namespace {
 
-using testsupport::MemoryMeter;
+using zmctest::MemoryMeter;
 
 class WidePixelTest : public PyramidFileTest {
 protected:
@@ -53,12 +53,12 @@ constexpr std::int64_t kLittle = std::int64_t{2} << 20;
 // A header of some hundred bytes may claim two thousand million bands. A tile of one pixel has 4
 // GiB then, and of those one sample is asked for.
 TEST_F(WidePixelTest, OneSampleOfAHugePixelTakesLittle) {
-    zelm::test::HeaderText header;
+    zmctest::HeaderText header;
     header.bands = 2147483647;
     header.tileSize = 1;
     header.pixelType = "UInt16";
-    support::WriteText(path.string(),
-                       zelm::test::FileWithHeader(header.Text()) + std::string("\1\2\3\4", 4));
+    zmctest::WriteText(path.string(),
+                       zmctest::FileWithHeader(header.Text()) + std::string("\1\2\3\4", 4));
     const auto dataset = Open();
     ASSERT_TRUE(dataset);
     const int list[] = {1, 2147483646, 0};
@@ -115,7 +115,7 @@ TEST_F(WidePixelTest, WritesAsTheModelDoes) {
                 EXPECT_TRUE(
                     WriteBytes(*dataset, r.x, r.y, r.width, r.height, BandList(list), 0, buffer));
                 model.WriteTile(r.x, r.y, r.width, r.height, list, 0, buffer);
-                EXPECT_TRUE(support::ReadText(path.string()) ==
+                EXPECT_TRUE(zmctest::ReadText(path.string()) ==
                             std::string(model.file.begin(), model.file.end()));
             }
     }

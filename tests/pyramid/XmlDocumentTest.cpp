@@ -14,7 +14,9 @@
 #include "tests/support/ScratchDirectory.h"
 #include "tests/support/XercesEnvironment.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 namespace {
 
 class XmlDocumentTest : public ::testing::Test {
@@ -27,7 +29,7 @@ protected:
         const String wide(name.c_str());
         const auto file = files::OpenSource(wide, files::OpenMode::Create);
         EXPECT_TRUE(document.SerializeDocument(*file, 7));
-        return support::ReadText(name).substr(7);
+        return zmctest::ReadText(name).substr(7);
     }
     std::string Text() { return Compact(Raw()); }
 
@@ -37,7 +39,7 @@ protected:
         return target.ParseTree(source);
     }
 
-    support::ScratchDirectory folder;
+    zmctest::ScratchDirectory folder;
     PyramidXMLDocument document;
 };
 
@@ -250,18 +252,18 @@ TEST_F(XmlDocumentTest, RecordsAreTakenBackFromAPosition) {
 
 TEST_F(XmlDocumentTest, ReadOnlyFileIsAFailure) {
     const std::string name = (folder / "document");
-    support::WriteText(name, "old");
+    zmctest::WriteText(name, "old");
     const auto file = files::OpenSource(name.c_str(), files::OpenMode::Read);
     EXPECT_FALSE(document.SerializeDocument(*file, 0));
-    EXPECT_EQ(support::ReadText(name), "old");
+    EXPECT_EQ(zmctest::ReadText(name), "old");
 }
 
 TEST_F(XmlDocumentTest, OldTextBehindTheDocumentIsBlankedAndNothingIsCut) {
     const std::string name = (folder / "document");
-    support::WriteText(name, std::string(10000, 'x'));
+    zmctest::WriteText(name, std::string(10000, 'x'));
     const auto file = files::OpenSource(name.c_str(), files::OpenMode::Update);
     EXPECT_TRUE(document.SerializeDocument(*file, 5));
-    const std::string text = support::ReadText(name);
+    const std::string text = zmctest::ReadText(name);
     EXPECT_EQ(text.size(), 10000u);
     EXPECT_EQ(text.substr(0, 5), "xxxxx");
     EXPECT_EQ(Compact(text.substr(5)), "<DATASET/>");
@@ -278,7 +280,7 @@ TEST_F(XmlDocumentTest, ParsedTreeGrows) {
     const std::string name = (folder / "document");
     const auto file = files::OpenSource(name.c_str(), files::OpenMode::Create);
     ASSERT_TRUE(parsed.SerializeDocument(*file, 0));
-    const std::string text = Compact(support::ReadText(name));
+    const std::string text = Compact(zmctest::ReadText(name));
     EXPECT_NE(text.find("<!-- kept -->"), std::string::npos);
     EXPECT_NE(text.find("<FOREIGN a=\"1\">\xC3\xA9</FOREIGN><BANDSTATISTICS>"), std::string::npos)
         << text;
@@ -398,4 +400,4 @@ TEST_F(XmlDocumentTest, RecordsFillATreeToItsLastElement) {
 }
 
 }  // namespace
-}  // namespace zelm::test
+}  // namespace zmctest

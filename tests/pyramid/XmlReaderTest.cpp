@@ -17,7 +17,9 @@
 #include "tests/support/ScratchDirectory.h"
 #include "tests/support/XercesEnvironment.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 namespace {
 
 using ::testing::HasSubstr;
@@ -494,8 +496,8 @@ TEST_F(XmlReaderTest, XmlExceptionOutOfTheParse) {
 // --- documents made to harm ---
 
 TEST_F(XmlReaderTest, DocumentTypesAreRefused) {
-    support::ScratchDirectory folder;
-    support::WriteText((folder / "secret"), "1");
+    zmctest::ScratchDirectory folder;
+    zmctest::WriteText((folder / "secret"), "1");
     const std::string documents[] = {
         "<!DOCTYPE DATASET><DATASET/>",
         "<!DOCTYPE DATASET SYSTEM \"file://" + (folder / "secret") + "\"><DATASET/>",
@@ -652,4 +654,4 @@ TEST_F(HostileDocumentTest, LongTextsTakeTimeInProportion) {
 }
 
 }  // namespace
-}  // namespace zelm::test
+}  // namespace zmctest

@@ -3,7 +3,9 @@
 #include "tests/support/MemoryRaster.h"
 #include "tests/support/ReaderConformance.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 namespace {
 
 template <class T>
@@ -45,4 +47,4 @@ struct FixturesOf<::testing::Types<Ts...>> {
 INSTANTIATE_TYPED_TEST_SUITE_P(Memory, ReaderConformance, FixturesOf<AllElementTypes>::Types);
 
 }  // namespace
-}  // namespace zelm::test
+}  // namespace zmctest

@@ -9,7 +9,9 @@
 #include "tests/support/MemoryRaster.h"
 #include "tests/support/TileModel.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 namespace {
 
 struct Case {
@@ -130,4 +132,4 @@ TYPED_TEST(MemoryTiles, AreWrittenAsTheModelSays) {
 }
 
 }  // namespace
-}  // namespace zelm::test
+}  // namespace zmctest

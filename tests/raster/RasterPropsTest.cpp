@@ -13,7 +13,7 @@
 namespace zelm {
 namespace {
 
-using testsupport::CountingGeoRef;
+using zmctest::CountingGeoRef;
 
 CountingGeoRef& GeoRefOf(const RasterProps& props) {
     return static_cast<CountingGeoRef&>(*props.geoRef);
@@ -179,7 +179,7 @@ TEST(RasterProps, AssignmentWhoseCloneThrowsChangesNothing) {
         const RasterProps before(target);
         const GeoRef* const held = target.geoRef.Get();
         {
-            const testsupport::ThrowingClones throwing;
+            const zmctest::ThrowingClones throwing;
             EXPECT_THROW(target = source, std::runtime_error);
             EXPECT_THROW(static_cast<void>(RasterProps(source)), std::runtime_error);
             EXPECT_THROW(target.SetGeoRef(source.geoRef), std::runtime_error);
@@ -210,7 +210,7 @@ TEST(RasterProps, AGeoRefThatRefusesItsSizeLeavesTheRecordAsItWas) {
 TEST(RasterProps, MovingTakesTheGeoRefWithoutCloningIt) {
     RasterProps source = Filled();
     const GeoRef* const held = source.geoRef.Get();
-    const testsupport::ThrowingClones throwing;
+    const zmctest::ThrowingClones throwing;
     RasterProps moved(std::move(source));
     EXPECT_EQ(moved.geoRef.Get(), held);
     EXPECT_EQ(moved.noDataValues.size(), 2u);

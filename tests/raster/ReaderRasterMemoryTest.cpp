@@ -9,7 +9,9 @@
 #include "tests/support/MemoryRaster.h"
 #include "tests/support/TileModel.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 namespace {
 
 // A raster of 4 samples, 3 lines and 3 bands, whose reader is at hand.
@@ -293,4 +295,4 @@ TEST(ReaderRasterMemoryDeathTest, AssertionsNameTheCallersFaults) {
 #endif
 
 }  // namespace
-}  // namespace zelm::test
+}  // namespace zmctest

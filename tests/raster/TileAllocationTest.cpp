@@ -10,10 +10,12 @@
 #include "tests/support/MemoryRaster.h"
 #include "tests/support/TileModel.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 namespace {
 
-using testsupport::CountAllocations;
+using zmctest::CountAllocations;
 
 template <class T>
 void ExpectNoAllocations(std::int32_t interleave) {
@@ -60,4 +62,4 @@ TEST(TileAllocations, NoneBeyondTheProperties) {
 }
 
 }  // namespace
-}  // namespace zelm::test
+}  // namespace zmctest

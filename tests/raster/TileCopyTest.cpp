@@ -11,7 +11,9 @@
 #include "core/PixelVocabulary.h"
 #include "tests/support/TileModel.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 namespace {
 
 using Bytes = std::vector<unsigned char>;
@@ -160,4 +162,4 @@ TEST_P(TileCopy, SinglePlaneNeedsNoList) {
 }
 
 }  // namespace
-}  // namespace zelm::test
+}  // namespace zmctest

@@ -9,7 +9,7 @@
 extern "C" __attribute__((visibility("default"))) const char* __lsan_default_suppressions();
 extern "C" const char* __lsan_default_suppressions() { return "leak:libxerces-c\n"; }
 
-namespace testsupport {
+namespace zmctest {
 namespace {
 
 // Plain data, so that it needs no initialiser and can be met by the first allocation of a thread.
@@ -71,11 +71,11 @@ void AllocationFaults::Rearm() { Of(scope).Start(Of(scope).failAt, Of(scope).mod
 std::size_t AllocationFaults::Count() const { return Of(scope).count; }
 std::size_t AllocationFaults::Failed() const { return Of(scope).failed; }
 
-}  // namespace testsupport
+}  // namespace zmctest
 
-using testsupport::OrThrow;
-using testsupport::Take;
-using testsupport::TakeAligned;
+using zmctest::OrThrow;
+using zmctest::Take;
+using zmctest::TakeAligned;
 
 void* operator new(std::size_t size) { return OrThrow(Take(size)); }
 void* operator new[](std::size_t size) { return OrThrow(Take(size)); }

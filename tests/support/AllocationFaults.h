@@ -13,7 +13,7 @@
 #include <cstddef>
 #include <string>
 
-namespace testsupport {
+namespace zmctest {
 
 enum class FaultMode {
     Once,        // the n-th allocation alone fails
@@ -80,6 +80,6 @@ std::size_t ForEachAllocationFailing(Attempt&& attempt, std::size_t limit = 1000
     return points;
 }
 
-}  // namespace testsupport
+}  // namespace zmctest
 
 #endif

@@ -12,7 +12,7 @@
 #include <string>
 #include <vector>
 
-namespace support {
+namespace zmctest {
 
 struct ChildResult {
     int status = -1;  // exit status, or minus the signal that ended it
@@ -68,6 +68,6 @@ inline ChildResult RunChild(const std::vector<std::string>& command,
     return result;
 }
 
-}  // namespace support
+}  // namespace zmctest
 
 #endif

@@ -8,7 +8,7 @@
 
 #include "core/GeoRef.h"
 
-namespace testsupport {
+namespace zmctest {
 
 class CountingGeoRef : public zelm::GeoRef {
 public:
@@ -49,6 +49,6 @@ public:
     ThrowingClones& operator=(const ThrowingClones&) = delete;
 };
 
-}  // namespace testsupport
+}  // namespace zmctest
 
 #endif

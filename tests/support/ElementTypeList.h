@@ -8,7 +8,9 @@
 
 #include "core/ElementTypes.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 
 template <class Ignored, class... Ts>
 struct TypesAfterFirst {
@@ -27,6 +29,6 @@ struct ElementTypeNames {
     }
 };
 
-}  // namespace zelm::test
+}  // namespace zmctest
 
 #endif

@@ -13,7 +13,7 @@
 
 #include "tests/support/ScratchDirectory.h"
 
-namespace support {
+namespace zmctest {
 
 class ElfFile {
 public:
@@ -124,6 +124,6 @@ private:
     std::string bytes;
 };
 
-}  // namespace support
+}  // namespace zmctest
 
 #endif  // ZMC_TESTS_SUPPORT_ELFFILE_H

@@ -6,7 +6,7 @@
 
 #include "host/base/Error.h"
 
-namespace support {
+namespace zmctest {
 
 // The text of the Error that the action throws; "no failure" if it throws none.
 template <class Action>
@@ -19,6 +19,6 @@ std::string FailureOf(Action&& action) {
     }
 }
 
-}  // namespace support
+}  // namespace zmctest
 
 #endif

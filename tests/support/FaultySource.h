@@ -15,7 +15,7 @@
 
 #include "files/ByteSource.h"
 
-namespace support {
+namespace zmctest {
 
 // What becomes of a transfer.
 enum class SourceFault {
@@ -130,6 +130,6 @@ private:
     std::atomic<std::size_t> transfers{0};
 };
 
-}  // namespace support
+}  // namespace zmctest
 
 #endif

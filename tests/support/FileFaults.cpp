@@ -20,7 +20,7 @@
 #include <cstdlib>
 #include <cstring>
 
-namespace testsupport {
+namespace zmctest {
 namespace {
 
 struct Orders {
@@ -183,12 +183,12 @@ std::vector<std::string> FileFaults::ForChild(const FileFault& fault,
     return environment;
 }
 
-}  // namespace testsupport
+}  // namespace zmctest
 
-using testsupport::CallFails;
-using testsupport::FileCall;
-using testsupport::Next;
-using testsupport::Transfer;
+using zmctest::CallFails;
+using zmctest::FileCall;
+using zmctest::Next;
+using zmctest::Transfer;
 
 // The C library has most functions under several names: with and without 64, and fortified.
 #define ZMC_EXPORT extern "C" __attribute__((visibility("default")))
@@ -199,7 +199,7 @@ using testsupport::Transfer;
         va_start(rest, flags);                                                          \
         const mode_t mode = (flags & (O_CREAT | O_TMPFILE)) ? va_arg(rest, mode_t) : 0; \
         va_end(rest);                                                                   \
-        if (CallFails(testsupport::kOpenCall, path)) return -1;                         \
+        if (CallFails(zmctest::kOpenCall, path)) return -1;                             \
         static const auto next = Next<int (*)(const char*, int, ...)>(#name);           \
         return next(path, flags, mode);                                                 \
     }
@@ -212,7 +212,7 @@ ZMC_OPEN(open64)
         va_start(rest, flags);                                                          \
         const mode_t mode = (flags & (O_CREAT | O_TMPFILE)) ? va_arg(rest, mode_t) : 0; \
         va_end(rest);                                                                   \
-        if (CallFails(testsupport::kOpenCall, path)) return -1;                         \
+        if (CallFails(zmctest::kOpenCall, path)) return -1;                             \
         static const auto next = Next<int (*)(int, const char*, int, ...)>(#name);      \
         return next(folder, path, flags, mode);                                         \
     }
@@ -221,7 +221,7 @@ ZMC_OPEN_AT(openat64)
 
 #define ZMC_FORTIFIED_OPEN(name)                                         \
     ZMC_EXPORT int name(const char* path, int flags) {                   \
-        if (CallFails(testsupport::kOpenCall, path)) return -1;          \
+        if (CallFails(zmctest::kOpenCall, path)) return -1;              \
         static const auto next = Next<int (*)(const char*, int)>(#name); \
         return next(path, flags);                                        \
     }
@@ -230,7 +230,7 @@ ZMC_FORTIFIED_OPEN(__open64_2)
 
 #define ZMC_FOPEN(name)                                                                 \
     ZMC_EXPORT std::FILE* name(const char* path, const char* mode) {                    \
-        if (CallFails(testsupport::kOpenCall, path)) return nullptr;                    \
+        if (CallFails(zmctest::kOpenCall, path)) return nullptr;                        \
         static const auto next = Next<std::FILE* (*)(const char*, const char*)>(#name); \
         return next(path, mode);                                                        \
     }
@@ -239,20 +239,20 @@ ZMC_FOPEN(fopen64)
 
 ZMC_EXPORT ssize_t read(int file, void* buffer, size_t size) {
     static const auto next = Next<ssize_t (*)(int, void*, size_t)>("read");
-    return Transfer(testsupport::kReadCall, file, size,
+    return Transfer(zmctest::kReadCall, file, size,
                     [&](size_t part) { return next(file, buffer, part); });
 }
 
 ZMC_EXPORT ssize_t __read_chk(int file, void* buffer, size_t size, size_t room) {
     static const auto next = Next<ssize_t (*)(int, void*, size_t, size_t)>("__read_chk");
-    return Transfer(testsupport::kReadCall, file, size,
+    return Transfer(zmctest::kReadCall, file, size,
                     [&](size_t part) { return next(file, buffer, part, room); });
 }
 
 #define ZMC_PREAD(name)                                                                 \
     ZMC_EXPORT ssize_t name(int file, void* buffer, size_t size, off_t offset) {        \
         static const auto next = Next<ssize_t (*)(int, void*, size_t, off_t)>(#name);   \
-        return Transfer(testsupport::kReadCall, file, size,                             \
+        return Transfer(zmctest::kReadCall, file, size,                                 \
                         [&](size_t part) { return next(file, buffer, part, offset); }); \
     }
 ZMC_PREAD(pread)
@@ -261,7 +261,7 @@ ZMC_PREAD(pread64)
 #define ZMC_FORTIFIED_PREAD(name)                                                             \
     ZMC_EXPORT ssize_t name(int file, void* buffer, size_t size, off_t offset, size_t room) { \
         static const auto next = Next<ssize_t (*)(int, void*, size_t, off_t, size_t)>(#name); \
-        return Transfer(testsupport::kReadCall, file, size,                                   \
+        return Transfer(zmctest::kReadCall, file, size,                                       \
                         [&](size_t part) { return next(file, buffer, part, offset, room); }); \
     }
 ZMC_FORTIFIED_PREAD(__pread_chk)
@@ -269,7 +269,7 @@ ZMC_FORTIFIED_PREAD(__pread64_chk)
 
 ZMC_EXPORT ssize_t write(int file, const void* buffer, size_t size) {
     static const auto next = Next<ssize_t (*)(int, const void*, size_t)>("write");
-    return Transfer(testsupport::kWriteCall, file, size,
+    return Transfer(zmctest::kWriteCall, file, size,
                     [&](size_t part) { return next(file, buffer, part); });
 }
 
@@ -279,7 +279,7 @@ ZMC_EXPORT ssize_t writev(int file, const iovec* pieces, int number) {
     static const auto one = Next<ssize_t (*)(int, const void*, size_t)>("write");
     size_t size = 0;
     for (int i = 0; i < number; ++i) size += pieces[i].iov_len;
-    return Transfer(testsupport::kWriteCall, file, size, [&](size_t part) {
+    return Transfer(zmctest::kWriteCall, file, size, [&](size_t part) {
         if (part == size) return next(file, pieces, number);
         return one(file, pieces[0].iov_base, std::min(part, pieces[0].iov_len));
     });
@@ -288,7 +288,7 @@ ZMC_EXPORT ssize_t writev(int file, const iovec* pieces, int number) {
 #define ZMC_PWRITE(name)                                                                    \
     ZMC_EXPORT ssize_t name(int file, const void* buffer, size_t size, off_t offset) {      \
         static const auto next = Next<ssize_t (*)(int, const void*, size_t, off_t)>(#name); \
-        return Transfer(testsupport::kWriteCall, file, size,                                \
+        return Transfer(zmctest::kWriteCall, file, size,                                    \
                         [&](size_t part) { return next(file, buffer, part, offset); });     \
     }
 ZMC_PWRITE(pwrite)
@@ -297,7 +297,7 @@ ZMC_PWRITE(pwrite64)
 // Calls that move nothing, by the descriptor or the path that they begin with.
 #define ZMC_CALL(kind, name, place, parameters, arguments, promise) \
     ZMC_EXPORT int name parameters promise {                        \
-        if (CallFails(testsupport::kind, place)) return -1;         \
+        if (CallFails(zmctest::kind, place)) return -1;             \
         static const auto next = Next<int(*) parameters>(#name);    \
         return next arguments;                                      \
     }
@@ -324,7 +324,7 @@ ZMC_CALL(kStatusCall, fstat64, file, (int file, struct stat64* status), (file, s
 // A descriptor is gone after close, failed or not.
 ZMC_EXPORT int close(int file) {
     static const auto next = Next<int (*)(int)>("close");
-    const bool fails = CallFails(testsupport::kCloseCall, file);
+    const bool fails = CallFails(zmctest::kCloseCall, file);
     const int error = errno;
     const int result = next(file);
     if (!fails) return result;
@@ -334,7 +334,7 @@ ZMC_EXPORT int close(int file) {
 
 ZMC_EXPORT int fclose(std::FILE* stream) {
     static const auto next = Next<int (*)(std::FILE*)>("fclose");
-    const bool fails = stream && CallFails(testsupport::kCloseCall, fileno(stream));
+    const bool fails = stream && CallFails(zmctest::kCloseCall, fileno(stream));
     const int error = errno;
     const int result = next(stream);
     if (!fails) return result;

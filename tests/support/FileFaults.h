@@ -15,7 +15,7 @@
 #include <string>
 #include <vector>
 
-namespace testsupport {
+namespace zmctest {
 
 // Kinds of calls, to be put together by |.
 enum FileCall : unsigned {
@@ -72,6 +72,6 @@ public:
                                              const std::string& countFile = {});
 };
 
-}  // namespace testsupport
+}  // namespace zmctest
 
 #endif

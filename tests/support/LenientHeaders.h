@@ -11,7 +11,7 @@
 
 #include "tests/support/PyramidFiles.h"
 
-namespace support {
+namespace zmctest {
 
 struct LenientHeader {
     const char* name;  // of the test
@@ -24,7 +24,7 @@ struct LenientHeader {
     static constexpr std::uint32_t kBands = 2;
 
     std::string Text() const {
-        zelm::test::HeaderText plain;
+        zmctest::HeaderText plain;
         plain.width = 600;
         plain.height = 500;
         plain.bands = kBands;
@@ -42,7 +42,7 @@ struct LenientHeader {
     }
     // A complete file, every byte of whose tiles is 1.
     std::string File() const {
-        return zelm::test::FileWithHeader(Text()) + std::string(TileBytes(), '\1');
+        return zmctest::FileWithHeader(Text()) + std::string(TileBytes(), '\1');
     }
 };
 
@@ -69,6 +69,6 @@ inline constexpr LenientHeader kLenientHeaders[] = {
     {"ALevelThatLooksLikeTheFirst", "<HEADER_LEVELMAX>1<", "<HEADER_LEVELMAX>32<", 600, 500, 0, 32},
 };
 
-}  // namespace support
+}  // namespace zmctest
 
 #endif

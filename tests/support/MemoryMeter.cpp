@@ -6,7 +6,7 @@
 #include <cstdlib>
 #include <new>
 
-namespace testsupport {
+namespace zmctest {
 namespace {
 
 struct State {
@@ -44,12 +44,12 @@ void MemoryMeter::Reset() { state = {}; }
 void MemoryMeter::Switch(bool on) { state.on = on; }
 std::int64_t MemoryMeter::Peak() { return state.peak; }
 
-}  // namespace testsupport
+}  // namespace zmctest
 
-using testsupport::Give;
-using testsupport::OrThrow;
-using testsupport::Take;
-using testsupport::TakeAligned;
+using zmctest::Give;
+using zmctest::OrThrow;
+using zmctest::Take;
+using zmctest::TakeAligned;
 
 void* operator new(std::size_t size) { return OrThrow(Take(size)); }
 void* operator new[](std::size_t size) { return OrThrow(Take(size)); }

@@ -8,7 +8,7 @@
 
 #include <cstdint>
 
-namespace testsupport {
+namespace zmctest {
 
 // For one thread at a time; other threads are not counted.
 struct MemoryMeter {
@@ -17,6 +17,6 @@ struct MemoryMeter {
     static std::int64_t Peak();  // most bytes in use at once since Reset
 };
 
-}  // namespace testsupport
+}  // namespace zmctest
 
 #endif

@@ -8,7 +8,9 @@
 #include "core/Array.h"
 #include "core/String.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 
 struct MemoryRasterText {
     std::string samples = "4", lines = "3", bands = "2", interleave = "2", pixelType = "1",
@@ -48,6 +50,6 @@ inline Array<String> Argument(std::initializer_list<std::string> elements) {
     return argument;
 }
 
-}  // namespace zelm::test
+}  // namespace zmctest
 
 #endif

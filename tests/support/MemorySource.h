@@ -15,7 +15,7 @@
 #include "host/raster/Module.h"
 #include "host/raster/RasterSource.h"
 
-namespace support {
+namespace zmctest {
 
 inline zmchost::ModulePtr TestModule() { return zmchost::Module::Load(ZMC_MODULE_PATH); }
 
@@ -74,6 +74,6 @@ private:
     }
 };
 
-}  // namespace support
+}  // namespace zmctest
 
 #endif

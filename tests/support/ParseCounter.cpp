@@ -50,8 +50,8 @@ void SAXParser::parse(const InputSource& source) {
 
 XERCES_CPP_NAMESPACE_END
 
-namespace support {
+namespace zmctest {
 
 std::size_t DocumentParses() { return parses; }
 
-}  // namespace support
+}  // namespace zmctest

@@ -8,10 +8,10 @@
 
 #include <cstddef>
 
-namespace support {
+namespace zmctest {
 
 std::size_t DocumentParses();
 
-}  // namespace support
+}  // namespace zmctest
 
 #endif

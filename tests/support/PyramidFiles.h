@@ -10,7 +10,9 @@
 #include "core/ElementTypes.h"
 #include "raster/RasterProps.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 
 // Calls visit(std::type_identity<T>{}) for each of the twelve element types.
 template <class Visit>
@@ -95,6 +97,6 @@ struct HeaderText {
     }
 };
 
-}  // namespace zelm::test
+}  // namespace zmctest
 
 #endif

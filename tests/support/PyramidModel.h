@@ -193,7 +193,7 @@ public:
 
     // A file that somebody else wrote.
     explicit PyramidModel(const std::filesystem::path& path) {
-        const std::string bytes = support::ReadText(path);
+        const std::string bytes = zmctest::ReadText(path);
         file.assign(bytes.begin(), bytes.end());
         if (file.size() < 20 || std::memcmp(file.data(), "KOBT", 4) != 0)
             throw std::runtime_error("not a pyramid");

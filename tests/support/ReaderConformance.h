@@ -31,7 +31,9 @@
 #include "raster/RasterReader.h"
 #include "tests/support/TileModel.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 
 template <class Fixture>
 class ReaderConformance : public ::testing::Test {
@@ -340,6 +342,6 @@ REGISTER_TYPED_TEST_SUITE_P(ReaderConformance, TellsItsRaster, PropertiesAreCopi
                             EmptyTilesMoveNothing, TakesNoDataValuesOfItsOwnBands,
                             MarksNoDataOnReading, StampsNoDataOnWriting);
 
-}  // namespace zelm::test
+}  // namespace zmctest
 
 #endif

@@ -11,7 +11,7 @@
 #include <sstream>
 #include <string>
 
-namespace support {
+namespace zmctest {
 
 class ScratchDirectory {
 public:
@@ -73,6 +73,6 @@ inline void WriteText(const std::string& name, const std::string& text) {
     std::ofstream(name, std::ios::binary) << text;
 }
 
-}  // namespace support
+}  // namespace zmctest
 
 #endif

@@ -13,7 +13,9 @@
 #include "core/ElementTypes.h"
 #include "core/PixelVocabulary.h"
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 
 inline constexpr std::int32_t kInterleaves[] = {Interleave::None, Interleave::BIP, Interleave::BIL,
                                                 Interleave::BSQ};
@@ -94,6 +96,6 @@ private:
     std::mt19937 engine;
 };
 
-}  // namespace zelm::test
+}  // namespace zmctest
 
 #endif

@@ -6,7 +6,9 @@
 
 #include <xercesc/util/PlatformUtils.hpp>
 
-namespace zelm::test {
+namespace zmctest {
+
+using namespace zelm;
 
 class XercesEnvironment : public ::testing::Environment {
 public:
@@ -17,6 +19,6 @@ public:
 inline ::testing::Environment* const kXercesEnvironment =
     ::testing::AddGlobalTestEnvironment(new XercesEnvironment);
 
-}  // namespace zelm::test
+}  // namespace zmctest
 
 #endif

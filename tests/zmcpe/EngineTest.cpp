@@ -40,11 +40,11 @@ protected:
 
 TEST_F(Engine, TakesEveryFormOfDefinition) {
     const std::string json =
-        support::RunChild({"projinfo", "-q", "-o", "PROJJSON", "EPSG:32633"}).out;
+        zmctest::RunChild({"projinfo", "-q", "-o", "PROJJSON", "EPSG:32633"}).out;
     const std::string wkt1 =
-        support::RunChild({"projinfo", "-q", "-o", "WKT1_GDAL", "EPSG:32633"}).out;
+        zmctest::RunChild({"projinfo", "-q", "-o", "WKT1_GDAL", "EPSG:32633"}).out;
     const std::string wkt2 =
-        support::RunChild({"projinfo", "-q", "-o", "WKT2:2019", "EPSG:32633"}).out;
+        zmctest::RunChild({"projinfo", "-q", "-o", "WKT2:2019", "EPSG:32633"}).out;
     ASSERT_THAT(json, StartsWith("{"));
     ASSERT_THAT(wkt1, StartsWith("PROJCS["));
     ASSERT_THAT(wkt2, StartsWith("PROJCRS["));
@@ -258,7 +258,7 @@ TEST_F(Engine, ThreadsShareObjects) {
 }
 
 TEST_F(Engine, DirectoriesOfTheHostStandBeforeThoseOfProj) {
-    const support::ScratchDirectory empty;
+    const zmctest::ScratchDirectory empty;
     String pe(empty.String().c_str());
     String gdal("Not Set");
     EXPECT_EQ(fp_Esri_Pe_Initialize(pe, gdal), 1);
@@ -270,14 +270,14 @@ TEST_F(Engine, DirectoriesOfTheHostStandBeforeThoseOfProj) {
 
 // Each is the first of its name that PROJ finds, and nothing that it can work with.
 TEST_F(Engine, UnusableDatabaseIsRefusedInSilenceAndForgottenAtTheNextCall) {
-    const support::ScratchDirectory scratch;
+    const zmctest::ScratchDirectory scratch;
     for (const char* kind : {"garbage", "empty", "folder"}) {
         const std::filesystem::path directory = scratch / kind;
         std::filesystem::create_directories(directory);
         if (kind == std::string("folder"))
             std::filesystem::create_directory(directory / "proj.db");
         else
-            support::WriteText(directory / "proj.db",
+            zmctest::WriteText(directory / "proj.db",
                                kind == std::string("empty") ? "" : std::string(5000, 'x'));
         String pe(directory.c_str());
         String none("Not Set");
@@ -292,7 +292,7 @@ TEST_F(Engine, UnusableDatabaseIsRefusedInSilenceAndForgottenAtTheNextCall) {
 }
 
 TEST(EngineLibrary, ExportsFourNamesAndNothingElse) {
-    const auto names = support::RunChild(
+    const auto names = zmctest::RunChild(
         {"nm", "-D", "--defined-only", "-f", "posix", ZMC_ENGINE_DIRECTORY "/libzmcpe.so"});
     ASSERT_EQ(names.status, 0) << names.err;
     std::vector<std::string> found;
@@ -305,7 +305,7 @@ TEST(EngineLibrary, ExportsFourNamesAndNothingElse) {
 }
 
 TEST(EngineLibrary, HandleMayOutliveTheDestructorsOfTheEngine) {
-    const auto result = support::RunChild({ZMC_LATE_HANDLE_PROBE, ZMC_ENGINE_DIRECTORY});
+    const auto result = zmctest::RunChild({ZMC_LATE_HANDLE_PROBE, ZMC_ENGINE_DIRECTORY});
     EXPECT_EQ(result.status, 0) << result.err;
     EXPECT_EQ(result.out, "bound\n");
 }

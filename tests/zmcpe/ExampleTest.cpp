@@ -23,7 +23,7 @@ std::vector<double> Numbers(const std::string& text) {
 }
 
 TEST(CoordSysExample, PrintsTheRastersSystemAndItsCornersAsGdalHasThem) {
-    const auto example = support::RunChild({ZMC_EXAMPLE, ZMC_ENGINE_DIRECTORY, kGrid, "EPSG:8857"});
+    const auto example = zmctest::RunChild({ZMC_EXAMPLE, ZMC_ENGINE_DIRECTORY, kGrid, "EPSG:8857"});
     ASSERT_EQ(example.status, 0) << example.err;
     EXPECT_THAT(example.out, testing::HasSubstr("name   WGS 84\n"));
     EXPECT_THAT(example.out, testing::HasSubstr("unit   degree, 1 degrees, code 9122\n"));
@@ -31,7 +31,7 @@ TEST(CoordSysExample, PrintsTheRastersSystemAndItsCornersAsGdalHasThem) {
     ASSERT_NE(corners, example.out.npos);
     const auto actual = Numbers(example.out.substr(corners + 21));
     const auto expected =
-        Numbers(support::RunChild(
+        Numbers(zmctest::RunChild(
                     {"gdaltransform", "-s_srs", "EPSG:4326", "-t_srs", "EPSG:8857", "-output_xy"},
                     {}, "-180 90\n179.75 90\n179.75 -90\n-180 -90\n")
                     .out);
@@ -44,9 +44,9 @@ TEST(CoordSysExample, PrintsTheRastersSystemAndItsCornersAsGdalHasThem) {
 }
 
 TEST(CoordSysExample, SaysWhatItCannotDo) {
-    EXPECT_NE(support::RunChild({ZMC_EXAMPLE, "/nowhere", kGrid}).status, 0);
-    EXPECT_NE(support::RunChild({ZMC_EXAMPLE, ZMC_ENGINE_DIRECTORY, "/nowhere.tif"}).status, 0);
-    EXPECT_NE(support::RunChild({ZMC_EXAMPLE, ZMC_ENGINE_DIRECTORY, kGrid, "nonsense"}).status, 0);
+    EXPECT_NE(zmctest::RunChild({ZMC_EXAMPLE, "/nowhere", kGrid}).status, 0);
+    EXPECT_NE(zmctest::RunChild({ZMC_EXAMPLE, ZMC_ENGINE_DIRECTORY, "/nowhere.tif"}).status, 0);
+    EXPECT_NE(zmctest::RunChild({ZMC_EXAMPLE, ZMC_ENGINE_DIRECTORY, kGrid, "nonsense"}).status, 0);
 }
 
 }  // namespace

@@ -15,7 +15,7 @@ TEST(LoadOrder, ModuleSiblingAndEngineInEveryOrder) {
             std::vector<std::string> command = {ZMC_LOAD_ORDER_PROBE};
             command.insert(command.end(), libraries.begin(), libraries.end());
             if (reverse) command.push_back("reverse");
-            const auto result = support::RunChild(command);
+            const auto result = zmctest::RunChild(command);
             EXPECT_EQ(result.status, 0) << libraries[0] << libraries[1] << result.err;
             EXPECT_EQ(result.out, "done\n");
             ++orders;

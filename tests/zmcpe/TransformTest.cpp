@@ -61,7 +61,7 @@ Point Swapped(const Point& point) { return {point[1], point[0]}; }
 
 Point ByGdal(const std::string& from, const std::string& to, const Point& point) {
     const auto result =
-        support::RunChild({"gdaltransform", "-s_srs", from, "-t_srs", to, "-output_xy"}, {},
+        zmctest::RunChild({"gdaltransform", "-s_srs", from, "-t_srs", to, "-output_xy"}, {},
                           Format(point[0], point[1]));
     EXPECT_EQ(result.status, 0) << result.err;
     return Parse(result.out);
@@ -70,7 +70,7 @@ Point ByGdal(const std::string& from, const std::string& to, const Point& point)
 // In and out in the order of the authority.
 Point ByProj(const std::string& from, const std::string& to, const Point& point) {
     const auto result =
-        support::RunChild({"cs2cs", "-f", "%.13f", from, to}, {}, Format(point[0], point[1]));
+        zmctest::RunChild({"cs2cs", "-f", "%.13f", from, to}, {}, Format(point[0], point[1]));
     EXPECT_EQ(result.status, 0) << result.err;
     return Parse(result.out);
 }
