@@ -31,7 +31,7 @@ if(ZMC_COVERAGE)
     # One way of a branch is told from the counts of the other and of both: threads may lose none.
     list(APPEND ZMC_INSTRUMENT_FLAGS -fprofile-instr-generate -fcoverage-mapping
          -fprofile-update=atomic
-         -fprofile-list=${CMAKE_CURRENT_LIST_DIR}/coverage.list)
+         -fprofile-list=${CMAKE_CURRENT_LIST_DIR}/counted-sources.list)
 endif()
 
 # The module works inside somebody else's process on files from anywhere: what the compiler, the C
