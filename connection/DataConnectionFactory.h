@@ -4,7 +4,14 @@
 // A connection argument is an array of strings: an optional format word ("MemoryRaster" or
 // "Pyramid") and the parameters. The order of the operations is fixed, the destructor last.
 // Nothing throws; failure is false or an empty pointer. A factory has no state, so calls may
-// overlap, and connections may outlive it.
+// overlap, and connections may outlive it. The module must stay loaded as long as anything that
+// came from it.
+//
+//     Array<String> argument;
+//     argument.Append(String("Pyramid"));
+//     argument.Append(String("/data/scene.pyr"));
+//     DataConnectionPtr connection = factory->Open(argument, GeoRefPtr(), MetadataPtr());
+//     if (!connection) ...   // not a pyramid, or not to be opened
 #ifndef ZMC_CONNECTION_DATACONNECTIONFACTORY_H
 #define ZMC_CONNECTION_DATACONNECTIONFACTORY_H
 
@@ -17,6 +24,7 @@ namespace zelm {
 
 class DataConnectionFactory {
 public:
+    // True: what this factory makes are connections to rasters, RasterDataConnection.
     virtual bool IsRasterFactory() = 0;
     // True if the argument could be opened here; the dataset itself is not touched.
     virtual bool Test(const Array<String>& connection) = 0;

@@ -1,5 +1,9 @@
-// Description of a coordinate system. Fields without a meaning of their own here are the engine's;
-// the order of the fields is fixed.
+// Description of a coordinate system, as the engine fills it in (DescribeCoordSys, through
+// BindCoordSys.h). A plain record, copied with its handle's owner; one thread at a time.
+//
+// Fields without a meaning of their own here are the engine's; the order of the fields is fixed,
+// since host and engine are compiled apart. The defaults are those of a system that nobody has
+// described: an unknown datum, in metres.
 #ifndef ZMC_COORDSYS_COORDSYSINFO_H
 #define ZMC_COORDSYS_COORDSYSINFO_H
 
@@ -19,13 +23,13 @@ struct CoordSysInfo {
     String thirdText;
     String datumName = "D_Unknown";
     String fifthText;
-    CoordSysParameter parameters[3];
-    String unitName = "Meter";
-    double unitFactor = 1.0;     // metres for a linear unit, degrees for an angular one
-    std::uint32_t unitKind = 0;  // 0: linear, 1: angular
-    std::int32_t unitCode = 9001;
+    CoordSysParameter parameters[3];  // of the projection, in the engine's order
+    String unitName = "Meter";        // of coordinates, as the engine calls it
+    double unitFactor = 1.0;          // metres for a linear unit, degrees for an angular one
+    std::uint32_t unitKind = 0;       // 0: linear, 1: angular
+    std::int32_t unitCode = 9001;     // EPSG code of the unit: 9001 is the metre
     String lastText;
-    std::byte block[128] = {};
+    std::byte block[128] = {};  // room of the engine's own
 };
 
 }  // namespace zelm

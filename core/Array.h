@@ -3,7 +3,16 @@
 // Elements lie in row-major order, the last dimension in use varying fastest; callers index `data`
 // by the shape, without bounds tests. A view allocates nothing and must not outlive its buffer.
 // An allocation that fails leaves the array empty with an error record; nothing is thrown, and the
-// array stays invalid from then on. Not synchronised.
+// array stays invalid from then on. One thread at a time may change an array; while nobody does,
+// any number may read it.
+//
+//     Array<int> bands;                       // owns what it gets
+//     bands.Append(2);
+//     Array<float> view(buffer, ArrayShape(480, 640));   // 480 lines of 640 samples, the caller's
+//     float sample = view.data[line * 640 + column];
+//
+// Counts of elements are 32-bit. T is copied by assignment; a T whose assignment throws lets that
+// exception out of whatever copies.
 #ifndef ZMC_CORE_ARRAY_H
 #define ZMC_CORE_ARRAY_H
 
@@ -24,11 +33,12 @@ public:
     // cppcheck-suppress duplInheritedMember ; each class has a code of its own by this name
     static const std::uint32_t typeCode;
 
-    T* data = nullptr;
-    ArrayShape shape;
+    T* data = nullptr;           // null while the array holds nothing
+    ArrayShape shape;            // how the elements are laid out; `shape.elements` of them count
     std::uint32_t capacity = 0;  // elements that fit in `data`
     bool owned = true;           // false: `data` belongs to somebody else
 
+    // Owns nothing yet: no elements, no dimensions.
     Array() = default;
 
     // A view of `elements` of the caller's buffer, which must outlive it.
@@ -45,6 +55,7 @@ public:
         }
     }
 
+    // Frees the elements of an owning array.
     ~Array() override {
         if (owned) delete[] data;
     }
@@ -75,11 +86,13 @@ public:
         return *this;
     }
 
+    // True for the code of this very instance of the template, and for that of Object.
     bool IsKindOf(std::uint32_t code) const override {
         return code == typeCode || code == Object::typeCode;
     }
 
-    // Frees the elements; a view is left as it is.
+    // Frees the elements: `data` is null, the shape ArrayShape::Emptied() and the capacity 0
+    // afterwards. A view is left as it is.
     void Clear() {
         if (!owned) return;
         delete[] data;
@@ -87,7 +100,10 @@ public:
     }
 
     // Makes a new buffer of `n` elements, default-constructed where T is a class and with values
-    // of no meaning otherwise. Neither frees the old buffer nor touches the shape.
+    // of no meaning otherwise. Neither frees the old buffer nor touches the shape: whoever calls it
+    // on an array that holds one keeps `data` beforehand and frees it. False, with the array empty
+    // and an error record of ObjectErrorOutOfMemory, if there is no memory for `n` elements or the
+    // constructor of one throws; an array without elements is no failure.
     bool Allocate(std::uint32_t n) {
         try {
             data = new (std::nothrow) T[n];
@@ -104,8 +120,10 @@ public:
         return false;
     }
 
-    // Moves to a buffer of `n` elements. The caller keeps the old `data` beforehand, and frees it
-    // afterwards whatever the answer. False on a view.
+    // Moves to a buffer of `n` elements, with as many of the old ones as fit; the shape stays. The
+    // caller keeps the old `data` beforehand, and frees it afterwards whatever the answer. False on
+    // a view, which is left as it is, and where Allocate fails. SetShape and Append do all of that
+    // by themselves.
     bool Reserve(std::uint32_t n) {
         if (!owned) return false;
         const T* const old = data;
@@ -115,7 +133,9 @@ public:
         return true;
     }
 
-    // A view refuses what does not fit in it; an owning array grows, keeping its elements.
+    // Takes another shape. An owning array that is too small for it grows, keeping its elements in
+    // their order in memory, and never shrinks its buffer; false where that fails, and the array is
+    // then empty. A view takes every shape that fits into its buffer, and refuses others by false.
     bool SetShape(const ArrayShape& newShape) {
         if (!owned) {
             if (newShape.elements > capacity) return false;
@@ -132,7 +152,9 @@ public:
         return allocated;
     }
 
-    // Grows by exactly one element; arrays that are appended to are short. False on a view.
+    // Puts a copy of `value` behind the last element, and makes the shape one of one dimension.
+    // Grows by exactly one element, so that n calls copy n * n / 2 elements: arrays that are
+    // appended to are short. False on a view, and without memory, which leaves the array empty.
     bool Append(const T& value) {
         if (!owned) return false;
         const std::uint32_t position = shape.elements;

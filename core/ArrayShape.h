@@ -1,4 +1,10 @@
 // ArrayShape: extent of a multi-dimensional array, up to eight dimensions, slowest first.
+//
+//     ArrayShape(3)             three elements in a row
+//     ArrayShape(480, 640)      480 lines of 640 samples: 2 dimensions, 307,200 elements
+//     ArrayShape(480, 640, 3)   the same with three bands in each pixel, interleaved by pixel
+//
+// A plain value: it allocates nothing, throws nothing and knows of no array.
 #ifndef ZMC_CORE_ARRAYSHAPE_H
 #define ZMC_CORE_ARRAYSHAPE_H
 
@@ -13,6 +19,7 @@ struct ArrayShape {
     std::uint32_t dimensions = 0;                                      // extents in use
     std::uint32_t elements = 0;                                        // product of the extents
 
+    // No dimensions and no elements.
     constexpr ArrayShape() = default;
 
     // Dimensions reach to the last extent that is not 0; every 0 is stored as 1. The product is
@@ -31,7 +38,7 @@ struct ArrayShape {
         elements = dimensions == 0 ? 0 : product;
     }
 
-    // The shape that Clear and a failed allocation leave behind.
+    // The shape that Array::Clear and a failed allocation leave behind: one dimension of 0.
     static constexpr ArrayShape Emptied() {
         ArrayShape shape;
         shape.extents[0] = 0;

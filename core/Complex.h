@@ -1,5 +1,7 @@
 // Complex<T>: the element type of complex rasters. Two adjacent T, real part first, as they lie in
-// memory and in files.
+// memory and in files. T is float (ComplexSingle, 8 bytes) or double (ComplexDouble, 16 bytes). No
+// arithmetic: the module computes no pixel, and a host takes the parts to a type of its own, with
+// which the layout of std::complex<T> agrees.
 #ifndef ZMC_CORE_COMPLEX_H
 #define ZMC_CORE_COMPLEX_H
 
@@ -7,9 +9,10 @@ namespace zelm {
 
 template <class T>
 struct Complex {
-    T re;
-    T im;
+    T re;  // real part
+    T im;  // imaginary part
 
+    // Zero, so that new arrays of it hold zeros.
     constexpr Complex() : re(0), im(0) {}
     constexpr Complex(T real, T imaginary) : re(real), im(imaginary) {}
 

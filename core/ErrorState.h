@@ -18,15 +18,19 @@ struct ErrorRecord {
 // The one bit of ErrorRecord::flags that is tested.
 inline constexpr std::uint32_t kErrorFlag = 4;
 
+// What an object can be told of its health: the base of the errors below. Hosts derive classes of
+// their own, with a code drawn by GloballyUniqueErrorCode (ObjectCodes.h).
 class ObjectErrorState {
 public:
-    std::uint32_t code;
+    std::uint32_t code;  // of the class, drawn once in the process
 
     explicit ObjectErrorState(std::uint32_t errorCode) : code(errorCode) {}
     virtual ~ObjectErrorState() = default;
+    // The record that SetError stores: here one without the flag of an error.
     virtual ErrorRecord GetState() const { return {0, code}; }
 };
 
+// One that makes the object it is stored in invalid.
 class ObjectError : public ObjectErrorState {
 public:
     using ObjectErrorState::ObjectErrorState;
@@ -47,9 +51,10 @@ public:
     RasterReaderErrorInvalid() : ObjectError(errorCode) {}
 };
 
+// What every class with a state of health derives from.
 class ErrorState {
 public:
-    ErrorRecord error;
+    ErrorRecord error;  // the last one stored
 
     ErrorState() = default;
     // A copy starts healthy, and assignment leaves the target's state: records are not copied.
@@ -58,6 +63,8 @@ public:
     ErrorState& operator=(const ErrorState&) { return *this; }
     virtual ~ErrorState() = default;
 
+    // Stores the record of `source`, in place of one that is there. Only whoever owns the object
+    // for the moment may call it: nothing is synchronised.
     void SetError(const ObjectErrorState& source) { error = source.GetState(); }
 };
 

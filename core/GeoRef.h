@@ -1,5 +1,12 @@
 // GeoRef: georeference of a raster, defined by the host. The module carries it and calls nothing
 // but the operations below.
+//
+// A host derives its own class, hands an object of it to Open in a GeoRefPtr, and finds a clone in
+// the properties of the raster (RasterProps::geoRef), which it casts back. Each record of
+// properties has a clone of its own, made and destroyed on the thread that copies the record: the
+// module calls it from no thread of its own. Both operations may throw; the record that was to
+// change is then as it was, and what crosses the module's interface is an invalid record instead of
+// the exception.
 #ifndef ZMC_CORE_GEOREF_H
 #define ZMC_CORE_GEOREF_H
 
@@ -12,12 +19,14 @@ namespace zelm {
 class GeoRef {
 public:
     virtual ~GeoRef() = default;
-    // A new object that the caller owns.
+    // A new object that the caller owns, of the same place on earth. Never null.
     virtual GeoRef* Clone() const = 0;
-    // Tells the size of the raster, in samples and lines.
+    // Tells the size of the raster, in samples and lines of level 0, whenever a record that holds
+    // this object takes another.
     virtual void SetRasterSize(std::uint32_t samples, std::uint32_t lines) = 0;
 };
 
+// Shares one georeference among its copies. Empty where a raster has none.
 class GeoRefPtr : public Pointer<GeoRef> {
 public:
     using Pointer::Pointer;

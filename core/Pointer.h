@@ -9,7 +9,17 @@
 // object of a derived class, only where that is sound: see CanStandFor.
 //
 // Copies may be made and dropped on several threads, as long as each Pointer variable is used by
-// one thread at a time.
+// one thread at a time. The object itself gets no lock from it.
+//
+// Nothing throws but the destructor of the object. Where the record cannot be allocated, the object
+// that was to be owned is destroyed at once, and the pointer is empty.
+//
+//     PalettePtr palette(new Palette);       // owns it
+//     PalettePtr other = palette;            // shares it: the count is 2
+//     if (palette) palette->Clear();
+//
+// The classes that a host meets derive a pointer class of their own from it (GeoRefPtr,
+// MetadataPtr, DataConnectionPtr, ...), which adds nothing but a name.
 #ifndef ZMC_CORE_POINTER_H
 #define ZMC_CORE_POINTER_H
 
@@ -22,8 +32,9 @@
 
 namespace zelm {
 
+// What all pointers to one object share. It goes with the last of them.
 struct ReferenceRecord {
-    std::atomic<std::uint32_t> count{0};
+    std::atomic<std::uint32_t> count{0};  // pointers that name this record
     // Untyped, because pointers to a class and to the base at its start share one record.
     void* object = nullptr;
     bool noDelete = false;  // the last release then frees the record and not the object
@@ -65,12 +76,14 @@ concept CanStandFor = !std::is_same_v<Derived, Base> && std::is_convertible_v<De
 template <class T>
 class Pointer {
 public:
-    ReferenceRecord* record = nullptr;
+    ReferenceRecord* record = nullptr;  // null after Release, and where memory ran out
 
-    // Takes ownership of `object`, which may be null.
+    // Takes ownership of `object`, which was made by `new` and may be null.
     explicit Pointer(T* object = nullptr) { Bind(object); }
+    // An object that the last release could not destroy by its own type is refused.
     template <class U>
     requires(!DestroyedThrough<U, T>) explicit Pointer(U* object) = delete;
+    // One more for the same object.
     Pointer(const Pointer& other) : record(other.record) { AddReference(); }
 
     // Shares the record of a pointer to a class of which T is a base.
@@ -81,6 +94,8 @@ public:
 
     virtual ~Pointer() { Release(); }
 
+    // Drops what it held and shares what `other` holds; assigning a pointer to itself changes
+    // nothing.
     Pointer& operator=(const Pointer& other) {
         if (this == &other) return *this;
         // The reference is taken first: releasing our object may destroy `other` itself.
@@ -91,6 +106,7 @@ public:
         return *this;
     }
 
+    // Drops what it held and takes ownership of `object`, with a new record.
     void Reset(T* object = nullptr) {
         Release();
         Bind(object);
@@ -114,10 +130,12 @@ public:
         record = nullptr;
     }
 
+    // The object, still owned by the pointers; null if this one is empty.
     T* Get() const { return record ? static_cast<T*>(record->object) : nullptr; }
-    // Only of pointers that are not empty.
+    // Only of pointers that are not empty, which nothing tests.
     T* operator->() const { return static_cast<T*>(record->object); }
     T& operator*() const { return *static_cast<T*>(record->object); }
+    // Whether it holds an object.
     explicit operator bool() const { return Get() != nullptr; }
 
 private:

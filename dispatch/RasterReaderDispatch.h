@@ -6,7 +6,11 @@
 //
 // A host reaches the typed reader by Visit, whatever the type:
 //     dispatch->Visit([&](auto& reader) { reader.ReadTile(...); });
-// or, when it knows the type, by As<T>() or the member itself.
+// or, when it knows the type, by As<T>() or the member itself:
+//     if (auto& reader = dispatch->As<float>()) reader->ReadTile(...);
+//
+// A reader belongs to one thread at a time, whichever way it was reached; so two threads that read
+// at once open a connection each.
 #ifndef ZMC_DISPATCH_RASTERREADERDISPATCH_H
 #define ZMC_DISPATCH_RASTERREADERDISPATCH_H
 
@@ -56,7 +60,8 @@ public:
         }
     }
 
-    // The pointer of element type T, which is empty unless T is the pixel type.
+    // The pointer of element type T, which is empty unless T is the pixel type. Copy it to keep the
+    // reader beyond the life of the dispatch.
     template <class T>
     const RasterReaderPtr<T>& As() const {
         return Member(std::type_identity<T>{});
@@ -73,6 +78,7 @@ private:
     void Bind(RasterReaderPtr<T>& member, RasterReaderPtr<T> reader);
 };
 
+// Shares one dispatch among its copies; what RasterDataConnection::GetReader gives.
 class RasterReaderDispatchPtr : public Pointer<RasterReaderDispatch> {
 public:
     using Pointer::Pointer;

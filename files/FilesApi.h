@@ -1,5 +1,6 @@
 // Marks what the library `zmcfiles` offers to others, and parts of that which stay inside; whatever
-// bears no mark stays inside too.
+// bears no mark stays inside too. A host needs nothing of it: the marks stand where classes and
+// functions are declared.
 #ifndef ZMC_FILES_FILESAPI_H
 #define ZMC_FILES_FILESAPI_H
 

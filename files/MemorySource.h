@@ -18,6 +18,7 @@ class ZMC_FILES_API MemorySource final : public ByteSource {
 public:
     using Bytes = std::vector<unsigned char>;
 
+    // Whether IsWritable answers true; a source that is not refuses writes with EBADF.
     enum class Access { ReadOnly, Writable };
 
     // What a source can grow to if nothing else is said: a write far behind its end takes all the
@@ -35,6 +36,7 @@ public:
     Bytes Content() const;
 
 protected:
+    // What the operations of ByteSource.h come down to, with the answers that are told there.
     Transfer DoReadAt(std::uint64_t offset, void* buffer, std::size_t size) override;
     // Beyond the limit nothing is moved, and ENOSPC says so of what lies before it as well.
     Transfer DoWriteAt(std::uint64_t offset, const void* buffer, std::size_t size) override;

@@ -3,7 +3,10 @@
 // Pure arithmetic: no file, no table. Level 0 is the full image, and every level has half the
 // columns and rows of the one before, truncated. The formulas are the file format
 // (docs/format.md). Sizes are unsigned 32-bit and wrap as such; offsets and products of sizes are
-// 64-bit.
+// 64-bit. Nothing throws, and any number of threads may use one.
+//
+//     LevelGeometry level(1000, 600, 256, 1);   // 500 x 300 pixels in 2 x 2 tiles
+//     level.Tile(1, 1);                         // {256, 256, 244, 44}
 #ifndef ZMC_FORMAT_LEVELGEOMETRY_H
 #define ZMC_FORMAT_LEVELGEOMETRY_H
 
@@ -38,18 +41,21 @@ struct LevelGeometry {
           lastWidth(samples + (1u - tilesAcross) * tileSide),
           lastHeight(lines + (1u - tilesDown) * tileSide) {}
 
+    // Size of the tiles of a column, or of a row, which the grid has.
     constexpr std::uint32_t TileWidth(std::uint32_t tileX) const {
         return tileX == tilesAcross - 1u ? lastWidth : tileSize;
     }
     constexpr std::uint32_t TileHeight(std::uint32_t tileY) const {
         return tileY == tilesDown - 1u ? lastHeight : tileSize;
     }
+    // All pixels of the level.
     constexpr Rectangle Whole() const { return {0, 0, samples, lines}; }
     // The pixels of a tile, which the grid has.
     constexpr Rectangle Tile(std::uint32_t tileX, std::uint32_t tileY) const {
         const std::uint32_t x = tileX * tileSize, y = tileY * tileSize;
         return {x, y, std::min(tileSize, samples - x), std::min(tileSize, lines - y)};
     }
+    // Whether the grid has this tile. Columns and rows of tiles count from 0.
     constexpr bool HasTile(std::uint32_t tileX, std::uint32_t tileY) const {
         return tileX < tilesAcross && tileY < tilesDown;
     }

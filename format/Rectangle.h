@@ -1,7 +1,9 @@
 // Rectangle: columns [x, x + width) and lines [y, y + height) of a level, in pixels of that level.
 //
 // One without width or height is empty. Its far edges may lie behind the last 32-bit number: all
-// questions are answered in 64 bits.
+// questions are answered in 64 bits. The one type for windows, tiles and parts of them; host and
+// driver know it by the name Window. A plain value: nothing throws, and any number of threads may
+// use one.
 #ifndef ZMC_FORMAT_RECTANGLE_H
 #define ZMC_FORMAT_RECTANGLE_H
 
@@ -11,11 +13,12 @@
 namespace zelm {
 
 struct Rectangle {
-    std::uint32_t x = 0;
-    std::uint32_t y = 0;
-    std::uint32_t width = 0;
-    std::uint32_t height = 0;
+    std::uint32_t x = 0;       // first column
+    std::uint32_t y = 0;       // first line
+    std::uint32_t width = 0;   // columns
+    std::uint32_t height = 0;  // lines
 
+    // The column behind the last, the line behind the last, and the number of pixels.
     constexpr std::uint64_t Right() const { return std::uint64_t{x} + width; }
     constexpr std::uint64_t Bottom() const { return std::uint64_t{y} + height; }
     constexpr std::uint64_t Pixels() const { return std::uint64_t{width} * height; }

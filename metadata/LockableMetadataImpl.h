@@ -1,4 +1,11 @@
 // The shared part of Metadata: a tree and the lock that serialises access to it.
+//
+// Whoever looks at the nodes, or changes them, holds the lock meanwhile, and takes nothing out of
+// the tree but copies:
+//     EnterCriticalSection(&metadata.impl->lock);
+//     const std::wstring text = metadata.impl->root.Format(L"");
+//     LeaveCriticalSection(&metadata.impl->lock);
+// An exception from in between would leave it locked, so a host puts the two calls into a guard.
 #ifndef ZMC_METADATA_LOCKABLEMETADATAIMPL_H
 #define ZMC_METADATA_LOCKABLEMETADATAIMPL_H
 
@@ -10,8 +17,8 @@ namespace zelm {
 
 // A plain structure: whoever makes one initialises `lock`, and the last release deletes it.
 struct LockableMetadataImpl {
-    MetadataContainer root;
-    CRITICAL_SECTION lock;  // to be held around every access to the nodes
+    MetadataContainer root;  // the tree, with the host's keys
+    CRITICAL_SECTION lock;   // to be held around every access to the nodes
 };
 
 // The structure has no virtual destructor, and its lock goes before its tree.
@@ -23,6 +30,7 @@ struct ObjectDestroyer<LockableMetadataImpl> {
     }
 };
 
+// Shares one tree among the handles on it.
 class LockableMetadataImplPtr : public Pointer<LockableMetadataImpl> {
 public:
     using Pointer::Pointer;

@@ -13,14 +13,15 @@ namespace zelm {
 
 class Metadata : public Object {
 public:
+    // The number of the class word "Metadata".
     // cppcheck-suppress duplInheritedMember ; each class has a code of its own by this name
     static const std::uint32_t typeCode;
 
     LockableMetadataImplPtr impl;  // holds no object if memory ran out
 
-    Metadata();  // a new, empty tree
-    Metadata(const Metadata& other);
-    Metadata& operator=(const Metadata& other);
+    Metadata();                                  // a new, empty tree
+    Metadata(const Metadata& other);             // shares the tree of `other`
+    Metadata& operator=(const Metadata& other);  // likewise, and lets go of its own
     ~Metadata() override;
 
     // Its own code alone: unlike other classes, Metadata does not answer to the code of Object.
@@ -28,6 +29,7 @@ public:
     String ToString() const override;  // "{Metadata}@" and the address
 };
 
+// Shares one handle among its copies; what hosts hand to Open.
 class MetadataPtr : public Pointer<Metadata> {
 public:
     using Pointer::Pointer;

@@ -1,5 +1,8 @@
 // RasterBandStats<T>: statistics of one band, as readers hand them out and pyramid files keep
-// them. The module computes none of the values.
+// them. The module computes none of the values: a host that stores them says what they are, and the
+// pixels that count are those which no rule marks as no-data (NoDataRule.h). Built files hold them
+// of level 0. T is the pixel type of the raster, complex types included, whose extremes have no
+// meaning.
 #ifndef ZMC_RASTER_RASTERBANDSTATS_H
 #define ZMC_RASTER_RASTERBANDSTATS_H
 
@@ -23,18 +26,18 @@ inline constexpr std::uint32_t All = 127;
 
 template <class T>
 struct RasterBandStats {
-    std::uint32_t band = 0;
+    std::uint32_t band = 0;   // from 0
     std::uint64_t count = 0;  // carried along, and lost on storing
     std::uint32_t flags = 0;  // a value whose flag is clear is absent, whatever its field says
-    T minimum{};
+    T minimum{};              // of the samples that count
     T maximum{};
-    double mean = 0;
-    double standardDeviation = 0;
+    double mean = 0;               // sum / number of samples
+    double standardDeviation = 0;  // of the population: sqrt(sumOfSquares / number - mean^2)
     double sum = 0;
     double sumOfSquares = 0;
-    double rootMeanSquare = 0;
-    Array<double> sumXY;       // carried along, and lost on storing
-    Array<double> covariance;  // likewise
+    double rootMeanSquare = 0;  // sqrt(sumOfSquares / number)
+    Array<double> sumXY;        // carried along, and lost on storing
+    Array<double> covariance;   // likewise
 };
 
 }  // namespace zelm

@@ -9,6 +9,13 @@
 //
 // `mask` has the tile's shape with one byte per sample. Bit 0 marks a sample that holds no valid
 // data; bits 1 to 7 are the caller's and never change, so the caller initialises the mask.
+//
+// A band list names bands from 0, each as often as wanted, in the order in which the tile holds
+// them. All buffers are the caller's and are used during the call alone.
+//
+// What a disk fails to read or write does not show in these answers, which say whether the call was
+// one that the reader takes. A host that has to know lends the file to the module and looks at the
+// record of the source that it lent (files/RecordingSource.h), as zmchost::Raster does.
 #ifndef ZMC_RASTER_RASTERREADER_H
 #define ZMC_RASTER_RASTERREADER_H
 
@@ -30,10 +37,18 @@ public:
     // The connection that built the reader: borrowed, not counted, and dangling once that has gone.
     RasterDataConnection* connection = nullptr;
 
+    // Borrowed as well; null for a reader without a connection.
     virtual RasterDataConnection* GetConnection() const = 0;
+    // The record at position `band` of those that are stored, whatever band it names: whoever
+    // stores all bands once, in one call and in their order, gets each by its number. A default
+    // record, with no flag set, where there is none.
     virtual RasterBandStats<T> GetBandStats(std::uint32_t band) const = 0;
+    // Stores records of any bands, in order. True of every pyramid, whatever the disk did; false of
+    // a memory raster, which keeps none.
     virtual bool SetBandStats(const Array<RasterBandStats<T>>& stats) = 0;
+    // All stored histograms, in the order of their storing; empty where there are none.
     virtual Array<RasterBandHistogram<T>> GetHistograms() const = 0;
+    // Stores histograms of any bands and levels, in order, with the answer of SetBandStats.
     virtual bool SetHistograms(const Array<RasterBandHistogram<T>>& histograms) = 0;
     // The band's no-data value as a pixel, truncated and cut to T; zero for a band without one.
     virtual T GetNoDataValue(std::uint32_t band) const = 0;
@@ -52,6 +67,7 @@ public:
                            T* buffer, unsigned char* mask) = 0;
 };
 
+// Shares one reader among its copies.
 template <class T>
 class RasterReaderPtr : public Pointer<RasterReader<T>> {
 public:

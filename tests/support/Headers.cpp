@@ -1,0 +1,1 @@
+// A program of no tests, whose precompiled headers all test programs share.
