@@ -127,10 +127,9 @@ public:
     // False, with nothing written, if memory ran out.
     bool WriteInterleaved(const unsigned char* buffer) {
         plan.block = plan.IsDirect() || plan.IsStrip();
-        if (!plan.block) return Write(buffer) && ExtendFile();
         // A list of some bands on the direct path: the tile's pixels take the new samples, and the
         // result goes behind the range that was read and not back to it. The tile stays as it was.
-        if (!plan.allInOrder) shift = plan.PlaneBytes();
+        if (plan.block && !plan.allInOrder) shift = plan.PlaneBytes();
         return Write(buffer);
     }
 
@@ -167,6 +166,7 @@ private:
             if (NeedsOld(segment)) old += segment.bytes;
             WriteSegment(piece, segment, run, buffer);
         });
+        if (!plan.block) ExtendFile();
         return true;
     }
 
@@ -225,14 +225,13 @@ private:
     }
 
     // A merged tile exists as a whole: where the file was shorter, the rest of it reads as zeros.
-    bool ExtendFile() const {
+    void ExtendFile() const {
         const std::uint32_t lastX = plan.LastTileX(), lastY = plan.LastTileY();
         const std::uint64_t end =
             PlaneStart(0, lastX, lastY) + std::uint64_t{plan.geometry.TileWidth(lastX)} *
                                               plan.geometry.TileHeight(lastY) * plan.tilePixelBytes;
         const unsigned char zero = 0;
         if (file.Size() < end) file.WriteAt(end - 1u, &zero, 1);
-        return true;
     }
 
     static constexpr std::uint64_t kMostWork = (std::uint64_t{1} << 32) - 1u;

@@ -17,10 +17,6 @@
 namespace zmctest {
 namespace {
 
-using zmctest::AllocationFaults;
-using zmctest::FaultMode;
-using zmctest::FaultScope;
-
 class AllocationFaultCampaign : public testing::TestWithParam<Layout> {
 protected:
     AllocationFaultCampaign() : session(GetParam()) {}

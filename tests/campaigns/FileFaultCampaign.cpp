@@ -18,10 +18,6 @@
 namespace zmctest {
 namespace {
 
-using zmctest::FileFault;
-using zmctest::FileFaultAction;
-using zmctest::FileFaults;
-
 struct Failing {
     const char* name;
     FileFaultAction action;

@@ -14,8 +14,6 @@
 
 namespace zmctest {
 
-using zmctest::Bytes;
-
 struct Rect {
     std::uint32_t x, y, width, height;
 };

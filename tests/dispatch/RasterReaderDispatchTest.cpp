@@ -14,9 +14,6 @@ namespace zmctest {
 using namespace zelm;
 namespace {
 
-using zmctest::CountingGeoRef;
-using zmctest::ThrowingClones;
-
 int BoundMembers(const RasterReaderDispatch& dispatch) {
     int bound = 0;
 #define ZMC_X(type, name, code) bound += dispatch.reader##name ? 1 : 0;

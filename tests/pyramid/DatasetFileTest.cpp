@@ -265,6 +265,9 @@ TEST_F(DatasetFileTest, TilesAboveTheLimitOpenAndRefuseTransfers) {
         ASSERT_TRUE(dataset);
         EXPECT_TRUE(dataset->File);
         EXPECT_FALSE(dataset->LevelOffsets);
+        EXPECT_FALSE(dataset->HasPyramid) << "opening ends before it looks";
+        EXPECT_TRUE(dataset->RefreshPyramidState());
+        EXPECT_TRUE(dataset->HasPyramid) << "any file is longer than no tiles at all";
         EXPECT_FALSE(dataset->AcceptsTile(0, 0, 10, 10, BandList({0}).View(), 0));
         Bytes buffer(100, 7);
         EXPECT_FALSE(ReadBytes(*dataset, 0, 0, 10, 10, BandList({0}), 0, buffer));

@@ -2,6 +2,7 @@
 #include <gtest/gtest.h>
 
 #include <cerrno>
+#include <filesystem>
 
 #include "core/PixelVocabulary.h"
 #include "pyramid/PyramidDataConnection.h"
@@ -15,9 +16,6 @@ namespace zmctest {
 
 using namespace zelm;
 namespace {
-
-using zmctest::FileFaultAction;
-using zmctest::FileFaults;
 
 class DiskFailureTest : public ::testing::Test {
 protected:
@@ -67,6 +65,25 @@ TEST_F(DiskFailureTest, PixelsAroundAPartialTileAreNotLost) {
     EXPECT_EQ(zmctest::ReadText(name), before);
     EXPECT_TRUE(dataset.WriteTileInterleaved(5, 5, 10, 10, bands, 0, pixels.data()));
     EXPECT_NE(zmctest::ReadText(name), before);
+}
+
+TEST_F(DiskFailureTest, MergeThatCannotReadDoesNotExtendTheFileEither) {
+    Make(256);
+    // Short of its last tile, into which the merge reaches.
+    std::filesystem::resize_file(name, std::filesystem::file_size(name) - 100);
+    const std::string before = zmctest::ReadText(name);
+    PyramidDataset dataset{String(name.c_str())};
+    ASSERT_FALSE(dataset.ReadHeader());
+    Array<int> bands;
+    bands.Append(0);
+    bands.Append(1);
+    const std::vector<unsigned char> pixels(200, 9);
+    {
+        const FileFaults faults = Fail(zmctest::kReadCall, 1);
+        EXPECT_TRUE(dataset.WriteTileInterleaved(257, 257, 10, 10, bands, 0, pixels.data()));
+        EXPECT_EQ(faults.Failed(), 1u);
+    }
+    EXPECT_TRUE(zmctest::ReadText(name) == before);
 }
 
 TEST_F(DiskFailureTest, BandsBesideTheListedOnesAreNotInvented) {

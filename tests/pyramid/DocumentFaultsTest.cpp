@@ -11,8 +11,6 @@ namespace zmctest {
 namespace {
 
 using zelm::PyramidXMLDocument;
-using zmctest::AllocationFaults;
-using zmctest::ForEachAllocationFailing;
 
 constexpr char kText[] = "<DATASET/>";
 

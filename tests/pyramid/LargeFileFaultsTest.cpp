@@ -11,9 +11,6 @@
 namespace zmctest {
 namespace {
 
-using zmctest::AllocationFaults;
-using zmctest::FaultMode;
-
 class LargeFileFaultsTest : public PyramidFileTest {
 protected:
     // Pixels of so many bands that a row of a tile does not fit in the work space, or a pixel.

@@ -12,11 +12,6 @@ namespace zmctest {
 namespace {
 
 using zelm::PyramidDataset;
-using zmctest::AllocationFaults;
-using zmctest::FileFault;
-using zmctest::FileFaultAction;
-using zmctest::FileFaults;
-using zmctest::ForEachAllocationFailing;
 
 class LayoutStateTest : public PyramidFileTest, public testing::WithParamInterface<std::uint32_t> {
 protected:

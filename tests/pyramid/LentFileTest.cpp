@@ -23,8 +23,6 @@ using zelm::files::LentName;
 using zelm::files::MemorySource;
 using zelm::files::OpenMode;
 using zelm::files::RecordingSource;
-using zmctest::FaultySource;
-using zmctest::SourceFault;
 
 class LentFileTest : public PyramidFileTest {
 protected:

@@ -13,11 +13,6 @@ namespace {
 
 using zelm::Array;
 using zelm::PyramidDataset;
-using zmctest::AllocationFaults;
-using zmctest::FileFault;
-using zmctest::FileFaultAction;
-using zmctest::FileFaults;
-using zmctest::ForEachAllocationFailing;
 
 constexpr std::uint32_t kSide = 20;
 

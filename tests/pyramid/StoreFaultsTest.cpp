@@ -13,10 +13,6 @@ namespace zmctest {
 using namespace zelm;
 namespace {
 
-using zmctest::FileFault;
-using zmctest::FileFaultAction;
-using zmctest::FileFaults;
-
 class StoreFaultsTest : public ::testing::Test {
 protected:
     StoreFaultsTest() {

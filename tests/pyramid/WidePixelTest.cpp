@@ -12,8 +12,6 @@
 namespace zmctest {
 namespace {
 
-using zmctest::MemoryMeter;
-
 class WidePixelTest : public PyramidFileTest {
 protected:
     // Most memory that `call` has in use.
@@ -70,6 +68,24 @@ TEST_F(WidePixelTest, OneSampleOfAHugePixelTakesLittle) {
     EXPECT_EQ(pixel[0], 0x403);
     EXPECT_EQ(pixel[1], 0);
     EXPECT_EQ(pixel[2], 0x201);
+}
+
+// One band of many, over parts of four tiles: all the pixels around would have to be held.
+TEST_F(WidePixelTest, MergeThatWouldHoldFourGigabytesIsRefused) {
+    zmctest::HeaderText header;
+    header.width = header.height = 400;
+    header.bands = 65537;
+    zmctest::WriteText(path.string(), zmctest::FileWithHeader(header.Text()));
+    const auto size = FileSize();
+    const auto dataset = Open();
+    ASSERT_TRUE(dataset);
+    const Bytes samples(std::size_t{300} * 300, 5);
+    bool written = true;
+    EXPECT_LT(
+        PeakOf([&] { written = WriteBytes(*dataset, 1, 1, 300, 300, BandList({2}), 0, samples); }),
+        kLittle);
+    EXPECT_FALSE(written);
+    EXPECT_EQ(FileSize(), size);
 }
 
 TEST_F(WidePixelTest, ReadsAsTheModelDoes) {

@@ -15,8 +15,6 @@ namespace zmctest {
 using namespace zelm;
 namespace {
 
-using zmctest::CountAllocations;
-
 template <class T>
 void ExpectNoAllocations(std::int32_t interleave) {
     std::vector<T> pixels = Samples<T>(16 * 9 * 3), tile(pixels.size());
