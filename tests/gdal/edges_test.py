@@ -129,7 +129,8 @@ class Options(FolderTest):
         for option in ("MEMORY=512M", "MEMORY=1G", "MEMORY=1gb", "MEMORY=524288K",
                        "MEMORY=536870912", "ORDERING=auto", "ORDERING=SCANLINE",
                        "ORDERING=Blocked", "LEVELS=AUTO", "LEVELS=0", "LEVELS=2", "BINS=7",
-                       "NUM_THREADS=ALL_CPUS", "NUM_THREADS=1", "RESAMPLING=near",
+                       "NUM_THREADS=ALL_CPUS", "NUM_THREADS=1",
+                       "NUM_THREADS=1000000", "NUM_THREADS=2147483647", "RESAMPLING=near",
                        "RESAMPLING=AVERAGE", "STATISTICS=NO"):
             with self.subTest(option):
                 self.made(option)
