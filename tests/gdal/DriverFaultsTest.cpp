@@ -8,6 +8,7 @@
 #include <csignal>
 #include <cstdlib>
 #include <filesystem>
+#include <functional>
 #include <vector>
 
 #include "gdal/Driver.h"
@@ -37,14 +38,15 @@ protected:
     static GDALDriver& Driver(const char* driver) {
         return *GetGDALDriverManager()->GetDriverByName(driver);
     }
-    static DatasetPtr Memory(int bands) {
-        DatasetPtr dataset(Driver("MEM").Create("", kSide, kSide, bands, GDT_Byte, nullptr));
-        for (int band = 1; band <= bands; ++band) Fill(*dataset, band, band);
+    // Its bands hold their numbers.
+    static DatasetPtr Memory(int bands, int side) {
+        DatasetPtr dataset(Driver("MEM").Create("", side, side, bands, GDT_Byte, nullptr));
+        for (int band = 1; band <= bands; ++band) dataset->GetRasterBand(band)->Fill(band);
         return dataset;
     }
-    // A pyramid of one tile whose bands hold their numbers.
-    void Make(int bands, GDALColorTable* table = nullptr) const {
-        const DatasetPtr source = Memory(bands);
+    // A pyramid of that, of one tile as a rule.
+    void Make(int bands, GDALColorTable* table = nullptr, int side = kSide) const {
+        const DatasetPtr source = Memory(bands, side);
         if (table) source->GetRasterBand(1)->SetColorTable(table);
         ASSERT_TRUE(DatasetPtr(
             Driver("ZMCPyramid")
@@ -53,9 +55,10 @@ protected:
     DatasetPtr Open(unsigned flags = 0) const {
         return DatasetPtr(GDALDataset::Open(name.c_str(), GDAL_OF_RASTER | flags));
     }
-    static CPLErr Fill(GDALDataset& dataset, int band, int value) {
+    // As large a part of a band as is read below.
+    static CPLErr Fill(GDALDataset& dataset, int band, int value, int x = 0, int y = 0) {
         Samples samples(std::size_t{kSide} * kSide, static_cast<unsigned char>(value));
-        return dataset.GetRasterBand(band)->RasterIO(GF_Write, 0, 0, kSide, kSide, samples.data(),
+        return dataset.GetRasterBand(band)->RasterIO(GF_Write, x, y, kSide, kSide, samples.data(),
                                                      kSide, kSide, GDT_Byte, 0, 0, nullptr);
     }
     static Samples Read(GDALDataset& dataset, int band) {
@@ -167,6 +170,55 @@ TEST_F(DriverFaults, WhatAWriteThatFailedHasLeftIsReadFromTheFile) {
     EXPECT_NE(std::find(torn.begin(), torn.end(), 22), torn.end());
     EXPECT_NE(std::find(torn.begin(), torn.end(), 2), torn.end());
     EXPECT_EQ(Read(*dataset, 2), torn);
+}
+
+TEST_F(DriverFaults, LevelsAreNotMadeOfPixelsThatCouldNotBeWritten) {
+    Make(1, nullptr, 600);
+    const DatasetPtr dataset = Open(GDAL_OF_UPDATE);
+    ASSERT_TRUE(dataset);
+    Fill(*dataset, 1, 9);
+    const FileFaults faults(
+        {folder.String(), zmctest::kWriteCall, 1, false, FileFaultAction::Error, ENOSPC});
+    const int factors[] = {2};
+    EXPECT_EQ(dataset->BuildOverviews("AVERAGE", 1, factors, 0, nullptr, nullptr, nullptr),
+              CE_Failure);
+    EXPECT_EQ(faults.Failed(), 1u);
+}
+
+TEST_F(DriverFaults, LevelsThatWereRenewedBeforeAFailureAreSeen) {
+    Make(1, nullptr, 1200);
+    const DatasetPtr dataset = Open(GDAL_OF_UPDATE);
+    ASSERT_TRUE(dataset);
+    for (int y = 0; y < 1200; y += kSide)
+        for (int x = 0; x < 1200; x += kSide) Fill(*dataset, 1, 9, x, y);
+    dataset->FlushCache(false);
+    // Whoever looks on meanwhile leaves what he saw in GDAL's cache.
+    const auto last = [](GDALDataset& looked) {
+        unsigned char sample = 0;
+        EXPECT_EQ(looked.GetRasterBand(1)->GetOverview(0)->RasterIO(
+                      GF_Read, 599, 599, 1, 1, &sample, 1, 1, GDT_Byte, 0, 0, nullptr),
+                  CE_None);
+        return sample;
+    };
+    const auto look = [](double, const char*, void* data) -> int {
+        (*static_cast<std::function<void()>*>(data))();
+        return TRUE;
+    };
+    std::function<void()> looking = [&, looked = false]() mutable {
+        EXPECT_EQ(looked ? 1 : last(*dataset), 1);
+        looked = true;
+    };
+    {
+        // The first level has nine tiles.
+        const FileFaults faults(
+            {folder.String(), zmctest::kWriteCall, 10, true, FileFaultAction::Error, ENOSPC});
+        const int factors[] = {2, 4};
+        EXPECT_EQ(dataset->BuildOverviews("AVERAGE", 2, factors, 0, nullptr, look, &looking),
+                  CE_Failure);
+        EXPECT_GT(faults.Failed(), 0u);
+    }
+    EXPECT_EQ(last(*Open()), 9);
+    EXPECT_EQ(last(*dataset), 9);
 }
 
 TEST_F(DriverFaults, NewFileWithoutSomeOfItsBlocksIsNotMade) {
