@@ -1,9 +1,8 @@
 #include "format/NumberText.h"
 
-#include <algorithm>
 #include <limits>
-#include <locale>
-#include <sstream>
+
+#include "platform/ParseNumber.h"
 
 namespace zelm {
 namespace {
@@ -40,28 +39,6 @@ std::int64_t ReadWhole(std::string_view text) {
     return negative ? -static_cast<std::int64_t>(magnitude) : static_cast<std::int64_t>(magnitude);
 }
 
-// A hexadecimal number without its prefix, whose value no double holds: infinity, or nothing. It is
-// hundreds of binary places away from 1, so the place of its first digit tells which.
-double HexadecimalOutOfRange(std::string_view text) {
-    const std::size_t mark = text.find_first_of("pP");
-    const std::string_view digits = text.substr(0, mark);
-    const auto point = static_cast<std::int64_t>(std::min(digits.find('.'), digits.size()));
-    const auto first = static_cast<std::int64_t>(digits.find_first_not_of("0."));
-    const std::int64_t power =
-        mark == std::string_view::npos ? 0 : ReadWhole(text.substr(mark + 1));
-    return point - first + power / 4 > 0 ? std::numeric_limits<double>::infinity() : 0;
-}
-
-// A decimal whose value no double holds: infinity, or the nearest to nothing.
-double ReadOutOfRange(std::string_view text) {
-    std::istringstream stream{std::string(text)};
-    stream.imbue(std::locale::classic());
-    double value = 0;
-    stream >> value;
-    return value == std::numeric_limits<double>::max() ? std::numeric_limits<double>::infinity()
-                                                       : value;
-}
-
 // False if the text does not begin with a number.
 bool ReadMagnitude(std::string_view text, double& value) {
     // The numbers that from_chars reads have a sign of their own.
@@ -72,8 +49,9 @@ bool ReadMagnitude(std::string_view text, double& value) {
         std::from_chars(text.data(), text.data() + text.size(), value,
                         hexadecimal ? std::chars_format::hex : std::chars_format::general);
     if (end.ec == std::errc::result_out_of_range) {
-        text = text.substr(0, static_cast<std::size_t>(end.ptr - text.data()));
-        value = hexadecimal ? HexadecimalOutOfRange(text) : ReadOutOfRange(text);
+        // Infinity, or the nearest to nothing, which from_chars does not tell.
+        const std::string number(text.data(), end.ptr);
+        value = platform::ParseReal(((hexadecimal ? "0x" : "") + number).c_str());
     }
     return end.ec != std::errc::invalid_argument;
 }

@@ -36,13 +36,17 @@ struct PyramidLayout {
     // of use in the tables, if memory ran out.
     bool LayOut();
 
+    // Whether files of that version can be complete: those of 1.1 and later.
+    static bool MayHaveLevels(std::uint32_t versionMajor, std::uint32_t versionMinor) {
+        return versionMajor > 1 || (versionMajor == 1 && versionMinor > 0);
+    }
+
     // Whether a file of that size counts as complete: it reaches the end of its tile data, and its
     // version is 1.1 or later. Files of version 1.0 never do, however long they are, and none that
     // does not tell its size.
     static bool IsComplete(std::uint32_t versionMajor, std::uint32_t versionMinor,
                            std::uint64_t tileDataEnd, std::optional<std::uint64_t> fileSize) {
-        const bool outdated = versionMajor == 0 || (versionMajor == 1 && versionMinor == 0);
-        return !outdated && fileSize && *fileSize >= tileDataEnd;
+        return MayHaveLevels(versionMajor, versionMinor) && fileSize && *fileSize >= tileDataEnd;
     }
 };
 

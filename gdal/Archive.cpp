@@ -103,36 +103,45 @@ Archive::Archive(LazyRaster& pyramid, bool hasDocument)
     : raster(pyramid), documentExists(hasDocument) {}
 
 const StoredStatistics* Archive::Statistics(std::uint32_t band) {
-    if (!documentExists) return nullptr;
-    auto found = statistics.find(band);
-    if (found == statistics.end()) found = statistics.emplace(band, FetchStatistics(band)).first;
-    return found->second ? &*found->second : nullptr;
+    if (!RemembersStatistics(band)) FetchStatistics(band);
+    const auto found = statistics.find(band);
+    return found != statistics.end() && found->second ? &*found->second : nullptr;
+}
+
+bool Archive::RemembersStatistics(std::uint32_t band) const {
+    return !documentExists || statistics.count(band) != 0;
 }
 
 template <class Look>
-void Archive::LookAtRecords(Look&& look) const {
-    raster.Visit([&]<class T>(zelm::RasterReader<T>&) { look(*raster.Get().Records<T>()); });
+bool Archive::LookAtRecords(Look&& look) const {
+    bool settled = false;
+    const bool told = raster.Visit([&]<class T>(zelm::RasterReader<T>&) {
+        const auto records = raster.Get().Records<T>();
+        look(*records);
+        settled = records->IsSettled();
+    });
+    return told && settled;
 }
 
-std::optional<StoredStatistics> Archive::FetchStatistics(std::uint32_t band) const {
+void Archive::FetchStatistics(std::uint32_t band) {
     std::optional<StoredStatistics> newest;
-    LookAtRecords([&](const auto& records) {
+    const bool known = LookAtRecords([&](const auto& records) {
         if (const auto* const record = records.NewestStatistics(band)) newest = Convert(*record);
     });
-    return newest;
+    if (known) statistics.emplace(band, newest);
 }
 
-std::vector<StoredHistogram> Archive::FetchHistograms() const {
+void Archive::FetchHistograms() {
     std::vector<StoredHistogram> found;
-    LookAtRecords([&](const auto& records) {
+    const bool known = LookAtRecords([&](const auto& records) {
         for (const auto& record : records.Histograms()) found.push_back(Convert(record));
     });
-    return found;
+    if (known) histograms = std::move(found);
 }
 
 const StoredHistogram* Archive::Histogram(std::uint32_t band, std::uint32_t level) {
-    if (!documentExists) return nullptr;
-    if (!histograms) histograms = FetchHistograms();
+    if (documentExists && !histograms) FetchHistograms();
+    if (!histograms) return nullptr;
     const auto newest = std::find_if(histograms->rbegin(), histograms->rend(), [&](auto& each) {
         return each.band == band && each.level == level && !each.counts.empty();
     });
@@ -140,32 +149,32 @@ const StoredHistogram* Archive::Histogram(std::uint32_t band, std::uint32_t leve
 }
 
 GDALColorTable* Archive::ColorTable(std::uint32_t band) {
-    if (!documentExists) return nullptr;
-    auto found = colorTables.find(band);
-    if (found == colorTables.end()) found = colorTables.emplace(band, FetchColorTable(band)).first;
-    return found->second.get();
+    if (documentExists && colorTables.count(band) == 0) FetchColorTable(band);
+    const auto found = colorTables.find(band);
+    return found == colorTables.end() ? nullptr : found->second.get();
 }
 
-std::unique_ptr<GDALColorTable> Archive::FetchColorTable(std::uint32_t band) const {
+void Archive::FetchColorTable(std::uint32_t band) {
     std::unique_ptr<GDALColorTable> table;
-    LookAtRecords([&](const auto& records) {
+    const bool known = LookAtRecords([&](const auto& records) {
         if (const zelm::Palette* const palette = records.BandPalette(band))
             table = TableOf(*palette);
     });
-    return table;
+    if (known) colorTables.emplace(band, std::move(table));
 }
 
-// The module's setters answer true for a file that they cannot write.
+// The module's setters answer true for a file that they cannot write. A store that fails may have
+// left a document where there was none.
 template <class Setter>
 bool Archive::Store(Setter&& setter) {
     bool stored = false;
     raster.Visit([&](auto& reader) {
         if (!raster.Get().IsWritable()) return;
         bool taken = false;
+        documentExists = true;
         raster.Get().Store([&] { taken = setter(reader); });
         stored = taken;
     });
-    documentExists |= stored;
     return stored;
 }
 

@@ -1,8 +1,9 @@
 // Archive: the statistics, histograms and palettes that a pyramid file keeps, in GDAL's terms.
 //
 // Everything is fetched when it is first asked for and then remembered; the document is parsed once
-// for all bands (Raster::Records). Bands count from 0. A file keeps every record ever stored; the
-// newest one of a band counts here.
+// for all bands (Raster::Records). What could not be fetched, since the disk failed or another
+// process is storing, is asked for again. Bands count from 0. A file keeps every record ever
+// stored; the newest one of a band counts here.
 #ifndef ZMC_GDAL_ARCHIVE_H
 #define ZMC_GDAL_ARCHIVE_H
 
@@ -48,6 +49,8 @@ public:
     const StoredStatistics* Statistics(std::uint32_t band);
     const StoredHistogram* Histogram(std::uint32_t band, std::uint32_t level);
     GDALColorTable* ColorTable(std::uint32_t band);
+    // Whether what Statistics gave last for that band will be given again.
+    bool RemembersStatistics(std::uint32_t band) const;
 
     // Appends a record to the file; false if the module did not take it.
     bool StoreStatistics(std::uint32_t band, const StoredStatistics& statistics);
@@ -65,12 +68,13 @@ private:
     // Lets `setter(reader)` store; false where the file cannot be written or it answers false.
     template <class Setter>
     bool Store(Setter&& setter);
-    // Calls look(zmchost::StoredRecords<T>). What is thrown goes to GDAL as a failure.
+    // Calls look(zmchost::StoredRecords<T>). What is thrown goes to GDAL as a failure. False if
+    // what was seen, or was not, may be something else the next time.
     template <class Look>
-    void LookAtRecords(Look&& look) const;
-    std::optional<StoredStatistics> FetchStatistics(std::uint32_t band) const;
-    std::vector<StoredHistogram> FetchHistograms() const;
-    std::unique_ptr<GDALColorTable> FetchColorTable(std::uint32_t band) const;
+    bool LookAtRecords(Look&& look) const;
+    void FetchStatistics(std::uint32_t band);
+    void FetchHistograms();
+    void FetchColorTable(std::uint32_t band);
 };
 
 }  // namespace zmcgdal

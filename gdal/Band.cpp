@@ -98,11 +98,22 @@ std::size_t Band::BlockNumber(int blockX, int blockY) const {
            static_cast<std::size_t>(blockX);
 }
 
-// Blocks that nobody wrote hold the no-data value, or zeros.
+// Blocks that nobody wrote hold the no-data value, to its last digit, or zeros.
 void Band::FillUnwritten(void* samples, std::size_t stride, std::size_t count) {
-    const double value = NoDataAsDouble(*this).value_or(0.0);
-    GDALCopyWords64(&value, GDT_Float64, 0, samples, eDataType, static_cast<int>(stride),
-                    static_cast<GPtrDiff_t>(count));
+    const auto fill = [&](auto value, GDALDataType type) {
+        GDALCopyWords64(&value, type, 0, samples, eDataType, static_cast<int>(stride),
+                        static_cast<GPtrDiff_t>(count));
+    };
+    int has = FALSE;
+    if (eDataType == GDT_Int64) {
+        const std::int64_t value = GetNoDataValueAsInt64(&has);
+        fill(has ? value : 0, GDT_Int64);
+    } else if (eDataType == GDT_UInt64) {
+        const std::uint64_t value = GetNoDataValueAsUInt64(&has);
+        fill(has ? value : 0, GDT_UInt64);
+    } else {
+        fill(NoDataAsDouble(*this).value_or(0.0), GDT_Float64);
+    }
 }
 
 // Copies the part of a padded block that lies in the tile, at `stride` bytes per pixel.
@@ -118,14 +129,12 @@ void Band::CopyFromBlock(const void* block, const zelm::Rectangle& tile, unsigne
 }
 
 // Puts this band's samples of a tile where they belong in whole pixels: from a block that waits in
-// the cache, which is written by this, else from the file, else what an unwritten block holds.
+// the cache, which goes to `waiting`, else from the file, else what an unwritten block holds.
 void Band::CompleteTile(int blockX, int blockY, const zelm::Rectangle& tile, unsigned char* samples,
-                        std::size_t stride) {
+                        std::size_t stride, WaitingBlocks& waiting) {
     if (GDALRasterBlock* const block = TryGetLockedBlockRef(blockX, blockY)) {
+        waiting.push_back({LockedBlock(block), this});
         CopyFromBlock(block->GetDataRef(), tile, samples, stride);
-        if (block->GetDirty()) DropSidecarStatistics();
-        block->MarkClean();
-        block->DropLock();
         return;
     }
     const Creation* const creation = owner.UnderCreation();
@@ -143,7 +152,8 @@ void Band::CompleteTile(int blockX, int blockY, const zelm::Rectangle& tile, uns
 
 // The tile as the file holds it, with all bands where they lie together; `bands` tells which.
 std::vector<unsigned char> Band::GatherTile(int blockX, int blockY, const zelm::Rectangle& tile,
-                                            const void* data, std::vector<std::uint32_t>& bands) {
+                                            const void* data, std::vector<std::uint32_t>& bands,
+                                            WaitingBlocks& waiting) {
     const zmchost::Raster& raster = owner.File().raster.Get();
     if (owner.File().tiles.IsPixelInterleaved())
         bands = raster.AllBands();
@@ -158,11 +168,17 @@ std::vector<unsigned char> Band::GatherTile(int blockX, int blockY, const zelm::
             CopyFromBlock(data, tile, first, stride);
         else
             static_cast<Band*>(owner.GetRasterBand(static_cast<int>(band) + 1))
-                ->CompleteTile(blockX, blockY, tile, first, stride);
+                ->CompleteTile(blockX, blockY, tile, first, stride, waiting);
         first += size;
     }
     if (IsWidened(raster.PixelType(), eDataType)) NarrowSamples(samples);
     return samples;
+}
+
+// Its samples are in the file with those of its tile.
+void Band::WaitingBlock::Settle() const {
+    if (block->GetDirty()) band->DropSidecarStatistics();
+    block->MarkClean();
 }
 
 // Nobody takes them for the new pixels. A sidecar without any is not written for this.
@@ -176,17 +192,21 @@ void Band::DropSidecarStatistics() {
 CPLErr Band::IWriteBlock(int blockX, int blockY, void* data) {
     TileReader& tiles = owner.File().tiles;
     const zelm::Rectangle tile = tiles.TileAt(owner.Level(), blockX, blockY);
+    Creation* const creation = owner.UnderCreation();
     try {
         std::vector<std::uint32_t> bands;
-        const auto samples = GatherTile(blockX, blockY, tile, data, bands);
-        owner.File().raster.Get().Write(owner.Level(), tile, bands, samples.data());
+        WaitingBlocks waiting;
+        const auto samples = GatherTile(blockX, blockY, tile, data, bands, waiting);
+        // What a write that fails leaves in the tile is anything.
         tiles.Forget();
+        owner.File().raster.Get().Write(owner.Level(), tile, bands, samples.data());
         DropSidecarStatistics();
-        if (Creation* const creation = owner.UnderCreation())
-            for (const std::uint32_t band : bands)
-                creation->MarkWritten(BlockNumber(blockX, blockY), band);
+        for (const WaitingBlock& other : waiting) other.Settle();
+        for (const std::uint32_t band : bands)
+            if (creation) creation->MarkWritten(BlockNumber(blockX, blockY), band);
         return CE_None;
     } catch (const std::exception& error) {
+        if (creation) creation->MarkLost(BlockNumber(blockX, blockY), index);
         ReportError(CE_Failure, CPLE_FileIO, "%s", error.what());
         return CE_Failure;
     }
@@ -330,9 +350,9 @@ const StoredStatistics* Band::Stored() {
 
 const CPLStringList& Band::StatisticsItems() {
     if (statisticsFetched) return statistics;
-    statisticsFetched = true;
     statistics.Clear();
     const StoredStatistics* const stored = Stored();
+    statisticsFetched = owner.IsOverview() || owner.File().archive.RemembersStatistics(index);
     if (!stored) return statistics;
     const auto set = [&](std::uint32_t flag, const char* name, double value) {
         if (stored->flags & flag) statistics.SetNameValue(name, NumberText(value).c_str());
@@ -417,12 +437,14 @@ CPLErr Band::GetDefaultHistogram(double* lower, double* upper, int* bucketCount,
     if (!stored)
         return GDALPamRasterBand::GetDefaultHistogram(lower, upper, bucketCount, counts, force,
                                                       progress, progressData);
+    auto* const copy =
+        static_cast<GUIntBig*>(VSI_MALLOC2_VERBOSE(stored->counts.size(), sizeof(GUIntBig)));
+    if (!copy) return CE_Failure;
+    std::copy(stored->counts.begin(), stored->counts.end(), copy);
     *lower = stored->lower;
     *upper = stored->upper;
     *bucketCount = static_cast<int>(stored->counts.size());
-    *counts = static_cast<GUIntBig*>(VSIMalloc2(stored->counts.size(), sizeof(GUIntBig)));
-    if (!*counts) return CE_Failure;
-    std::copy(stored->counts.begin(), stored->counts.end(), *counts);
+    *counts = copy;
     return CE_None;
 }
 

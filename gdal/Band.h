@@ -75,14 +75,28 @@ private:
     CPLStringList merged;  // statistics and the sidecar's metadata
     CPLStringList structure;
 
+    struct DropLock {
+        void operator()(GDALRasterBlock* block) const { block->DropLock(); }
+    };
+    using LockedBlock = std::unique_ptr<GDALRasterBlock, DropLock>;
+    // A block of another band whose samples go into the file with those of this one. It stays what
+    // it was, waiting to be written, until they are there.
+    struct WaitingBlock {
+        LockedBlock block;
+        Band* band;
+        void Settle() const;
+    };
+    using WaitingBlocks = std::vector<WaitingBlock>;
+
     std::size_t BlockNumber(int blockX, int blockY) const;
     void FillUnwritten(void* samples, std::size_t stride, std::size_t count);
     void CopyFromBlock(const void* block, const zelm::Rectangle& tile, unsigned char* samples,
                        std::size_t stride) const;
     void CompleteTile(int blockX, int blockY, const zelm::Rectangle& tile, unsigned char* samples,
-                      std::size_t stride);
+                      std::size_t stride, WaitingBlocks& waiting);
     std::vector<unsigned char> GatherTile(int blockX, int blockY, const zelm::Rectangle& tile,
-                                          const void* data, std::vector<std::uint32_t>& bands);
+                                          const void* data, std::vector<std::uint32_t>& bands,
+                                          WaitingBlocks& waiting);
 
     void DropSidecarStatistics();
     Band* MainBand();

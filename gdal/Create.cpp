@@ -46,6 +46,23 @@ void UseProgress(zmchost::BuildOptions& options, GDALProgressFunc progress, void
     };
 }
 
+// A target whose sidecar cannot be written goes again, with what there is of that.
+class Unfinished {
+public:
+    explicit Unfinished(const std::string& target) : name(target) {}
+    ~Unfinished() {
+        for (const char* const ending : {"", ".aux.xml", ".msk"})
+            if (!kept) VSIUnlink((name + ending).c_str());
+    }
+    Unfinished(const Unfinished&) = delete;
+    Unfinished& operator=(const Unfinished&) = delete;
+    void Keep() { kept = true; }
+
+private:
+    const std::string& name;
+    bool kept = false;
+};
+
 std::unique_ptr<Dataset> OpenForUpdate(const std::string& name) {
     auto file = std::make_shared<OpenFile>(name, GA_Update, OpenOptions{});
     auto dataset = Dataset::FromFile(std::move(file), GA_Update);
@@ -59,9 +76,11 @@ GDALDataset* CopyTo(const std::string& target, GDALDataset& source, bool strict,
     if (!AcceptLosses(pixels, strict)) return nullptr;
     UseProgress(options.build, progress, progressData);
     zmchost::PyramidBuilder(SharedModule()).Build(pixels, target, options.build);
+    Unfinished made(target);
     auto dataset = OpenForUpdate(target);
     if (CopySidecar(source, *dataset, strict) != CE_None) return nullptr;
     dataset->FlushCache(false);
+    made.Keep();
     return dataset.release();
 }
 
@@ -86,8 +105,10 @@ GDALDataset* OpenSpool(const std::string& target, const zmchost::Raster& raster,
     auto file = std::make_shared<OpenFile>(spool->Path(), GA_Update, open);
     auto dataset = Dataset::FromFile(std::move(file), GA_Update);
     dataset->SetDescription(target.c_str());
-    dataset->BeginCreation(std::make_unique<Creation>(target, std::move(options), std::move(spool),
-                                                      blocks, std::size_t{raster.Bands()}));
+    auto creation = std::make_unique<Creation>(target, std::move(options), std::move(spool), blocks,
+                                               std::size_t{raster.Bands()});
+    creation->Check(*dataset);
+    dataset->BeginCreation(std::move(creation));
     return dataset.release();
 }
 
@@ -133,7 +154,13 @@ Creation::Creation(std::string targetName, CreationOptions creationOptions,
       bands(bandCount),
       written(blockCount * bandCount) {}
 
-CPLErr Creation::ChooseLevels(const char* resampling, int count, const int* factors) {
+void Creation::Check(Dataset& dataset, const zmchost::BuildOptions& build) const {
+    GdalRasterSource source(dataset, options.signedByte);
+    zmchost::PyramidBuilder(SharedModule()).Check(source, target, build);
+}
+
+CPLErr Creation::ChooseLevels(Dataset& dataset, const char* resampling, int count,
+                              const int* factors) {
     std::uint32_t coarsest = 0;
     for (int i = 0; i < count; ++i) {
         std::uint32_t level = 1;
@@ -150,21 +177,33 @@ CPLErr Creation::ChooseLevels(const char* resampling, int count, const int* fact
         CPLError(CE_Failure, CPLE_NotSupported, "resampling %s is not known", resampling);
         return CE_Failure;
     }
-    options.build.resampling = method;
-    options.build.levels = coarsest;
+    zmchost::BuildOptions chosen = options.build;
+    chosen.resampling = method;
+    chosen.levels = coarsest;
+    const bool possible = Reporting([&] {
+        Check(dataset, chosen);
+        return true;
+    });
+    if (!possible) return CE_Failure;
+    options.build = std::move(chosen);
     return CE_None;
 }
 
-void Creation::Finish(Dataset& dataset) {
+bool Creation::Finish(Dataset& dataset) {
     sealed = std::find(written.begin(), written.end(), false) == written.end();
-    Reporting([&] {
+    const bool built = Reporting([&] {
+        if (!lost.empty())
+            throw zmchost::Error(target, "build it", "some of its blocks could not be written");
         GdalRasterSource source(dataset, options.signedByte);
+        AcceptLosses(source, false);
         zmchost::PyramidBuilder(SharedModule()).Build(source, target, options.build);
         return true;
     });
+    if (!built) return false;
     // The palettes are in the file now.
     for (int number = 1; number <= dataset.GetRasterCount(); ++number)
         static_cast<Band*>(dataset.GetRasterBand(number))->DropSidecarColors();
+    return true;
 }
 
 }  // namespace zmcgdal

@@ -11,6 +11,7 @@
 #include <gdal_priv.h>
 
 #include <memory>
+#include <set>
 #include <string>
 #include <vector>
 
@@ -37,22 +38,32 @@ public:
     bool IsWritten(std::size_t block, std::size_t band) const {
         return written[block * bands + band];
     }
-    void MarkWritten(std::size_t block, std::size_t band) { written[block * bands + band] = true; }
+    void MarkWritten(std::size_t block, std::size_t band) {
+        written[block * bands + band] = true;
+        lost.erase(block * bands + band);
+    }
+    // The spool did not take a block: without it there will be no target.
+    void MarkLost(std::size_t block, std::size_t band) { lost.insert(block * bands + band); }
     // Every block has been written, and none will be any more.
     bool IsSealed() const { return sealed; }
 
-    // Levels that the user asks for are made at the end; the method counts for all of them.
-    CPLErr ChooseLevels(const char* resampling, int count, const int* factors);
+    // Throws zmchost::Error where no target can be made of the dataset by such options.
+    void Check(Dataset& dataset, const zmchost::BuildOptions& build) const;
+    void Check(Dataset& dataset) const { Check(dataset, options.build); }
+    // Levels that the user asks for are made at the end; the method counts for all of them. A
+    // request that is refused changes nothing.
+    CPLErr ChooseLevels(Dataset& dataset, const char* resampling, int count, const int* factors);
 
-    // Builds the target from the spool. Failures are reported to GDAL.
-    void Finish(Dataset& dataset);
+    // Builds the target from the spool. Failures are reported to GDAL, and there is no target then.
+    bool Finish(Dataset& dataset);
 
 private:
     std::string target;
     CreationOptions options;
     std::unique_ptr<zmchost::BuildFile> spool;
     std::size_t bands;
-    std::vector<bool> written;  // by block and band
+    std::vector<bool> written;   // by block and band
+    std::set<std::size_t> lost;  // likewise
     bool sealed = false;
 };
 

@@ -60,7 +60,8 @@ Dataset::Dataset(std::shared_ptr<OpenFile> openFile, std::uint32_t levelShown, G
 Dataset::~Dataset() {
     // NOLINTNEXTLINE(bugprone-parent-virtual-call): the pixels, and the sidecar not yet.
     GDALDataset::FlushCache(true);
-    if (creation) creation->Finish(*this);
+    // Without a raster there is nothing that a sidecar could belong to.
+    if (creation && !creation->Finish(*this)) nPamFlags &= ~GPF_DIRTY;
     GDALPamDataset::FlushCache(true);
     CloseDependentDatasets();
 }
@@ -180,12 +181,19 @@ CPLErr Dataset::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, 
 CPLErr Dataset::IBuildOverviews(const char* resampling, int overviewCount, const int* factors,
                                 int bandCount, const int* bands, GDALProgressFunc progress,
                                 void* progressData, CSLConstList options) {
-    if (creation) return creation->ChooseLevels(resampling, overviewCount, factors);
+    if (creation) return creation->ChooseLevels(*this, resampling, overviewCount, factors);
     if (Overviews().empty())
         return GDALPamDataset::IBuildOverviews(resampling, overviewCount, factors, bandCount, bands,
                                                progress, progressData, options);
     return RefreshLevels(*this, resampling, std::vector<int>(factors, factors + overviewCount),
                          progress, progressData);
+}
+
+// The sidecar of a raster that there is not yet waits for it.
+Dataset::Flushed Dataset::FlushCache(bool atClosing) {
+    if (!creation) return GDALPamDataset::FlushCache(atClosing);
+    // NOLINTNEXTLINE(bugprone-parent-virtual-call): the pixels alone.
+    return GDALDataset::FlushCache(atClosing);
 }
 
 int Dataset::CloseDependentDatasets() {

@@ -12,6 +12,7 @@
 
 #include <memory>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "gdal/Archive.h"
@@ -64,6 +65,10 @@ public:
     char** GetMetadataDomainList() override;
     char** GetMetadata(const char* domain = "") override;
     const char* GetMetadataItem(const char* name, const char* domain = "") override;
+
+    // Nothing before GDAL 3.7, an error from then on.
+    using Flushed = decltype(std::declval<GDALPamDataset&>().FlushCache(false));
+    Flushed FlushCache(bool atClosing) override;
 
     CPLErr IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, void* data,
                      int bufferWidth, int bufferHeight, GDALDataType bufferType, int bandCount,

@@ -99,6 +99,13 @@ void DropCaches(Dataset& dataset) {
     dataset.File().tiles.Forget();
 }
 
+// False, told to GDAL, where some of the pixels that levels are made of are not in the file.
+bool WritePixels(Dataset& dataset) {
+    CPLErrorReset();
+    DropCaches(dataset);
+    return CPLGetLastErrorType() < CE_Failure;
+}
+
 }  // namespace
 
 CPLErr RefreshLevels(Dataset& dataset, const char* resampling, const std::vector<int>& factors,
@@ -111,8 +118,7 @@ CPLErr RefreshLevels(Dataset& dataset, const char* resampling, const std::vector
     if (!method || !zmchost::SupportsElementType(*method, pixelType))
         return Refuse("this resampling is not known for the pixel type");
     const auto levels = LevelsOf(dataset, factors);
-    if (!levels) return CE_Failure;
-    DropCaches(dataset);
+    if (!levels || !WritePixels(dataset)) return CE_Failure;
     try {
         TellNoDataValues(dataset);
         bool finished = false;
@@ -124,6 +130,7 @@ CPLErr RefreshLevels(Dataset& dataset, const char* resampling, const std::vector
         if (finished) return CE_None;
         CPLError(CE_Failure, CPLE_UserInterrupt, "cancelled");
     } catch (const std::exception& error) {
+        DropCaches(dataset);
         CPLError(CE_Failure, CPLE_FileIO, "%s", error.what());
     }
     return CE_Failure;

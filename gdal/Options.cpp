@@ -127,10 +127,11 @@ std::optional<CreationOptions> ParseCreationOptions(CSLConstList options) {
     const auto order = ParseOrdering(ordering);
     if (!order && !Report("ORDERING", ordering)) return std::nullopt;
     parsed.build.ordering = *order;
-    const char* const memory = CSLFetchNameValueDef(options, "MEMORY", "256M");
-    const auto size = ParseSize(memory);
-    if (!size && !Report("MEMORY", memory)) return std::nullopt;
-    parsed.build.memory = *size;
+    if (const char* const memory = CSLFetchNameValue(options, "MEMORY")) {
+        const auto size = ParseSize(memory);
+        if (!size && !Report("MEMORY", memory)) return std::nullopt;
+        parsed.build.memory = *size;
+    }
     parsed.build.statistics = CPLFetchBool(options, "STATISTICS", true);
     parsed.signedByte =
         EQUAL(CSLFetchNameValueDef(options, "PIXELTYPE", "DEFAULT"), "SIGNEDBYTE") != 0;

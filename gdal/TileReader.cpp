@@ -106,7 +106,7 @@ const unsigned char* TileReader::LoadTile(std::uint32_t level, const Rectangle& 
 // Who reads one band of a picture mostly goes on to the next, and all bands are taken apart by
 // vector code in the time that one takes without it.
 bool TileReader::SplitsIntoPlanes(int bandCount) const {
-    return bandCount == 1 && fileBands >= 2 && fileBands <= 4;
+    return bandCount == 1 && fileBands >= 2 && fileBands <= kMostPlanes;
 }
 
 // Takes a tile apart into `planes`; the plane of `band` goes to `out` instead, if that is not null.
@@ -115,7 +115,7 @@ bool TileReader::SplitTile(std::uint32_t level, const Rectangle& tile, int band,
     if (!LoadTile(level, tile, 0)) return false;
     const std::size_t samples = tile.Pixels();
     planes.resize(scratch.size());
-    void* parts[4] = {};
+    void* parts[kMostPlanes] = {};
     for (int i = 0; i < fileBands; ++i)
         parts[i] = planes.data() + static_cast<std::size_t>(i) * samples * sampleSize;
     if (out) parts[band] = out;
@@ -178,7 +178,7 @@ bool TileReader::CopyPart(std::uint32_t level, const Rectangle& tile, const Rect
 bool TileReader::CopyAllBandsApart(const Rectangle& tile, const unsigned char* samples,
                                    const Rectangle& part, const Rectangle& window, const int* bands,
                                    int bandCount, const Target& target) const {
-    if (bandCount < 2 || bandCount > 4 || target.type != sampleType ||
+    if (bandCount < 2 || bandCount > kMostPlanes || target.type != sampleType ||
         target.pixelSpace != static_cast<GSpacing>(sampleSize) ||
         !std::equal(bands, bands + bandCount, allBands.begin(), allBands.end()))
         return false;
@@ -189,7 +189,7 @@ bool TileReader::CopyAllBandsApart(const Rectangle& tile, const unsigned char* s
         auto* const to = static_cast<unsigned char*>(target.data) +
                          (part.y - window.y + line) * target.lineSpace +
                          (part.x - window.x) * target.pixelSpace;
-        void* parts[4] = {};
+        void* parts[kMostPlanes] = {};
         for (int i = 0; i < bandCount; ++i) parts[i] = to + i * target.bandSpace;
         GDALDeinterleave(samples + fromPixel * pixelSize, sampleType, bandCount, parts, sampleType,
                          part.width);

@@ -73,6 +73,9 @@ private:
         int band = 0;  // 0 where all bands lie together
         friend bool operator==(const TileKey&, const TileKey&) = default;
     };
+    // Bands that GDAL has vector code for, to put them apart.
+    static constexpr int kMostPlanes = 4;
+
     TileKey held;        // tile in `scratch`
     TileKey heldApart;   // tile in `planes`, and the
     int planeAway = -1;  // band whose plane went straight to a caller

@@ -1,6 +1,9 @@
 #include "tools/Arguments.h"
 
+#include <cctype>
+#include <cerrno>
 #include <charconv>
+#include <cmath>
 #include <cstdlib>
 #include <sstream>
 
@@ -39,8 +42,13 @@ std::uint64_t ParseCount(const std::string& option, const std::string& text, std
 
 double ParseNumber(const std::string& option, const std::string& text) {
     char* end = nullptr;
+    errno = 0;
     const double value = std::strtod(text.c_str(), &end);
-    if (text.empty() || *end != '\0') throw UsageError(option, "\"" + text + "\" is no number");
+    const bool blank = text.empty() || std::isspace(static_cast<unsigned char>(text[0])) != 0;
+    if (blank || *end != '\0') throw UsageError(option, "\"" + text + "\" is no number");
+    // What has lost digits only is the nearest there is.
+    if (errno == ERANGE && (std::isinf(value) || value == 0))
+        throw UsageError(option, text + " is beyond the numbers of 64 bits");
     return value;
 }
 
@@ -48,7 +56,8 @@ std::uint64_t ParseSize(const std::string& option, const std::string& text) {
     std::string digits = text;
     unsigned shift = 0;
     if (!digits.empty() && (digits.back() == 'B' || digits.back() == 'b')) digits.pop_back();
-    if (digits.size() > 1 && digits.back() == 'i') digits.pop_back();
+    const bool binary = digits.size() > 1 && digits.back() == 'i';
+    if (binary) digits.pop_back();
     const std::string units = "KMGkmg";
     const auto unit = digits.empty() ? units.npos : units.find(digits.back());
     if (unit != units.npos) {
@@ -56,7 +65,7 @@ std::uint64_t ParseSize(const std::string& option, const std::string& text) {
         digits.pop_back();
     }
     const auto value = WholeNumber(digits);
-    if (!value || *value > (UINT64_MAX >> shift))
+    if (!value || *value > (UINT64_MAX >> shift) || (binary && shift == 0))
         throw UsageError(option, "\"" + text + "\" is no size: give bytes, or 512K, 256M, 2G");
     return *value << shift;
 }

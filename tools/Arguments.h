@@ -16,10 +16,11 @@ namespace zmctools {
 // A whole number without a sign, up to `limit`.
 std::uint64_t ParseCount(const std::string& option, const std::string& text, std::uint64_t limit);
 
-// A number, "nan" and "inf" included.
+// A number, "nan" and "inf" included. One that a double would make infinite or nothing is refused.
 double ParseNumber(const std::string& option, const std::string& text);
 
-// Bytes, with a unit K, M or G of 1024 to a power, with or without "B" or "iB" behind it.
+// Bytes, with a unit K, M or G of 1024 to a power, with or without "B", "i" or "iB" behind it, or
+// "B" alone.
 std::uint64_t ParseSize(const std::string& option, const std::string& text);
 
 // "3,2,1" as bands from 0. Every one lies below `bands`. An empty text means all of them.

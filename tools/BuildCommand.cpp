@@ -2,6 +2,7 @@
 #include <gdal_utils.h>
 
 #include <cstdio>
+#include <cstdlib>
 #include <filesystem>
 
 #include "core/PixelVocabulary.h"
@@ -101,12 +102,11 @@ void BuildCommand::Describe(OptionTable& table) {
         "other metadata go to TARGET.aux.xml.");
 }
 
-template <class T>
-bool Holds(double value) {
-    if constexpr (zelm::kIsComplex<T>)
-        return true;
-    else
-        return zmchost::HoldsValue<T>(value);
+bool IsInteger(std::uint32_t pixelType) {
+    bool integer = false;
+    zelm::VisitElementType(
+        pixelType, [&]<class T>(std::type_identity<T>) { integer = std::is_integral_v<T>; });
+    return integer;
 }
 
 zmchost::BuildOptions BuildCommand::Options(const zelm::RasterProps& props) const {
@@ -120,13 +120,20 @@ zmchost::BuildOptions BuildCommand::Options(const zelm::RasterProps& props) cons
     if (!noData.empty() && noData != "none") {
         const double value = ParseNumber("--nodata", noData);
         bool holds = false;
-        zelm::VisitElementType(props.pixelType,
-                               [&]<class T>(std::type_identity<T>) { holds = Holds<T>(value); });
+        zelm::VisitElementType(props.pixelType, [&]<class T>(std::type_identity<T>) {
+            holds = zmchost::HoldsValue<T>(value);
+        });
         if (!holds)
             throw UsageError("--nodata", std::string("no sample of type ") +
                                              zelm::PixelTypeName(props.pixelType) + " can be " +
                                              noData);
         options.noData = zmchost::BuildOptions::NoData{value};
+        // A long real holds all integers of 64 bits.
+        if (std::strtold(noData.c_str(), nullptr) != static_cast<long double>(value) &&
+            IsInteger(props.pixelType))
+            Warn(target +
+                 ": warning: a pyramid does not keep the last digits of the no-data value " +
+                 noData + " while levels are reduced");
     }
     options.bands = ParseBands(bands, props.bands);
     options.bins = static_cast<std::uint32_t>(ParseCount("--bins", bins, 1 << 24));

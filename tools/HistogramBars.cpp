@@ -2,14 +2,15 @@
 
 #include <algorithm>
 #include <cmath>
+#include <iterator>
 
 namespace zmctools {
 namespace {
 
 constexpr std::size_t kMaxBars = 64;
 constexpr int kLines = 6;
-constexpr int kSteps = 8;  // heights that a character has
-const char* const kBlocks[] = {" ", "▁", "▂", "▃", "▄", "▅", "▆", "▇", "█"};
+constexpr const char* kBlocks[] = {" ", "▁", "▂", "▃", "▄", "▅", "▆", "▇", "█"};
+constexpr int kSteps = std::size(kBlocks) - 1;  // heights that a character has
 
 std::vector<double> Gather(const std::vector<double>& counts) {
     const std::size_t perBar = (counts.size() + kMaxBars - 1) / kMaxBars;

@@ -2,6 +2,7 @@
 #ifndef ZMC_TOOLS_METHODS_H
 #define ZMC_TOOLS_METHODS_H
 
+#include <cstdint>
 #include <string>
 #include <vector>
 
@@ -11,7 +12,7 @@ namespace zmctools {
 
 inline std::vector<std::string> MethodNames() {
     std::vector<std::string> names;
-    for (int method = 0; method <= static_cast<int>(zmchost::Resampling::Lanczos); ++method)
+    for (std::uint32_t method = 0; method < zmchost::kResamplings; ++method)
         names.emplace_back(zmchost::ResamplingName(static_cast<zmchost::Resampling>(method)));
     return names;
 }

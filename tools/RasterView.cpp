@@ -6,6 +6,7 @@
 #include <set>
 
 #include "core/PixelVocabulary.h"
+#include "format/PyramidHeaderRecord.h"
 #include "gdal/Dataset.h"
 #include "gdal/GdalRasterSource.h"
 #include "host/journal/MetadataJournal.h"
@@ -17,7 +18,8 @@ namespace zmctools {
 namespace {
 
 constexpr std::uint64_t kStripBudget = std::uint64_t{32} << 20;
-constexpr std::uint32_t kTileRows = 256;
+// Of the files that builds write; those of others are read as well, if slower.
+constexpr std::uint32_t kTileRows = zelm::kWrittenTileSize;
 
 class PyramidView final : public RasterView {
 public:

@@ -1,6 +1,7 @@
 #include "tools/Verification.h"
 
 #include "core/PixelVocabulary.h"
+#include "format/PyramidLayout.h"
 #include "host/file/MetadataDocument.h"
 #include "tools/Interrupt.h"
 #include "tools/Message.h"
@@ -36,8 +37,7 @@ CheckResult CheckStructure(const zmchost::PyramidFileInfo& info, const zmchost::
     expect("the number of bands", header.bandCount, props.bands);
     expect("the pixel type", header.pixelType, props.pixelType);
     expect("the finest level", header.levelMin, 0);
-    const std::uint32_t version = header.versionMajor << 16 | header.versionMinor;
-    if (version < (1u << 16 | 1u))
+    if (!zelm::PyramidLayout::MayHaveLevels(header.versionMajor, header.versionMinor))
         result.problems.push_back("version " + std::to_string(header.versionMajor) + '.' +
                                   std::to_string(header.versionMinor) +
                                   " has no levels; a pyramid is of 1.1 or later");

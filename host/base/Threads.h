@@ -10,6 +10,10 @@ namespace zmchost {
 // Processors of this machine that the process may use, at least 1.
 std::uint32_t AvailableThreads();
 
+// The most threads that a task can ask for: each takes a stack and a slot of the arena, and many
+// thousands of them end the process.
+inline constexpr std::uint32_t kMaxThreads = 1024;
+
 // Runs `task` in a task arena of that many threads, the caller's among them, and waits for the
 // other threads to end, unless somebody else in the process is using them. Exceptions of the task
 // come out.

@@ -101,9 +101,10 @@ private:
     };
 
     static constexpr std::uint64_t TableBytes() {
-        return kCountsEveryValue<T>
-                   ? (std::uint64_t{8} << (8 * std::min<std::size_t>(sizeof(T), 2)))
-                   : 0;
+        if constexpr (kCountsEveryValue<T>)
+            return ValueCounter<T>::kBytes;
+        else
+            return 0;
     }
 
     std::size_t Place(std::uint32_t lane, std::uint32_t band) const {

@@ -20,7 +20,7 @@ namespace zmchost {
 
 // The rows of a level that a coarser row is made of, null where the level ends.
 struct RowWindow {
-    static constexpr std::uint32_t kMaxRows = 12;
+    static constexpr std::uint32_t kMaxRows = 2 + 2 * kMaxReductionHalo;
     const std::byte* rows[kMaxRows] = {};
     const unsigned char* masks[kMaxRows] = {};
     bool anyMask = false;

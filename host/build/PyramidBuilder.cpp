@@ -95,7 +95,7 @@ BuildRun::BuildRun(ModulePtr loadedModule, RasterSource& rasterSource, std::stri
       source(rasterSource),
       name(std::move(targetName)),
       options(buildOptions) {
-    threads = options.threads != 0 ? options.threads : AvailableThreads();
+    threads = std::min(options.threads != 0 ? options.threads : AvailableThreads(), kMaxThreads);
     lanes = std::min(2 * threads, 16u);
     const zelm::RasterProps given = source.Props();
     props.samples = given.samples;
@@ -404,6 +404,11 @@ void BuildRun::Advance(std::uint64_t pixels) {
 }
 
 }  // namespace
+
+void PyramidBuilder::Check(RasterSource& source, const std::string& target,
+                           const BuildOptions& options) const {
+    const BuildRun run(module, source, target, options);
+}
 
 BuildReport PyramidBuilder::Build(RasterSource& source, const std::string& target,
                                   const BuildOptions& options) const {

@@ -54,7 +54,8 @@ struct BuildOptions {
     std::vector<std::uint32_t> bands;  // of the source, from 0, in the order wanted; empty: all
     std::uint32_t bins = 256;          // of a histogram; one per value for 8-bit types
     bool statistics = true;            // statistics and histograms, which complex types never get
-    std::uint32_t threads = 0;         // 0: as many as the machine has processors
+    std::uint32_t threads = 0;         // 0: as many as the machine has processors; at
+                                       // most 1024, which more are taken for
     std::uint64_t memory = std::uint64_t{256} << 20;  // budget in bytes
     bool overwrite = false;
     // Called now and then, one call at a time, on one of the build's threads; false cancels.
@@ -81,6 +82,9 @@ public:
     // is then what it was, and no temporary file stays. Builds may run on several threads.
     BuildReport Build(RasterSource& source, const std::string& target,
                       const BuildOptions& options = {}) const;
+
+    // Throws Error where Build would refuse the options before it touches anything.
+    void Check(RasterSource& source, const std::string& target, const BuildOptions& options) const;
 
 private:
     ModulePtr module;

@@ -115,6 +115,12 @@ void LentFile::Accept() {
     accepted = recording->Identify();
 }
 
+void LentFile::AcceptOwnChange(std::uint64_t least) {
+    const std::uint64_t size = recording->Size();
+    if (size != ByteSource::kUnknownSize && size >= least) Accept();
+    recording->Reset();
+}
+
 std::string LentFile::LossOfName() const {
     if (!plain || plain->NameStillMeansThis()) return "";
     return plain->IdentifyName().known ? "another file has taken its name"

@@ -51,8 +51,13 @@ public:
     // file is no failure, but where the file goes on behind it, or was cut.
     std::string TakeFailure() const;
 
-    // Takes the source as it is now for what it should be, after opening it and writing to it.
+    // Takes the source as it is now for what it should be, after opening it.
     void Accept();
+    // The same after an operation that changed it, whether it succeeded or failed partway, unless
+    // the source is shorter than `least` bytes, which the operation cannot have made it. Failures
+    // of asking are not told.
+    void AcceptOwnChange(std::uint64_t least);
+    std::uint64_t AcceptedSize() const { return acceptedSize; }
     // What others have done to it since, in words: that it was cut, replaced, removed or written
     // to. Empty if nothing is to be seen.
     std::string Change() const;

@@ -13,7 +13,8 @@
 
 namespace zmchost {
 
-// Whether T holds the value as it is. A file of a narrow type often names a value that none of its
+// Whether a sample can have the value: in integers as it is, in reals and in the real part of
+// complex numbers rounded to the type. A file of a narrow type often names a value that none of its
 // samples can have; such a value marks nothing, rather than what is left of it when it is cut.
 template <class T>
 bool HoldsValue(double value) {
@@ -21,6 +22,13 @@ bool HoldsValue(double value) {
         const double end = std::ldexp(1.0, std::numeric_limits<T>::digits);
         const double begin = std::is_signed_v<T> ? -end : 0.0;
         return value >= begin && value < end && value == std::trunc(value);
+    } else if constexpr (std::is_same_v<T, float>) {
+        // From halfway behind the largest number on a real is rounded to infinity.
+        constexpr double half = 0x1p103;
+        return !std::isfinite(value) ||
+               std::fabs(value) < static_cast<double>(std::numeric_limits<float>::max()) + half;
+    } else if constexpr (zelm::kIsComplex<T>) {
+        return HoldsValue<decltype(T::re)>(value);
     } else {
         return true;
     }

@@ -76,6 +76,14 @@ struct Forgetting {
     ~Forgetting() { records.reset(); }
 };
 
+// Whatever becomes of a change, what the file is afterwards is not the doing of others. Made before
+// all that may still change the file when it goes.
+struct OwnChange {
+    LentFile& file;
+    std::uint64_t least;  // bytes that the change leaves
+    ~OwnChange() { file.AcceptOwnChange(least); }
+};
+
 template <class Record>
 zelm::Array<Record> ToArray(const std::vector<Record>& records) {
     zelm::Array<Record> array;
@@ -241,8 +249,9 @@ bool Raster::IsComplete() {
         typed.RefreshPyramidState();
         complete = typed.HasPyramid();
     });
-    header->fileSize = file->Size();
+    const std::uint64_t size = file->Size();
     CheckDisk("look at its size");
+    header->fileSize = size;
     return complete;
 }
 
@@ -263,8 +272,10 @@ std::optional<double> Raster::NoDataValue(std::uint32_t band) const {
 }
 
 void Raster::SetNoDataValues(const std::map<std::uint32_t, double>& values) {
-    props.noDataValues = values;
-    Visit([&](auto& typed) { typed.SetNoDataValues(props); });
+    zelm::RasterProps changed = props;
+    changed.noDataValues = values;
+    Visit([&](auto& typed) { typed.SetNoDataValues(changed); });
+    props.noDataValues.swap(changed.noDataValues);
 }
 
 std::vector<std::uint32_t> Raster::AllBands() const {
@@ -425,10 +436,10 @@ void Raster::Write(std::uint32_t level, const Window& window, std::span<const st
         });
         return;
     }
+    const OwnChange change{*file, file->AcceptedSize()};
     zelm::VisitTiles(Geometry(level), window, [&](const zelm::TilePart& part) {
         MergeTile(level, part.tile, window, bands, samples.data());
     });
-    file->Accept();
 }
 
 template <class T>
@@ -481,6 +492,7 @@ zelm::RasterBandStats<T> Raster::Statistics(std::uint32_t band) const {
 void Raster::Store(const std::function<void()>& action) {
     if (!file) return action();
     CheckWritable("store into its metadata document");
+    const OwnChange change{*file, std::min(file->AcceptedSize(), header->tileDataEnd)};
     std::optional<MetadataJournal> copy;
     if (keepsCopies)
         if (const std::string plain = file->PlainName(); !plain.empty()) copy.emplace(plain);
@@ -489,7 +501,6 @@ void Raster::Store(const std::function<void()>& action) {
     action();
     CheckDisk("store into its metadata document");
     if (copy) copy->Finish();
-    file->Accept();
 }
 
 template <class T>

@@ -1,11 +1,17 @@
 #include "host/reduce/Reduction.h"
 
-#include <array>
+#include <algorithm>
 
 #include "core/ElementTypes.h"
+#include "host/reduce/ReductionWindow.h"
 
 namespace zmchost {
 namespace {
+
+template <class Kernel>
+constexpr std::uint32_t HaloOf() {
+    return Kernel::kReach - 1;
+}
 
 // Of each method: its word, the rows that it needs above and below a pair, and whether it is
 // defined for values without an order. In the order of the enumeration.
@@ -15,7 +21,7 @@ struct MethodTraits {
     std::uint32_t halo;
     bool forComplex;
 };
-constexpr std::array<MethodTraits, 10> kMethods = {{
+constexpr MethodTraits kMethods[] = {
     {Resampling::Nearest, "nearest", 0, true},
     {Resampling::Average, "average", 0, true},
     {Resampling::Rms, "rms", 0, false},
@@ -23,10 +29,25 @@ constexpr std::array<MethodTraits, 10> kMethods = {{
     {Resampling::Minimum, "minimum", 0, false},
     {Resampling::Maximum, "maximum", 0, false},
     {Resampling::Median, "median", 0, false},
-    {Resampling::Bilinear, "bilinear", 1, true},
-    {Resampling::Cubic, "cubic", 3, true},
-    {Resampling::Lanczos, "lanczos", 5, true},
-}};
+    {Resampling::Bilinear, "bilinear", HaloOf<BilinearKernel>(), true},
+    {Resampling::Cubic, "cubic", HaloOf<CubicKernel>(), true},
+    {Resampling::Lanczos, "lanczos", HaloOf<LanczosKernel>(), true},
+};
+
+constexpr bool MethodsAreInOrder() {
+    std::uint32_t place = 0;
+    for (const MethodTraits& traits : kMethods)
+        if (static_cast<std::uint32_t>(traits.method) != place++) return false;
+    return place == kResamplings;
+}
+static_assert(MethodsAreInOrder());
+
+constexpr std::uint32_t LargestHalo() {
+    std::uint32_t largest = 0;
+    for (const MethodTraits& traits : kMethods) largest = std::max(largest, traits.halo);
+    return largest;
+}
+static_assert(LargestHalo() == kMaxReductionHalo);
 
 const MethodTraits& Traits(Resampling method) { return kMethods[static_cast<std::size_t>(method)]; }
 

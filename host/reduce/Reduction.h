@@ -46,6 +46,8 @@ enum class Resampling {
     Lanczos
 };
 
+inline constexpr std::uint32_t kResamplings = static_cast<std::uint32_t>(Resampling::Lanczos) + 1;
+
 // "nearest", "average", "rms", "mode", "minimum", "maximum", "median", "bilinear", "cubic",
 // "lanczos", in this spelling only.
 std::optional<Resampling> ParseResampling(std::string_view word);
@@ -58,6 +60,8 @@ bool SupportsElementType(Resampling method, std::uint32_t pixelType);
 // Rows of the finer level needed above and below the pair (2y, 2y + 1) for coarse row y: 0 for the
 // methods on 2 x 2 samples, 1, 3 and 5 for the others.
 std::uint32_t ReductionHalo(Resampling method);
+// The largest of them.
+inline constexpr std::uint32_t kMaxReductionHalo = 5;
 
 // The rows that one coarse row is made of, top to bottom: 2 + 2 * halo pointers each.
 template <class T>

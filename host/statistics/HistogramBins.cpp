@@ -48,7 +48,8 @@ HistogramBins<T>::HistogramBins(T lowest, T highest, std::uint32_t binCount)
 template <class T>
 HistogramBins<T> HistogramBins<T>::ForBand(T lowest, T highest, std::uint32_t binCount) {
     if constexpr (sizeof(T) == 1)
-        return HistogramBins(std::numeric_limits<T>::min(), std::numeric_limits<T>::max(), 256);
+        return HistogramBins(std::numeric_limits<T>::min(), std::numeric_limits<T>::max(),
+                             1u << (8 * sizeof(T)));
     else
         return HistogramBins(lowest, highest, binCount);
 }

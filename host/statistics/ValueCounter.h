@@ -28,6 +28,7 @@ class ValueCounter {
 
 public:
     static constexpr std::size_t kValues = std::size_t{1} << (8 * sizeof(T));
+    static constexpr std::size_t kBytes = kValues * sizeof(std::uint64_t);
 
     ValueCounter() : counts(kValues) {}
 

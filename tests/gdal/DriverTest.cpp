@@ -1,6 +1,7 @@
 // The driver from inside the process, with sanitizers where those are on.
 #include "gdal/Driver.h"
 
+#include <cpl_minixml.h>
 #include <gdal_alg.h>
 #include <gdal_priv.h>
 #include <gtest/gtest.h>
@@ -13,9 +14,11 @@
 #include <fstream>
 #include <numeric>
 #include <random>
+#include <set>
 #include <thread>
 #include <vector>
 
+#include "gdal/Options.h"
 #include "gdal/SampleType.h"
 #include "host/file/PyramidHeader.h"
 #include "host/journal/MetadataJournal.h"
@@ -141,6 +144,44 @@ TEST_F(DriverTest, EveryElementTypeHasADataTypeAndComesBack) {
     EXPECT_EQ(PixelTypeFor(GDT_Byte, true), zelm::PixelTypeCode::Char);
     EXPECT_EQ(PixelTypeFor(GDT_Unknown, false), 0u);
     EXPECT_EQ(GdalTypeOf(7, SignedByteAs::Int16), GDT_Unknown);
+}
+
+// What GDAL prints and checks is told apart from what is done.
+TEST_F(DriverTest, CreationOptionsDoWhatTheirDescriptionTells) {
+    const CPLXMLTreeCloser list(CPLParseXMLString(kCreationOptionsXml));
+    ASSERT_TRUE(list.get());
+    const auto none = ParseCreationOptions(nullptr);
+    ASSERT_TRUE(none);
+    std::set<std::string> names;
+    for (const CPLXMLNode* option = list->psChild; option; option = option->psNext) {
+        if (!EQUAL(option->pszValue, "Option")) continue;
+        const std::string name = CPLGetXMLValue(option, "name", "");
+        names.insert(name);
+        CPLStringList given;
+        if (const char* const standard = CPLGetXMLValue(option, "default", nullptr))
+            given.SetNameValue(name.c_str(), standard);
+        const auto parsed = ParseCreationOptions(given.List());
+        ASSERT_TRUE(parsed) << name;
+        EXPECT_EQ(parsed->build.memory, none->build.memory) << name;
+        EXPECT_EQ(parsed->build.bins, none->build.bins) << name;
+        EXPECT_EQ(parsed->build.threads, none->build.threads) << name;
+        EXPECT_EQ(parsed->build.levels, none->build.levels) << name;
+        EXPECT_EQ(parsed->build.statistics, none->build.statistics) << name;
+        EXPECT_EQ(parsed->build.ordering, none->build.ordering) << name;
+        EXPECT_EQ(parsed->signedByte, none->signedByte) << name;
+        std::size_t values = 0;
+        for (const CPLXMLNode* value = option->psChild; value; value = value->psNext) {
+            if (value->eType != CXT_Element || !EQUAL(value->pszValue, "Value")) continue;
+            CPLStringList one;
+            one.SetNameValue(name.c_str(), CPLGetXMLValue(value, "", ""));
+            EXPECT_TRUE(ParseCreationOptions(one.List())) << one[0];
+            ++values;
+        }
+        const bool methods = name == "RESAMPLING";
+        EXPECT_EQ(methods ? values : 0, methods ? zmchost::kResamplings : 0) << name;
+    }
+    EXPECT_EQ(names, (std::set<std::string>{"BINS", "LEVELS", "MEMORY", "NUM_THREADS", "ORDERING",
+                                            "PIXELTYPE", "RESAMPLING", "STATISTICS"}));
 }
 
 TEST_F(DriverTest, CopiesOfEveryTypeHoldTheSamePixels) {

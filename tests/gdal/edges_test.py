@@ -1,8 +1,10 @@
 """The driver at its edges: levels that stand for their band, signed bytes, options that are not
 understood, files that go away, headers that GDAL cannot hold."""
 import os
+import re
 import struct
 import unittest
+from xml.etree import ElementTree
 
 import numpy as np
 from osgeo import gdal
@@ -129,10 +131,25 @@ class Options(FolderTest):
         for option in ("MEMORY=512M", "MEMORY=1G", "MEMORY=1gb", "MEMORY=524288K",
                        "MEMORY=536870912", "ORDERING=auto", "ORDERING=SCANLINE",
                        "ORDERING=Blocked", "LEVELS=AUTO", "LEVELS=0", "LEVELS=2", "BINS=7",
-                       "NUM_THREADS=ALL_CPUS", "NUM_THREADS=1", "RESAMPLING=near",
+                       "NUM_THREADS=ALL_CPUS", "NUM_THREADS=1",
+                       "NUM_THREADS=1000000", "NUM_THREADS=2147483647", "RESAMPLING=near",
                        "RESAMPLING=AVERAGE", "STATISTICS=NO"):
             with self.subTest(option):
                 self.made(option)
+
+    def test_the_page_of_the_driver_has_all_of_them(self):
+        with open(os.path.join(os.path.dirname(__file__), "../../docs/gdal.md")) as page:
+            rows = re.findall(r"^\| `([A-Z_]+)` \| (.*) \| (.*) \|$", page.read(), re.M)
+        told = {name: (values, standard) for name, values, standard in rows}
+        xml = gdal.GetDriverByName(DRIVER).GetMetadataItem("DMD_CREATIONOPTIONLIST")
+        options = {each.get("name"): each for each in ElementTree.fromstring(xml)}
+        self.assertEqual(told.keys(), options.keys())
+        for name, (values, standard) in told.items():
+            choices = [each.text for each in options[name]]
+            if choices:
+                self.assertEqual(re.findall("`([A-Z]+)`", values), choices, name)
+            if "default" in options[name].attrib:
+                self.assertIn(options[name].get("default"), standard.replace("`", ""), name)
 
     def test_not_understood(self):
         for option in ("MEMORY=", "MEMORY=B", "MEMORY=M", "MEMORY=12X", "MEMORY=-1",

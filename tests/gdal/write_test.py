@@ -158,6 +158,15 @@ class Copies(FolderTest):
         self.assertEqual(dataset.GetRasterBand(2).GetMaskFlags(), gdal.GMF_PER_DATASET)
         np.testing.assert_array_equal(dataset.GetRasterBand(2).GetMaskBand().ReadAsArray(), mask)
 
+    def test_a_mask_that_cannot_be_kept_leaves_nothing_behind(self):
+        source = memory_dataset(samples(gdal.GDT_Byte, 30, 40, 1), gdal.GDT_Byte)
+        place(source)
+        source.CreateMaskBand(gdal.GMF_PER_DATASET)
+        os.mkdir(self.path("raster.pyr.msk"))
+        with self.assertRaises(RuntimeError):
+            self.copy(source)
+        self.assertEqual(self.files(), ["raster.pyr.msk"])
+
     def test_strict_copies_refuse_what_is_lost_and_others_name_it(self):
         source = memory_dataset(samples(gdal.GDT_Byte, 9, 9, 1), gdal.GDT_Byte)
         table = gdal.ColorTable(gdal.GPI_HLS)
@@ -268,6 +277,47 @@ class BlockByBlock(FolderTest):
         np.testing.assert_array_equal(made.ReadAsArray(), expected)
         self.assertEqual(made.GetGeoTransform()[0], 500000)
         self.assertEqual(made.GetRasterBand(1).GetMinimum(), 1)
+
+    def test_what_is_not_written_is_no_data_to_its_last_digit(self):
+        for data_type, value in ((gdal.GDT_Int64, 2**53 + 1), (gdal.GDT_UInt64, 2**64 - 2)):
+            dataset = self.create(300, 10, 1, data_type)
+            dataset.GetRasterBand(1).SetNoDataValue(value)
+            dataset.GetRasterBand(1).WriteArray(np.ones((10, 10), TYPES[data_type]))
+            del dataset
+            made = gdal.Open(self.path("new.pyr"))
+            band = made.GetRasterBand(1)
+            self.assertEqual(int(band.ReadAsArray(299, 9, 1, 1)[0, 0]), value)
+            self.assertEqual(band.GetMaskBand().ReadAsArray(299, 9, 1, 1)[0, 0], 0)
+
+    def test_a_file_that_cannot_be_made_leaves_nothing_behind(self):
+        dataset = self.create(30, 30, 1, gdal.GDT_Byte)
+        place(dataset)
+        dataset.FlushCache()
+        self.assertEqual([name for name in self.files() if not name.endswith(".tmp")], [])
+        os.mkdir(self.path("new.pyr"))
+        try:
+            del dataset
+        except RuntimeError:
+            pass
+        self.assertEqual(self.files(), ["new.pyr"])
+
+    def test_options_that_do_not_fit_are_refused_at_once(self):
+        for data_type, option in ((gdal.GDT_CFloat32, "RESAMPLING=MEDIAN"),
+                                  (gdal.GDT_Byte, "ORDERING=MORTON"), (gdal.GDT_Byte, "LEVELS=9")):
+            with self.assertRaises(RuntimeError):
+                self.create(30, 30, 1, data_type, [option])
+            self.assertEqual(self.files(), [])
+
+    def test_levels_that_do_not_fit_are_refused_at_once_and_forgotten(self):
+        dataset = self.create(64, 64, 1, gdal.GDT_CFloat32)
+        dataset.GetRasterBand(1).Fill(3)
+        for method, factors in (("MEDIAN", [2]), ("NEAREST", [1024])):
+            with self.assertRaises(RuntimeError):
+                dataset.BuildOverviews(method, factors)
+        del dataset
+        made = gdal.Open(self.path("new.pyr"))
+        self.assertEqual(made.GetRasterBand(1).GetOverviewCount(), 0)
+        self.assertEqual(made.ReadAsArray(63, 63, 1, 1)[0, 0], 3)
 
     def test_color_tables_go_into_the_file(self):
         dataset = self.create(30, 30, 1, gdal.GDT_Byte)

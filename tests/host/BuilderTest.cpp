@@ -7,11 +7,14 @@
 #include <algorithm>
 #include <cmath>
 #include <cstring>
+#include <filesystem>
+#include <iterator>
 #include <limits>
 
 #include "core/PixelVocabulary.h"
 #include "host/raster/Raster.h"
 #include "host/statistics/BandStatistics.h"
+#include "host/statistics/HistogramBins.h"
 #include "tests/host/NaivePyramid.h"
 #include "tests/support/MemorySource.h"
 #include "tests/support/ScratchDirectory.h"
@@ -27,6 +30,7 @@ constexpr Resampling kMethods[] = {Resampling::Nearest, Resampling::Average,  Re
                                    Resampling::Mode,    Resampling::Minimum,  Resampling::Maximum,
                                    Resampling::Median,  Resampling::Bilinear, Resampling::Cubic,
                                    Resampling::Lanczos};
+static_assert(std::size(kMethods) == kResamplings);
 
 template <class T>
 bool SameBytes(const std::vector<T>& a, const std::vector<T>& b) {
@@ -254,6 +258,33 @@ TEST(PyramidBuilder, StoresStatisticsAndHistogramsOfEveryType) {
 #define ZMC_X(type, name, code) ExpectStatistics<type>();
     ZMC_ELEMENT_TYPES(ZMC_X)
 #undef ZMC_X
+}
+
+TEST(PyramidBuilder, TakesTheUsualNumberOfBinsUnlessToldOtherwise) {
+    EXPECT_EQ(BuildOptions().bins, kDefaultHistogramBins);
+}
+
+TEST(PyramidBuilder, MoreThreadsThanThereCanBeAreTakenForTheMost) {
+    const ScratchDirectory folder;
+    MemorySource<unsigned char> source(300, 300, 1);
+    BuildOptions options;
+    for (const std::uint32_t threads : {0x7FFFFFFFu, 0x80000000u, 0xFFFFFFFFu}) {
+        options.threads = threads;
+        options.overwrite = true;
+        const auto report = PyramidBuilder(TestModule()).Build(source, folder / "a.pyr", options);
+        EXPECT_EQ(report.maxLevel, 1u);
+    }
+}
+
+TEST(PyramidBuilder, ChecksOptionsWithoutTouchingAnything) {
+    const ScratchDirectory folder;
+    MemorySource<unsigned char> source(300, 300, 1);
+    BuildOptions options;
+    const PyramidBuilder builder(TestModule());
+    builder.Check(source, folder / "a.pyr", options);
+    options.levels = 9;
+    EXPECT_THROW(builder.Check(source, folder / "a.pyr", options), Error);
+    EXPECT_TRUE(std::filesystem::is_empty(folder.String()));
 }
 
 TEST(PyramidBuilder, StoresNoStatisticsWhenAskedSo) {

@@ -144,6 +144,51 @@ TEST_F(RasterFileTest, TellsThatOthersHaveWrittenToTheFileButNotThatItDid) {
     EXPECT_EQ(raster.Change(), "others have written to it");
 }
 
+// A call of the disk that fails leaves what was written before it, and the time of that.
+TEST_F(RasterFileTest, WhatItDidItselfIsNotLaidToOthersWhereItFailed) {
+    Make(file, 300, 1, 3);
+    Raster raster = Raster::Open(TestModule(), file);
+    const std::vector<Pixel> pixels(std::size_t{300} * 300 * 3, 9);
+    {
+        const FileFaults faults(
+            {folder.String(), zmctest::kWriteCall, 2, true, FileFaultAction::Error, ENOSPC});
+        EXPECT_THAT(FailureOf([&] {
+                        raster.Write<Pixel>(0, {0, 0, 300, 300}, pixels);
+                    }),
+                    HasSubstr("No space left"));
+        EXPECT_GT(faults.Failed(), 0u);
+    }
+    EXPECT_EQ(raster.Change(), "");
+    for (const bool copies : {false, true}) {
+        raster.KeepCopies(copies);
+        std::size_t last = 1;
+        for (std::size_t n = 1; n <= last; ++n) {
+            const FileFaults faults(
+                {folder.String(), zmctest::kChangingCall, n, true, FileFaultAction::Error, ENOSPC});
+            zelm::Palette palette;
+            palette.AddColor(zelm::Color());
+            if (FailureOf([&] { raster.SetBandPalette(0, palette); }) != "no failure") ++last;
+            EXPECT_EQ(raster.Change(), "") << "call " << n;
+        }
+        EXPECT_GT(last, 3u);
+    }
+    std::filesystem::resize_file(file, std::filesystem::file_size(file) - 1);
+    EXPECT_THAT(raster.Change(), HasSubstr("it was cut from"));
+    raster.Write<Pixel>(0, {0, 0, 1, 1}, {1, 1, 1});
+    EXPECT_THAT(raster.Change(), HasSubstr("it was cut from")) << "and not by itself";
+}
+
+TEST_F(RasterFileTest, SizeThatCannotBeToldIsNotTakenForNothing) {
+    Make(file, 20, 1);
+    const auto source = Faulty();
+    Raster raster = Raster::Open(TestModule(), source, "a raster");
+    const std::uint64_t size = raster.Header().fileSize;
+    source->sizeError = EIO;
+    EXPECT_THAT(FailureOf([&] { raster.IsComplete(); }), HasSubstr("Input/output error"));
+    EXPECT_EQ(raster.Header().fileSize, size);
+    EXPECT_EQ(raster.Header().BytesMissing(), 0u);
+}
+
 TEST_F(RasterFileTest, NameThatLooksLentIsThatOfAFile) {
     Make(file, 20, 1);
     const auto name = zelm::files::Lend(FileSource::Open(file.c_str(), OpenMode::Update));

@@ -24,8 +24,19 @@ TEST(Arguments, NumbersMayBeNegativeOrNotFinite) {
     EXPECT_EQ(ParseNumber("--n", "-9999.5"), -9999.5);
     EXPECT_TRUE(std::isnan(ParseNumber("--n", "nan")));
     EXPECT_TRUE(std::isinf(ParseNumber("--n", "-inf")));
-    for (const char* const text : {"", "1,5", "one", "1 2"})
+    for (const char* const text :
+         {"", "1,5", "one", "1 2", " ", " 1", "1 ", "\t1", "0x", "1e", "."})
         EXPECT_THROW(ParseNumber("--n", text), UsageError) << text;
+}
+
+// They would become infinity, which nothing differs by, and 0, which is a sample of its own.
+TEST(Arguments, NumbersThatNoDoubleHoldsAreRefused) {
+    for (const char* const text : {"1e999", "-1e999", "1e-999", "-1e-400", "0x1p2000"})
+        EXPECT_THROW(ParseNumber("--n", text), UsageError) << text;
+    EXPECT_EQ(ParseNumber("--n", "0e-999"), 0);
+    EXPECT_EQ(ParseNumber("--n", "1e-310"), 1e-310);
+    EXPECT_EQ(ParseNumber("--n", "+1.7976931348623157e308"), 1.7976931348623157e308);
+    EXPECT_EQ(ParseNumber("--n", "0x10"), 16);
 }
 
 TEST(Arguments, SizesHaveUnits) {
@@ -33,7 +44,8 @@ TEST(Arguments, SizesHaveUnits) {
     EXPECT_EQ(ParseSize("--memory", "512K"), std::uint64_t{512} << 10);
     EXPECT_EQ(ParseSize("--memory", "256MiB"), std::uint64_t{256} << 20);
     EXPECT_EQ(ParseSize("--memory", "2gb"), std::uint64_t{2} << 30);
-    for (const char* const text : {"", "K", "iB", "1T", "-1K", "1.5G", "18446744073709551615K"})
+    for (const char* const text :
+         {"", "K", "iB", "1T", "-1K", "1.5G", "18446744073709551615K", "5i", "5iB", " 5", "5 M"})
         EXPECT_THROW(ParseSize("--memory", text), UsageError) << text;
 }
 

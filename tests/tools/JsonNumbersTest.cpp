@@ -27,6 +27,17 @@ TEST(JsonNumbers, WhatIsNotFiniteIsAWord) {
     EXPECT_EQ(JsonNumber(-kInfinity), "-Infinity");
 }
 
+// Differences of 64-bit integers and of large reals.
+TEST(JsonNumbers, LongRealsBeyondADoubleAreStrings) {
+    EXPECT_EQ(JsonNumber(1.5L), Json(1.5));
+    EXPECT_EQ(JsonNumber(9007199254740992.0L), Json(9007199254740992.0));
+    EXPECT_EQ(JsonNumber(9007199254740993.0L), Json("9007199254740993"));
+    EXPECT_EQ(JsonNumber(18446744073709551615.0L), Json("18446744073709551615"));
+    EXPECT_EQ(JsonNumber(static_cast<long double>(1e300)), Json(1e300));
+    EXPECT_TRUE(JsonNumber(2.0L * std::numeric_limits<double>::max()).is_string());
+    EXPECT_EQ(JsonNumber(std::numeric_limits<long double>::infinity()), Json("Infinity"));
+}
+
 TEST(JsonNumbers, RealsComeBackUnchanged) {
     for (const double value : {0.1, 1e300, -1.0 / 3, 5e-324})
         EXPECT_EQ(Json::parse(JsonNumber(value).dump()).get<double>(), value);

@@ -112,6 +112,22 @@ class Options(ToolTest):
         statistics = self.document("info", "made.pyr")["statistics"][0]
         self.assertEqual(statistics["minimum"], 10)
 
+    def test_a_no_data_value_that_the_builder_rounds_is_told(self):
+        geotiff(self.path("a.tif"), samples("Int64", 20, 30, 1), "Int64")
+        for value, told in ((2**53 + 1, True), (2**53, False), (-7, False)):
+            done = self.run_tool("build", "a.tif", "a.pyr", "--overwrite", f"--nodata={value}")
+            self.assertEqual((done.returncode, "last digits of the no-data value" in done.stderr),
+                             (0, told), done.stderr)
+
+    def test_a_no_data_value_that_no_sample_can_have(self):
+        geotiff(self.path("a.tif"), samples("Single", 20, 30, 1), "Single")
+        for value in ("1e39", "-1e300"):
+            done = self.run_tool("build", "a.tif", "a.pyr", f"--nodata={value}")
+            self.assertEqual(done.returncode, 2, done.stderr)
+            self.assertIn("no sample of type Single can be " + value, done.stderr)
+        done = self.run_tool("build", "a.tif", "a.pyr", "--nodata=-3.4028235e38")
+        self.assertEqual(done.returncode, 0, "this one is rounded to the lowest sample")
+
     def test_no_no_data_value(self):
         geotiff(self.path("source.tif"), np.zeros((4, 4, 1), np.uint8), nodata=0)
         self.good("build", "source.tif", "made.pyr", "--nodata", "none")

@@ -45,6 +45,18 @@ class Compare(ToolTest):
         geotiff(self.path("b.tif"), pixels, "UInt64")
         document = self.document("compare", "a.tif", "b.tif", status=3)
         self.assertEqual(document["bands"][0]["greatestDifference"], 1)
+        pixels[:] = 0
+        geotiff(self.path("c.tif"), pixels, "UInt64")
+        pixels[0, 0] = 2**64 - 1
+        geotiff(self.path("d.tif"), pixels, "UInt64")
+        document = self.document("compare", "c.tif", "d.tif", status=3)
+        self.assertEqual(document["bands"][0]["greatestDifference"], str(2**64 - 1))
+
+    def test_differences_that_no_double_holds(self):
+        for name, value in (("a.tif", 1.7e308), ("b.tif", -1.7e308)):
+            geotiff(self.path(name), np.full((3, 3, 1), value), "Double")
+        document = self.document("compare", "a.tif", "b.tif", status=3)
+        self.assertRegex(document["bands"][0]["greatestDifference"], r"^3\.39999.*e\+308$")
 
     def test_not_a_number_is_equal_to_itself_only(self):
         pixels = np.zeros((3, 3, 1), np.float32)

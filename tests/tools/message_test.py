@@ -1,5 +1,6 @@
 """Every refusal: one line on stderr, nothing on stdout, and the right exit status."""
 import os
+import re
 
 from frame import ToolTest, geotiff, samples
 
@@ -19,6 +20,20 @@ class Help(ToolTest):
         self.assertRegex(self.good("--version"),
                          r"^zmcraster \d+\.\d+\.\d+\npyramid format 1\.1\nXerces-C\+\+ 3\.\S+\n"
                          r"GDAL 3\.\S+\n$")
+        self.pyramid()
+        written = self.document("info", "picture.pyr")["version"]
+        self.assertIn(f"\npyramid format {written}\n", self.good("--version"))
+
+    def test_the_page_of_the_command_line_shows_the_help_there_is(self):
+        with open(os.path.join(os.path.dirname(__file__), "../../docs/cli.md")) as page:
+            text = page.read()
+        shown = text.split("$ zmcraster build --help\n")[1].split("```")[0]
+        self.assertEqual(shown.rstrip("\n"), self.good("build", "--help").rstrip("\n"))
+        for status in self.good("--help").split("Exit status: ")[1].rstrip(".\n").split(", "):
+            number = status.split()[0]
+            self.assertRegex(text, rf"Exit status:[^.]*\b{number}\b")
+        commands = re.findall(r"^  (\w+) {2,}", self.good("--help").split("Subcommands:")[1], re.M)
+        self.assertEqual(sorted(re.findall(r"^## ([a-z]+)$", text, re.M)), sorted(commands))
 
 
 class Usage(ToolTest):

@@ -70,6 +70,15 @@ class VerifyEdges(ToolTest):
         problems = self.problems("documents", name)
         self.assertEqual(problems, ["histogram of band 1 has 0 counts for 4000000000 bins"])
 
+    def test_bins_without_counts_take_no_memory(self):
+        name = self.handmade(self.histogram(HIST_BINCOUNT=4000000000, HIST_BINSIZE=2e-9))
+        self.assertEqual(self.problems("statistics", name), [])
+
+    def test_versions_of_many_digits(self):
+        for major in (2, 65535, 65536, 4294967295):
+            self.assertEqual(self.problems("structure", self.handmade(VERSION_MAJOR=major),
+                                           status=0), [])
+
     # Each of these says nothing about the pixels that could be counted anew.
     def test_histograms_that_are_not_counted_anew(self):
         for fields in ({"HIST_BINCOUNT": 0, "HIST_COUNTS": ""}, {"HIST_BINSIZE": 3},

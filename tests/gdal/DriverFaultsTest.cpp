@@ -1,0 +1,255 @@
+// What the driver answers, and what it remembers, when the disk fails under it.
+#include <gdal_priv.h>
+#include <gtest/gtest.h>
+#include <sys/resource.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <csignal>
+#include <cstdlib>
+#include <filesystem>
+#include <functional>
+#include <vector>
+
+#include "gdal/Driver.h"
+#include "tests/support/FileFaults.h"
+#include "tests/support/ScratchDirectory.h"
+
+namespace zmcgdal {
+namespace {
+
+using DatasetPtr = std::unique_ptr<GDALDataset>;
+using Samples = std::vector<unsigned char>;
+using zmctest::FileFaultAction;
+using zmctest::FileFaults;
+
+constexpr int kSide = 200;
+
+class DriverFaults : public testing::Test {
+protected:
+    static void SetUpTestSuite() {
+        setenv("ZMCRASTER_MODULE", ZMC_MODULE_PATH, 1);
+        GDALRegister_ZMCPyramid();
+        GDALAllRegister();
+    }
+    void SetUp() override { CPLPushErrorHandler(CPLQuietErrorHandler); }
+    void TearDown() override { CPLPopErrorHandler(); }
+
+    static GDALDriver& Driver(const char* driver) {
+        return *GetGDALDriverManager()->GetDriverByName(driver);
+    }
+    // Its bands hold their numbers.
+    static DatasetPtr Memory(int bands, int side) {
+        DatasetPtr dataset(Driver("MEM").Create("", side, side, bands, GDT_Byte, nullptr));
+        for (int band = 1; band <= bands; ++band) dataset->GetRasterBand(band)->Fill(band);
+        return dataset;
+    }
+    // A pyramid of that, of one tile as a rule.
+    void Make(int bands, GDALColorTable* table = nullptr, int side = kSide) const {
+        const DatasetPtr source = Memory(bands, side);
+        if (table) source->GetRasterBand(1)->SetColorTable(table);
+        ASSERT_TRUE(DatasetPtr(
+            Driver("ZMCPyramid")
+                .CreateCopy(name.c_str(), source.get(), FALSE, nullptr, nullptr, nullptr)));
+    }
+    DatasetPtr Open(unsigned flags = 0) const {
+        return DatasetPtr(GDALDataset::Open(name.c_str(), GDAL_OF_RASTER | flags));
+    }
+    // As large a part of a band as is read below.
+    static CPLErr Fill(GDALDataset& dataset, int band, int value, int x = 0, int y = 0) {
+        Samples samples(std::size_t{kSide} * kSide, static_cast<unsigned char>(value));
+        return dataset.GetRasterBand(band)->RasterIO(GF_Write, x, y, kSide, kSide, samples.data(),
+                                                     kSide, kSide, GDT_Byte, 0, 0, nullptr);
+    }
+    static Samples Read(GDALDataset& dataset, int band) {
+        Samples samples(std::size_t{kSide} * kSide);
+        EXPECT_EQ(dataset.GetRasterBand(band)->RasterIO(GF_Read, 0, 0, kSide, kSide, samples.data(),
+                                                        kSide, kSide, GDT_Byte, 0, 0, nullptr),
+                  CE_None);
+        return samples;
+    }
+    static bool Holds(const Samples& samples, int value) {
+        return std::all_of(samples.begin(), samples.end(),
+                           [value](unsigned char each) { return each == value; });
+    }
+
+    zmctest::ScratchDirectory folder;
+    const std::string name = folder / "a.pyr";
+};
+
+// Files of this process end at that size while an object of this class lives: a write across it
+// moves a part and then fails.
+class FileSizeLimit {
+public:
+    explicit FileSizeLimit(rlim_t size) : handler(std::signal(SIGXFSZ, SIG_IGN)) {
+        getrlimit(RLIMIT_FSIZE, &before);
+        const rlimit limit{size, before.rlim_max};
+        setrlimit(RLIMIT_FSIZE, &limit);
+    }
+    ~FileSizeLimit() {
+        setrlimit(RLIMIT_FSIZE, &before);
+        std::signal(SIGXFSZ, handler);
+    }
+    FileSizeLimit(const FileSizeLimit&) = delete;
+    FileSizeLimit& operator=(const FileSizeLimit&) = delete;
+
+private:
+    rlimit before{};
+    void (*handler)(int);
+};
+
+TEST_F(DriverFaults, RecordsThatCouldNotBeReadAreAskedForAgain) {
+    GDALColorTable table;
+    const GDALColorEntry color{1, 2, 3, 255};
+    table.SetColorEntry(1, &color);
+    Make(1, &table);
+    const DatasetPtr dataset = Open();
+    ASSERT_TRUE(dataset);
+    Read(*dataset, 1);
+    GDALRasterBand& band = *dataset->GetRasterBand(1);
+    const auto statistics = [&] {
+        double mean = 0;
+        return band.GetStatistics(FALSE, FALSE, nullptr, nullptr, &mean, nullptr) == CE_None;
+    };
+    const auto histogram = [&] {
+        double low = 0, high = 0;
+        int buckets = 0;
+        GUIntBig* counts = nullptr;
+        band.GetDefaultHistogram(&low, &high, &buckets, &counts, FALSE, nullptr, nullptr);
+        CPLFree(counts);
+        return buckets != 0;
+    };
+    const auto item = [&] { return band.GetMetadataItem("STATISTICS_MEAN") != nullptr; };
+    {
+        const FileFaults faults(
+            {folder.String(), zmctest::kReadCall, 1, true, FileFaultAction::Error, EIO});
+        EXPECT_FALSE(item());
+        EXPECT_FALSE(statistics());
+        EXPECT_FALSE(histogram());
+        EXPECT_EQ(band.GetColorTable(), nullptr);
+        EXPECT_GE(faults.Failed(), 4u);
+    }
+    EXPECT_TRUE(item());
+    EXPECT_TRUE(statistics());
+    EXPECT_TRUE(histogram());
+    EXPECT_NE(band.GetColorTable(), nullptr);
+}
+
+TEST_F(DriverFaults, BlocksOfOtherBandsWaitUntilTheirTileIsWritten) {
+    Make(3);
+    {
+        const DatasetPtr dataset = Open(GDAL_OF_UPDATE);
+        ASSERT_TRUE(dataset);
+        Fill(*dataset, 1, 11);
+        Fill(*dataset, 2, 12);
+        const FileFaults faults(
+            {folder.String(), zmctest::kWriteCall, 1, false, FileFaultAction::Error, ENOSPC});
+        CPLErrorReset();
+        dataset->FlushCache(false);
+        EXPECT_EQ(CPLGetLastErrorType(), CE_Failure);
+        EXPECT_EQ(faults.Failed(), 1u);
+    }
+    const DatasetPtr dataset = Open();
+    EXPECT_TRUE(Holds(Read(*dataset, 2), 12));
+    EXPECT_TRUE(Holds(Read(*dataset, 3), 3));
+}
+
+TEST_F(DriverFaults, WhatAWriteThatFailedHasLeftIsReadFromTheFile) {
+    Make(5);
+    const DatasetPtr dataset = Open(GDAL_OF_UPDATE);
+    ASSERT_TRUE(dataset);
+    Read(*dataset, 1);
+    Fill(*dataset, 2, 22);
+    {
+        const FileSizeLimit limit(std::size_t{kSide} * kSide * 5 / 2);
+        CPLErrorReset();
+        dataset->FlushCache(false);
+        EXPECT_EQ(CPLGetLastErrorType(), CE_Failure);
+    }
+    const Samples torn = Read(*Open(), 2);
+    EXPECT_NE(std::find(torn.begin(), torn.end(), 22), torn.end());
+    EXPECT_NE(std::find(torn.begin(), torn.end(), 2), torn.end());
+    EXPECT_EQ(Read(*dataset, 2), torn);
+}
+
+TEST_F(DriverFaults, LevelsAreNotMadeOfPixelsThatCouldNotBeWritten) {
+    Make(1, nullptr, 600);
+    const DatasetPtr dataset = Open(GDAL_OF_UPDATE);
+    ASSERT_TRUE(dataset);
+    Fill(*dataset, 1, 9);
+    const FileFaults faults(
+        {folder.String(), zmctest::kWriteCall, 1, false, FileFaultAction::Error, ENOSPC});
+    const int factors[] = {2};
+    EXPECT_EQ(dataset->BuildOverviews("AVERAGE", 1, factors, 0, nullptr, nullptr, nullptr),
+              CE_Failure);
+    EXPECT_EQ(faults.Failed(), 1u);
+}
+
+TEST_F(DriverFaults, LevelsThatWereRenewedBeforeAFailureAreSeen) {
+    Make(1, nullptr, 1200);
+    const DatasetPtr dataset = Open(GDAL_OF_UPDATE);
+    ASSERT_TRUE(dataset);
+    for (int y = 0; y < 1200; y += kSide)
+        for (int x = 0; x < 1200; x += kSide) Fill(*dataset, 1, 9, x, y);
+    dataset->FlushCache(false);
+    // Whoever looks on meanwhile leaves what he saw in GDAL's cache.
+    const auto last = [](GDALDataset& looked) {
+        unsigned char sample = 0;
+        EXPECT_EQ(looked.GetRasterBand(1)->GetOverview(0)->RasterIO(
+                      GF_Read, 599, 599, 1, 1, &sample, 1, 1, GDT_Byte, 0, 0, nullptr),
+                  CE_None);
+        return sample;
+    };
+    const auto look = [](double, const char*, void* data) -> int {
+        (*static_cast<std::function<void()>*>(data))();
+        return TRUE;
+    };
+    std::function<void()> looking = [&, looked = false]() mutable {
+        EXPECT_EQ(looked ? 1 : last(*dataset), 1);
+        looked = true;
+    };
+    {
+        // The first level has nine tiles.
+        const FileFaults faults(
+            {folder.String(), zmctest::kWriteCall, 10, true, FileFaultAction::Error, ENOSPC});
+        const int factors[] = {2, 4};
+        EXPECT_EQ(dataset->BuildOverviews("AVERAGE", 2, factors, 0, nullptr, look, &looking),
+                  CE_Failure);
+        EXPECT_GT(faults.Failed(), 0u);
+    }
+    EXPECT_EQ(last(*Open()), 9);
+    EXPECT_EQ(last(*dataset), 9);
+}
+
+TEST_F(DriverFaults, NewFileWithoutSomeOfItsBlocksIsNotMade) {
+    DatasetPtr dataset(
+        Driver("ZMCPyramid").Create(name.c_str(), kSide, kSide, 1, GDT_Byte, nullptr));
+    ASSERT_TRUE(dataset);
+    Fill(*dataset, 1, 7);
+    const FileFaults faults(
+        {folder.String(), zmctest::kWriteCall, 1, false, FileFaultAction::Error, ENOSPC});
+    dataset.reset();
+    EXPECT_EQ(faults.Failed(), 1u);
+    EXPECT_TRUE(std::filesystem::is_empty(folder.String()));
+}
+
+TEST_F(DriverFaults, NewFileIsMadeOnceItsBlocksAreWritten) {
+    DatasetPtr dataset(
+        Driver("ZMCPyramid").Create(name.c_str(), kSide, kSide, 1, GDT_Byte, nullptr));
+    ASSERT_TRUE(dataset);
+    Fill(*dataset, 1, 7);
+    {
+        const FileFaults faults(
+            {folder.String(), zmctest::kWriteCall, 1, false, FileFaultAction::Error, ENOSPC});
+        dataset->FlushCache(false);
+        EXPECT_EQ(faults.Failed(), 1u);
+    }
+    Fill(*dataset, 1, 8);
+    dataset.reset();
+    dataset = Open();
+    ASSERT_TRUE(dataset);
+    EXPECT_TRUE(Holds(Read(*dataset, 1), 8));
+}
+
+}  // namespace
+}  // namespace zmcgdal
