@@ -307,7 +307,19 @@ void PyramidXMLReaderHandlers<T>::TakeHistogramText(ElementName name, std::strin
     }
 }
 
-#define ZMC_X(type, name, code) template class PyramidXMLReaderHandlers<type>;
+template <class T>
+void PyramidRecordReader<T>::KeepPalette(Palette& kept) {
+    const auto& open = this->stateStack;
+    if (std::find(open.begin(), open.end(), StateOf(PALETTE)) != open.end())
+        return PyramidXMLReaderHandlers<T>::KeepPalette(kept);
+    kept.Clear();
+    kept.colors.swap(this->currentPalette.colors);
+    std::swap(kept.nextIndex, this->currentPalette.nextIndex);
+}
+
+#define ZMC_X(type, name, code)                    \
+    template class PyramidXMLReaderHandlers<type>; \
+    template class PyramidRecordReader<type>;
 ZMC_ELEMENT_TYPES(ZMC_X)
 #undef ZMC_X
 

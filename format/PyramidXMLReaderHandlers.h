@@ -121,6 +121,14 @@ protected:
     void TakeHistogramText(ElementName name, std::string_view text) override;
 };
 
+// The same for those who look at the finished records alone: a palette that is not inside another
+// is handed over to them rather than copied, and leaves none in hand.
+template <class T>
+class PyramidRecordReader : public PyramidXMLReaderHandlers<T> {
+protected:
+    void KeepPalette(Palette& kept) override;
+};
+
 }  // namespace zelm
 
 #endif

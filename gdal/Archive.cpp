@@ -4,6 +4,7 @@
 #include <cmath>
 
 #include "core/ElementTypes.h"
+#include "gdal/ColorTables.h"
 #include "gdal/NearestValue.h"
 #include "host/file/StoredRecords.h"
 
@@ -82,13 +83,6 @@ std::unique_ptr<GDALColorTable> TableOf(const zelm::Palette& palette) {
         table->SetColorEntry(static_cast<int>(index), &entry);
     }
     return table;
-}
-
-void AddEntry(zelm::Palette& palette, const GDALColorEntry& entry) {
-    unsigned char components[] = {
-        static_cast<unsigned char>(entry.c1), static_cast<unsigned char>(entry.c2),
-        static_cast<unsigned char>(entry.c3), static_cast<unsigned char>(entry.c4)};
-    palette.AddColor(zelm::RGBAColor(zelm::Array(components, zelm::ArrayShape(4))));
 }
 
 }  // namespace
@@ -200,8 +194,7 @@ bool Archive::StoreHistogram(const StoredHistogram& histogram) {
 bool Archive::StoreColorTable(std::uint32_t band, const GDALColorTable* table) {
     const bool stored = Store([&](auto& reader) {
         zelm::Palette palette;
-        for (int i = 0; table && i < table->GetColorEntryCount(); ++i)
-            AddEntry(palette, *table->GetColorEntry(i));
+        if (table) AddColors(*table, palette);
         return reader.SetPalette(band, palette);
     });
     colorTables.erase(band);

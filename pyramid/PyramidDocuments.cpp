@@ -19,8 +19,7 @@ namespace {
 constexpr std::uint64_t kHeaderOffset = PyramidFront::kHeaderOffset;
 
 // A source over a text, or null if memory ran out.
-std::unique_ptr<xercesc::MemBufInputSource> MakeSource(std::unique_ptr<XMLByte[]> text,
-                                                       std::size_t size, const char* name) {
+DocumentSource MakeSource(std::unique_ptr<XMLByte[]> text, std::size_t size, const char* name) {
     GuardText(text.get(), size);
     try {
         auto source = std::make_unique<xercesc::MemBufInputSource>(text.get(), size, name, true);
@@ -33,7 +32,7 @@ std::unique_ptr<xercesc::MemBufInputSource> MakeSource(std::unique_ptr<XMLByte[]
 
 // A source over `size` bytes of the file at `offset`, or null: too long, past the end of the file,
 // or out of memory.
-std::unique_ptr<xercesc::MemBufInputSource> LoadText(files::ByteSource& file, std::uint64_t offset,
+DocumentSource LoadText(files::ByteSource& file, std::uint64_t offset,
                                                      std::uint64_t size, const char* name) {
     const std::uint64_t fileSize = file.Size();
     if (size > kMaxDocumentBytes || offset > fileSize || size > fileSize - offset) return nullptr;
@@ -45,7 +44,7 @@ std::unique_ptr<xercesc::MemBufInputSource> LoadText(files::ByteSource& file, st
 
 // The header document that ends at `end`. An end before its beginning wraps to a size that no file
 // has.
-std::unique_ptr<xercesc::MemBufInputSource> LoadHeaderText(files::ByteSource& file,
+DocumentSource LoadHeaderText(files::ByteSource& file,
                                                            std::uint64_t end) {
     return LoadText(file, kHeaderOffset, end - kHeaderOffset, "ORVAPYRHEADER");
 }
@@ -79,7 +78,7 @@ bool PyramidDataset::ParseHeaderDocument(PyramidHeaderRecord& out) {
     return ParseHeaderText(HeaderSource, HeaderLoaded, out);
 }
 
-bool PyramidDataset::ParseHeaderText(std::unique_ptr<xercesc::MemBufInputSource>& text,
+bool PyramidDataset::ParseHeaderText(DocumentSource& text,
                                      bool& loaded, PyramidHeaderRecord& out) {
     try {
         PyramidXMLReaderHandlers<char> handlers;
@@ -94,7 +93,7 @@ bool PyramidDataset::ParseHeaderText(std::unique_ptr<xercesc::MemBufInputSource>
 // What LoadHeaderDocument and ParseHeaderDocument do, aside. An empty region leaves the record
 // without a tile size, and with that refused.
 bool PyramidDataset::ReadHeaderText(PyramidLayout& layout,
-                                    std::unique_ptr<xercesc::MemBufInputSource>& text) {
+                                    DocumentSource& text) {
     if (layout.tileDataStart == kHeaderOffset) return true;
     text = LoadHeaderText(*File, layout.tileDataStart);
     bool loaded = text != nullptr;
@@ -114,7 +113,7 @@ bool PyramidDataset::LoadMetaDocument() {
 }
 
 int PyramidDataset::ParseDocument(xercesc::HandlerBase* handlers,
-                                  std::unique_ptr<xercesc::MemBufInputSource>& source,
+                                  DocumentSource& source,
                                   bool& loaded) {
     if (!source || !Parser) return kParseError;
     const ParseEnd end = RunParser(*Parser, handlers, *source, PrintFailure);
@@ -128,13 +127,13 @@ int PyramidDataset::ParseDocument(xercesc::HandlerBase* handlers,
 
 void PyramidDataset::ReadMetaTree() {
     if (!File) return;
-    const bool loaded = MetaLoaded || LoadMetaDocument();
+    if (MetaLoaded || LoadMetaDocument()) {
+        metaUnknown = false;
+        return MetaDocument.Await(MetaSource);
+    }
     const std::uint64_t size = File->Size();
-    metaUnknown = !loaded && size == files::ByteSource::kUnknownSize;
-    if (metaUnknown || (!loaded && size <= MetaDocumentOffset)) return;
-    std::unique_ptr<PyramidXMLDocument> document = PyramidXMLDocument::Make();
-    if (document && loaded) document->ParseTree(*MetaSource);
-    MetaDocument.reset(std::move(document));
+    metaUnknown = size == files::ByteSource::kUnknownSize;
+    if (!metaUnknown && size > MetaDocumentOffset) MetaDocument.reset(PyramidXMLDocument::Make());
 }
 
 PyramidXMLDocument* PyramidDataset::EnsureMetaDocument() {

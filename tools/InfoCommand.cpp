@@ -1,8 +1,8 @@
 #include <cstdio>
 
 #include "core/PixelVocabulary.h"
-#include "host/file/MetadataDocument.h"
 #include "host/file/PyramidFileInfo.h"
+#include "host/file/StoredRecords.h"
 #include "platform/Terminal.h"
 #include "tools/Command.h"
 #include "tools/HistogramBars.h"
@@ -89,21 +89,28 @@ Json HistogramsOf(const zmchost::Raster& raster) {
     return list;
 }
 
+// A colour for each number, since there may be 65,536 of them.
+Json::array_t ColorsOf(const zelm::Palette& palette) {
+    Json::array_t colors(palette.nextIndex);
+    auto entry = palette.colors.begin();
+    for (std::uint32_t i = 0; i < palette.nextIndex; ++i) {
+        const bool present = entry != palette.colors.end() && entry->first == i;
+        const zelm::Color* const color = present ? entry->second.Get() : nullptr;
+        Json::array_t channels(4, 0u);
+        if (color) channels = {color->red, color->green, color->blue, color->alpha};
+        colors[i] = std::move(channels);
+        if (present) ++entry;
+    }
+    return colors;
+}
+
+template <class T>
 Json PalettesOf(const zmchost::Raster& raster) {
     Json list = Json::array();
-    for (std::uint32_t band = 0; band < raster.Bands(); ++band) {
-        const zelm::PalettePtr palette = raster.BandPalette(band);
-        if (!palette) continue;
-        Json colors = Json::array();
-        for (std::uint32_t i = 0; i < palette->nextIndex; ++i) {
-            const auto found = palette->colors.find(i);
-            const zelm::Color* const color =
-                found == palette->colors.end() ? nullptr : found->second.operator->();
-            colors.push_back(color ? Json{color->red, color->green, color->blue, color->alpha}
-                                   : Json{0, 0, 0, 0});
-        }
-        list.push_back({{"band", band + 1}, {"colors", colors}});
-    }
+    const auto records = raster.Records<T>();
+    for (std::uint32_t band = 0; band < raster.Bands(); ++band)
+        if (const zelm::Palette* const palette = records->BandPalette(band))
+            list.push_back({{"band", band + 1}, {"colors", ColorsOf(*palette)}});
     return list;
 }
 
@@ -132,16 +139,16 @@ Json Describe(const std::string& file) {
     // Of a type without a reader the header is all that can be told.
     if (zelm::CheckedPixelType(header.pixelType) == 0 || !info.HasMetadataDocument())
         return document;
-    if (const std::string wrong = zmchost::JudgeMetadata(file, info.header); !wrong.empty()) {
+    const zmchost::Raster raster = OpenPyramid(file);
+    if (const std::string wrong = raster.DocumentFault(); !wrong.empty()) {
         Warn(file + ": warning: " + wrong + "; statistics, histograms and palettes are not shown");
         return document;
     }
-    const zmchost::Raster raster = OpenPyramid(file);
     zelm::VisitElementType(raster.PixelType(), [&]<class T>(std::type_identity<T>) {
         document["statistics"] = StatisticsOf<T>(raster);
         document["histograms"] = HistogramsOf<T>(raster);
+        document["palettes"] = PalettesOf<T>(raster);
     });
-    document["palettes"] = PalettesOf(raster);
     return document;
 }
 

@@ -1,7 +1,6 @@
 #include "tools/Verification.h"
 
 #include "core/PixelVocabulary.h"
-#include "host/file/MetadataDocument.h"
 #include "tools/Interrupt.h"
 #include "tools/Message.h"
 #include "tools/SampleDifferences.h"
@@ -55,11 +54,11 @@ CheckResult CheckCompleteness(const zmchost::PyramidFileInfo& info) {
     return result;
 }
 
-CheckResult CheckDocuments(const std::string& file, const zmchost::PyramidFileInfo& info,
+CheckResult CheckDocuments(const zmchost::PyramidFileInfo& info,
                            const zmchost::Raster& raster) {
     CheckResult result{"documents", {}, {}};
     if (!info.HasMetadataDocument()) return result;
-    const std::string wrong = zmchost::JudgeMetadata(file, info.header);
+    const std::string wrong = raster.DocumentFault();
     if (!wrong.empty()) {
         result.problems.push_back(wrong);
         return result;

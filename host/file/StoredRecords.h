@@ -12,6 +12,7 @@
 #include <cstdint>
 #include <memory>
 #include <span>
+#include <string>
 #include <unordered_map>
 
 #include "colour/Palette.h"
@@ -20,6 +21,7 @@
 #include "raster/RasterBandStats.h"
 
 namespace zelm {
+struct DocumentText;
 template <class T>
 class PyramidXMLReaderHandlers;
 }  // namespace zelm
@@ -34,6 +36,9 @@ public:
     // The last one stored; null where there is none, or one without colours, which hides those
     // before it. Owned by this object.
     virtual const zelm::Palette* BandPalette(std::uint32_t band) const = 0;
+    // What is wrong with the form of the document, as JudgeMetadata tells it; empty if nothing, or if
+    // there is none. One of another root keeps its records all the same.
+    virtual const std::string& Fault() const = 0;
     // Whether the text came to rest: one that is missing, or that a store has marked as unfinished,
     // may be another a moment later.
     virtual bool IsSettled() const = 0;
@@ -60,16 +65,19 @@ public:
 
     bool HasStatistics(std::uint32_t band) const override { return FirstStatistics(band); }
     const zelm::Palette* BandPalette(std::uint32_t band) const override;
+    const std::string& Fault() const override { return fault; }
     bool IsSettled() const override { return settled; }
 
 private:
     using Places = std::unordered_map<std::uint32_t, std::uint32_t>;
 
+    void Parse(zelm::DocumentText text);
     void MapPlaces();
     const zelm::RasterBandStats<T>* At(const Places& places, std::uint32_t band) const;
 
     std::unique_ptr<zelm::PyramidXMLReaderHandlers<T>> kept;  // null if nothing is
     Places first, newest;                                     // in Statistics(), by band
+    std::string fault;
     bool settled = false;
 };
 

@@ -449,6 +449,11 @@ std::shared_ptr<const DocumentRecords> Raster::AnyRecords() const {
     return read;
 }
 
+std::string Raster::DocumentFault() const {
+    const auto stored = AnyRecords();
+    return stored ? stored->Fault() : "";
+}
+
 bool Raster::HasStatistics(std::uint32_t band) const {
     const auto stored = AnyRecords();
     return stored && stored->HasStatistics(band);
@@ -538,6 +543,11 @@ void Raster::SetHistograms(const std::vector<zelm::RasterBandHistogram<T>>& hist
             same = HaveSameCounts(stored[before + i], histograms[i]);
         if (!same) throw Error(name, "store histograms", "the module did not store them");
     });
+}
+
+bool Raster::HasPalette(std::uint32_t band) const {
+    const auto stored = AnyRecords();
+    return stored && stored->BandPalette(band);
 }
 
 // A copy, for whatever its holder does with it. No memory raster has one.
