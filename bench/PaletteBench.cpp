@@ -1,7 +1,7 @@
 // What a palette of 65,536 colours costs, wherever one is read or stored: through the host's
 // rasters, through GDAL, and on the command line, each from an open to its end. Every figure is to
-// stay below 50 ms; `Scan`, the bare parse of the document by handlers that do nothing, is what none
-// of those that read can go below.
+// stay below 50 ms; `Scan`, the bare parse of the document by handlers that do nothing, is what
+// none of those that read can go below.
 //
 // The commands are timed by the processor time that they take in user mode, and stand beside the
 // same command on a file without a palette, which is what starting the program costs.

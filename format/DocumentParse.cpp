@@ -133,10 +133,9 @@ std::string ParseDocumentText(std::string text, FaultReader& reader) {
 
 std::string ParseDocumentBytes(unsigned char* bytes, std::size_t size,
                                xercesc::HandlerBase& handlers, std::string& fault) {
-    const bool parsed =
-        ParseWithKept(bytes, size, handlers, [&](const xercesc::XMLException& exception) {
-            fault = ToNarrow(exception.getMessage());
-        });
+    const bool parsed = ParseWithKept(
+        bytes, size, handlers,
+        [&](const xercesc::XMLException& exception) { fault = ToNarrow(exception.getMessage()); });
     if (parsed) return "";
     return fault.empty() ? "it cannot be parsed" : fault;
 }

@@ -18,6 +18,7 @@
 #include <utility>
 
 #include "colour/Color.h"
+#include "colour/ColorList.h"
 #include "colour/Palette.h"
 #include "core/Array.h"
 #include "format/ElementReader.h"
@@ -83,9 +84,13 @@ protected:
     void Leave(std::int32_t state) override;
     void TakeText(ElementName name, std::string_view text) override;
 
-    // The palette in hand has come to its end, and is kept as this. Colours without a palette
-    // around them, and those of one around it, are added to the one in hand: it stays.
-    virtual void KeepPalette(Palette& kept);
+    // The palette in hand begins, gets a colour, has one looked up, or has come to its end and is
+    // kept as that of the band told last. Colours without a palette around them, and those of one
+    // around it, are added to the one in hand: it stays.
+    virtual void BeginPalette();
+    virtual void AddColor(ColorList::Rgba rgba);
+    virtual void LookUpColor(std::uint32_t index);
+    virtual void KeepPalette();
 
     virtual void BeginStats() = 0;
     virtual void EndStats() = 0;
@@ -126,7 +131,7 @@ protected:
 template <class T>
 class PyramidRecordReader : public PyramidXMLReaderHandlers<T> {
 protected:
-    void KeepPalette(Palette& kept) override;
+    void KeepPalette() override;
 };
 
 }  // namespace zelm

@@ -178,8 +178,7 @@ public:
     // Runs Parser over `source`, which may be null only after a failure; `handlers` may be null.
     // kParsed, kParseError or kParseOutOfMemory. The source is one of the two members: after an
     // exception it is dropped and its flag cleared.
-    int ParseDocument(xercesc::HandlerBase* handlers,
-                      DocumentSource& source, bool& loaded);
+    int ParseDocument(xercesc::HandlerBase* handlers, DocumentSource& source, bool& loaded);
     // Gives the file's text to MetaDocument, if the file has any. Text that cannot be had, or is
     // malformed, leaves MetaDocument without a tree, so that no store replaces it.
     void ReadMetaTree();
@@ -224,8 +223,7 @@ private:
     // The fixed fields of the open file, and its header document, as far as `layout` goes.
     bool ReadFixedFields(PyramidLayout& layout) const;
     bool ReadHeaderText(PyramidLayout& layout, DocumentSource& text);
-    bool ParseHeaderText(DocumentSource& text, bool& loaded,
-                         PyramidHeaderRecord& out);
+    bool ParseHeaderText(DocumentSource& text, bool& loaded, PyramidHeaderRecord& out);
     bool WriteFront(PyramidLayout& layout);
     bool EnsureTileTable();
     // Judges a transfer that has something to move, and makes sure of the tile table.

@@ -32,8 +32,8 @@ DocumentSource MakeSource(std::unique_ptr<XMLByte[]> text, std::size_t size, con
 
 // A source over `size` bytes of the file at `offset`, or null: too long, past the end of the file,
 // or out of memory.
-DocumentSource LoadText(files::ByteSource& file, std::uint64_t offset,
-                                                     std::uint64_t size, const char* name) {
+DocumentSource LoadText(files::ByteSource& file, std::uint64_t offset, std::uint64_t size,
+                        const char* name) {
     const std::uint64_t fileSize = file.Size();
     if (size > kMaxDocumentBytes || offset > fileSize || size > fileSize - offset) return nullptr;
     std::unique_ptr<XMLByte[]> text(new (std::nothrow) XMLByte[static_cast<std::size_t>(size)]);
@@ -44,8 +44,7 @@ DocumentSource LoadText(files::ByteSource& file, std::uint64_t offset,
 
 // The header document that ends at `end`. An end before its beginning wraps to a size that no file
 // has.
-DocumentSource LoadHeaderText(files::ByteSource& file,
-                                                           std::uint64_t end) {
+DocumentSource LoadHeaderText(files::ByteSource& file, std::uint64_t end) {
     return LoadText(file, kHeaderOffset, end - kHeaderOffset, "ORVAPYRHEADER");
 }
 
@@ -78,8 +77,7 @@ bool PyramidDataset::ParseHeaderDocument(PyramidHeaderRecord& out) {
     return ParseHeaderText(HeaderSource, HeaderLoaded, out);
 }
 
-bool PyramidDataset::ParseHeaderText(DocumentSource& text,
-                                     bool& loaded, PyramidHeaderRecord& out) {
+bool PyramidDataset::ParseHeaderText(DocumentSource& text, bool& loaded, PyramidHeaderRecord& out) {
     try {
         PyramidXMLReaderHandlers<char> handlers;
         if (ParseDocument(&handlers, text, loaded) != kParsed) return false;
@@ -92,8 +90,7 @@ bool PyramidDataset::ParseHeaderText(DocumentSource& text,
 
 // What LoadHeaderDocument and ParseHeaderDocument do, aside. An empty region leaves the record
 // without a tile size, and with that refused.
-bool PyramidDataset::ReadHeaderText(PyramidLayout& layout,
-                                    DocumentSource& text) {
+bool PyramidDataset::ReadHeaderText(PyramidLayout& layout, DocumentSource& text) {
     if (layout.tileDataStart == kHeaderOffset) return true;
     text = LoadHeaderText(*File, layout.tileDataStart);
     bool loaded = text != nullptr;
@@ -112,8 +109,7 @@ bool PyramidDataset::LoadMetaDocument() {
     return MetaSource != nullptr;
 }
 
-int PyramidDataset::ParseDocument(xercesc::HandlerBase* handlers,
-                                  DocumentSource& source,
+int PyramidDataset::ParseDocument(xercesc::HandlerBase* handlers, DocumentSource& source,
                                   bool& loaded) {
     if (!source || !Parser) return kParseError;
     const ParseEnd end = RunParser(*Parser, handlers, *source, PrintFailure);

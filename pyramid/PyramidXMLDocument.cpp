@@ -146,8 +146,8 @@ std::string FormatCounts(const RasterBandHistogram<T>& histogram) {
 }  // namespace
 
 // Writes the children of records in the place of the comments that stand for them. The serializer
-// hands on what it writes as it goes, so that the text so far ends with the tag of the record; if it
-// did not, the text would be no document.
+// hands on what it writes as it goes, so that the text so far ends with the tag of the record; if
+// it did not, the text would be no document.
 class PyramidXMLDocument::TextFiller : public xercesc::DOMLSSerializerFilter {
 public:
     TextFiller(const ChildTexts& texts, xercesc::MemBufFormatTarget& text)
@@ -338,8 +338,8 @@ bool PyramidXMLDocument::WritePaletteElement(std::uint32_t band, const Palette& 
     // Each colour is an element.
     if (palette.nextIndex > kMaxDocumentNodes) return false;
     return AppendRecord(ElementName::PALETTE, [&](xercesc::DOMElement& record) {
-        AppendChildText(record, {FormatPaletteChildren(band, palette),
-                                 2 + std::uint64_t{palette.nextIndex}});
+        AppendChildText(
+            record, {FormatPaletteChildren(band, palette), 2 + std::uint64_t{palette.nextIndex}});
     });
 }
 

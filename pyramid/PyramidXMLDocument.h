@@ -10,7 +10,8 @@
 // (DocumentLimits.h).
 //
 // A palette may have 65,536 colours, each an element with a text: in the tree it is an element with
-// a comment, which stands for its children, and those are kept as the text that they are written as.
+// a comment, which stands for its children, and those are kept as the text that they are written
+// as.
 #ifndef ZMC_PYRAMID_PYRAMIDXMLDOCUMENT_H
 #define ZMC_PYRAMID_PYRAMIDXMLDOCUMENT_H
 

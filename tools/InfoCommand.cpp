@@ -1,4 +1,6 @@
+#include <algorithm>
 #include <cstdio>
+#include <limits>
 
 #include "core/PixelVocabulary.h"
 #include "host/file/PyramidFileInfo.h"
@@ -89,32 +91,39 @@ Json HistogramsOf(const zmchost::Raster& raster) {
     return list;
 }
 
-// A colour for each number, since there may be 65,536 of them.
-Json::array_t ColorsOf(const zelm::Palette& palette) {
-    Json::array_t colors(palette.nextIndex);
-    auto entry = palette.colors.begin();
-    for (std::uint32_t i = 0; i < palette.nextIndex; ++i) {
-        const bool present = entry != palette.colors.end() && entry->first == i;
-        const zelm::Color* const color = present ? entry->second.Get() : nullptr;
-        Json::array_t channels(4, 0u);
-        if (color) channels = {color->red, color->green, color->blue, color->alpha};
-        colors[i] = std::move(channels);
-        if (present) ++entry;
+// Of 65,536 colours people are shown no more than a line.
+constexpr std::size_t kColorsOnALine = 64;
+constexpr std::size_t kAllColors = std::numeric_limits<std::size_t>::max();
+
+Json ColorsOf(const zelm::ColorList& palette, std::size_t most) {
+    Json::array_t colors;
+    colors.reserve(std::min(most, palette.Colors().size()));
+    for (const zelm::ColorList::Rgba color : palette.Colors()) {
+        if (colors.size() == most) break;
+        Json::array_t channels(4);
+        for (int i = 0; i < 4; ++i)
+            channels[static_cast<std::size_t>(i)] = zelm::ColorList::Channel(color, i);
+        colors.emplace_back(std::move(channels));
     }
     return colors;
 }
 
+// With no more than so many colours of each, and their true number where that may be more.
 template <class T>
-Json PalettesOf(const zmchost::Raster& raster) {
+Json PalettesOf(const zmchost::Raster& raster, std::size_t most) {
     Json list = Json::array();
     const auto records = raster.Records<T>();
-    for (std::uint32_t band = 0; band < raster.Bands(); ++band)
-        if (const zelm::Palette* const palette = records->BandPalette(band))
-            list.push_back({{"band", band + 1}, {"colors", ColorsOf(*palette)}});
+    for (std::uint32_t band = 0; band < raster.Bands(); ++band) {
+        const zelm::ColorList* const palette = records->BandPalette(band);
+        if (!palette) continue;
+        Json entry = {{"band", band + 1}, {"colors", ColorsOf(*palette, most)}};
+        if (most != kAllColors) entry["count"] = palette->Colors().size();
+        list.push_back(std::move(entry));
+    }
     return list;
 }
 
-Json Describe(const std::string& file) {
+Json Describe(const std::string& file, std::size_t mostColors) {
     const zmchost::PyramidFileInfo info = ReadLayout(file);
     const zmchost::PyramidHeader& header = info.header;
     Json document = {{"schema", kSchema},
@@ -147,7 +156,7 @@ Json Describe(const std::string& file) {
     zelm::VisitElementType(raster.PixelType(), [&]<class T>(std::type_identity<T>) {
         document["statistics"] = StatisticsOf<T>(raster);
         document["histograms"] = HistogramsOf<T>(raster);
-        document["palettes"] = PalettesOf<T>(raster);
+        document["palettes"] = PalettesOf<T>(raster, mostColors);
     });
     return document;
 }
@@ -198,15 +207,13 @@ void PrintHistograms(const Json& document) {
 
 void PrintPalettes(const Json& document) {
     for (const Json& palette : document["palettes"]) {
-        std::printf("palette of band %s: %zu colors\n", Text(palette["band"]).c_str(),
-                    palette["colors"].size());
+        std::printf("palette of band %s: %s colors\n", Text(palette["band"]).c_str(),
+                    Text(palette["count"]).c_str());
         if (!platform::IsTerminal(platform::StandardStream::Output)) continue;
         std::printf("  ");
-        for (std::size_t i = 0; i < palette["colors"].size() && i < 64; ++i) {
-            const Json& color = palette["colors"][i];
+        for (const Json& color : palette["colors"])
             std::printf("\x1b[48;2;%d;%d;%dm ", color[0].get<int>(), color[1].get<int>(),
                         color[2].get<int>());
-        }
         std::printf("\x1b[0m\n");
     }
 }
@@ -230,7 +237,7 @@ void Print(const Json& document) {
 }
 
 ExitStatus InfoCommand::Run() {
-    const Json document = zmctools::Describe(file);
+    const Json document = zmctools::Describe(file, json ? kAllColors : kColorsOnALine);
     if (json)
         PrintDocument(document);
     else

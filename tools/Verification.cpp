@@ -54,8 +54,7 @@ CheckResult CheckCompleteness(const zmchost::PyramidFileInfo& info) {
     return result;
 }
 
-CheckResult CheckDocuments(const zmchost::PyramidFileInfo& info,
-                           const zmchost::Raster& raster) {
+CheckResult CheckDocuments(const zmchost::PyramidFileInfo& info, const zmchost::Raster& raster) {
     CheckResult result{"documents", {}, {}};
     if (!info.HasMetadataDocument()) return result;
     const std::string wrong = raster.DocumentFault();

@@ -14,10 +14,11 @@ namespace {
 
 // Says nothing on the standard error stream, and keeps what is wrong for those who ask.
 template <class T>
-class JudgingReader : public zelm::PyramidRecordReader<T> {
+class JudgingReader : public zelm::PyramidXMLReaderHandlers<T> {
 public:
     std::string fault;
     bool hasOurRoot = false;
+    std::unordered_map<std::uint32_t, zelm::ColorList> colors;  // of finished palettes, by band
 
     void warning(const xercesc::SAXParseException&) override {}
     void error(const xercesc::SAXParseException& exception) override {
@@ -29,8 +30,15 @@ protected:
     void Enter(std::int32_t state) override {
         if (this->stateStack.size() == 1)
             hasOurRoot = state == zelm::StateOf(zelm::ElementName::DATASET);
-        zelm::PyramidRecordReader<T>::Enter(state);
+        zelm::PyramidXMLReaderHandlers<T>::Enter(state);
     }
+    void BeginPalette() override { current.Clear(); }
+    void AddColor(zelm::ColorList::Rgba rgba) override { current.Add(rgba); }
+    void LookUpColor(std::uint32_t index) override { current.LookUp(index); }
+    void KeepPalette() override { colors[this->paletteBand] = current; }
+
+private:
+    zelm::ColorList current;  // the palette in hand
 };
 
 // Why the text behind `offset` could not be had; empty if there is none.
@@ -77,6 +85,7 @@ void StoredRecords<T>::Parse(zelm::DocumentText text) {
         zelm::ParseDocumentBytes(text.bytes.get(), text.size, *reader, reader->fault);
     if (fault.empty()) fault = JudgeMetadataParse(wrong, reader->hasOurRoot);
     if (!wrong.empty()) return;
+    colors = std::move(reader->colors);
     kept = std::move(reader);
     MapPlaces();
 }
@@ -121,11 +130,9 @@ const zelm::RasterBandStats<T>* StoredRecords<T>::NewestStatistics(std::uint32_t
 }
 
 template <class T>
-const zelm::Palette* StoredRecords<T>::BandPalette(std::uint32_t band) const {
-    if (!kept) return nullptr;
-    const auto found = kept->palettes.find(band);
-    const bool has = found != kept->palettes.end() && found->second.nextIndex != 0;
-    return has ? &found->second : nullptr;
+const zelm::ColorList* StoredRecords<T>::BandPalette(std::uint32_t band) const {
+    const auto found = colors.find(band);
+    return found != colors.end() && !found->second.Colors().empty() ? &found->second : nullptr;
 }
 
 #define ZMC_X(type, word, code) template class StoredRecords<type>;

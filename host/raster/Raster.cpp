@@ -550,11 +550,11 @@ bool Raster::HasPalette(std::uint32_t band) const {
     return stored && stored->BandPalette(band);
 }
 
-// A copy, for whatever its holder does with it. No memory raster has one.
+// Made anew, for whatever its holder does with it. No memory raster has one.
 zelm::PalettePtr Raster::BandPalette(std::uint32_t band) const {
     zelm::PalettePtr palette;
     const auto stored = AnyRecords();
-    const zelm::Palette* const found = stored ? stored->BandPalette(band) : nullptr;
+    const zelm::ColorList* const found = stored ? stored->BandPalette(band) : nullptr;
     if (!found) return palette;
     palette.Reset(new zelm::Palette);
     found->CopyTo(*palette);
@@ -568,8 +568,8 @@ void Raster::SetBandPalette(std::uint32_t band, const zelm::Palette& palette) {
         Visit([&](auto& typed) { typed.SetPalette(band, palette); });
         CheckDisk("store a palette");
         const auto stored = AnyRecords();
-        const zelm::Palette* const found = stored ? stored->BandPalette(band) : nullptr;
-        if ((found ? found->nextIndex : 0) != palette.nextIndex)
+        const zelm::ColorList* const found = stored ? stored->BandPalette(band) : nullptr;
+        if ((found ? found->Colors().size() : 0) != palette.nextIndex)
             throw Error(name, "store a palette", "the module did not store it");
     });
 }

@@ -160,7 +160,7 @@ public:
     void SetHistograms(const std::vector<zelm::RasterBandHistogram<T>>& histograms);
 
     bool HasPalette(std::uint32_t band) const;
-    // A copy of the palette of a band, or an empty pointer. Records() has the palette itself.
+    // The palette of a band, made anew, or an empty pointer. Records() has its colours as numbers.
     zelm::PalettePtr BandPalette(std::uint32_t band) const;
     void SetBandPalette(std::uint32_t band, const zelm::Palette& palette);
 

@@ -76,6 +76,15 @@ TEST(NumberText, EdgesOfReals) {
     EXPECT_EQ(ReadReal("-1e999"), -std::numeric_limits<double>::infinity());
     EXPECT_EQ(ReadReal("1e-999"), 0);
     EXPECT_EQ(ReadReal("0x10"), 16);
+    EXPECT_EQ(ReadReal("255|7"), 255);
+    EXPECT_EQ(ReadReal("12x"), 12);
+    EXPECT_EQ(ReadReal("12e1"), 120);
+    EXPECT_EQ(ReadReal("12E1"), 120);
+    EXPECT_EQ(ReadReal("12.5"), 12.5);
+    EXPECT_EQ(ReadReal("999999999"), 999999999);
+    EXPECT_EQ(ReadReal("4294967296"), 4294967296);
+    EXPECT_EQ(ReadReal("-000000000000000012"), -12);
+    EXPECT_TRUE(std::signbit(ReadReal("-0")));
     EXPECT_TRUE(std::isnan(ReadReal("-nan")));
     EXPECT_EQ(ReadReal("inf"), std::numeric_limits<double>::infinity());
 }
