@@ -3,6 +3,14 @@
 #include <new>
 
 namespace zelm {
+namespace {
+
+// Colours for which there is no memory are left out, or left without a name, in silence.
+void Demand(const Color* made) {
+    if (!made || !made->name.wide) throw std::bad_alloc();
+}
+
+}  // namespace
 
 void ColorList::LookUp(std::uint32_t index) {
     if (index >= colors.size()) lookedUp.push_back(index);
@@ -21,11 +29,10 @@ void ColorList::CopyTo(Palette& target) const {
         color.blue = Channel(rgba, 2);
         color.alpha = Channel(rgba, 3);
         target.AddColor(color);
-        const ColorPtr& added = target.colors.rbegin()->second;
-        if (!added || !added->name.wide) throw std::bad_alloc();
+        Demand(target.colors.rbegin()->second.Get());
     }
     for (const std::uint32_t index : lookedUp)
-        if (index >= colors.size() && !target.GetColor(index)) throw std::bad_alloc();
+        if (index >= colors.size()) Demand(target.GetColor(index));
 }
 
 }  // namespace zelm

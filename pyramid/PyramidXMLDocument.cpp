@@ -128,7 +128,7 @@ std::string FormatPaletteChildren(std::uint32_t band, const Palette& palette) {
     AddChildLine(text, NameOf(ElementName::PALETTE_BAND), FormatDecimal(band));
     AddChildLine(text, NameOf(ElementName::PALETTE_COUNT), FormatDecimal(palette.nextIndex));
     AddColorLines(text, palette);
-    return text + "\n  ";
+    return text.append("\n  "), text;
 }
 
 // All bins of the record; those beyond its count array are 0.
