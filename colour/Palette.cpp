@@ -6,10 +6,15 @@
 namespace zelm {
 namespace {
 
-ColorPtr WholeCopy(const Color& color) {
-    const ColorPtr copy(new Color(color));
-    if (!copy || (color.name.wide && !copy->name.wide)) throw std::bad_alloc();
-    return copy;
+// Stands for a copy that is yet to be made, in the place of the one who owns it: a pointer that is
+// copied into its entry counts its object three times over.
+struct CopyToCome {
+    const Color& color;
+    operator Color*() const { return new (std::nothrow) Color(color); }
+};
+
+bool IsCopyOf(const ColorPtr& copy, const Color& color) {
+    return copy && (!color.name.wide || copy->name.wide);
 }
 
 }  // namespace
@@ -30,7 +35,9 @@ Color* Palette::GetColor(std::uint32_t index) {
 void Palette::AddColor(const Color& color) {
     auto place = colors.end();
     if (!colors.empty() && std::prev(place)->first > nextIndex) --place;
-    colors.insert_or_assign(place, nextIndex, ColorPtr(new (std::nothrow) Color(color)));
+    const std::size_t before = colors.size();
+    place = colors.try_emplace(place, nextIndex, CopyToCome{color});
+    if (colors.size() == before) place->second = ColorPtr(CopyToCome{color});
     ++nextIndex;
 }
 
@@ -45,8 +52,11 @@ void Palette::SetColor(std::uint32_t index, const Color& color) {
 void Palette::CopyTo(Palette& target) const {
     if (this == &target) return;
     std::map<std::uint32_t, ColorPtr> copies;
-    for (const auto& [index, color] : colors)
-        if (color) copies.emplace_hint(copies.end(), index, WholeCopy(*color));
+    for (const auto& [index, color] : colors) {
+        if (!color) continue;
+        const auto copy = copies.try_emplace(copies.end(), index, CopyToCome{*color});
+        if (!IsCopyOf(copy->second, *color)) throw std::bad_alloc();
+    }
     target.colors.swap(copies);
     target.nextIndex = nextIndex;
 }

@@ -113,10 +113,13 @@ ParseEnd RunParser(xercesc::SAXParser& parser, xercesc::HandlerBase* handlers,
     }
 }
 
+std::string TextOfFault(const xercesc::SAXParseException& exception) {
+    return "line " + FormatDecimal(exception.getLineNumber()) + ": " +
+           ToNarrow(exception.getMessage());
+}
+
 void FaultReader::error(const xercesc::SAXParseException& exception) {
-    if (fault.empty())
-        fault = "line " + FormatDecimal(exception.getLineNumber()) + ": " +
-                ToNarrow(exception.getMessage());
+    if (fault.empty()) fault = TextOfFault(exception);
 }
 
 void FaultReader::fatalError(const xercesc::SAXParseException& exception) { error(exception); }
@@ -124,16 +127,17 @@ void FaultReader::fatalError(const xercesc::SAXParseException& exception) { erro
 void FaultReader::TakeText(ElementName, std::string_view) {}
 
 std::string ParseDocumentText(std::string text, FaultReader& reader) {
-    const bool parsed = ParseWithKept(reinterpret_cast<unsigned char*>(text.data()), text.size(),
-                                      reader, [&](const xercesc::XMLException& exception) {
-                                          reader.fault = ToNarrow(exception.getMessage());
-                                      });
-    if (parsed) return "";
-    return reader.fault.empty() ? "it cannot be parsed" : reader.fault;
+    return ParseDocumentBytes(reinterpret_cast<unsigned char*>(text.data()), text.size(), reader,
+                              reader.fault);
 }
 
-bool ParseDocumentBytes(unsigned char* bytes, std::size_t size, xercesc::HandlerBase& handlers) {
-    return ParseWithKept(bytes, size, handlers, [](const xercesc::XMLException&) {});
+std::string ParseDocumentBytes(unsigned char* bytes, std::size_t size,
+                               xercesc::HandlerBase& handlers, std::string& fault) {
+    const bool parsed = ParseWithKept(
+        bytes, size, handlers,
+        [&](const xercesc::XMLException& exception) { fault = ToNarrow(exception.getMessage()); });
+    if (parsed) return "";
+    return fault.empty() ? "it cannot be parsed" : fault;
 }
 
 }  // namespace zelm

@@ -15,6 +15,7 @@
 
 namespace XERCES_CPP_NAMESPACE {
 class InputSource;
+class SAXParseException;
 class SAXParser;
 class XMLException;
 }  // namespace XERCES_CPP_NAMESPACE
@@ -44,6 +45,9 @@ ParseEnd RunParser(xercesc::SAXParser& parser, xercesc::HandlerBase* handlers,
                    const xercesc::InputSource& source,
                    const std::function<void(const xercesc::XMLException&)>& report) noexcept;
 
+// What an error handler is told, for people: "line 3: ...". May throw std::bad_alloc.
+std::string TextOfFault(const xercesc::SAXParseException& exception);
+
 // Handlers for those who want to know what is wrong, and not to have it printed.
 class FaultReader : public ElementReader {
 public:
@@ -60,9 +64,10 @@ protected:
 // Parses a text of any kind: guarded, by a parser that is kept for the next caller. What is wrong
 // with it, for people; empty if nothing. Throws std::bad_alloc. Any thread.
 std::string ParseDocumentText(std::string text, FaultReader& reader);
-// The same over bytes of the caller's, which are changed, with handlers of any kind; true if
-// nothing is wrong with the text.
-bool ParseDocumentBytes(unsigned char* bytes, std::size_t size, xercesc::HandlerBase& handlers);
+// The same over bytes of the caller's, which are changed, with handlers of any kind, which leave
+// the first fault that they are told of in `fault`.
+std::string ParseDocumentBytes(unsigned char* bytes, std::size_t size,
+                               xercesc::HandlerBase& handlers, std::string& fault);
 
 }  // namespace zelm
 

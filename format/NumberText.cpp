@@ -56,6 +56,23 @@ bool ReadMagnitude(std::string_view text, double& value) {
     return end.ec != std::errc::invalid_argument;
 }
 
+// A whole number that 32 bits hold, as channels and counts are, without the cost of reading a real;
+// false for any other. What makes it another number behind its digits is looked for.
+bool ReadShortWhole(std::string_view text, double& value) {
+    constexpr std::size_t most = std::numeric_limits<std::uint32_t>::digits10;
+    std::uint32_t whole = 0;
+    std::size_t digits = 0;
+    for (; digits < text.size() && text[digits] >= '0' && text[digits] <= '9'; ++digits) {
+        if (digits == most) return false;
+        whole = whole * 10 + static_cast<std::uint32_t>(text[digits] - '0');
+    }
+    constexpr std::string_view further = ".eExX";
+    if (digits == 0 || (digits < text.size() && further.find(text[digits]) != further.npos))
+        return false;
+    value = whole;
+    return true;
+}
+
 }  // namespace
 
 std::string FormatReal(double value, int digits) {
@@ -70,7 +87,7 @@ double ReadReal(std::string_view text) {
     const bool negative = TakeSign(text);
     double magnitude = 0;
     // What is no number is no negative zero either.
-    if (!ReadMagnitude(text, magnitude)) return 0;
+    if (!ReadShortWhole(text, magnitude) && !ReadMagnitude(text, magnitude)) return 0;
     return negative ? -magnitude : magnitude;
 }
 

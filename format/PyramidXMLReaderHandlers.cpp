@@ -141,7 +141,7 @@ void PyramidXMLReaderCore::Enter(std::int32_t state) {
     } else if (state == StateOf(HISTOGRAMS)) {
         BeginHistogram();
     } else if (state == StateOf(PALETTE)) {
-        currentPalette.Clear();
+        BeginPalette();
     }
 }
 
@@ -151,13 +151,28 @@ void PyramidXMLReaderCore::Leave(std::int32_t state) {
     } else if (state == StateOf(HISTOGRAMS)) {
         EndHistogram();
     } else if (state == StateOf(PALETTE)) {
-        if (!IsWhole(currentPalette)) throw std::bad_alloc();
-        KeepPalette(palettes[paletteBand]);
+        KeepPalette();
     }
 }
 
+void PyramidXMLReaderCore::BeginPalette() { currentPalette.Clear(); }
+
+void PyramidXMLReaderCore::AddColor(ColorList::Rgba rgba) {
+    color.red = ColorList::Channel(rgba, 0);
+    color.green = ColorList::Channel(rgba, 1);
+    color.blue = ColorList::Channel(rgba, 2);
+    color.alpha = ColorList::Channel(rgba, 3);
+    currentPalette.AddColor(color);
+}
+
+// Sets no length: the colours are counted. The lookup leaves a null colour behind.
+void PyramidXMLReaderCore::LookUpColor(std::uint32_t index) { currentPalette.GetColor(index); }
+
 // CopyTo throws where memory runs out.
-void PyramidXMLReaderCore::KeepPalette(Palette& kept) { currentPalette.CopyTo(kept); }
+void PyramidXMLReaderCore::KeepPalette() {
+    if (!IsWhole(currentPalette)) throw std::bad_alloc();
+    currentPalette.CopyTo(palettes[paletteBand]);
+}
 
 void PyramidXMLReaderCore::TakeText(ElementName name, std::string_view text) {
     if (name < HIST_LEVEL)
@@ -174,23 +189,18 @@ void PyramidXMLReaderCore::TakePaletteText(ElementName name, std::string_view te
     if (name == PALETTE_BAND) {
         paletteBand = ReadInteger(text);
     } else if (name == PALETTE_COUNT) {
-        // Sets no length: the colours are counted. The lookup leaves a null colour behind.
-        currentPalette.GetColor(ReadInteger(text));
+        LookUpColor(ReadInteger(text));
     } else {
         // PALETTE_RGBA, the last of all names.
-        unsigned char channels[4] = {};
+        ColorList::Rgba rgba = 0;
         std::string_view token;
         bool more = true;
         for (int i = 0; more && i < 4; ++i) {
             more = TakeToken(text, token);
-            channels[i] =
-                static_cast<unsigned char>(TruncateToSigned<std::int64_t>(ReadReal(token)));
+            const std::int64_t channel = TruncateToSigned<std::int64_t>(ReadReal(token));
+            rgba |= static_cast<ColorList::Rgba>(channel & 0xFF) << (8 * i);
         }
-        color.red = channels[0];
-        color.green = channels[1];
-        color.blue = channels[2];
-        color.alpha = channels[3];
-        currentPalette.AddColor(color);
+        AddColor(rgba);
     }
 }
 
@@ -307,7 +317,21 @@ void PyramidXMLReaderHandlers<T>::TakeHistogramText(ElementName name, std::strin
     }
 }
 
-#define ZMC_X(type, name, code) template class PyramidXMLReaderHandlers<type>;
+template <class T>
+void PyramidRecordReader<T>::KeepPalette() {
+    const auto& open = this->stateStack;
+    if (std::find(open.begin(), open.end(), StateOf(PALETTE)) != open.end())
+        return PyramidXMLReaderHandlers<T>::KeepPalette();
+    if (!IsWhole(this->currentPalette)) throw std::bad_alloc();
+    Palette& kept = this->palettes[this->paletteBand];
+    kept.Clear();
+    kept.colors.swap(this->currentPalette.colors);
+    std::swap(kept.nextIndex, this->currentPalette.nextIndex);
+}
+
+#define ZMC_X(type, name, code)                    \
+    template class PyramidXMLReaderHandlers<type>; \
+    template class PyramidRecordReader<type>;
 ZMC_ELEMENT_TYPES(ZMC_X)
 #undef ZMC_X
 

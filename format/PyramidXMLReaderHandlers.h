@@ -18,6 +18,7 @@
 #include <utility>
 
 #include "colour/Color.h"
+#include "colour/ColorList.h"
 #include "colour/Palette.h"
 #include "core/Array.h"
 #include "format/ElementReader.h"
@@ -83,9 +84,13 @@ protected:
     void Leave(std::int32_t state) override;
     void TakeText(ElementName name, std::string_view text) override;
 
-    // The palette in hand has come to its end, and is kept as this. Colours without a palette
-    // around them, and those of one around it, are added to the one in hand: it stays.
-    virtual void KeepPalette(Palette& kept);
+    // The palette in hand begins, gets a colour, has one looked up, or has come to its end and is
+    // kept as that of the band told last. Colours without a palette around them, and those of one
+    // around it, are added to the one in hand: it stays.
+    virtual void BeginPalette();
+    virtual void AddColor(ColorList::Rgba rgba);
+    virtual void LookUpColor(std::uint32_t index);
+    virtual void KeepPalette();
 
     virtual void BeginStats() = 0;
     virtual void EndStats() = 0;
@@ -119,6 +124,14 @@ protected:
     void EndHistogram() override;
     void TakeStatsText(ElementName name, std::string_view text) override;
     void TakeHistogramText(ElementName name, std::string_view text) override;
+};
+
+// The same for those who look at the finished records alone: a palette that is not inside another
+// is handed over to them rather than copied, and leaves none in hand.
+template <class T>
+class PyramidRecordReader : public PyramidXMLReaderHandlers<T> {
+protected:
+    void KeepPalette() override;
 };
 
 }  // namespace zelm

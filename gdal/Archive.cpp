@@ -4,13 +4,14 @@
 #include <cmath>
 
 #include "core/ElementTypes.h"
+#include "gdal/ColorTables.h"
 #include "gdal/NearestValue.h"
 #include "host/file/StoredRecords.h"
 
 namespace zmcgdal {
 namespace {
 
-constexpr std::uint32_t kMaxColors = 65536;
+constexpr std::size_t kMaxColors = 65536;
 
 template <class T>
 double ToDouble(const T& value) {
@@ -65,30 +66,20 @@ void Fill(zelm::RasterBandHistogram<T>& record, const StoredHistogram& histogram
         std::copy(histogram.counts.begin(), histogram.counts.end(), record.counts.data);
 }
 
-GDALColorEntry EntryOf(const zelm::Color& color) {
-    return {color.red, color.green, color.blue, color.alpha};
+GDALColorEntry EntryOf(zelm::ColorList::Rgba color) {
+    const auto channel = [&](int index) { return zelm::ColorList::Channel(color, index); };
+    return {channel(0), channel(1), channel(2), channel(3)};
 }
 
-// Colours that the palette lacks are transparent black, as GDAL fills gaps. The last one comes
-// first, so that the table grows once.
-std::unique_ptr<GDALColorTable> TableOf(const zelm::Palette& palette) {
+// The last one comes first, so that the table grows once.
+std::unique_ptr<GDALColorTable> TableOf(const zelm::ColorList& palette) {
     auto table = std::make_unique<GDALColorTable>();
-    const std::uint32_t count = std::min(palette.nextIndex, kMaxColors);
-    const GDALColorEntry gap{};
-    table->SetColorEntry(static_cast<int>(count) - 1, &gap);
-    for (const auto& [index, color] : palette.colors) {
-        if (index >= count || !color) continue;
-        const GDALColorEntry entry = EntryOf(*color);
-        table->SetColorEntry(static_cast<int>(index), &entry);
+    const auto& colors = palette.Colors();
+    for (std::size_t i = std::min(colors.size(), kMaxColors); i-- != 0;) {
+        const GDALColorEntry entry = EntryOf(colors[i]);
+        table->SetColorEntry(static_cast<int>(i), &entry);
     }
     return table;
-}
-
-void AddEntry(zelm::Palette& palette, const GDALColorEntry& entry) {
-    unsigned char components[] = {
-        static_cast<unsigned char>(entry.c1), static_cast<unsigned char>(entry.c2),
-        static_cast<unsigned char>(entry.c3), static_cast<unsigned char>(entry.c4)};
-    palette.AddColor(zelm::RGBAColor(zelm::Array(components, zelm::ArrayShape(4))));
 }
 
 }  // namespace
@@ -157,7 +148,7 @@ GDALColorTable* Archive::ColorTable(std::uint32_t band) {
 void Archive::FetchColorTable(std::uint32_t band) {
     std::unique_ptr<GDALColorTable> table;
     const bool known = LookAtRecords([&](const auto& records) {
-        if (const zelm::Palette* const palette = records.BandPalette(band))
+        if (const zelm::ColorList* const palette = records.BandPalette(band))
             table = TableOf(*palette);
     });
     if (known) colorTables.emplace(band, std::move(table));
@@ -209,8 +200,7 @@ bool Archive::StoreHistogram(const StoredHistogram& histogram) {
 bool Archive::StoreColorTable(std::uint32_t band, const GDALColorTable* table) {
     const bool stored = Store([&](auto& reader) {
         zelm::Palette palette;
-        for (int i = 0; table && i < table->GetColorEntryCount(); ++i)
-            AddEntry(palette, *table->GetColorEntry(i));
+        if (table) AddColors(*table, palette);
         return reader.SetPalette(band, palette);
     });
     colorTables.erase(band);

@@ -3,6 +3,7 @@
 #include <cpl_error.h>
 
 #include "core/PixelVocabulary.h"
+#include "gdal/ColorTables.h"
 #include "gdal/NoDataValues.h"
 #include "gdal/SampleType.h"
 #include "host/base/Error.h"
@@ -110,13 +111,7 @@ zelm::PalettePtr GdalRasterSource::BandPalette(std::uint32_t band) const {
         dataset.GetRasterBand(static_cast<int>(band) + 1)->GetColorTable();
     if (!table || !FitsPalette(*table)) return zelm::PalettePtr();
     zelm::PalettePtr palette(new zelm::Palette);
-    for (int i = 0; i < table->GetColorEntryCount(); ++i) {
-        const GDALColorEntry& entry = *table->GetColorEntry(i);
-        unsigned char components[] = {
-            static_cast<unsigned char>(entry.c1), static_cast<unsigned char>(entry.c2),
-            static_cast<unsigned char>(entry.c3), static_cast<unsigned char>(entry.c4)};
-        palette->AddColor(zelm::RGBAColor(zelm::Array(components, zelm::ArrayShape(4))));
-    }
+    AddColors(*table, *palette);
     return palette;
 }
 

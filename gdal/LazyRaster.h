@@ -1,7 +1,7 @@
 // LazyRaster: the module's view of a file, made when it is first needed.
 //
 // GDAL opens many files only to look at their size and place, and the header tells those; the
-// module parses the file's statistics as well. What it refuses then fails the read that asked. The
+// module reads the file's statistics as well. What it refuses then fails the read that asked. The
 // bytes come from the source that the header came from, so that a file that takes the name in
 // between is not met; and what the module finds in it has to be what the header said.
 #ifndef ZMC_GDAL_LAZYRASTER_H

@@ -17,7 +17,7 @@ template <class T, class Take>
 bool ParseMeta(PyramidDataset& dataset, bool withoutText, Take take) {
     if (!dataset.MetaLoaded && !dataset.LoadMetaDocument()) return withoutText;
     try {
-        PyramidXMLReaderHandlers<T> handlers;
+        PyramidRecordReader<T> handlers;
         const int result = dataset.ParseDocument(&handlers, dataset.MetaSource, dataset.MetaLoaded);
         if (result != PyramidDataset::kParsed) return false;
         take(handlers);
@@ -42,7 +42,9 @@ bool Store(PyramidDataset& dataset, Append append) {
     if (append(*document) &&
         (document->SerializeDocument(*dataset.File, dataset.MetaDocumentOffset) ||
          !document->IsTooLong())) {
+        // The text of before the store serves nobody any more.
         dataset.MetaLoaded = false;
+        dataset.MetaSource.reset();
         return true;
     }
     document->RemoveFrom(before);

@@ -74,7 +74,7 @@ bool PyramidDataset::ReadFixedFields(PyramidLayout& layout) const {
 
 bool PyramidDataset::ReadHeader() {
     PyramidLayout layout;
-    std::unique_ptr<xercesc::MemBufInputSource> text;
+    DocumentSource text;
     if (!OpenFile(false) || !ReadFixedFields(layout) || !ReadHeaderText(layout, text)) return true;
     // Not a failure, by the rules of the format: such a file opens, and refuses its tiles.
     const bool served = layout.header.tileSize <= kMaxTileSize;

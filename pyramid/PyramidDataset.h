@@ -80,14 +80,15 @@ public:
     std::unique_ptr<std::uint64_t[]> LevelOffsets;  // LevelMax + 1 entries
     std::uint64_t TileDataStart = 0;
     std::uint64_t MetaDocumentOffset = 0;
-    // Tree of the metadata document: an empty one until a header is read with a document behind it.
-    // Records join it as they are stored. It outlives the file: one that is made anew by the same
-    // dataset gets all of it with the next store.
+    // Tree of the metadata document: an empty one until a header is read with a document behind it,
+    // then that of the text which was there, made when the first store asks for it. Records join it
+    // as they are stored. It outlives the file: one that is made anew by the same dataset gets all
+    // of it with the next store.
     DocumentOnDemand MetaDocument;
     std::unique_ptr<PyramidXMLDocument> HeaderDocument;  // only while CreateFile runs
     std::unique_ptr<xercesc::SAXParser> Parser;          // for both documents
-    std::unique_ptr<xercesc::MemBufInputSource> MetaSource;
-    std::unique_ptr<xercesc::MemBufInputSource> HeaderSource;
+    DocumentSource MetaSource;
+    DocumentSource HeaderSource;
     bool MetaLoaded = false;    // MetaSource reflects the file, and no store is under way there
     bool HeaderLoaded = false;  // HeaderSource reflects the file
     PalettePtr CurrentPalette;  // palette of the last GetPalette
@@ -177,10 +178,9 @@ public:
     // Runs Parser over `source`, which may be null only after a failure; `handlers` may be null.
     // kParsed, kParseError or kParseOutOfMemory. The source is one of the two members: after an
     // exception it is dropped and its flag cleared.
-    int ParseDocument(xercesc::HandlerBase* handlers,
-                      std::unique_ptr<xercesc::MemBufInputSource>& source, bool& loaded);
-    // Puts the tree of the file's text into MetaDocument, if the file has any. Text that cannot be
-    // had, or is malformed, leaves MetaDocument without a tree, so that no store replaces it.
+    int ParseDocument(xercesc::HandlerBase* handlers, DocumentSource& source, bool& loaded);
+    // Gives the file's text to MetaDocument, if the file has any. Text that cannot be had, or is
+    // malformed, leaves MetaDocument without a tree, so that no store replaces it.
     void ReadMetaTree();
     // MetaDocument, ready for records; null if memory ran out. Where the open could not tell
     // whether the file has a document, the file is looked at now, and nothing is given until that
@@ -222,9 +222,8 @@ private:
     void Settle(PyramidLayout&& layout) noexcept;
     // The fixed fields of the open file, and its header document, as far as `layout` goes.
     bool ReadFixedFields(PyramidLayout& layout) const;
-    bool ReadHeaderText(PyramidLayout& layout, std::unique_ptr<xercesc::MemBufInputSource>& text);
-    bool ParseHeaderText(std::unique_ptr<xercesc::MemBufInputSource>& text, bool& loaded,
-                         PyramidHeaderRecord& out);
+    bool ReadHeaderText(PyramidLayout& layout, DocumentSource& text);
+    bool ParseHeaderText(DocumentSource& text, bool& loaded, PyramidHeaderRecord& out);
     bool WriteFront(PyramidLayout& layout);
     bool EnsureTileTable();
     // Judges a transfer that has something to move, and makes sure of the tile table.

@@ -19,8 +19,7 @@ namespace {
 constexpr std::uint64_t kHeaderOffset = PyramidFront::kHeaderOffset;
 
 // A source over a text, or null if memory ran out.
-std::unique_ptr<xercesc::MemBufInputSource> MakeSource(std::unique_ptr<XMLByte[]> text,
-                                                       std::size_t size, const char* name) {
+DocumentSource MakeSource(std::unique_ptr<XMLByte[]> text, std::size_t size, const char* name) {
     GuardText(text.get(), size);
     try {
         auto source = std::make_unique<xercesc::MemBufInputSource>(text.get(), size, name, true);
@@ -33,8 +32,8 @@ std::unique_ptr<xercesc::MemBufInputSource> MakeSource(std::unique_ptr<XMLByte[]
 
 // A source over `size` bytes of the file at `offset`, or null: too long, past the end of the file,
 // or out of memory.
-std::unique_ptr<xercesc::MemBufInputSource> LoadText(files::ByteSource& file, std::uint64_t offset,
-                                                     std::uint64_t size, const char* name) {
+DocumentSource LoadText(files::ByteSource& file, std::uint64_t offset, std::uint64_t size,
+                        const char* name) {
     const std::uint64_t fileSize = file.Size();
     if (size > kMaxDocumentBytes || offset > fileSize || size > fileSize - offset) return nullptr;
     std::unique_ptr<XMLByte[]> text(new (std::nothrow) XMLByte[static_cast<std::size_t>(size)]);
@@ -45,8 +44,7 @@ std::unique_ptr<xercesc::MemBufInputSource> LoadText(files::ByteSource& file, st
 
 // The header document that ends at `end`. An end before its beginning wraps to a size that no file
 // has.
-std::unique_ptr<xercesc::MemBufInputSource> LoadHeaderText(files::ByteSource& file,
-                                                           std::uint64_t end) {
+DocumentSource LoadHeaderText(files::ByteSource& file, std::uint64_t end) {
     return LoadText(file, kHeaderOffset, end - kHeaderOffset, "ORVAPYRHEADER");
 }
 
@@ -79,8 +77,7 @@ bool PyramidDataset::ParseHeaderDocument(PyramidHeaderRecord& out) {
     return ParseHeaderText(HeaderSource, HeaderLoaded, out);
 }
 
-bool PyramidDataset::ParseHeaderText(std::unique_ptr<xercesc::MemBufInputSource>& text,
-                                     bool& loaded, PyramidHeaderRecord& out) {
+bool PyramidDataset::ParseHeaderText(DocumentSource& text, bool& loaded, PyramidHeaderRecord& out) {
     try {
         PyramidXMLReaderHandlers<char> handlers;
         if (ParseDocument(&handlers, text, loaded) != kParsed) return false;
@@ -93,8 +90,7 @@ bool PyramidDataset::ParseHeaderText(std::unique_ptr<xercesc::MemBufInputSource>
 
 // What LoadHeaderDocument and ParseHeaderDocument do, aside. An empty region leaves the record
 // without a tile size, and with that refused.
-bool PyramidDataset::ReadHeaderText(PyramidLayout& layout,
-                                    std::unique_ptr<xercesc::MemBufInputSource>& text) {
+bool PyramidDataset::ReadHeaderText(PyramidLayout& layout, DocumentSource& text) {
     if (layout.tileDataStart == kHeaderOffset) return true;
     text = LoadHeaderText(*File, layout.tileDataStart);
     bool loaded = text != nullptr;
@@ -113,8 +109,7 @@ bool PyramidDataset::LoadMetaDocument() {
     return MetaSource != nullptr;
 }
 
-int PyramidDataset::ParseDocument(xercesc::HandlerBase* handlers,
-                                  std::unique_ptr<xercesc::MemBufInputSource>& source,
+int PyramidDataset::ParseDocument(xercesc::HandlerBase* handlers, DocumentSource& source,
                                   bool& loaded) {
     if (!source || !Parser) return kParseError;
     const ParseEnd end = RunParser(*Parser, handlers, *source, PrintFailure);
@@ -128,13 +123,13 @@ int PyramidDataset::ParseDocument(xercesc::HandlerBase* handlers,
 
 void PyramidDataset::ReadMetaTree() {
     if (!File) return;
-    const bool loaded = MetaLoaded || LoadMetaDocument();
+    if (MetaLoaded || LoadMetaDocument()) {
+        metaUnknown = false;
+        return MetaDocument.Await(MetaSource);
+    }
     const std::uint64_t size = File->Size();
-    metaUnknown = !loaded && size == files::ByteSource::kUnknownSize;
-    if (metaUnknown || (!loaded && size <= MetaDocumentOffset)) return;
-    std::unique_ptr<PyramidXMLDocument> document = PyramidXMLDocument::Make();
-    if (document && loaded) document->ParseTree(*MetaSource);
-    MetaDocument.reset(std::move(document));
+    metaUnknown = size == files::ByteSource::kUnknownSize;
+    if (!metaUnknown && size > MetaDocumentOffset) MetaDocument.reset(PyramidXMLDocument::Make());
 }
 
 PyramidXMLDocument* PyramidDataset::EnsureMetaDocument() {

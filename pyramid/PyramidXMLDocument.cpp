@@ -1,7 +1,11 @@
 #include "pyramid/PyramidXMLDocument.h"
 
+#include <charconv>
 #include <cstdio>
 #include <new>
+#include <span>
+#include <string_view>
+#include <utility>
 
 #include <xercesc/dom/DOM.hpp>
 #include <xercesc/framework/MemBufFormatTarget.hpp>
@@ -53,27 +57,78 @@ bool Attempt(const char* heading, Step step) {
     return false;
 }
 
+// What else a step throws passes through.
+template <class Step>
+bool RunsOutOfMemory(Step step) {
+    try {
+        step();
+        return false;
+    } catch (const xercesc::OutOfMemoryException&) {
+        return true;
+    } catch (const std::bad_alloc&) {
+        return true;
+    }
+}
+
 void Serialize(const xercesc::DOMDocument& document, xercesc::MemBufFormatTarget& target,
-               bool& complete) {
+               const xercesc::DOMLSSerializerFilter& filter, bool& complete) {
     xercesc::DOMImplementation* implementation =
         xercesc::DOMImplementationRegistry::getDOMImplementation(u"LS");
     xercesc::MemoryManager* memory = xercesc::XMLPlatformUtils::fgMemoryManager;
     const Released<xercesc::DOMLSSerializer> writer(implementation->createLSSerializer(memory));
     const Released<xercesc::DOMLSOutput> output(implementation->createLSOutput(memory));
     writer->getDomConfig()->setParameter(xercesc::XMLUni::fgDOMWRTFormatPrettyPrint, true);
+    writer->setFilter(&const_cast<xercesc::DOMLSSerializerFilter&>(filter));
     output->setEncoding(u"UTF-8");
     output->setByteStream(&target);
     complete = writer->write(&document, output.get());
 }
 
-// A record and its children, which have none of their own.
-std::uint64_t ElementsOf(const xercesc::DOMElement& record) {
-    return 1 + std::uint64_t{record.getChildElementCount()};
+// One child of a record, laid out as the serializer does it. `value` needs no escapes.
+void AddChildLine(std::string& text, std::string_view name, std::string_view value) {
+    text.append("\n    <").append(name).append(">").append(value);
+    text.append("</").append(name).append(">");
 }
 
-std::string FormatColor(const Color& color) {
-    return FormatDecimal(color.red) + '|' + FormatDecimal(color.green) + '|' +
-           FormatDecimal(color.blue) + '|' + FormatDecimal(color.alpha);
+std::string NameOf(ElementName name) {
+    const std::u16string_view wide = kElementNames[static_cast<int>(name)];
+    std::string narrow;
+    NarrowAscii(wide, narrow);
+    return narrow;
+}
+
+// Red, green, blue and alpha in the space that is given, which has room for them.
+std::string_view FormatColor(const Color& color, std::span<char, 16> space) {
+    char* at = space.data();
+    for (const std::uint8_t channel : {color.red, color.green, color.blue, color.alpha}) {
+        if (at != space.data()) *at++ = '|';
+        at = std::to_chars(at, space.data() + space.size(), channel).ptr;
+    }
+    return {space.data(), static_cast<std::size_t>(at - space.data())};
+}
+
+// All colours below `nextIndex`; those that the palette lacks are null.
+void AddColorLines(std::string& text, const Palette& palette) {
+    const std::string name = NameOf(ElementName::PALETTE_RGBA);
+    const Color nullColor;
+    char space[16];
+    auto entry = palette.colors.begin();
+    for (std::uint32_t i = 0; i < palette.nextIndex; ++i) {
+        const bool present = entry != palette.colors.end() && entry->first == i;
+        const bool known = present && entry->second;
+        AddChildLine(text, name, FormatColor(known ? *entry->second : nullColor, space));
+        if (present) ++entry;
+    }
+}
+
+std::string FormatPaletteChildren(std::uint32_t band, const Palette& palette) {
+    constexpr std::size_t kUsualLine = 48;
+    std::string text;
+    text.reserve((std::size_t{palette.nextIndex} + 3) * kUsualLine);
+    AddChildLine(text, NameOf(ElementName::PALETTE_BAND), FormatDecimal(band));
+    AddChildLine(text, NameOf(ElementName::PALETTE_COUNT), FormatDecimal(palette.nextIndex));
+    AddColorLines(text, palette);
+    return text.append("\n  "), text;
 }
 
 // All bins of the record; those beyond its count array are 0.
@@ -89,6 +144,33 @@ std::string FormatCounts(const RasterBandHistogram<T>& histogram) {
 }
 
 }  // namespace
+
+// Writes the children of records in the place of the comments that stand for them. The serializer
+// hands on what it writes as it goes, so that the text so far ends with the tag of the record; if
+// it did not, the text would be no document.
+class PyramidXMLDocument::TextFiller : public xercesc::DOMLSSerializerFilter {
+public:
+    TextFiller(const ChildTexts& texts, xercesc::MemBufFormatTarget& text)
+        : childTexts(texts), target(text) {}
+
+    FilterAction acceptNode(const xercesc::DOMNode* node) const override {
+        const auto found = childTexts.find(node);
+        if (found == childTexts.end()) return FILTER_ACCEPT;
+        const std::string& text = found->second.text;
+        const XMLSize_t length = target.getLen();
+        failed |= length == 0 || target.getRawBuffer()[length - 1] != '>';
+        target.writeChars(reinterpret_cast<const XMLByte*>(text.data()), text.size(), nullptr);
+        return FILTER_REJECT;
+    }
+    ShowType getWhatToShow() const override { return xercesc::DOMNodeFilter::SHOW_COMMENT; }
+
+    bool HasFailed() const { return failed; }
+
+private:
+    const ChildTexts& childTexts;
+    xercesc::MemBufFormatTarget& target;
+    mutable bool failed = false;
+};
 
 std::unique_ptr<PyramidXMLDocument> PyramidXMLDocument::Make() {
     try {
@@ -119,24 +201,27 @@ bool PyramidXMLDocument::CreateDocument() {
     });
 }
 
-bool PyramidXMLDocument::ParseTree(const xercesc::InputSource& source) {
+PyramidXMLDocument::Taken PyramidXMLDocument::TakeTree(const xercesc::InputSource& source) {
     DropTree();
     FaultCounter handler;
+    bool ranOut = false;
     const bool parsed = Attempt("", [&] {
         setErrorHandler(&handler);
-        parse(source);
-        return handler.faults == 0;
+        ranOut = RunsOutOfMemory([&] { parse(source); });
+        return !ranOut && handler.faults == 0;
     });
     setErrorHandler(nullptr);
-    if (!parsed) return false;
+    if (ranOut) return Taken::NoMemory;
+    if (!parsed) return Taken::Malformed;
     document = adoptDocument();
     elementCount = limits.nodes;
-    return document != nullptr;
+    return document ? Taken::Tree : Taken::Malformed;
 }
 
 void PyramidXMLDocument::DropTree() {
     if (document) document->release();
     document = nullptr;
+    childTexts.clear();
     elementCount = 0;
 }
 
@@ -146,6 +231,27 @@ void PyramidXMLDocument::AppendValueElement(xercesc::DOMElement& parent, Element
         document->createElement(kElementNames[static_cast<int>(name)].data());
     element->appendChild(document->createTextNode(ToWide(text).c_str()));
     parent.appendChild(element);
+}
+
+void PyramidXMLDocument::AppendChildText(xercesc::DOMElement& record, ChildText children) {
+    xercesc::DOMNode* const standIn = document->createComment(u"");
+    const auto kept = childTexts.emplace(standIn, std::move(children)).first;
+    try {
+        record.appendChild(standIn);
+    } catch (...) {
+        childTexts.erase(kept);
+        throw;
+    }
+}
+
+void PyramidXMLDocument::ForgetChildText(const xercesc::DOMElement& record) {
+    childTexts.erase(record.getFirstChild());
+}
+
+std::uint64_t PyramidXMLDocument::ElementsOf(const xercesc::DOMElement& record) const {
+    const auto children = childTexts.find(record.getFirstChild());
+    return 1 + (children != childTexts.end() ? children->second.count
+                                             : std::uint64_t{record.getChildElementCount()});
 }
 
 // The children are built aside, so that a record is appended whole or not at all.
@@ -158,6 +264,7 @@ bool PyramidXMLDocument::AppendRecord(ElementName name, Build build) {
         build(*record);
         const std::uint64_t count = ElementsOf(*record);
         if (elementCount + count > kMaxDocumentNodes) {
+            ForgetChildText(*record);
             record->release();
             return false;
         }
@@ -231,15 +338,8 @@ bool PyramidXMLDocument::WritePaletteElement(std::uint32_t band, const Palette& 
     // Each colour is an element.
     if (palette.nextIndex > kMaxDocumentNodes) return false;
     return AppendRecord(ElementName::PALETTE, [&](xercesc::DOMElement& record) {
-        AppendValueElement(record, ElementName::PALETTE_BAND, FormatDecimal(band));
-        AppendValueElement(record, ElementName::PALETTE_COUNT, FormatDecimal(palette.nextIndex));
-        const Color nullColor;
-        for (std::uint32_t i = 0; i < palette.nextIndex; ++i) {
-            const auto entry = palette.colors.find(i);
-            const bool known = entry != palette.colors.end() && entry->second;
-            AppendValueElement(record, ElementName::PALETTE_RGBA,
-                               FormatColor(known ? *entry->second : nullColor));
-        }
+        AppendChildText(
+            record, {FormatPaletteChildren(band, palette), 2 + std::uint64_t{palette.nextIndex}});
     });
 }
 
@@ -248,11 +348,12 @@ bool PyramidXMLDocument::SerializeDocument(files::ByteSource& file, std::uint64_
     if (!document) return false;
     return Attempt("Exception when serializing the XML:\n", [&] {
         xercesc::MemBufFormatTarget target(1023);
+        const TextFiller filler(childTexts, target);
         bool complete = false;
-        Serialize(*document, target, complete);
+        Serialize(*document, target, filler, complete);
         const std::size_t length = target.getLen();
         tooLong = length > kMaxDocumentBytes;
-        if (!complete || tooLong) return false;
+        if (!complete || filler.HasFailed() || tooLong) return false;
         return DocumentStore<files::ByteSource>(file, offset).Write(target.getRawBuffer(), length);
     });
 }
@@ -270,6 +371,7 @@ void PyramidXMLDocument::RemoveFrom(std::uint32_t position) {
         xercesc::DOMElement* last = root->getLastElementChild();
         xercesc::DOMNode* const removed = root->removeChild(last);
         elementCount -= ElementsOf(*last);
+        ForgetChildText(*last);
         try {
             removed->release();
         } catch (...) {

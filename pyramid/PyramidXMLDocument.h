@@ -8,10 +8,15 @@
 // The object stands without a tree until CreateDocument or ParseTree succeeds, and then refuses
 // every record. So it does for records that would take the document beyond what readers accept
 // (DocumentLimits.h).
+//
+// A palette may have 65,536 colours, each an element with a text: in the tree it is an element with
+// a comment, which stands for its children, and those are kept as the text that they are written
+// as.
 #ifndef ZMC_PYRAMID_PYRAMIDXMLDOCUMENT_H
 #define ZMC_PYRAMID_PYRAMIDXMLDOCUMENT_H
 
 #include <cstdint>
+#include <map>
 #include <memory>
 #include <string>
 
@@ -28,6 +33,7 @@
 namespace XERCES_CPP_NAMESPACE {
 class DOMDocument;
 class DOMElement;
+class DOMNode;
 class InputSource;
 }  // namespace XERCES_CPP_NAMESPACE
 
@@ -46,8 +52,12 @@ public:
 
     // Makes an empty document with the root DATASET, encoding UTF-8.
     bool CreateDocument();
-    // Takes the tree of the text; false, without a tree and in silence, if it is malformed.
-    bool ParseTree(const xercesc::InputSource& source);
+    // Takes the tree of the text, or stands without one, and in silence, if the text is malformed
+    // or memory runs out.
+    enum class Taken { Tree, Malformed, NoMemory };
+    Taken TakeTree(const xercesc::InputSource& source);
+    // The same; true for a tree.
+    bool ParseTree(const xercesc::InputSource& source) { return TakeTree(source) == Taken::Tree; }
     void DropTree();
 
     // Each appends one element with its children. False, with nothing appended, if there is no
@@ -77,9 +87,22 @@ public:
     void RemoveFrom(std::uint32_t position);
 
 private:
+    // Children of a record that are not in the tree.
+    struct ChildText {
+        std::string text;
+        std::uint64_t count = 0;
+    };
+    using ChildTexts = std::map<const xercesc::DOMNode*, ChildText>;
+    class TextFiller;
+
     template <class Build>
     bool AppendRecord(ElementName name, Build build);
+    void AppendChildText(xercesc::DOMElement& record, ChildText children);
+    void ForgetChildText(const xercesc::DOMElement& record);
+    // A record and its children, which have none of their own.
+    std::uint64_t ElementsOf(const xercesc::DOMElement& record) const;
 
+    ChildTexts childTexts;  // by the comment that stands for them
     bool tooLong = false;
     std::uint64_t elementCount = 0;  // elements of the tree, the root included
 };

@@ -1,8 +1,10 @@
+#include <algorithm>
 #include <cstdio>
+#include <limits>
 
 #include "core/PixelVocabulary.h"
-#include "host/file/MetadataDocument.h"
 #include "host/file/PyramidFileInfo.h"
+#include "host/file/StoredRecords.h"
 #include "platform/Terminal.h"
 #include "tools/Command.h"
 #include "tools/HistogramBars.h"
@@ -89,25 +91,39 @@ Json HistogramsOf(const zmchost::Raster& raster) {
     return list;
 }
 
-Json PalettesOf(const zmchost::Raster& raster) {
+// Of 65,536 colours people are shown no more than a line.
+constexpr std::size_t kColorsOnALine = 64;
+constexpr std::size_t kAllColors = std::numeric_limits<std::size_t>::max();
+
+Json ColorsOf(const zelm::ColorList& palette, std::size_t most) {
+    Json::array_t colors;
+    colors.reserve(std::min(most, palette.Colors().size()));
+    for (const zelm::ColorList::Rgba color : palette.Colors()) {
+        if (colors.size() == most) break;
+        Json::array_t channels(4);
+        for (int i = 0; i < 4; ++i)
+            channels[static_cast<std::size_t>(i)] = zelm::ColorList::Channel(color, i);
+        colors.emplace_back(std::move(channels));
+    }
+    return colors;
+}
+
+// With no more than so many colours of each, and their true number where that may be more.
+template <class T>
+Json PalettesOf(const zmchost::Raster& raster, std::size_t most) {
     Json list = Json::array();
+    const auto records = raster.Records<T>();
     for (std::uint32_t band = 0; band < raster.Bands(); ++band) {
-        const zelm::PalettePtr palette = raster.BandPalette(band);
+        const zelm::ColorList* const palette = records->BandPalette(band);
         if (!palette) continue;
-        Json colors = Json::array();
-        for (std::uint32_t i = 0; i < palette->nextIndex; ++i) {
-            const auto found = palette->colors.find(i);
-            const zelm::Color* const color =
-                found == palette->colors.end() ? nullptr : found->second.operator->();
-            colors.push_back(color ? Json{color->red, color->green, color->blue, color->alpha}
-                                   : Json{0, 0, 0, 0});
-        }
-        list.push_back({{"band", band + 1}, {"colors", colors}});
+        Json entry = {{"band", band + 1}, {"colors", ColorsOf(*palette, most)}};
+        if (most != kAllColors) entry["count"] = palette->Colors().size();
+        list.push_back(std::move(entry));
     }
     return list;
 }
 
-Json Describe(const std::string& file) {
+Json Describe(const std::string& file, std::size_t mostColors) {
     const zmchost::PyramidFileInfo info = ReadLayout(file);
     const zmchost::PyramidHeader& header = info.header;
     Json document = {{"schema", kSchema},
@@ -132,16 +148,16 @@ Json Describe(const std::string& file) {
     // Of a type without a reader the header is all that can be told.
     if (zelm::CheckedPixelType(header.pixelType) == 0 || !info.HasMetadataDocument())
         return document;
-    if (const std::string wrong = zmchost::JudgeMetadata(file, info.header); !wrong.empty()) {
+    const zmchost::Raster raster = OpenPyramid(file);
+    if (const std::string wrong = raster.DocumentFault(); !wrong.empty()) {
         Warn(file + ": warning: " + wrong + "; statistics, histograms and palettes are not shown");
         return document;
     }
-    const zmchost::Raster raster = OpenPyramid(file);
     zelm::VisitElementType(raster.PixelType(), [&]<class T>(std::type_identity<T>) {
         document["statistics"] = StatisticsOf<T>(raster);
         document["histograms"] = HistogramsOf<T>(raster);
+        document["palettes"] = PalettesOf<T>(raster, mostColors);
     });
-    document["palettes"] = PalettesOf(raster);
     return document;
 }
 
@@ -191,15 +207,13 @@ void PrintHistograms(const Json& document) {
 
 void PrintPalettes(const Json& document) {
     for (const Json& palette : document["palettes"]) {
-        std::printf("palette of band %s: %zu colors\n", Text(palette["band"]).c_str(),
-                    palette["colors"].size());
+        std::printf("palette of band %s: %s colors\n", Text(palette["band"]).c_str(),
+                    Text(palette["count"]).c_str());
         if (!platform::IsTerminal(platform::StandardStream::Output)) continue;
         std::printf("  ");
-        for (std::size_t i = 0; i < palette["colors"].size() && i < 64; ++i) {
-            const Json& color = palette["colors"][i];
+        for (const Json& color : palette["colors"])
             std::printf("\x1b[48;2;%d;%d;%dm ", color[0].get<int>(), color[1].get<int>(),
                         color[2].get<int>());
-        }
         std::printf("\x1b[0m\n");
     }
 }
@@ -223,7 +237,7 @@ void Print(const Json& document) {
 }
 
 ExitStatus InfoCommand::Run() {
-    const Json document = zmctools::Describe(file);
+    const Json document = zmctools::Describe(file, json ? kAllColors : kColorsOnALine);
     if (json)
         PrintDocument(document);
     else

@@ -2,7 +2,6 @@
 
 #include "core/PixelVocabulary.h"
 #include "format/PyramidLayout.h"
-#include "host/file/MetadataDocument.h"
 #include "tools/Interrupt.h"
 #include "tools/Message.h"
 #include "tools/SampleDifferences.h"
@@ -55,11 +54,10 @@ CheckResult CheckCompleteness(const zmchost::PyramidFileInfo& info) {
     return result;
 }
 
-CheckResult CheckDocuments(const std::string& file, const zmchost::PyramidFileInfo& info,
-                           const zmchost::Raster& raster) {
+CheckResult CheckDocuments(const zmchost::PyramidFileInfo& info, const zmchost::Raster& raster) {
     CheckResult result{"documents", {}, {}};
     if (!info.HasMetadataDocument()) return result;
-    const std::string wrong = zmchost::JudgeMetadata(file, info.header);
+    const std::string wrong = raster.DocumentFault();
     if (!wrong.empty()) {
         result.problems.push_back(wrong);
         return result;

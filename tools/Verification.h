@@ -27,8 +27,7 @@ struct CheckResult {
 CheckResult CheckStructure(const zmchost::PyramidFileInfo& info, const zmchost::Raster& raster);
 CheckResult CheckCompleteness(const zmchost::PyramidFileInfo& info);
 // The metadata document is well-formed, and its records are of bands and levels that there are.
-CheckResult CheckDocuments(const std::string& file, const zmchost::PyramidFileInfo& info,
-                           const zmchost::Raster& raster);
+CheckResult CheckDocuments(const zmchost::PyramidFileInfo& info, const zmchost::Raster& raster);
 // Stored statistics and histograms against those of level 0, as exact as a file keeps them.
 CheckResult CheckStatistics(zmchost::Raster& raster, bool quiet);
 // Every coarser level against what the method makes of the level below it.

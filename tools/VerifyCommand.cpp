@@ -69,7 +69,7 @@ void TakeNoDataValues(zmchost::Raster& raster) {
 
 bool HasPalette(const zmchost::Raster& raster) {
     for (std::uint32_t band = 0; band < raster.Bands(); ++band)
-        if (raster.BandPalette(band)) return true;
+        if (raster.HasPalette(band)) return true;
     return false;
 }
 
@@ -116,7 +116,7 @@ ExitStatus VerifyCommand::Run() {
     zmchost::Raster raster = OpenPyramid(file);
     results.push_back(CheckStructure(info, raster));
     results.push_back(CheckCompleteness(info));
-    results.push_back(CheckDocuments(file, info, raster));
+    results.push_back(CheckDocuments(info, raster));
     const bool documentIsGood = results.back().problems.empty();
     if (info.complete)
         CheckPixels(raster, documentIsGood);

@@ -18,7 +18,8 @@ using zelm::files::ByteSource;
 using zelm::files::FileSource;
 using zelm::files::OpenMode;
 
-constexpr char kTooLong[] = " longer than 256 MiB";
+constexpr char kSubject[] = "the metadata document ";
+constexpr char kTooLong[] = "is longer than 256 MiB";
 
 class RootReader : public zelm::FaultReader {
 public:
@@ -52,24 +53,37 @@ std::uint64_t DocumentSize(ByteSource& source, const std::string& name,
 
 }  // namespace
 
-std::string JudgeMetadataText(std::string text) {
-    const std::string subject = "the metadata document ";
+std::string JudgeMetadataBytes(std::string_view text) {
+    const std::string subject = kSubject;
     if (text.find_first_not_of(" \t\r\n") == text.npos) return subject + "is empty";
     if (static_cast<unsigned char>(text.front()) == zelm::kUnfinishedDocument)
         return subject + "is damaged: a store did not end";
     if (text.find('\0') != text.npos) return subject + "holds bytes of 0";
     if ((text.back() & 0x80) != 0) return subject + "ends in the middle of a character";
+    return "";
+}
+
+std::string JudgeMetadataParse(const std::string& fault, bool hasOurRoot) {
+    if (!fault.empty()) return kSubject + ("is malformed: " + fault);
+    return hasOurRoot ? "" : std::string(kSubject) + "has no root DATASET";
+}
+
+std::string JudgeMetadataSize(std::uint64_t bytes) {
+    return bytes > zelm::kMaxDocumentBytes ? std::string(kSubject) + kTooLong : "";
+}
+
+std::string JudgeMetadataText(std::string text) {
+    if (std::string wrong = JudgeMetadataBytes(text); !wrong.empty()) return wrong;
     InitialiseXerces();
     RootReader reader;
-    if (const std::string wrong = zelm::ParseDocumentText(std::move(text), reader); !wrong.empty())
-        return subject + "is malformed: " + wrong;
-    return reader.hasOurRoot ? "" : subject + "has no root DATASET";
+    const std::string fault = zelm::ParseDocumentText(std::move(text), reader);
+    return JudgeMetadataParse(fault, reader.hasOurRoot);
 }
 
 std::string ReadMetadataText(ByteSource& source, const std::string& name,
                              const PyramidHeader& header) {
     const std::uint64_t size = DocumentSize(source, name, header);
-    if (size > zelm::kMaxDocumentBytes) Fail(name, std::string("it is") + kTooLong);
+    if (size > zelm::kMaxDocumentBytes) Fail(name, std::string("it ") + kTooLong);
     std::string text(static_cast<std::size_t>(size), '\0');
     int error = 0;
     if (source.ReadAt(header.tileDataEnd, text.data(), text.size(), &error) != text.size())
@@ -83,8 +97,8 @@ std::string ReadMetadataText(const std::string& file, const PyramidHeader& heade
 
 std::string JudgeMetadata(ByteSource& source, const std::string& name,
                           const PyramidHeader& header) {
-    if (DocumentSize(source, name, header) > zelm::kMaxDocumentBytes)
-        return std::string("the metadata document is") + kTooLong;
+    if (std::string wrong = JudgeMetadataSize(DocumentSize(source, name, header)); !wrong.empty())
+        return wrong;
     std::string text = ReadMetadataText(source, name, header);
     return text.empty() ? "" : JudgeMetadataText(std::move(text));
 }

@@ -6,7 +6,9 @@
 #ifndef ZMC_HOST_FILE_METADATADOCUMENT_H
 #define ZMC_HOST_FILE_METADATADOCUMENT_H
 
+#include <cstdint>
 #include <string>
+#include <string_view>
 
 #include "files/ByteSource.h"
 #include "host/file/PyramidHeader.h"
@@ -16,6 +18,13 @@ namespace zmchost {
 // What is wrong with the form of a document, by the same parser and limits as in the module; empty
 // if nothing. `text` may be anything.
 std::string JudgeMetadataText(std::string text);
+
+// The same in two steps for those who parse the text themselves, for what else it tells: before
+// the parse, and behind it by the parser's fault, which is empty if it has none, and by the root.
+std::string JudgeMetadataBytes(std::string_view text);
+std::string JudgeMetadataParse(const std::string& fault, bool hasOurRoot);
+// What is said of a document beyond the limit, which nobody parses.
+std::string JudgeMetadataSize(std::uint64_t bytes);
 
 // The text behind the tiles of a file; empty if there is none. Throws Error if it cannot be read or
 // is too long.

@@ -1,6 +1,5 @@
 #include "host/file/StoredRecords.h"
 
-#include <algorithm>
 #include <utility>
 
 #include "core/ElementTypes.h"
@@ -8,31 +7,47 @@
 #include "format/DocumentText.h"
 #include "format/PyramidXMLReaderHandlers.h"
 #include "host/base/Xerces.h"
+#include "host/file/MetadataDocument.h"
 
 namespace zmchost {
 namespace {
 
-// Says nothing on the standard error stream: hosts that want to know what is wrong with a document
-// ask for it (MetadataDocument.h).
-//
-// Nobody looks at the palette in hand afterwards, so one that is not inside another is not copied.
+// Says nothing on the standard error stream, and keeps what is wrong for those who ask.
 template <class T>
-class QuietReader : public zelm::PyramidXMLReaderHandlers<T> {
+class JudgingReader : public zelm::PyramidXMLReaderHandlers<T> {
 public:
+    std::string fault;
+    bool hasOurRoot = false;
+    std::unordered_map<std::uint32_t, zelm::ColorList> colors;  // of finished palettes, by band
+
     void warning(const xercesc::SAXParseException&) override {}
-    void error(const xercesc::SAXParseException&) override {}
-    void fatalError(const xercesc::SAXParseException&) override {}
+    void error(const xercesc::SAXParseException& exception) override {
+        if (fault.empty()) fault = zelm::TextOfFault(exception);
+    }
+    void fatalError(const xercesc::SAXParseException& exception) override { error(exception); }
 
 protected:
-    void KeepPalette(zelm::Palette& kept) override {
-        constexpr auto palette = zelm::StateOf(zelm::ElementName::PALETTE);
-        if (std::count(this->stateStack.begin(), this->stateStack.end(), palette) != 0)
-            return zelm::PyramidXMLReaderHandlers<T>::KeepPalette(kept);
-        kept.Clear();
-        kept.colors.swap(this->currentPalette.colors);
-        std::swap(kept.nextIndex, this->currentPalette.nextIndex);
+    void Enter(std::int32_t state) override {
+        if (this->stateStack.size() == 1)
+            hasOurRoot = state == zelm::StateOf(zelm::ElementName::DATASET);
+        zelm::PyramidXMLReaderHandlers<T>::Enter(state);
     }
+    void BeginPalette() override { current.Clear(); }
+    void AddColor(zelm::ColorList::Rgba rgba) override { current.Add(rgba); }
+    void LookUpColor(std::uint32_t index) override { current.LookUp(index); }
+    void KeepPalette() override { colors[this->paletteBand] = current; }
+
+private:
+    zelm::ColorList current;  // the palette in hand
 };
+
+// Why the text behind `offset` could not be had; empty if there is none.
+std::string JudgeAbsence(zelm::files::ByteSource& source, std::uint64_t offset) {
+    std::uint64_t size = 0;
+    if (source.TellSize(size) && size <= offset) return "";
+    const std::string wrong = JudgeMetadataSize(size > offset ? size - offset : 0);
+    return wrong.empty() ? "the metadata document cannot be read" : wrong;
+}
 
 template <class Record>
 std::span<const Record> SpanOf(const zelm::Array<Record>& records) {
@@ -53,13 +68,26 @@ std::shared_ptr<const StoredRecords<T>> StoredRecords<T>::Read(zelm::files::Byte
     auto records = std::make_shared<StoredRecords>();
     zelm::DocumentText text = zelm::DocumentText::Take(source, offset);
     records->settled = text.bytes && !text.IsUnfinished();
-    if (!text.bytes) return records;
-    InitialiseXerces();
-    auto reader = std::make_unique<QuietReader<T>>();
-    if (!zelm::ParseDocumentBytes(text.bytes.get(), text.size, *reader)) return records;
-    records->kept = std::move(reader);
-    records->MapPlaces();
+    if (text.bytes)
+        records->Parse(std::move(text));
+    else
+        records->fault = JudgeAbsence(source, offset);
     return records;
+}
+
+template <class T>
+void StoredRecords<T>::Parse(zelm::DocumentText text) {
+    // The parse changes the bytes.
+    fault = JudgeMetadataBytes({reinterpret_cast<const char*>(text.bytes.get()), text.size});
+    InitialiseXerces();
+    auto reader = std::make_unique<JudgingReader<T>>();
+    const std::string wrong =
+        zelm::ParseDocumentBytes(text.bytes.get(), text.size, *reader, reader->fault);
+    if (fault.empty()) fault = JudgeMetadataParse(wrong, reader->hasOurRoot);
+    if (!wrong.empty()) return;
+    colors = std::move(reader->colors);
+    kept = std::move(reader);
+    MapPlaces();
 }
 
 template <class T>
@@ -102,11 +130,9 @@ const zelm::RasterBandStats<T>* StoredRecords<T>::NewestStatistics(std::uint32_t
 }
 
 template <class T>
-const zelm::Palette* StoredRecords<T>::BandPalette(std::uint32_t band) const {
-    if (!kept) return nullptr;
-    const auto found = kept->palettes.find(band);
-    const bool has = found != kept->palettes.end() && found->second.nextIndex != 0;
-    return has ? &found->second : nullptr;
+const zelm::ColorList* StoredRecords<T>::BandPalette(std::uint32_t band) const {
+    const auto found = colors.find(band);
+    return found != colors.end() && !found->second.Colors().empty() ? &found->second : nullptr;
 }
 
 #define ZMC_X(type, word, code) template class StoredRecords<type>;

@@ -12,14 +12,16 @@
 #include <cstdint>
 #include <memory>
 #include <span>
+#include <string>
 #include <unordered_map>
 
-#include "colour/Palette.h"
+#include "colour/ColorList.h"
 #include "files/ByteSource.h"
 #include "raster/RasterBandHistogram.h"
 #include "raster/RasterBandStats.h"
 
 namespace zelm {
+struct DocumentText;
 template <class T>
 class PyramidXMLReaderHandlers;
 }  // namespace zelm
@@ -33,7 +35,10 @@ public:
     virtual bool HasStatistics(std::uint32_t band) const = 0;
     // The last one stored; null where there is none, or one without colours, which hides those
     // before it. Owned by this object.
-    virtual const zelm::Palette* BandPalette(std::uint32_t band) const = 0;
+    virtual const zelm::ColorList* BandPalette(std::uint32_t band) const = 0;
+    // What is wrong with the form of the document, as JudgeMetadata tells it; empty if nothing, or
+    // if there is none. One of another root keeps its records all the same.
+    virtual const std::string& Fault() const = 0;
     // Whether the text came to rest: one that is missing, or that a store has marked as unfinished,
     // may be another a moment later.
     virtual bool IsSettled() const = 0;
@@ -59,17 +64,21 @@ public:
     const zelm::RasterBandStats<T>* NewestStatistics(std::uint32_t band) const;
 
     bool HasStatistics(std::uint32_t band) const override { return FirstStatistics(band); }
-    const zelm::Palette* BandPalette(std::uint32_t band) const override;
+    const zelm::ColorList* BandPalette(std::uint32_t band) const override;
+    const std::string& Fault() const override { return fault; }
     bool IsSettled() const override { return settled; }
 
 private:
     using Places = std::unordered_map<std::uint32_t, std::uint32_t>;
 
+    void Parse(zelm::DocumentText text);
     void MapPlaces();
     const zelm::RasterBandStats<T>* At(const Places& places, std::uint32_t band) const;
 
-    std::unique_ptr<zelm::PyramidXMLReaderHandlers<T>> kept;  // null if nothing is
-    Places first, newest;                                     // in Statistics(), by band
+    std::unique_ptr<zelm::PyramidXMLReaderHandlers<T>> kept;    // null if nothing is
+    Places first, newest;                                       // in Statistics(), by band
+    std::unordered_map<std::uint32_t, zelm::ColorList> colors;  // of palettes, by band
+    std::string fault;
     bool settled = false;
 };
 

@@ -460,6 +460,11 @@ std::shared_ptr<const DocumentRecords> Raster::AnyRecords() const {
     return read;
 }
 
+std::string Raster::DocumentFault() const {
+    const auto stored = AnyRecords();
+    return stored ? stored->Fault() : "";
+}
+
 bool Raster::HasStatistics(std::uint32_t band) const {
     const auto stored = AnyRecords();
     return stored && stored->HasStatistics(band);
@@ -551,11 +556,16 @@ void Raster::SetHistograms(const std::vector<zelm::RasterBandHistogram<T>>& hist
     });
 }
 
-// A copy, for whatever its holder does with it. No memory raster has one.
+bool Raster::HasPalette(std::uint32_t band) const {
+    const auto stored = AnyRecords();
+    return stored && stored->BandPalette(band);
+}
+
+// Made anew, for whatever its holder does with it. No memory raster has one.
 zelm::PalettePtr Raster::BandPalette(std::uint32_t band) const {
     zelm::PalettePtr palette;
     const auto stored = AnyRecords();
-    const zelm::Palette* const found = stored ? stored->BandPalette(band) : nullptr;
+    const zelm::ColorList* const found = stored ? stored->BandPalette(band) : nullptr;
     if (!found) return palette;
     palette.Reset(new zelm::Palette);
     found->CopyTo(*palette);
@@ -569,8 +579,8 @@ void Raster::SetBandPalette(std::uint32_t band, const zelm::Palette& palette) {
         Visit([&](auto& typed) { typed.SetPalette(band, palette); });
         CheckDisk("store a palette");
         const auto stored = AnyRecords();
-        const zelm::Palette* const found = stored ? stored->BandPalette(band) : nullptr;
-        if ((found ? found->nextIndex : 0) != palette.nextIndex)
+        const zelm::ColorList* const found = stored ? stored->BandPalette(band) : nullptr;
+        if ((found ? found->Colors().size() : 0) != palette.nextIndex)
             throw Error(name, "store a palette", "the module did not store it");
     });
 }

@@ -140,6 +140,10 @@ public:
     template <class T>
     std::shared_ptr<const StoredRecords<T>> Records() const;
 
+    // What is wrong with the form of the file's document, by the parse that Records keeps; empty if
+    // nothing, or if there is none.
+    std::string DocumentFault() const;
+
     bool HasStatistics(std::uint32_t band) const;
     // The record of a band. Throws if there is none.
     template <class T>
@@ -155,7 +159,8 @@ public:
     template <class T>
     void SetHistograms(const std::vector<zelm::RasterBandHistogram<T>>& histograms);
 
-    // The palette of a band, or an empty pointer.
+    bool HasPalette(std::uint32_t band) const;
+    // The palette of a band, made anew, or an empty pointer. Records() has its colours as numbers.
     zelm::PalettePtr BandPalette(std::uint32_t band) const;
     void SetBandPalette(std::uint32_t band, const zelm::Palette& palette);
 

@@ -4,6 +4,7 @@
 #include <new>
 #include <string>
 
+#include "colour/ColorList.h"
 #include "colour/Palette.h"
 #include "core/ElementTypes.h"
 #include "core/Object.h"
@@ -91,6 +92,31 @@ TEST(PaletteFaults, ACopyIsWholeOrThrown) {
         thrown += threw ? 1 : 0;
     });
     EXPECT_GE(thrown, 24u) << "entry, colour, name and record of each, in both modes";
+}
+
+TEST(PaletteFaults, APaletteOfAColorListIsWholeOrThrown) {
+    ColorList list;
+    Palette whole;
+    for (unsigned char value = 1; value <= 3; ++value) {
+        list.Add(ColorList::Pack(value, value, value, 255));
+        whole.AddColor(Grey(value));
+    }
+    list.LookUp(5);
+    whole.GetColor(5);
+    std::size_t thrown = 0;
+    ForEachAllocationFailing([&](AllocationFaults& faults) {
+        Palette made;
+        bool threw = false;
+        try {
+            list.CopyTo(made);
+        } catch (const std::bad_alloc&) {
+            threw = true;
+        }
+        faults.Disarm();
+        EXPECT_TRUE(threw || SameColors(made, whole));
+        thrown += threw ? 1 : 0;
+    });
+    EXPECT_GE(thrown, 32u) << "entry, colour, name and record of each, in both modes";
 }
 
 TEST(PaletteFaults, EveryOperationSurvivesEveryFailure) {

@@ -1,13 +1,16 @@
 // What a raster's document is parsed for, and how much of a level is read to make another.
 #include <gtest/gtest.h>
 
+#include <filesystem>
 #include <fstream>
 #include <memory>
 #include <numeric>
 #include <utility>
+#include <vector>
 
 #include "files/FileSource.h"
 #include "host/build/LevelReduction.h"
+#include "host/file/MetadataDocument.h"
 #include "host/file/StoredRecords.h"
 #include "host/raster/Raster.h"
 #include "tests/support/MemorySource.h"
@@ -175,6 +178,70 @@ TEST_F(StoredRecordsTest, PaletteAroundAnotherHasItsColoursToo) {
     EXPECT_EQ(read.BandPalette(2)->nextIndex, 2u);
     EXPECT_EQ(read.BandPalette(2)->colors.at(1)->blue, 3u);
     EXPECT_EQ(read.BandPalette(2)->colors.at(1)->alpha, 4u);
+}
+
+// Entries that lookups have left are there as well, and the colours are those of the module.
+TEST_F(StoredRecordsTest, PaletteHasTheEntriesOfTheModules) {
+    Raster raster = Make(1);
+    const std::string colour = "<PALETTE_RGBA>1|2|3|4</PALETTE_RGBA>";
+    const auto count = [](int number) {
+        return "<PALETTE_COUNT>" + std::to_string(number) + "</PALETTE_COUNT>";
+    };
+    std::ofstream(file, std::ios::app) << "<DATASET><PALETTE>" << count(1) << colour << count(0)
+                                       << count(9) << colour << colour << "</PALETTE></DATASET>";
+    const Raster read = Raster::Open(TestModule(), file);
+    const zelm::PalettePtr palette = read.BandPalette(0);
+    ASSERT_TRUE(palette);
+    EXPECT_EQ(palette->nextIndex, 3u);
+    EXPECT_EQ(palette->colors.size(), 4u);
+    const auto describe = [](const zelm::Palette& given) {
+        std::vector<std::pair<std::uint32_t, std::vector<int>>> list;
+        std::vector<std::string> names;
+        for (const auto& [index, color] : given.colors) {
+            list.push_back(
+                {index, {color->red, color->green, color->blue, color->alpha, color->isNull}});
+            names.push_back(color->name.GetUtf8());
+        }
+        return std::pair(list, names);
+    };
+    read.Visit(
+        [&](auto& reader) { EXPECT_EQ(describe(*palette), describe(*reader.GetPalette(0))); });
+}
+
+// By the parse that reads the records, and in the words of the one that judges alone.
+TEST_F(StoredRecordsTest, FaultIsToldByTheOneParse) {
+    Make(1);
+    const std::string start = zmctest::ReadText(file);
+    const std::string good = "<DATASET><BANDSTATISTICS/></DATASET>";
+    for (const std::string& document :
+         {std::string(), good, good + "\n\n", good + "<", std::string("<OTHER/>"),
+          std::string("  \n"), "\x1A" + good, good + std::string(1, '\0'), good + "\xC3",
+          "<!DOCTYPE DATASET>" + good, std::string("<DATASET><DATASET>")}) {
+        SCOPED_TRACE(document);
+        zmctest::WriteText(file, start + document);
+        const std::string judged = JudgeMetadata(file, PyramidHeader::Read(file));
+        EXPECT_EQ(judged.empty(),
+                  document.empty() || document.starts_with(good + "\n") || document == good);
+        const Raster raster = Raster::Open(TestModule(), file);
+        const std::size_t before = DocumentParses();
+        EXPECT_EQ(raster.DocumentFault(), judged);
+        EXPECT_EQ(raster.HasStatistics(0), judged.empty() && !document.empty());
+        if (!document.empty() && !document.starts_with('\x1A')) {
+            EXPECT_EQ(DocumentParses() - before, 1u);
+        }
+    }
+    EXPECT_TRUE(Raster::Open(TestModule(), file)
+                    .DocumentFault()
+                    .starts_with("the metadata document is malformed: line 1: "));
+}
+
+TEST_F(StoredRecordsTest, DocumentBeyondTheLimitIsAFault) {
+    Make(1);
+    const std::uint64_t most = std::uint64_t{256} << 20;
+    std::filesystem::resize_file(file, std::filesystem::file_size(file) + most + 1);
+    const Raster raster = Raster::Open(TestModule(), file);
+    EXPECT_EQ(raster.DocumentFault(), "the metadata document is longer than 256 MiB");
+    EXPECT_EQ(raster.DocumentFault(), JudgeMetadata(file, PyramidHeader::Read(file)));
 }
 
 TEST_F(StoredRecordsTest, MalformedDocumentKeepsNothing) {

@@ -3,13 +3,17 @@
 
 #include <sys/resource.h>
 
+#include <algorithm>
 #include <cmath>
 #include <csignal>
+#include <ctime>
 #include <filesystem>
 #include <limits>
 #include <random>
 
 #include <xercesc/dom/DOM.hpp>
+#include <xercesc/framework/MemBufInputSource.hpp>
+#include <xercesc/sax/HandlerBase.hpp>
 
 #include "core/NumericConversion.h"
 #include "format/NumberText.h"
@@ -142,6 +146,117 @@ TEST_F(ArchiveTest, RecordThatWasOnlyFetchedIsNotStoredInTheNewFile) {
     early->CreateFile(0, 0);
     EXPECT_TRUE(early->SetBandStats(ArrayOf({StatsOf<T>(0, 1)})));
     EXPECT_EQ(ValuesOf(DocumentText(*early), "RSTC_MEAN"), std::vector<std::string>{"1"});
+}
+
+// --- the tree of a document, which is made when it is asked for ---
+
+std::string DocumentWith(const std::string& mean) {
+    return "<DATASET><BANDSTATISTICS><RSTC_MEAN>" + mean +
+           "</RSTC_MEAN></BANDSTATISTICS></DATASET>";
+}
+
+TEST_F(ArchiveTest, ReadingMakesNoTree) {
+    WriteFile(DocumentWith("1"));
+    const auto dataset = Open();
+    EXPECT_TRUE(dataset->HasBandStats<T>(0));
+    EXPECT_EQ(dataset->GetBandStats<T>(0).mean, 1);
+    EXPECT_EQ(dataset->GetHistograms<T>().shape.elements, 0u);
+    EXPECT_EQ(dataset->GetPalette<T>(0)->nextIndex, 0u);
+    dataset->RefreshPyramidState();
+    EXPECT_FALSE(dataset->MetaDocument.IsMade());
+    EXPECT_TRUE(dataset->SetBandStats(ArrayOf({StatsOf<T>(0, 2)})));
+    EXPECT_TRUE(dataset->MetaDocument.IsMade());
+}
+
+TEST_F(ArchiveTest, TreeIsThatOfTheTextAtTheOpen) {
+    WriteFile(DocumentWith("1"));
+    for (const bool fetches : {false, true}) {
+        const auto early = Open();
+        WriteFile(DocumentWith("2"));
+        EXPECT_EQ(fetches, fetches && early->LoadMetaDocument());
+        EXPECT_EQ(early->GetBandStats<T>(0).mean, fetches ? 2 : 1);
+        EXPECT_TRUE(early->SetBandStats(ArrayOf({StatsOf<T>(0, 3)})));
+        EXPECT_EQ(ValuesOf(DocumentText(*early), "RSTC_MEAN"),
+                  (std::vector<std::string>{"1", "3"}));
+        WriteFile(DocumentWith("1"));
+    }
+}
+
+TEST_F(ArchiveTest, TextThatAFetchHasDroppedMakesTheTree) {
+    struct Throwing : xercesc::HandlerBase {
+        void startElement(const XMLCh* const, xercesc::AttributeList&) override {
+            throw std::bad_alloc();
+        }
+    } handlers;
+    WriteFile(DocumentWith("1"));
+    const auto early = Open();
+    {
+        Stderr messages;
+        EXPECT_EQ(early->ParseDocument(&handlers, early->MetaSource, early->MetaLoaded),
+                  PyramidDataset::kParseOutOfMemory);
+    }
+    EXPECT_EQ(early->MetaSource, nullptr);
+    WriteFile(DocumentWith("2"));
+    EXPECT_TRUE(early->SetBandStats(ArrayOf({StatsOf<T>(0, 3)})));
+    EXPECT_EQ(ValuesOf(DocumentText(*early), "RSTC_MEAN"), (std::vector<std::string>{"1", "3"}));
+}
+
+TEST_F(ArchiveTest, TextThatWasDamagedAtTheOpenIsNeverGrown) {
+    for (const char* const damaged : {"<DATASET>",
+                                      "\x1A"
+                                      "DATASET/>"}) {
+        WriteFile(damaged);
+        const auto early = Open();
+        WriteFile(DocumentWith("2"));
+        EXPECT_TRUE(early->LoadMetaDocument());
+        EXPECT_TRUE(early->HasBandStats<T>(0)) << "fetches go by what is there";
+        EXPECT_FALSE(early->SetBandStats(ArrayOf({StatsOf<T>(0, 3)})));
+        EXPECT_EQ(early->MetaDocument->document, nullptr);
+        EXPECT_EQ(DocumentText(*early), DocumentWith("2"));
+    }
+}
+
+TEST_F(ArchiveTest, TreeThatNobodyAskedForOutlivesItsFile) {
+    WriteFile(DocumentWith("1"));
+    const auto made = Open();
+    made->CreateFile(0, 0);
+    EXPECT_TRUE(made->SetBandStats(ArrayOf({StatsOf<T>(0, 3)})));
+    EXPECT_EQ(ValuesOf(DocumentText(*made), "RSTC_MEAN"), (std::vector<std::string>{"1", "3"}));
+    WriteFile(DocumentWith("1"));
+    const auto again = Open();
+    WriteFile("");
+    EXPECT_FALSE(again->ReadHeader()) << "false is success";
+    EXPECT_EQ(again->MetaDocument->RecordCount(), 1u) << "a file without a document changes none";
+}
+
+TEST_F(ArchiveTest, TextsAreLetGoOfWhenTheyHaveServed) {
+    WriteFile(DocumentWith("1"));
+    const auto dataset = Open();
+    const std::weak_ptr<xercesc::MemBufInputSource> text = dataset->MetaSource;
+    EXPECT_FALSE(text.expired());
+    EXPECT_TRUE(dataset->SetBandStats(ArrayOf({StatsOf<T>(0, 2)})));
+    EXPECT_TRUE(text.expired());
+}
+
+// In the same run, so that it holds on any machine: an open moves the bytes, and a tree is many
+// times their work.
+TEST_F(ArchiveTest, OpeningIsQuickerThanATree) {
+    Palette palette;
+    for (std::uint32_t i = 0; i < 65536; ++i) palette.AddColor(ColorOf(1, 2, 3, 4));
+    ASSERT_TRUE(Make()->SetPalette(0, palette));
+    const auto seconds = [](auto&& work) {
+        const std::clock_t start = std::clock();
+        work();
+        return static_cast<double>(std::clock() - start) / CLOCKS_PER_SEC;
+    };
+    std::unique_ptr<PyramidDataset> dataset;
+    double open = 1e9, tree = 1e9;
+    for (int run = 0; run < 3; ++run) {
+        open = std::min(open, seconds([&] { dataset = Open(); }));
+        tree = std::min(tree, seconds([&] { dataset->MetaDocument.get(); }));
+    }
+    EXPECT_EQ(dataset->MetaDocument->RecordCount(), 1u);
+    EXPECT_LT(open, tree / 2);
 }
 
 // Some bands of a level that is one tile go behind the tile, which is behind all tiles.

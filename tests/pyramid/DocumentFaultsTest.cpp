@@ -109,5 +109,58 @@ TEST_F(FetchFaults, AreWholeOrNothing) {
     EXPECT_GT(points, 100u);
 }
 
+// Memory that is short at a store is no reason to refuse the next.
+TEST_F(FetchFaults, TreeThatFoundNoMemoryIsMadeByTheNextStore) {
+    PyramidDescription d;
+    d.samples = d.lines = 4;
+    zelm::Palette colours;
+    colours.AddColor(zelm::Color());
+    ASSERT_TRUE(Create(d)->SetPalette(0, colours));
+    testing::internal::CaptureStderr();
+    const std::size_t points = ForEachAllocationFailing([&](AllocationFaults& faults) {
+        faults.Disarm();
+        const auto dataset = Open();
+        faults.Rearm();
+        const bool made = dataset->EnsureMetaDocument() != nullptr;
+        faults.Disarm();
+        ASSERT_TRUE(made || faults.Failed() != 0);
+        EXPECT_EQ(made, dataset->MetaDocument.IsMade());
+        ASSERT_TRUE(dataset->EnsureMetaDocument());
+        ASSERT_TRUE(dataset->EnsureMetaDocument()->document);
+        EXPECT_EQ(dataset->EnsureMetaDocument()->RecordCount(), 1u);
+    });
+    testing::internal::GetCapturedStderr();
+    EXPECT_GT(points, 20u);
+}
+
+// An object, its name, its count of references and its entry; nothing of it is made twice, and a
+// tree has no part in it.
+TEST_F(FetchFaults, FetchOfAPaletteAllocatesFourTimesForEachColour) {
+    constexpr std::uint32_t kColours = 4096;
+    PyramidDescription d;
+    d.samples = d.lines = 4;
+    zelm::Palette colours;
+    for (std::uint32_t i = 0; i < kColours; ++i) colours.AddColor(zelm::Color());
+    ASSERT_TRUE(Create(d)->SetPalette(0, colours));
+    const auto dataset = Open();
+    dataset->GetPalette<unsigned char>(0);
+    const std::size_t count = zmctest::CountAllocations([&] {
+        const auto other = Open();
+        ASSERT_EQ(other->GetPalette<unsigned char>(0)->nextIndex, kColours);
+    });
+    EXPECT_LT(count, kColours * 4 + 1000);
+}
+
+// One text for all of them.
+TEST_F(FetchFaults, StoreOfAPaletteAllocatesNothingForEachColour) {
+    PyramidDescription d;
+    d.samples = d.lines = 4;
+    zelm::Palette colours;
+    for (std::uint32_t i = 0; i < 4096; ++i) colours.AddColor(zelm::Color());
+    const auto dataset = Create(d);
+    EXPECT_LT(zmctest::CountAllocations([&] { ASSERT_TRUE(dataset->SetPalette(0, colours)); }),
+              1000u);
+}
+
 }  // namespace
 }  // namespace zmctest

@@ -194,7 +194,7 @@ TEST_F(RefusalTest, DocumentsWithoutAFileOrAParser) {
     ASSERT_TRUE(dataset->MetaDocument);
     EXPECT_EQ(dataset->MetaDocument->RecordCount(), 0u);
     bool loaded = true;
-    std::unique_ptr<xercesc::MemBufInputSource> none;
+    zelm::DocumentSource none;
     EXPECT_EQ(dataset->ParseDocument(nullptr, none, loaded), PyramidDataset::kParseError);
     none = std::make_unique<xercesc::MemBufInputSource>(reinterpret_cast<const XMLByte*>("<A/>"),
                                                         XMLSize_t{4}, "text");

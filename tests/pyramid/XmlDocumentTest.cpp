@@ -205,6 +205,53 @@ TEST_F(XmlDocumentTest, PaletteWithoutColoursHasTwoChildren) {
               "</PALETTE></DATASET>");
 }
 
+// A palette is written from its colours, and every other record from its elements.
+TEST_F(XmlDocumentTest, PaletteIsLaidOutAsItsElementsWouldBe) {
+    Palette palette;
+    palette.nextIndex = 2;
+    unsigned char channels[4] = {255, 0, 17, 9};
+    palette.SetColor(1, RGBAColor(Array<unsigned char>(channels, ArrayShape(4))));
+    const auto stats = [&] { return document.WriteBandStatsElement(RasterBandStats<int>()); };
+    ASSERT_TRUE(stats() && document.WritePaletteElement(7, palette) && stats());
+    const std::string written = Raw();
+    document.CreateDocument();
+    ASSERT_TRUE(stats());
+    xercesc::DOMElement* const record = document.document->createElement(u"PALETTE");
+    document.document->getDocumentElement()->appendChild(record);
+    document.AppendValueElement(*record, ElementName::PALETTE_BAND, "7");
+    document.AppendValueElement(*record, ElementName::PALETTE_COUNT, "2");
+    document.AppendValueElement(*record, ElementName::PALETTE_RGBA, "0|0|0|0");
+    document.AppendValueElement(*record, ElementName::PALETTE_RGBA, "255|0|17|9");
+    ASSERT_TRUE(stats());
+    EXPECT_EQ(written, Raw());
+    EXPECT_EQ(written, Raw()) << "and so each time";
+}
+
+TEST_F(XmlDocumentTest, PaletteThatIsTakenBackIsForgotten) {
+    Palette two;
+    two.nextIndex = 2;
+    document.WritePaletteElement(0, Palette());
+    document.WritePaletteElement(1, two);
+    document.RemoveFrom(1);
+    document.WritePaletteElement(2, Palette());
+    EXPECT_EQ(document.RecordCount(), 2u);
+    EXPECT_EQ(Text(),
+              "<DATASET><PALETTE><PALETTE_BAND>0</PALETTE_BAND><PALETTE_COUNT>0</PALETTE_COUNT>"
+              "</PALETTE><PALETTE><PALETTE_BAND>2</PALETTE_BAND><PALETTE_COUNT>0</PALETTE_COUNT>"
+              "</PALETTE></DATASET>");
+    document.DropTree();
+    document.CreateDocument();
+    EXPECT_EQ(Text(), "<DATASET/>");
+}
+
+TEST_F(XmlDocumentTest, CommentsOfOthersStayBesideAPalette) {
+    ASSERT_TRUE(Parse(document, "<!--a--><DATASET><PALETTE><!----></PALETTE></DATASET><!--b-->"));
+    EXPECT_TRUE(document.WritePaletteElement(0, Palette()));
+    EXPECT_EQ(Text(),
+              "<!--a--><DATASET><PALETTE><!----></PALETTE><PALETTE><PALETTE_BAND>0</PALETTE_BAND>"
+              "<PALETTE_COUNT>0</PALETTE_COUNT></PALETTE></DATASET><!--b-->");
+}
+
 TEST_F(XmlDocumentTest, IndexWithoutColourIsWrittenAsTheNullColour) {
     Palette palette;
     palette.nextIndex = 2;

@@ -24,8 +24,7 @@ namespace {
 
 using ::testing::HasSubstr;
 
-std::unique_ptr<xercesc::MemBufInputSource> SourceOf(const std::string& text,
-                                                     const char* name = "ORVAPYRMETA") {
+DocumentSource SourceOf(const std::string& text, const char* name = "ORVAPYRMETA") {
     auto* bytes = new XMLByte[text.size() + 1];
     std::memcpy(bytes, text.data(), text.size());
     return std::make_unique<xercesc::MemBufInputSource>(bytes, text.size(), name, true);
@@ -45,7 +44,7 @@ protected:
     }
 
     PyramidDataset dataset{String("no file")};
-    std::unique_ptr<xercesc::MemBufInputSource> source;
+    DocumentSource source;
     bool loaded = false;
 };
 

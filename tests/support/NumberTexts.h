@@ -21,6 +21,7 @@ inline std::vector<std::string> RealTexts() {
         "1x", "1e", "1e+", "1.5.5", "12 7",
         // Decimals, and the ends of their range, which neither the first digit nor the sign of the
         // exponent tells.
+        "255|7", "12x", "12e1", "12E1", "12.5", "999999999", "4294967296", "-000000000000000012",
         "1.5", " -2.5e3x", "\n\t 12.5 7", "+4", "-0", "-0.0", "1e999", "-1e999", "-0.1E999",
         "1e-999", "1E-999", "-1e-999", "0." + zeros + "1", "1" + zeros, "0." + zeros + "1e5",
         "-." + zeros + "9e+9", "9" + zeros + "e-5", "-12" + zeros + ".5E-9", "0001e400",

@@ -72,6 +72,17 @@ class Info(ToolTest):
             self.assertEqual(self.parses(command, "made200.pyr"), few)
             self.assertLess(few, 10)
 
+    @unittest.skipUnless("ZMC_PARSE_COUNTER" in os.environ, "this build cannot count them")
+    def test_a_document_is_judged_by_the_parse_that_reads_it(self):
+        self.pyramid()
+        file = Pyramid(self.path("picture.pyr"))
+        with open(self.path("picture.pyr"), "rb") as handle:
+            tiles = handle.read()[:file.end]
+        with open(self.path("bare.pyr"), "wb") as handle:
+            handle.write(tiles)
+        self.assertEqual(self.parses("verify", "picture.pyr"),
+                         self.parses("verify", "bare.pyr") + 1)
+
     def test_the_ordering_morton_has_no_offsets(self):
         geotiff(self.path("source.tif"), samples("Byte", 40, 50, 9))
         self.good("build", "source.tif", "made.pyr")
