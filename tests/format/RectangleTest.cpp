@@ -65,6 +65,14 @@ TEST(RectangleTest, WhatLiesInside) {
     EXPECT_FALSE((Rectangle{1, 1, 1, 1}).IsEmpty());
 }
 
+TEST(RectangleTest, EveryMemberCountsInAComparison) {
+    const Rectangle one{2, 3, 10, 20};
+    EXPECT_EQ(one, (Rectangle{2, 3, 10, 20}));
+    for (const Rectangle other :
+         {Rectangle{1, 3, 10, 20}, {2, 2, 10, 20}, {2, 3, 11, 20}, {2, 3, 10, 21}})
+        EXPECT_FALSE(one == other) << other;
+}
+
 // --- the walk over tiles ---
 
 TEST(TileWalk, TilesFromTheTopAndFromTheLeft) {

@@ -205,6 +205,13 @@ TEST_F(XmlDocumentTest, PaletteWithoutColoursHasTwoChildren) {
               "</PALETTE></DATASET>");
 }
 
+TEST_F(XmlDocumentTest, PaletteOfMoreColoursThanADocumentHasElementsIsRefused) {
+    Palette palette;
+    palette.nextIndex = kMaxDocumentNodes + 1;
+    EXPECT_FALSE(document.WritePaletteElement(0, palette));
+    EXPECT_EQ(Text(), "<DATASET/>");
+}
+
 // A palette is written from its colours, and every other record from its elements.
 TEST_F(XmlDocumentTest, PaletteIsLaidOutAsItsElementsWouldBe) {
     Palette palette;
