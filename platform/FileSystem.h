@@ -24,6 +24,7 @@ struct FileStatus {
     std::uint64_t size = 0;  // bytes, of a regular file
     // What tells the file from all others of its file system while it exists, whatever its name.
     std::uint64_t number = 0;
+    std::uint64_t owner = 0;  // the number of the user to whom it belongs; 0 is the superuser
 };
 
 std::string LastErrorText();
@@ -31,6 +32,11 @@ std::string LastErrorText();
 std::string ErrorText(int error);
 
 FileStatus StatusOf(const std::string& path) noexcept;
+
+// Whether what one file says of another counts. Anyone who may write a folder can put a note beside
+// somebody's file: it counts if it belongs to the owner of the file, to the superuser or to the
+// user of this process.
+bool MaySpeakFor(const FileStatus& note, const FileStatus& file) noexcept;
 
 // The folder of a path ("." for a bare name), its last part, and the two put together.
 std::string FolderOf(const std::string& path);
@@ -69,7 +75,6 @@ bool ReleaseReserve(const std::string& path) noexcept;
 std::string SystemRun();
 
 std::uint64_t CurrentProcess() noexcept;
-bool ProcessAlive(std::uint64_t process) noexcept;
 // A number that another call, in this process or another, does not give.
 std::uint64_t RandomNumber() noexcept;
 

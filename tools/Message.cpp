@@ -1,6 +1,8 @@
 #include "tools/Message.h"
 
 #include <atomic>
+#include <mutex>
+#include <set>
 
 #include "platform/Terminal.h"
 
@@ -23,8 +25,13 @@ void Say(const std::string& text) {
     platform::WriteAtOnce(platform::StandardStream::Errors, line);
 }
 
+// What several readers of one file find is said once.
 void Warn(const std::string& text) {
-    if (!isQuiet) Say(text);
+    static std::mutex mutex;
+    static std::set<std::string> said;
+    if (isQuiet) return;
+    const std::lock_guard lock(mutex);
+    if (said.insert(text).second) Say(text);
 }
 
 void SetQuiet(bool quiet) { isQuiet = quiet; }

@@ -36,7 +36,8 @@ public:
 // Writes a message, on one line whatever `text` holds.
 void Say(const std::string& text);
 
-// The same for what does not keep a command from going on; silent after SetQuiet(true).
+// The same for what does not keep a command from going on, each text once; silent after
+// SetQuiet(true). Any thread may call.
 void Warn(const std::string& text);
 void SetQuiet(bool quiet);
 

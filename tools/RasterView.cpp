@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <filesystem>
 #include <fstream>
-#include <set>
 
 #include "core/PixelVocabulary.h"
 #include "gdal/Dataset.h"
@@ -59,10 +58,8 @@ private:
     zelm::RasterProps props = source.Props();
 };
 
-// Once for each file: a copy that cannot be used is found again by whoever looks next.
 void TellRecovery(const std::string& name, const std::string& text) {
-    static std::set<std::string> told;
-    if (!text.empty() && told.insert(name).second) Warn(name + ": warning: " + text);
+    if (!text.empty()) Warn(name + ": warning: " + text);
 }
 
 std::uint64_t LineBytes(const RasterView& view, const Selection& selection) {
@@ -94,12 +91,13 @@ void CheckIsFile(const std::string& name) {
 
 zmchost::PyramidFileInfo ReadLayout(const std::string& name) {
     CheckIsFile(name);
-    TellRecovery(name, zmchost::RecoverMetadata(name).text);
+    TellRecovery(name, zmchost::LookForCopy(name).text);
     return zmchost::ReadPyramidFileInfo(name);
 }
 
 zmchost::Raster OpenPyramid(const std::string& name) {
-    zmchost::Raster raster = zmchost::Raster::Open(zmcgdal::SharedModule(), name);
+    zmchost::Raster raster =
+        zmchost::Raster::Open(zmcgdal::SharedModule(), name, zmchost::Access::Read);
     TellRecovery(name, raster.RecoveryNote());
     return raster;
 }

@@ -43,8 +43,8 @@ bool IsPyramidFile(const std::string& name);
 // Throws Failure if there is no file of that name.
 void CheckIsFile(const std::string& name);
 
-// The layout of a pyramid file, once statistics whose store was cut off are put in order. Throws
-// Failure, or what its reader throws.
+// The layout of a pyramid file, with a warning of a store into it that was cut off. Throws Failure,
+// or what its reader throws.
 zmchost::PyramidFileInfo ReadLayout(const std::string& name);
 
 // Opens a pyramid file, any other raster, or whichever of both the name tells.

@@ -18,14 +18,14 @@ BuildFile::BuildFile(const std::string& targetName, bool mayOverwrite)
     : given(targetName), overwrite(mayOverwrite), target(platform::ResolveLinks(targetName)) {
     CheckTarget();
     SideFile::RemoveStale(target, kKind);
-    path = SideFile::TemporaryPath(target, kKind);
-    if (!platform::CreateNewFile(path))
+    path = SideFile::MakeTemporary(target, kKind, lock);
+    if (path.empty())
         throw Error(given, "build a file in the folder " + platform::FolderOf(target),
                     platform::LastErrorText());
 }
 
 BuildFile::~BuildFile() {
-    if (!committed) platform::RemoveEntry(path);
+    if (!committed && !path.empty()) platform::RemoveEntry(path);
 }
 
 void BuildFile::CheckTarget() const {
@@ -61,6 +61,7 @@ void BuildFile::Commit() {
     if (!platform::RenameFile(path, target))
         throw Error(given, "give the finished file its name", platform::LastErrorText());
     committed = true;
+    lock.Release();
     // What may be left of a store into the old file has no file any more.
     platform::RemoveEntry(MetadataJournal::PathFor(target));
     if (!platform::SyncFolder(platform::FolderOf(target)))

@@ -390,7 +390,7 @@ void BuildRun::Check() {
     tiles.reset();
     work.reset();
     raster.reset();
-    Raster finished = Raster::Open(module, file->Path());
+    Raster finished = Raster::Open(module, file->Path(), Access::Read);
     report.fileSize = finished.Header().fileSize;
     if (!finished.IsComplete() || finished.Width() != props.samples ||
         finished.Height() != props.lines || finished.MaxLevel() != maxLevel ||

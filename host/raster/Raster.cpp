@@ -119,9 +119,10 @@ void Raster::TakeReader() {
 }
 
 // Here and below the caller's hold on the module outlasts the connection, whatever is thrown.
-Raster Raster::Open(ModulePtr module, const std::string& file) {
-    const auto opened = std::make_shared<LentFile>(OpenPlainFile(file, true), file);
-    const Recovery recovery = RecoverMetadata(file);
+Raster Raster::Open(ModulePtr module, const std::string& file, Access access) {
+    const auto opened =
+        std::make_shared<LentFile>(OpenPlainFile(file, access == Access::Update), file);
+    const Recovery recovery = opened->IsWritable() ? RecoverMetadata(file) : LookForCopy(file);
     opened->Accept();
     Raster raster = OpenLent(std::move(module), file, opened);
     raster.recoveryNote = recovery.text;

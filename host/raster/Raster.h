@@ -40,11 +40,17 @@ class LentFile;
 template <class T>
 class StoredRecords;
 
+// What a pyramid file is opened for.
+enum class Access {
+    Read,    // nothing is ever written, neither into the file nor beside it
+    Update,  // for writing too where the file allows it
+};
+
 class Raster {
 public:
-    // Opens a pyramid file, for writing too where the file allows it. What a store with a copy
-    // (KeepCopies) left behind when it was cut off is put in order first; RecoveryNote tells of it.
-    static Raster Open(ModulePtr module, const std::string& file);
+    // Opens a pyramid file. What a store with a copy (KeepCopies) left behind when it was cut off
+    // is put in order first where the file is opened for writing; RecoveryNote tells of it.
+    static Raster Open(ModulePtr module, const std::string& file, Access access = Access::Update);
     // The same from an open source, which `name` stands for in messages: a file of another kind, or
     // one that the caller has looked at already. Nothing is put in order, and copies are kept of
     // plain files alone (FileSource.h).

@@ -300,8 +300,12 @@ TEST_F(DriverTest, StoreThatWasCutOffIsPutInOrder) {
     std::fstream(name, std::ios::in | std::ios::out | std::ios::binary)
             .seekp(static_cast<std::streamoff>(document))
         << '\x1A';
+    const std::string damaged = zmctest::ReadText(name);
     CPLPushErrorHandler(CPLQuietErrorHandler);
-    const DatasetPtr opened = Open(name);
+    EXPECT_TRUE(Open(name));
+    EXPECT_NE(std::string(CPLGetLastErrorMsg()).find("zmcraster recover"), std::string::npos);
+    EXPECT_EQ(zmctest::ReadText(name), damaged) << "who opens for reading writes nothing";
+    const DatasetPtr opened = Open(name, GDAL_OF_UPDATE);
     EXPECT_NE(std::string(CPLGetLastErrorMsg()).find("again the one of before"), std::string::npos);
     CPLPopErrorHandler();
     EXPECT_EQ(MeanOf(*opened), mean);
