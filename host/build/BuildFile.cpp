@@ -4,6 +4,7 @@
 #include "host/file/SideFile.h"
 #include "host/journal/MetadataJournal.h"
 #include "platform/FileSystem.h"
+#include "platform/Rights.h"
 
 namespace zmchost {
 namespace {
@@ -22,6 +23,12 @@ BuildFile::BuildFile(const std::string& targetName, bool mayOverwrite)
     if (path.empty())
         throw Error(given, "build a file in the folder " + platform::FolderOf(target),
                     platform::LastErrorText());
+    // What is to replace a file is nobody else's business until it has the rights of that one.
+    if (platform::StatusOf(target).exists && !platform::MakePrivate(path)) {
+        const std::string reason = platform::LastErrorText();
+        platform::RemoveEntry(path);
+        throw Error(given, "build a file in the folder " + platform::FolderOf(target), reason);
+    }
 }
 
 BuildFile::~BuildFile() {
@@ -58,6 +65,8 @@ void BuildFile::Flush() const {
 
 void BuildFile::Commit() {
     CheckTarget();
+    if (platform::StatusOf(target).exists && !platform::CopyRights(target, path))
+        throw Error(given, "give it the rights of the file before", platform::LastErrorText());
     if (!platform::RenameFile(path, target))
         throw Error(given, "give the finished file its name", platform::LastErrorText());
     committed = true;

@@ -205,6 +205,7 @@ BuildReport BuildRun::Run() {
     RunWithThreads(threads, [this] { Fill(); });
     StoreRecords();
     Check();
+    if (options.beforeNaming) options.beforeNaming(file->Path());
     file->Commit();
     report.width = props.samples;
     report.height = props.lines;

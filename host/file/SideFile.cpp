@@ -21,18 +21,14 @@ std::size_t Digits(std::string_view text) {
     return std::min(text.find_first_not_of("0123456789"), text.size());
 }
 
-// The temporary name at the start of a name, which may be one of a companion; empty if none is.
-std::string TemporaryIn(std::string_view name, std::string_view prefix) {
-    if (!name.starts_with(prefix)) return "";
-    std::size_t end = prefix.size();
-    const std::size_t process = Digits(name.substr(end));
-    end += process;
-    if (process == 0 || !name.substr(end).starts_with('-')) return "";
-    const std::size_t random = Digits(name.substr(++end));
-    end += random;
-    if (random == 0 || !name.substr(end).starts_with(kSuffix)) return "";
-    end += kSuffix.size();
-    return end == name.size() || name[end] == '.' ? std::string(name.substr(0, end)) : "";
+bool IsTemporary(std::string_view name, std::string_view prefix) {
+    if (!name.starts_with(prefix)) return false;
+    name.remove_prefix(prefix.size());
+    const std::size_t process = Digits(name);
+    if (process == 0 || !name.substr(process).starts_with('-')) return false;
+    name.remove_prefix(process + 1);
+    const std::size_t random = Digits(name);
+    return random != 0 && name.substr(random) == kSuffix;
 }
 
 }  // namespace
@@ -74,12 +70,10 @@ void SideFile::RemoveStale(const std::string& file, const std::string& kind) {
     const std::string folder = platform::FolderOf(file);
     const std::string prefix = Prefix(file, kind);
     for (const std::string& name : platform::ListFolder(folder)) {
-        const std::string temporary = TemporaryIn(name, prefix);
-        if (temporary.empty()) continue;
+        if (!IsTemporary(name, prefix)) continue;
+        const std::string path = platform::JoinPath(folder, name);
         platform::FileLock lock;
-        const Result taken = lock.Take(platform::JoinPath(folder, temporary));
-        if (taken == Result::Taken || (taken == Result::Missing && name != temporary))
-            platform::RemoveEntry(platform::JoinPath(folder, name));
+        if (lock.Take(path) == Result::Taken) platform::RemoveEntry(path);
     }
 }
 

@@ -1,10 +1,9 @@
 // SideFile: names of the files that this library puts beside a file of a user's.
 //
-// A temporary file of NAME is called ".NAME.KIND-PROCESS-RANDOM.tmp"; files whose names go on behind
-// that with a dot are its companions. Who makes one holds its lock for as long as it is wanted, so
-// that whoever comes next can tell what is left over: a number of a process means nothing in another
-// container or on another machine. Names longer than a file system takes are cut. Paths are those
-// of the file itself, links resolved.
+// A temporary file of NAME is called ".NAME.KIND-PROCESS-RANDOM.tmp". Who makes one holds its
+// lock for as long as it is wanted, so that whoever comes next can tell what is left over: a number
+// of a process means nothing in another container or on another machine. Names longer than a file
+// system takes are cut. Paths are those of the file itself, links resolved.
 #ifndef ZMC_HOST_FILE_SIDEFILE_H
 #define ZMC_HOST_FILE_SIDEFILE_H
 
@@ -27,7 +26,7 @@ public:
     // LastErrorText, if that cannot be done.
     static std::string MakeTemporary(const std::string& file, const std::string& kind,
                                      platform::FileLock& lock);
-    // Removes the temporary files of that kind, and their companions, whose lock nobody holds.
+    // Removes the temporary files of that kind whose lock nobody holds.
     static void RemoveStale(const std::string& file, const std::string& kind);
 };
 
