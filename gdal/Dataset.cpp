@@ -8,6 +8,7 @@
 #include "gdal/Band.h"
 #include "gdal/Create.h"
 #include "gdal/LevelRefresh.h"
+#include "gdal/SidecarStage.h"
 #include "gdal/VsiSource.h"
 #include "host/raster/LentFile.h"
 
@@ -111,8 +112,17 @@ void Dataset::BeginCreation(std::unique_ptr<Creation> state) { creation = std::m
 
 void Dataset::LoadSidecar(const char* fileName, char** siblings) {
     SetDescription(fileName);
-    TryLoadXML(siblings);
-    oOvManager.Initialize(this, fileName, siblings);
+    std::string base = fileName;
+    if (!IsVirtualName(base)) {
+        if (eAccess == GA_Update) SettleSidecar(base, *file->source, file->info.header);
+        base = SidecarBase(base, *file->source, file->info.header);
+    }
+    const bool staged = base != fileName;
+    if (staged) SetPhysicalFilename(base.c_str());
+    TryLoadXML(staged ? nullptr : siblings);
+    oOvManager.Initialize(this, base.c_str(), staged ? nullptr : siblings);
+    // Without this GDAL looks for a mask beside the usual name, when it is asked for one.
+    if (staged) oOvManager.HaveMaskFile(nullptr, base.c_str());
 }
 
 bool Dataset::ReadsDirectly(int x, int y, int width, int height) const {

@@ -56,6 +56,8 @@ bool CreateNewFile(const std::string& path) noexcept;
 bool RenameFile(const std::string& from, const std::string& to) noexcept;
 // The same, and fails if anything bears that name.
 bool RenameToNewName(const std::string& from, const std::string& to) noexcept;
+// Gives a file one more name; fails if anything bears it, or the file system has no such thing.
+bool LinkFile(const std::string& file, const std::string& name) noexcept;
 bool RemoveEntry(const std::string& path) noexcept;
 
 // Waits until a file's bytes, or a folder's names, have reached the disk.

@@ -117,6 +117,10 @@ bool RenameToNewName(const std::string& from, const std::string& to) noexcept {
     return ::link(from.c_str(), to.c_str()) == 0 && ::unlink(from.c_str()) == 0;
 }
 
+bool LinkFile(const std::string& file, const std::string& name) noexcept {
+    return ::link(file.c_str(), name.c_str()) == 0;
+}
+
 bool RemoveEntry(const std::string& path) noexcept { return ::unlink(path.c_str()) == 0; }
 
 bool SyncFile(const std::string& path) noexcept { return Sync(path, O_RDONLY); }

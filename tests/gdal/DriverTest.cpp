@@ -17,6 +17,7 @@
 #include <vector>
 
 #include "gdal/SampleType.h"
+#include "gdal/VsiSource.h"
 #include "host/file/PyramidHeader.h"
 #include "host/journal/MetadataJournal.h"
 #include "tests/support/LenientHeaders.h"
@@ -310,6 +311,41 @@ TEST_F(DriverTest, StoreThatWasCutOffIsPutInOrder) {
     CPLPopErrorHandler();
     EXPECT_EQ(MeanOf(*opened), mean);
     EXPECT_FALSE(fs::exists(zmchost::MetadataJournal::PathFor(name)));
+}
+
+// What a build leaves that is ended between the names of its files.
+TEST_F(DriverTest, StagedSidecarOfThisFileIsSeenAndGetsItsNameForUpdate) {
+    const std::string name = MakeCopy(*Memory(20, 10, 1, GDT_Byte));
+    const std::string usual = name + ".aux.xml";
+    const auto unitOf = [&](unsigned flags) {
+        const DatasetPtr dataset = Open(name, flags);
+        return std::string(dataset->GetRasterBand(1)->GetUnitType());
+    };
+    const auto sidecar = [](const std::string& unit) {
+        return "<PAMDataset><PAMRasterBand band=\"1\"><UnitType>" + unit +
+               "</UnitType></PAMRasterBand></PAMDataset>";
+    };
+    zmctest::WriteText(usual, sidecar("old"));
+    const auto source = OpenByName(name, false);
+    const auto header = zmchost::PyramidHeader::Read(*source, name);
+    const std::string base =
+        fs::path(name).parent_path() / ("." + fs::path(name).filename().string() + ".zmcside-" +
+                                        std::to_string(source->Identify().number) + "-");
+    const std::string staged = base + std::to_string(header.tileDataEnd) + ".aux.xml";
+    const std::string foreign = base + "1.aux.xml";
+    zmctest::WriteText(foreign, sidecar("foreign"));
+    EXPECT_EQ(unitOf(GDAL_OF_READONLY), "old") << "that is of another file";
+    zmctest::WriteText(staged, sidecar("new"));
+    EXPECT_EQ(unitOf(GDAL_OF_READONLY), "new");
+    EXPECT_EQ(zmctest::ReadText(usual), sidecar("old")) << "who reads changes nothing";
+    EXPECT_EQ(unitOf(GDAL_OF_UPDATE), "new");
+    EXPECT_EQ(zmctest::ReadText(usual), sidecar("new"));
+    EXPECT_FALSE(fs::exists(staged));
+    EXPECT_TRUE(fs::exists(foreign)) << "the next build removes it";
+    zmctest::WriteText(staged, "<PAMDataset />\n");
+    EXPECT_EQ(unitOf(GDAL_OF_READONLY), "");
+    EXPECT_EQ(unitOf(GDAL_OF_UPDATE), "");
+    EXPECT_FALSE(fs::exists(usual));
 }
 
 class LenientHeaders : public DriverTest,
