@@ -2,6 +2,7 @@
 
 #include <utility>
 
+#include "format/DocumentLimits.h"
 #include "host/base/Checksum.h"
 
 namespace zmchost {
@@ -40,6 +41,8 @@ private:
 };
 
 }  // namespace
+
+const std::uint64_t JournalRecord::kMaxBytes = zelm::kMaxDocumentBytes + 1024;
 
 std::string JournalRecord::Encode() const {
     std::string bytes(kMagic);

@@ -12,8 +12,6 @@
 #include <string>
 #include <string_view>
 
-#include "format/DocumentLimits.h"
-
 namespace zmchost {
 
 struct JournalRecord {
@@ -26,7 +24,7 @@ struct JournalRecord {
     std::string text;              // the document; empty if there was none
 
     // What no record is longer than.
-    static constexpr std::uint64_t kMaxBytes = zelm::kMaxDocumentBytes + 1024;
+    static const std::uint64_t kMaxBytes;
     // Bytes from its start that tell how long a record is.
     static constexpr std::size_t kHeadBytes = 64;
 

@@ -251,6 +251,12 @@ bool Raster::IsWritable() const { return !file || file->IsWritable(); }
 
 std::string Raster::Change() const { return file ? file->Change() : ""; }
 
+std::string Raster::ContentChange() const { return file ? file->ContentChange() : ""; }
+
+zelm::files::Identity Raster::OpenedAs() const {
+    return file ? file->Accepted() : zelm::files::Identity{};
+}
+
 std::string Raster::TakeFailure() const { return file ? file->TakeFailure() : ""; }
 
 void Raster::CheckDisk(const std::string& operation) const {

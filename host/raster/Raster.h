@@ -99,6 +99,13 @@ public:
     // What others have done to the file since it was opened, or last written to by this object, for
     // people: that it was cut, replaced, removed or written to. Empty if nothing is to be seen.
     std::string Change() const;
+    // The part of it that concerns what is read: that the file was cut or written to. What was read
+    // while this is empty is of one file in one state, but for writes within the clock tick of the
+    // file system in which the file was last written before (Identity in ByteSource.h).
+    std::string ContentChange() const;
+    // Which file it is, in which state, as it was opened or last written to by this object; unknown
+    // of a memory raster.
+    zelm::files::Identity OpenedAs() const;
 
     std::optional<double> NoDataValue(std::uint32_t band) const;
     // By band; they live in this object, since files have no place for them. A value that the pixel
