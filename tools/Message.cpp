@@ -5,6 +5,7 @@
 #include <set>
 
 #include "platform/Terminal.h"
+#include "tools/Visible.h"
 
 namespace zmctools {
 namespace {
@@ -13,6 +14,7 @@ std::atomic<bool> isQuiet{false};
 
 }  // namespace
 
+// Libraries tell some things on several lines; names are visible already where we made the text.
 void Say(const std::string& text) {
     std::string line = "zmcraster: ";
     for (const char c : text)
@@ -21,8 +23,7 @@ void Say(const std::string& text) {
         else if (line.back() != ' ')
             line += ' ';
     while (line.back() == ' ') line.pop_back();
-    line += '\n';
-    platform::WriteAtOnce(platform::StandardStream::Errors, line);
+    platform::WriteAtOnce(platform::StandardStream::Errors, Visible(line) + '\n');
 }
 
 // What several readers of one file find is said once.

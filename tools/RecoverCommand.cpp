@@ -48,7 +48,7 @@ void RecoverCommand::Report(const char* result, const std::string& text) const {
     if (json)
         PrintDocument({{"schema", kSchema}, {"file", file}, {"result", result}, {"text", text}});
     else if (!quiet)
-        std::printf("%s: %s\n", file.c_str(), text.c_str());
+        std::printf("%s: %s\n", Visible(file).c_str(), Visible(text).c_str());
 }
 
 void RecoverCommand::Recover() const {
