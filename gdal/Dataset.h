@@ -81,6 +81,7 @@ private:
     Dataset(std::shared_ptr<OpenFile> openFile, std::uint32_t levelShown, GDALAccess access,
             Dataset* mainDataset);
     void AddBands();
+    void IgnoreCompanions();
     void AddOverviews();
     void DescribeFile();
     CPLStringList* OwnDomain(const char* domain);

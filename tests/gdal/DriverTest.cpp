@@ -4,6 +4,7 @@
 #include <gdal_alg.h>
 #include <gdal_priv.h>
 #include <gtest/gtest.h>
+#include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -346,6 +347,32 @@ TEST_F(DriverTest, StagedSidecarOfThisFileIsSeenAndGetsItsNameForUpdate) {
     EXPECT_EQ(unitOf(GDAL_OF_READONLY), "");
     EXPECT_EQ(unitOf(GDAL_OF_UPDATE), "");
     EXPECT_FALSE(fs::exists(usual));
+}
+
+// Opening a pipe would wait for its other end.
+TEST_F(DriverTest, PipesBesideARasterAreNotOpened) {
+    const std::string name = MakeCopy(*Memory(20, 10, 1, GDT_Byte));
+    for (const char* const ending : {".aux.xml", ".msk", ".ovr"}) {
+        const std::string pipe = name + ending;
+        fs::remove(pipe);
+        ASSERT_EQ(mkfifo(pipe.c_str(), 0600), 0);
+        alarm(60);
+        CPLPushErrorHandler(CPLQuietErrorHandler);
+        for (const int flags : {GDAL_OF_READONLY, GDAL_OF_UPDATE}) {
+            const DatasetPtr dataset = Open(name, static_cast<unsigned>(flags));
+            ASSERT_TRUE(dataset) << ending;
+            EXPECT_NE(std::string(CPLGetLastErrorMsg()).find("is no regular file"),
+                      std::string::npos);
+            EXPECT_EQ(dataset->GetRasterBand(1)->GetMaskFlags(), GMF_ALL_VALID);
+            unsigned char pixel = 0;
+            EXPECT_EQ(dataset->GetRasterBand(1)->RasterIO(GF_Read, 0, 0, 1, 1, &pixel, 1, 1,
+                                                          GDT_Byte, 0, 0, nullptr),
+                      CE_None);
+        }
+        CPLPopErrorHandler();
+        alarm(0);
+        fs::remove(pipe);
+    }
 }
 
 class LenientHeaders : public DriverTest,
