@@ -166,6 +166,8 @@ zmchost::Raster OpenPyramid(const std::string& name) {
 }
 
 std::unique_ptr<RasterView> OpenView(const std::string& name) {
+    // Loaded before the file is looked at, so that little time is left for others to replace it.
+    static_cast<void>(zmcgdal::SharedModule());
     if (IsPyramidFile(name)) return std::make_unique<PyramidView>(name);
     return std::make_unique<GdalView>(name);
 }

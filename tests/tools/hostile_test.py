@@ -155,11 +155,11 @@ class Limits(ToolTest):
         self.pyramid("made.pyr")
         with open(self.path("made.pyr"), "rb") as file:
             old = file.read()
-        self.picture("large.tif", 1500, 1500, 3)
+        self.picture("large.tif", 2600, 2600, 3)
         for target, status in (("made.pyr", 1), ("new.pyr", 1)):
             done = self.run_tool(
                 "build", "large.tif", target, "--overwrite",
-                preexec_fn=lambda: resource.setrlimit(resource.RLIMIT_FSIZE, (1 << 20, 1 << 20)))
+                preexec_fn=lambda: resource.setrlimit(resource.RLIMIT_FSIZE, (12 << 20, 12 << 20)))
             self.assertEqual((done.returncode, done.stdout), (status, ""), done)
             self.assertRegex(done.stderr, rf"^zmcraster: {target}: [^\n]*File too large[^\n]*\n$")
             self.assertEqual(self.files(), ["large.tif", "made.pyr", "picture.tif"])
@@ -366,7 +366,7 @@ class Moments(ToolTest):
             with open(self.path("next"), "wb") as file:
                 file.write(parts[turn])
             os.rename(self.path("next"), self.path(name))
-            time.sleep(0.02)
+            time.sleep(0.1)
         change(0)
         return change
 
