@@ -1,5 +1,5 @@
 // What the file system offers beyond the transfers of platform/File.h: names, folders, replacing a
-// file in one step, space, and what is needed to tell a dead process's leavings.
+// file in one step, space, and whose a file is.
 //
 // Paths are narrow UTF-8. An operation that fails says so by its result, and LastErrorText gives
 // the system's reason to the thread that called it, until its next call. Operations do not throw.
