@@ -83,6 +83,7 @@ set(ZMC_PUBLIC_HEADERS
     # Members of what is above.
     platform/CriticalSection.h
     platform/FileLock.h
+    platform/FileSystem.h
     platform/LoadableLibrary.h
     platform/Mutex.h)
 

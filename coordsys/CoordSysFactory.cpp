@@ -14,7 +14,7 @@ constexpr std::uint32_t kLevel = CoordSysLog::kErrorLevel;
 
 String ReadDirectory(const Environment& environment, const String& key) {
     String directory = environment.GetSetting(key);
-    if (directory.IsEmpty()) directory = "Not Set";
+    if (directory.IsEmpty()) directory = EnvironmentKeys::kNotSet;
     return directory;
 }
 

@@ -2,6 +2,7 @@
 
 #include "coordsys/CoordSysLog.h"
 #include "coordsys/CoordSysMutex.h"
+#include "coordsys/EnvironmentKeys.h"
 #include "platform/Directory.h"
 #include "zmcg/zmcg.h"
 
@@ -35,7 +36,8 @@ String CoordSysFuncPtrs::EngineFileName() {
 
 int CoordSysFuncPtrs::LoadFuncPtrs(const String& binDirectory) {
     const String path = binDirectory + platform::kPathSeparator + EngineFileName();
-    if (path.length == 0 || !platform::PathExists(path.GetAnsi())) {
+    const bool isSet = binDirectory != EnvironmentKeys::kNotSet;
+    if (!isSet || path.length == 0 || !platform::PathExists(path.GetAnsi())) {
         CoordSysLog::LogMessage(kLevel, u"CoordSysFuncPtrs::LoadFuncPtrs - error invalid path.");
         return 0;
     }

@@ -8,6 +8,7 @@
 #include <new>
 
 #include "coordsys/CoordSysLogNotes.h"
+#include "coordsys/EnvironmentKeys.h"
 #include "platform/DebugOutput.h"
 #include "platform/Directory.h"
 #include "platform/LocalTime.h"
@@ -77,6 +78,7 @@ CoordSysLog* CoordSysLog::CreateInstance(const String& directory) {
 }
 
 bool CoordSysLog::Start() {
+    if (peDirectory == EnvironmentKeys::kNotSet) return false;
     if (!platform::PathExists(peDirectory.GetAnsi())) return false;
     const platform::MutexHolder lock(writing);
     Init();

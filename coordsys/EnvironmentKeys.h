@@ -16,6 +16,10 @@ inline const String kGdalDirectory("ZELM::Environment::GdalDirectory");
 inline const String kMdfDirectory("ZELM::Environment::MdfDirectory");  // not read here
 inline const String kWorkingDirectory("ZELM::WorkingDirectory");       // not read here
 
+// What stands for a directory without a setting. It is no path: a folder of that name below the
+// working directory, which belongs to whoever started the process, is nothing of ours.
+inline const String kNotSet("Not Set");
+
 }  // namespace zelm::EnvironmentKeys
 
 #endif

@@ -8,8 +8,10 @@
 #include "gdal/Band.h"
 #include "gdal/Create.h"
 #include "gdal/LevelRefresh.h"
+#include "gdal/SidecarStage.h"
 #include "gdal/VsiSource.h"
 #include "host/raster/LentFile.h"
+#include "platform/FileSystem.h"
 
 namespace zmcgdal {
 namespace {
@@ -34,6 +36,20 @@ zmchost::PyramidFileInfo CheckedInfo(const std::string& fileName,
     if (tilePixels * zelm::PixelSize(header.pixelType) > kMaxTileBytes / bands)
         refuse("its tiles are too large");
     return info;
+}
+
+// What is neither a file nor a folder where GDAL looks for companions of a file: to open a pipe is
+// to wait for its other end.
+bool HasPipesBeside(const std::string& base) {
+    for (const char* const ending : {".aux.xml", ".msk", ".ovr"}) {
+        const platform::FileStatus status = platform::StatusOf(base + ending);
+        if (!status.exists || status.isRegular || status.isFolder) continue;
+        CPLError(CE_Warning, CPLE_AppDefined,
+                 "%s%s is no regular file; what stands beside the raster is not looked at",
+                 base.c_str(), ending);
+        return true;
+    }
+    return false;
 }
 
 }  // namespace
@@ -110,10 +126,23 @@ void Dataset::DescribeFile() {
 
 void Dataset::BeginCreation(std::unique_ptr<Creation> state) { creation = std::move(state); }
 
+// Nor is anything written there.
+void Dataset::IgnoreCompanions() { nPamFlags |= GPF_DISABLED; }
+
 void Dataset::LoadSidecar(const char* fileName, char** siblings) {
     SetDescription(fileName);
-    TryLoadXML(siblings);
-    oOvManager.Initialize(this, fileName, siblings);
+    std::string base = fileName;
+    if (!IsVirtualName(base)) {
+        if (eAccess == GA_Update) SettleSidecar(base, *file->source, file->info.header);
+        base = SidecarBase(base, *file->source, file->info.header);
+    }
+    if (HasPipesBeside(base)) return IgnoreCompanions();
+    const bool staged = base != fileName;
+    if (staged) SetPhysicalFilename(base.c_str());
+    TryLoadXML(staged ? nullptr : siblings);
+    oOvManager.Initialize(this, base.c_str(), staged ? nullptr : siblings);
+    // Without this GDAL looks for a mask beside the usual name, when it is asked for one.
+    if (staged) oOvManager.HaveMaskFile(nullptr, base.c_str());
 }
 
 bool Dataset::ReadsDirectly(int x, int y, int width, int height) const {

@@ -51,7 +51,8 @@ public:
     // From fine to coarse; made when first asked for.
     const std::vector<std::unique_ptr<Dataset>>& Overviews();
 
-    // Reads the sidecar, and looks for other companions.
+    // Reads the sidecar, and looks for other companions, of a file of that name. Those that are
+    // staged for it (SidecarStage.h) are given their names first if it is open for update.
     void LoadSidecar(const char* fileName, char** siblings);
 
     // True if pixels of this window are better read past GDAL's block cache: it is not a sliver of
@@ -85,6 +86,7 @@ private:
     Dataset(std::shared_ptr<OpenFile> openFile, std::uint32_t levelShown, GDALAccess access,
             Dataset* mainDataset);
     void AddBands();
+    void IgnoreCompanions();
     void AddOverviews();
     void DescribeFile();
     CPLStringList* OwnDomain(const char* domain);

@@ -42,17 +42,20 @@ void WarnIfIncomplete(const Dataset& dataset, const zmchost::PyramidFileInfo& in
 
 // What a store that was cut off has left: statistics that GDAL stores into it now would be lost
 // when somebody else puts the old ones back.
-void PutInOrder(const std::string& name) {
-    const zmchost::Recovery recovery = zmchost::RecoverMetadata(name);
+// Who opens for reading writes nothing.
+void PutInOrder(const std::string& name, GDALAccess access) {
+    const zmchost::Recovery recovery =
+        access == GA_Update ? zmchost::RecoverMetadata(name) : zmchost::LookForCopy(name);
     using Outcome = zmchost::Recovery::Outcome;
-    if (recovery.outcome == Outcome::Restored || recovery.outcome == Outcome::Complete)
+    if (recovery.outcome == Outcome::Restored || recovery.outcome == Outcome::Complete ||
+        recovery.outcome == Outcome::Pending)
         CPLError(CE_Warning, CPLE_AppDefined, "%s: %s", name.c_str(), recovery.text.c_str());
     else if (!recovery.text.empty())
         CPLDebug(kName, "%s: %s", name.c_str(), recovery.text.c_str());
 }
 
 std::unique_ptr<Dataset> OpenDataset(GDALOpenInfo* info) {
-    if (!IsVirtualName(info->pszFilename)) PutInOrder(info->pszFilename);
+    if (!IsVirtualName(info->pszFilename)) PutInOrder(info->pszFilename, info->eAccess);
     auto file = std::make_shared<OpenFile>(info->pszFilename, info->eAccess,
                                            OpenOptionsFrom(info->papszOpenOptions));
     const zmchost::PyramidFileInfo layout = file->info;

@@ -1,5 +1,5 @@
 // What the file system offers beyond the transfers of platform/File.h: names, folders, replacing a
-// file in one step, space, and what is needed to tell a dead process's leavings.
+// file in one step, space, and whose a file is.
 //
 // Paths are narrow UTF-8. An operation that fails says so by its result, and LastErrorText gives
 // the system's reason to the thread that called it, until its next call. Operations do not throw.
@@ -24,6 +24,7 @@ struct FileStatus {
     std::uint64_t size = 0;  // bytes, of a regular file
     // What tells the file from all others of its file system while it exists, whatever its name.
     std::uint64_t number = 0;
+    std::uint64_t owner = 0;  // the number of the user to whom it belongs; 0 is the superuser
 };
 
 std::string LastErrorText();
@@ -31,6 +32,11 @@ std::string LastErrorText();
 std::string ErrorText(int error);
 
 FileStatus StatusOf(const std::string& path) noexcept;
+
+// Whether what one file says of another counts. Anyone who may write a folder can put a note beside
+// somebody's file: it counts if it belongs to the owner of the file, to the superuser or to the
+// user of this process.
+bool MaySpeakFor(const FileStatus& note, const FileStatus& file) noexcept;
 
 // The folder of a path ("." for a bare name), its last part, and the two put together.
 std::string FolderOf(const std::string& path);
@@ -50,6 +56,8 @@ bool CreateNewFile(const std::string& path) noexcept;
 bool RenameFile(const std::string& from, const std::string& to) noexcept;
 // The same, and fails if anything bears that name.
 bool RenameToNewName(const std::string& from, const std::string& to) noexcept;
+// Gives a file one more name; fails if anything bears it, or the file system has no such thing.
+bool LinkFile(const std::string& file, const std::string& name) noexcept;
 bool RemoveEntry(const std::string& path) noexcept;
 
 // Waits until a file's bytes, or a folder's names, have reached the disk.
@@ -69,7 +77,6 @@ bool ReleaseReserve(const std::string& path) noexcept;
 std::string SystemRun();
 
 std::uint64_t CurrentProcess() noexcept;
-bool ProcessAlive(std::uint64_t process) noexcept;
 // A number that another call, in this process or another, does not give.
 std::uint64_t RandomNumber() noexcept;
 

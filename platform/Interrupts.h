@@ -8,7 +8,8 @@
 namespace platform {
 
 // From now on an interruption sets the mark; a second one of the same kind ends the process at
-// once. What the process was started to ignore stays ignored.
+// once. What the process was started to ignore stays ignored. A file that grows beyond what the
+// process may write fails the write, and does not end the process.
 void CatchInterrupts();
 
 // Any thread may ask.

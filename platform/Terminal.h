@@ -9,6 +9,12 @@ namespace platform {
 
 enum class StandardStream { Output, Errors };
 
+// Takes the numbers of the standard streams that the process was started without, so that no file
+// that any library opens gets one, and has messages written into it. What is read from them or
+// written to them fails as before. False if that cannot be done. At the start of a program, which a
+// library has no business in.
+bool HoldStandardStreams();
+
 bool IsTerminal(StandardStream stream);
 
 // Columns of the terminal that the stream goes to; `otherwise` if it goes elsewhere or the terminal

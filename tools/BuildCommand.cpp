@@ -9,6 +9,7 @@
 #include "gdal/Dataset.h"
 #include "gdal/GdalRasterSource.h"
 #include "gdal/Sidecar.h"
+#include "gdal/SidecarStage.h"
 #include "host/build/PyramidBuilder.h"
 #include "host/raster/NoData.h"
 #include "tools/Arguments.h"
@@ -22,8 +23,6 @@ namespace zmctools {
 namespace {
 
 namespace fs = std::filesystem;
-
-constexpr const char* kSidecarEndings[] = {".aux.xml", ".msk"};
 
 class BuildCommand final : public Command {
 public:
@@ -48,9 +47,10 @@ private:
 
     zmchost::BuildOptions Options(const zelm::RasterProps& props) const;
     void CheckTarget() const;
-    zmchost::BuildReport Build(zmcgdal::GdalRasterSource& pixels,
+    zmchost::BuildReport Build(GDALDataset& dataset, zmcgdal::GdalRasterSource& pixels,
                                zmchost::BuildOptions options) const;
-    void KeepSidecar(GDALDataset& dataset, const zmchost::BuildOptions& options) const;
+    void WriteSidecar(GDALDataset& dataset, const zmchost::BuildOptions& options,
+                      const std::string& built, const std::string& base) const;
     void Report(const zmchost::BuildReport& report, std::uint32_t pixelType) const;
 };
 
@@ -156,14 +156,23 @@ void BuildCommand::CheckTarget() const {
     if (!overwrite) throw Failure(target, "the file exists already; --overwrite replaces it");
 }
 
-zmchost::BuildReport BuildCommand::Build(zmcgdal::GdalRasterSource& pixels,
+// What belongs beside the new file is there before it has its name.
+zmchost::BuildReport BuildCommand::Build(GDALDataset& dataset, zmcgdal::GdalRasterSource& pixels,
                                          zmchost::BuildOptions options) const {
     TerminalProgress bar(fs::path(target).filename().string(), !quiet);
     options.progress = [&](const zmchost::BuildProgress& state) {
         return bar.Show(state.done, state.total);
     };
+    zmcgdal::SidecarStage stage(target);
+    options.beforeNaming = [&](const std::string& built) {
+        WriteSidecar(dataset, options, built, stage.Begin(built));
+        stage.Complete();
+    };
     try {
-        return zmchost::PyramidBuilder(zmcgdal::SharedModule()).Build(pixels, target, options);
+        const zmchost::BuildReport report =
+            zmchost::PyramidBuilder(zmcgdal::SharedModule()).Build(pixels, target, options);
+        stage.Settle();
+        return report;
     } catch (const zmchost::Cancelled&) {
         throw Interruption(target);
     }
@@ -184,9 +193,8 @@ std::vector<std::string> TranslateArguments(const zmchost::BuildOptions& options
 }
 
 // A virtual raster selects the bands; only its metadata are looked at.
-void BuildCommand::KeepSidecar(GDALDataset& dataset, const zmchost::BuildOptions& options) const {
-    std::error_code ignored;
-    for (const char* const ending : kSidecarEndings) fs::remove(target + ending, ignored);
+void BuildCommand::WriteSidecar(GDALDataset& dataset, const zmchost::BuildOptions& options,
+                                const std::string& built, const std::string& base) const {
     CPLStringList list;
     for (const std::string& word : TranslateArguments(options, noData))
         list.AddString(word.c_str());
@@ -194,16 +202,15 @@ void BuildCommand::KeepSidecar(GDALDataset& dataset, const zmchost::BuildOptions
         GDALTranslateOptionsNew(list.List(), nullptr), &GDALTranslateOptionsFree);
     const DatasetPtr selected(GDALDataset::FromHandle(
         GDALTranslate("", GDALDataset::ToHandle(&dataset), translate.get(), nullptr)));
-    const char* const drivers[] = {"ZMCPyramid", nullptr};
-    DatasetPtr pyramid(GDALDataset::Open(target.c_str(), GDAL_OF_RASTER | GDAL_OF_UPDATE, drivers));
-    bool kept =
-        selected && pyramid &&
-        zmcgdal::CopySidecar(*selected, static_cast<zmcgdal::Dataset&>(*pyramid), true) == CE_None;
+    auto pyramid = zmcgdal::Dataset::FromFile(
+        std::make_shared<zmcgdal::OpenFile>(built, GA_Update, zmcgdal::OpenOptions{}), GA_Update);
+    pyramid->LoadSidecar(base.c_str(), nullptr);
+    bool kept = selected && zmcgdal::CopySidecar(*selected, *pyramid, true) == CE_None;
     pyramid.reset();
     const std::string reason = TakeGdalError(target);
     kept = kept && reason.empty();
     if (!kept)
-        throw Failure(target, "the pyramid is built, but its metadata cannot be kept in " + target +
+        throw Failure(target, "its metadata cannot be kept in " + Visible(target) +
                                   ".aux.xml: " + (reason.empty() ? "no reason given" : reason));
 }
 
@@ -226,8 +233,8 @@ void BuildCommand::Report(const zmchost::BuildReport& report, std::uint32_t pixe
         std::printf(
             "%s: %u x %u pixels, %u band%s of %s, levels 0 to %u by %s, %llu bytes, %.2f s "
             "(%.1f Mpixel/s)\n",
-            target.c_str(), report.width, report.height, report.bands, report.bands == 1 ? "" : "s",
-            zelm::PixelTypeName(pixelType), report.maxLevel,
+            Visible(target).c_str(), report.width, report.height, report.bands,
+            report.bands == 1 ? "" : "s", zelm::PixelTypeName(pixelType), report.maxLevel,
             zmchost::ResamplingName(report.resampling),
             static_cast<unsigned long long>(report.fileSize), report.seconds,
             report.seconds > 0 ? pixels / report.seconds / 1e6 : 0.0);
@@ -242,9 +249,8 @@ ExitStatus BuildCommand::Run() {
     CheckTarget();
     CheckInterrupt(target);
     for (const std::string& loss : pixels.Losses())
-        Warn(source + ": warning: a pyramid does not keep " + loss);
-    const zmchost::BuildReport report = Build(pixels, options);
-    KeepSidecar(*dataset, options);
+        Warn(Visible(source) + ": warning: a pyramid does not keep " + loss);
+    const zmchost::BuildReport report = Build(*dataset, pixels, options);
     Report(report, props.pixelType);
     return ExitStatus::Done;
 }

@@ -93,7 +93,8 @@ ExitStatus CompareCommand::Report(const std::vector<std::string>& shape,
                        {"bands", bands}});
     } else {
         for (const std::string& line : shape) std::printf("%s\n", line.c_str());
-        if (equal && !quiet) std::printf("%s and %s are equal\n", first.c_str(), second.c_str());
+        if (equal && !quiet)
+            std::printf("%s and %s are equal\n", Visible(first).c_str(), Visible(second).c_str());
     }
     return equal ? ExitStatus::Done : ExitStatus::Differences;
 }
@@ -106,6 +107,8 @@ ExitStatus CompareCommand::Run() {
     std::vector<std::string> shape = ShapeDifferences(*a, *b);
     SampleDifferences samples(a->PixelType(), b->PixelType(), a->Bands(), allowed);
     if (shape.empty()) CompareSamples(*a, *b, quiet, samples);
+    a->CheckUnchanged();
+    b->CheckUnchanged();
     return Report(shape, samples);
 }
 

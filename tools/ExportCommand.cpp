@@ -146,6 +146,7 @@ ExitStatus ExportCommand::Run() {
     std::error_code ignored;
     if (fs::is_directory(target, ignored))
         throw Failure(target, "it is a folder; name a file in it");
+    CheckIsNoDevice(target);
     if (fs::exists(target, ignored) && fs::equivalent(file, target, ignored))
         throw Failure(target, "it is the pyramid itself; name another file");
     Translate(*dataset, arguments);
@@ -156,8 +157,8 @@ ExitStatus ExportCommand::Run() {
                        {"level", wanted},
                        {"window", {area.x, area.y, area.width, area.height}}});
     else if (!quiet)
-        std::printf("%s: level %u of %s, %u x %u pixels from %u,%u\n", target.c_str(), wanted,
-                    file.c_str(), area.width, area.height, area.x, area.y);
+        std::printf("%s: level %u of %s, %u x %u pixels from %u,%u\n", Visible(target).c_str(),
+                    wanted, Visible(file).c_str(), area.width, area.height, area.x, area.y);
     return ExitStatus::Done;
 }
 

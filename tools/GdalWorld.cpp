@@ -8,7 +8,9 @@
 
 #include "gdal/Driver.h"
 #include "host/base/Xerces.h"
+#include "platform/FileSystem.h"
 #include "tools/Message.h"
+#include "tools/RegularFiles.h"
 
 namespace zmctools {
 namespace {
@@ -27,7 +29,8 @@ std::string WithoutPrefix(const std::string& text, const std::string& prefix) {
 // GDAL works on threads of its own too, so there is one place for all of them.
 void CPL_STDCALL TakeError(CPLErr kind, CPLErrorNum, const char* text) {
     const std::lock_guard lock(mutex);
-    if (kind == CE_Warning) Warn(subject + ": warning: " + WithoutPrefix(text, subject + ": "));
+    if (kind == CE_Warning)
+        Warn(Visible(subject) + ": warning: " + WithoutPrefix(text, subject + ": "));
     if (kind < CE_Failure) return;
     if (firstError.empty()) firstError = text;
 }
@@ -39,6 +42,7 @@ void StartGdal() {
     CPLSetErrorHandler(&TakeError);
     GDALRegister_ZMCPyramid();
     GDALAllRegister();
+    OpenRegularFilesOnly();
     if (!CPLGetConfigOption("GDAL_CACHEMAX", nullptr)) GDALSetCacheMax64(kBlockCache);
     if (GDALDriver* const memory = GetGDALDriverManager()->GetDriverByName("MEM")) {
         memory->pfnOpen = nullptr;
@@ -61,6 +65,9 @@ std::string TakeGdalError(const std::string& file) {
 DatasetPtr OpenDataset(const std::string& name, const std::vector<std::string>& options) {
     CPLStringList list;
     for (const std::string& option : options) list.AddString(option.c_str());
+    if (const platform::FileStatus status = platform::StatusOf(name);
+        status.exists && !status.isRegular && !status.isFolder)
+        throw Failure(name, "it is not a regular file");
     TakeGdalError(name);
     SetSubject(name);
     DatasetPtr dataset(GDALDataset::Open(name.c_str(), GDAL_OF_RASTER | GDAL_OF_VERBOSE_ERROR,

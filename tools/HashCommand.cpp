@@ -59,6 +59,7 @@ ExitStatus HashCommand::Run() {
             bytes += samples.size();
         });
     }
+    view->CheckUnchanged();
     const std::string digest = sha.Finish();
     if (json) {
         Json numbers = Json::array();
@@ -73,7 +74,7 @@ ExitStatus HashCommand::Run() {
                        {"bytes", JsonNumber(bytes)},
                        {"sha256", digest}});
     } else {
-        std::printf("%s  %s\n", digest.c_str(), file.c_str());
+        std::printf("%s  %s\n", digest.c_str(), Visible(file).c_str());
     }
     return ExitStatus::Done;
 }

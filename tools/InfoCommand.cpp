@@ -219,7 +219,7 @@ void PrintPalettes(const Json& document) {
 }
 
 void Print(const Json& document) {
-    std::printf("%s\n", Text(document["file"]).c_str());
+    std::printf("%s\n", Visible(Text(document["file"])).c_str());
     std::printf("%s x %s pixels, %s band%s of %s\n", Text(document["width"]).c_str(),
                 Text(document["height"]).c_str(), Text(document["bands"]).c_str(),
                 document["bands"] == 1 ? "" : "s", Text(document["pixelType"]).c_str());

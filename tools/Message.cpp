@@ -1,8 +1,11 @@
 #include "tools/Message.h"
 
 #include <atomic>
+#include <mutex>
+#include <set>
 
 #include "platform/Terminal.h"
+#include "tools/Visible.h"
 
 namespace zmctools {
 namespace {
@@ -11,6 +14,7 @@ std::atomic<bool> isQuiet{false};
 
 }  // namespace
 
+// Libraries tell some things on several lines; names are visible already where we made the text.
 void Say(const std::string& text) {
     std::string line = "zmcraster: ";
     for (const char c : text)
@@ -19,12 +23,16 @@ void Say(const std::string& text) {
         else if (line.back() != ' ')
             line += ' ';
     while (line.back() == ' ') line.pop_back();
-    line += '\n';
-    platform::WriteAtOnce(platform::StandardStream::Errors, line);
+    platform::WriteAtOnce(platform::StandardStream::Errors, Visible(line) + '\n');
 }
 
+// What several readers of one file find is said once.
 void Warn(const std::string& text) {
-    if (!isQuiet) Say(text);
+    static std::mutex mutex;
+    static std::set<std::string> said;
+    if (isQuiet) return;
+    const std::lock_guard lock(mutex);
+    if (said.insert(text).second) Say(text);
 }
 
 void SetQuiet(bool quiet) { isQuiet = quiet; }

@@ -8,6 +8,8 @@
 #include <stdexcept>
 #include <string>
 
+#include "tools/Visible.h"
+
 namespace zmctools {
 
 enum class ExitStatus { Done = 0, Failed = 1, Usage = 2, Differences = 3, Interrupted = 130 };
@@ -16,7 +18,7 @@ enum class ExitStatus { Done = 0, Failed = 1, Usage = 2, Differences = 3, Interr
 class Failure : public std::runtime_error {
 public:
     Failure(const std::string& file, const std::string& what)
-        : std::runtime_error(file + ": " + what) {}
+        : std::runtime_error(Visible(file) + ": " + what) {}
 };
 
 // The command line asks for something that does not exist.
@@ -24,19 +26,21 @@ class UsageError : public std::runtime_error {
 public:
     // `option` is the option or argument as it was written.
     UsageError(const std::string& option, const std::string& what)
-        : std::runtime_error(option + ": " + what) {}
+        : std::runtime_error(Visible(option) + ": " + what) {}
 };
 
 // Somebody asked for an end while the command worked on `file`.
 class Interruption : public std::runtime_error {
 public:
-    explicit Interruption(const std::string& file) : std::runtime_error(file + ": interrupted") {}
+    explicit Interruption(const std::string& file)
+        : std::runtime_error(Visible(file) + ": interrupted") {}
 };
 
-// Writes a message, on one line whatever `text` holds.
+// Writes a message, on one line and with nothing that steers a terminal, whatever `text` holds.
 void Say(const std::string& text);
 
-// The same for what does not keep a command from going on; silent after SetQuiet(true).
+// The same for what does not keep a command from going on, each text once; silent after
+// SetQuiet(true). Any thread may call.
 void Warn(const std::string& text);
 void SetQuiet(bool quiet);
 

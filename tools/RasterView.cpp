@@ -1,15 +1,19 @@
 #include "tools/RasterView.h"
 
+#include <cpl_string.h>
+
 #include <algorithm>
-#include <filesystem>
-#include <fstream>
-#include <set>
+#include <chrono>
+#include <thread>
+#include <utility>
 
 #include "core/PixelVocabulary.h"
 #include "format/PyramidHeaderRecord.h"
 #include "gdal/Dataset.h"
 #include "gdal/GdalRasterSource.h"
 #include "host/journal/MetadataJournal.h"
+#include "platform/File.h"
+#include "platform/FileSystem.h"
 #include "tools/GdalWorld.h"
 #include "tools/Interrupt.h"
 #include "tools/Message.h"
@@ -21,9 +25,40 @@ constexpr std::uint64_t kStripBudget = std::uint64_t{32} << 20;
 // Of the files that builds write; those of others are read as well, if slower.
 constexpr std::uint32_t kTileRows = zelm::kWrittenTileSize;
 
+using zelm::files::Identity;
+
+Identity IdentityOf(const std::string& name) {
+    platform::FileIdentity found;
+    const zelm::String wide(name.c_str());
+    if (!wide.wide || !platform::TellIdentity(wide.wide, found)) return {};
+    return {true, found.device, found.number, found.size, found.modified, found.changed};
+}
+
+// Two writes within a tick of the file system's clock look like one: a file that was written a
+// moment ago is given the time for the next write to show. Some ticks of the slowest clocks.
+Identity IdentityAtRest(const std::string& name) {
+    using std::chrono::nanoseconds;
+    constexpr nanoseconds kRest = std::chrono::milliseconds(20);
+    constexpr int kTries = 100;
+    Identity now = IdentityOf(name);
+    for (int i = 0; i < kTries && now.known; ++i) {
+        const nanoseconds age =
+            std::chrono::system_clock::now().time_since_epoch() - nanoseconds(now.modified);
+        if (age >= kRest || age < -kRest) break;
+        std::this_thread::sleep_for(kRest);
+        now = IdentityOf(name);
+    }
+    return now;
+}
+
+[[noreturn]] void FailAsChanged(const std::string& name, const std::string& change) {
+    throw Failure(name, "it changed while it was read: " + change);
+}
+
 class PyramidView final : public RasterView {
 public:
-    explicit PyramidView(const std::string& name) : raster(OpenPyramid(name)) {}
+    explicit PyramidView(const std::string& name)
+        : before(IdentityAtRest(name)), raster(OpenPyramid(name)) {}
     std::string Name() const override { return raster.Name(); }
     std::uint32_t PixelType() const override { return raster.PixelType(); }
     std::uint32_t Bands() const override { return raster.Bands(); }
@@ -35,14 +70,26 @@ public:
               std::span<const std::uint32_t> bands, void* pixels) override {
         raster.Read(level, window, bands, pixels);
     }
+    void CheckUnchanged() const override {
+        if (before.known && !raster.OpenedAs().SameContent(before))
+            FailAsChanged(Name(), "it was replaced or written to");
+        if (const std::string change = raster.ContentChange(); !change.empty())
+            FailAsChanged(Name(), change);
+    }
 
 private:
+    Identity before;
     zmchost::Raster raster;
 };
 
 class GdalView final : public RasterView {
 public:
-    explicit GdalView(const std::string& name) : dataset(OpenDataset(name)), source(*dataset) {}
+    explicit GdalView(const std::string& name)
+        : before(IdentityAtRest(name)), dataset(OpenDataset(name)), source(*dataset) {
+        const CPLStringList list(dataset->GetFileList());
+        for (int i = 0; i < list.Count(); ++i) files.emplace_back(list[i], IdentityOf(list[i]));
+        files.emplace_back(name, before);
+    }
     std::string Name() const override { return source.Name(); }
     std::uint32_t PixelType() const override { return props.pixelType; }
     std::uint32_t Bands() const override { return props.bands; }
@@ -54,17 +101,22 @@ public:
               void* pixels) override {
         source.Read(window, bands, pixels);
     }
+    void CheckUnchanged() const override {
+        for (const auto& [name, identity] : files)
+            if (IdentityOf(name) != identity)
+                FailAsChanged(Name(), Visible(name) + " was replaced or written to");
+    }
 
 private:
+    Identity before;
     DatasetPtr dataset;
     zmcgdal::GdalRasterSource source;
     zelm::RasterProps props = source.Props();
+    std::vector<std::pair<std::string, Identity>> files;
 };
 
-// Once for each file: a copy that cannot be used is found again by whoever looks next.
 void TellRecovery(const std::string& name, const std::string& text) {
-    static std::set<std::string> told;
-    if (!text.empty() && told.insert(name).second) Warn(name + ": warning: " + text);
+    if (!text.empty()) Warn(Visible(name) + ": warning: " + text);
 }
 
 std::uint64_t LineBytes(const RasterView& view, const Selection& selection) {
@@ -82,31 +134,42 @@ void RasterView::CheckLevel(std::uint32_t level) const {
 }
 
 bool IsPyramidFile(const std::string& name) {
-    std::ifstream file(name, std::ios::binary);
+    const zelm::String wide(name.c_str());
+    const auto file =
+        wide.wide ? platform::File::Open(wide.wide, platform::File::Mode::Read) : nullptr;
     char start[64];
-    file.read(start, sizeof start);
-    return zmchost::LooksLikePyramid({start, static_cast<std::size_t>(file.gcount())});
+    return file && zmchost::LooksLikePyramid({start, file->ReadAt(0, start, sizeof start)});
+}
+
+void CheckIsNoDevice(const std::string& name) {
+    const platform::FileStatus status = platform::StatusOf(name);
+    if (status.exists && !status.isRegular && !status.isFolder)
+        throw Failure(name, "it is not a regular file");
 }
 
 void CheckIsFile(const std::string& name) {
-    std::error_code ignored;
-    if (!std::filesystem::exists(name, ignored)) throw Failure(name, "there is no such file");
-    if (std::filesystem::is_directory(name, ignored)) throw Failure(name, "it is a folder");
+    const platform::FileStatus status = platform::StatusOf(name);
+    if (!status.exists) throw Failure(name, "there is no such file");
+    if (status.isFolder) throw Failure(name, "it is a folder");
+    CheckIsNoDevice(name);
 }
 
 zmchost::PyramidFileInfo ReadLayout(const std::string& name) {
     CheckIsFile(name);
-    TellRecovery(name, zmchost::RecoverMetadata(name).text);
+    TellRecovery(name, zmchost::LookForCopy(name).text);
     return zmchost::ReadPyramidFileInfo(name);
 }
 
 zmchost::Raster OpenPyramid(const std::string& name) {
-    zmchost::Raster raster = zmchost::Raster::Open(zmcgdal::SharedModule(), name);
+    zmchost::Raster raster =
+        zmchost::Raster::Open(zmcgdal::SharedModule(), name, zmchost::Access::Read);
     TellRecovery(name, raster.RecoveryNote());
     return raster;
 }
 
 std::unique_ptr<RasterView> OpenView(const std::string& name) {
+    // Loaded before the file is looked at, so that little time is left for others to replace it.
+    static_cast<void>(zmcgdal::SharedModule());
     if (IsPyramidFile(name)) return std::make_unique<PyramidView>(name);
     return std::make_unique<GdalView>(name);
 }

@@ -32,19 +32,26 @@ public:
     virtual std::uint32_t Height(std::uint32_t level) const = 0;
     virtual void Read(std::uint32_t level, const zmchost::Window& window,
                       std::span<const std::uint32_t> bands, void* pixels) = 0;
+    // Throws Failure if what was read since opening may not be of one file in one state: of a
+    // pyramid, if it was written to; of others, which are looked up by name, if they or a file of
+    // theirs were replaced as well. A file that takes the name of an open pyramid is not met.
+    virtual void CheckUnchanged() const = 0;
 
     // Throws UsageError for a level that there is not.
     void CheckLevel(std::uint32_t level) const;
 };
 
-// True if the file of that name begins like a pyramid.
+// True if there is a regular file of that name that begins like a pyramid.
 bool IsPyramidFile(const std::string& name);
 
-// Throws Failure if there is no file of that name.
+// Throws Failure if there is no regular file of that name: opening a pipe would wait for its other
+// end, and a device may do anything.
 void CheckIsFile(const std::string& name);
+// Throws Failure if the name is that of something else than a file or a folder.
+void CheckIsNoDevice(const std::string& name);
 
-// The layout of a pyramid file, once statistics whose store was cut off are put in order. Throws
-// Failure, or what its reader throws.
+// The layout of a pyramid file, with a warning of a store into it that was cut off. Throws Failure,
+// or what its reader throws.
 zmchost::PyramidFileInfo ReadLayout(const std::string& name);
 
 // Opens a pyramid file, any other raster, or whichever of both the name tells.

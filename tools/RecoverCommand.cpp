@@ -41,14 +41,14 @@ void RecoverCommand::Describe(OptionTable& table) {
         "A host may keep a copy of the metadata document in FILE.zmcmeta while it stores into it. "
         "A\n"
         "copy that is left over is put back, or removed where the store is whole. Pixels are not\n"
-        "touched. Other commands do the same when they open FILE, where they may write it.");
+        "touched. Other commands write nothing into FILE; they warn of a copy that is left over.");
 }
 
 void RecoverCommand::Report(const char* result, const std::string& text) const {
     if (json)
         PrintDocument({{"schema", kSchema}, {"file", file}, {"result", result}, {"text", text}});
     else if (!quiet)
-        std::printf("%s: %s\n", file.c_str(), text.c_str());
+        std::printf("%s: %s\n", Visible(file).c_str(), Visible(text).c_str());
 }
 
 void RecoverCommand::Recover() const {
@@ -65,6 +65,7 @@ void RecoverCommand::Recover() const {
         case Outcome::Failed:
             throw Failure(file, recovery.text);
         case Outcome::Nothing:
+        case Outcome::Pending:
             break;
     }
     const std::string wrong = zmchost::JudgeMetadata(file, zmchost::PyramidHeader::Read(file));

@@ -6,6 +6,7 @@
 
 #include "platform/Interrupts.h"
 #include "platform/Terminal.h"
+#include "tools/Visible.h"
 
 namespace zmctools {
 namespace {
@@ -25,8 +26,8 @@ std::string Clock(double seconds) {
 
 }  // namespace
 
-TerminalProgress::TerminalProgress(std::string labelText, bool wanted)
-    : label(std::move(labelText)), enabled(wanted && platform::IsTerminal(kStream)) {}
+TerminalProgress::TerminalProgress(const std::string& labelText, bool wanted)
+    : label(Shortened(Visible(labelText), 30)), enabled(wanted && platform::IsTerminal(kStream)) {}
 
 TerminalProgress::~TerminalProgress() {
     if (drawn) platform::WriteAtOnce(kStream, "\r\x1b[K");
@@ -58,8 +59,7 @@ void TerminalProgress::Draw(double share, double pixels) {
         after += tail;
     }
     if (share > 0) after += "  " + zmctools::Clock(seconds / share - seconds) + " left";
-    std::string before = label.size() > 30 ? label.substr(0, 27) + "..." : label;
-    before += " [";
+    const std::string before = label + " [";
     const std::size_t width = platform::TerminalColumns(kStream, 80);
     const std::size_t taken = before.size() + after.size() + 1;
     const std::size_t room = width > taken + 10 ? width - taken : 10;

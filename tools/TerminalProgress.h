@@ -15,7 +15,7 @@ namespace zmctools {
 class TerminalProgress {
 public:
     // `label` stands before the bar; progress is counted in pixels.
-    TerminalProgress(std::string labelText, bool wanted);
+    TerminalProgress(const std::string& labelText, bool wanted);
     ~TerminalProgress();
     TerminalProgress(const TerminalProgress&) = delete;
     TerminalProgress& operator=(const TerminalProgress&) = delete;

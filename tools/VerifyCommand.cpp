@@ -85,6 +85,7 @@ void VerifyCommand::CheckPixels(zmchost::Raster& raster, bool documentIsGood) {
     if (source.empty()) return;
     const auto view = OpenView(source);
     results.push_back(CheckSource(raster, *view, ParseBands(bands, view->Bands()), quiet));
+    view->CheckUnchanged();
 }
 
 ExitStatus VerifyCommand::Report() const {
@@ -101,7 +102,8 @@ ExitStatus VerifyCommand::Report() const {
         if (json || (quiet && result.problems.empty())) continue;
         std::printf("%-13s %s%s\n", result.check.c_str(), verdict,
                     result.skipped.empty() ? "" : (": " + result.skipped).c_str());
-        for (const std::string& problem : result.problems) std::printf("  %s\n", problem.c_str());
+        for (const std::string& problem : result.problems)
+            std::printf("  %s\n", Visible(problem).c_str());
     }
     if (json)
         PrintDocument({{"schema", kSchema}, {"file", file}, {"good", equal}, {"checks", checks}});
@@ -123,6 +125,8 @@ ExitStatus VerifyCommand::Run() {
     else
         for (const char* const check : {"statistics", "levels"})
             results.push_back({check, "the file is not complete", {}});
+    if (const std::string change = raster.ContentChange(); !change.empty())
+        throw Failure(file, "it changed while it was read: " + change);
     return Report();
 }
 

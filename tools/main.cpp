@@ -9,6 +9,7 @@
 #include "files/Lending.h"
 #include "host/base/Error.h"
 #include "platform/Interrupts.h"
+#include "platform/Terminal.h"
 #include "tools/Command.h"
 #include "tools/GdalWorld.h"
 #include "tools/Generate.h"
@@ -148,6 +149,8 @@ ExitStatus Guarded(int count, char** words) {
         return ExitStatus::Interrupted;
     } catch (const std::bad_alloc&) {
         Say("out of memory");
+    } catch (const zmchost::Error& error) {
+        Say(Visible(error.File()) + ": cannot " + error.Operation() + ": " + error.Reason());
     } catch (const std::exception& error) {
         Say(error.what());
     }
@@ -157,4 +160,7 @@ ExitStatus Guarded(int count, char** words) {
 }  // namespace
 }  // namespace zmctools
 
-int main(int count, char** words) { return static_cast<int>(zmctools::Guarded(count, words)); }
+int main(int count, char** words) {
+    if (!platform::HoldStandardStreams()) return static_cast<int>(zmctools::ExitStatus::Failed);
+    return static_cast<int>(zmctools::Guarded(count, words));
+}

@@ -4,6 +4,7 @@
 #include "host/file/SideFile.h"
 #include "host/journal/MetadataJournal.h"
 #include "platform/FileSystem.h"
+#include "platform/Rights.h"
 
 namespace zmchost {
 namespace {
@@ -18,14 +19,20 @@ BuildFile::BuildFile(const std::string& targetName, bool mayOverwrite)
     : given(targetName), overwrite(mayOverwrite), target(platform::ResolveLinks(targetName)) {
     CheckTarget();
     SideFile::RemoveStale(target, kKind);
-    path = SideFile::TemporaryPath(target, kKind);
-    if (!platform::CreateNewFile(path))
+    path = SideFile::MakeTemporary(target, kKind, lock);
+    if (path.empty())
         throw Error(given, "build a file in the folder " + platform::FolderOf(target),
                     platform::LastErrorText());
+    // What is to replace a file is nobody else's business until it has the rights of that one.
+    if (platform::StatusOf(target).exists && !platform::MakePrivate(path)) {
+        const std::string reason = platform::LastErrorText();
+        platform::RemoveEntry(path);
+        throw Error(given, "build a file in the folder " + platform::FolderOf(target), reason);
+    }
 }
 
 BuildFile::~BuildFile() {
-    if (!committed) platform::RemoveEntry(path);
+    if (!committed && !path.empty()) platform::RemoveEntry(path);
 }
 
 void BuildFile::CheckTarget() const {
@@ -58,9 +65,12 @@ void BuildFile::Flush() const {
 
 void BuildFile::Commit() {
     CheckTarget();
+    if (platform::StatusOf(target).exists && !platform::CopyRights(target, path))
+        throw Error(given, "give it the rights of the file before", platform::LastErrorText());
     if (!platform::RenameFile(path, target))
         throw Error(given, "give the finished file its name", platform::LastErrorText());
     committed = true;
+    lock.Release();
     // What may be left of a store into the old file has no file any more.
     platform::RemoveEntry(MetadataJournal::PathFor(target));
     if (!platform::SyncFolder(platform::FolderOf(target)))

@@ -2,13 +2,17 @@
 //
 // The file is called ".NAME.zmcbuild-PROCESS-RANDOM.tmp". Commit flushes it to disk and gives it
 // the name in one step, so that others see the old file or the finished one and nothing between.
-// Without Commit the destructor removes it. What a killed process left is removed by the next build
-// of the same target.
+// A file that it replaces leaves it owner, group, mode, access list and extended attributes, as far
+// as this process may give them; a new one has what the system gives to new files (umask). Without
+// Commit the destructor removes it. It is locked all the while; what a killed process left is not,
+// and is removed by the next build of the same target.
 #ifndef ZMC_HOST_BUILD_BUILDFILE_H
 #define ZMC_HOST_BUILD_BUILDFILE_H
 
 #include <cstdint>
 #include <string>
+
+#include "platform/FileLock.h"
 
 namespace zmchost {
 
@@ -40,6 +44,7 @@ private:
     bool overwrite;
     std::string target;  // where links led
     std::string path;
+    platform::FileLock lock;  // of the temporary file, so that nobody takes it for a left-over
     bool committed = false;
 };
 

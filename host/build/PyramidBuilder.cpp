@@ -205,6 +205,7 @@ BuildReport BuildRun::Run() {
     RunWithThreads(threads, [this] { Fill(); });
     StoreRecords();
     Check();
+    if (options.beforeNaming) options.beforeNaming(file->Path());
     file->Commit();
     report.width = props.samples;
     report.height = props.lines;
@@ -390,7 +391,7 @@ void BuildRun::Check() {
     tiles.reset();
     work.reset();
     raster.reset();
-    Raster finished = Raster::Open(module, file->Path());
+    Raster finished = Raster::Open(module, file->Path(), Access::Read);
     report.fileSize = finished.Header().fileSize;
     if (!finished.IsComplete() || finished.Width() != props.samples ||
         finished.Height() != props.lines || finished.MaxLevel() != maxLevel ||

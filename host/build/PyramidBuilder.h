@@ -60,6 +60,9 @@ struct BuildOptions {
     bool overwrite = false;
     // Called now and then, one call at a time, on one of the build's threads; false cancels.
     std::function<bool(const BuildProgress&)> progress;
+    // Called once with the path of the finished file, before it gets its name: the last moment to
+    // put beside the target what belongs to the new file. What it throws ends the build.
+    std::function<void(const std::string& finished)> beforeNaming;
 };
 
 struct BuildReport {

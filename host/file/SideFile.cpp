@@ -1,7 +1,6 @@
 #include "host/file/SideFile.h"
 
-#include <charconv>
-#include <cstdint>
+#include <algorithm>
 #include <string_view>
 
 #include "host/base/Checksum.h"
@@ -18,15 +17,18 @@ std::string Prefix(const std::string& file, const std::string& kind) {
     return '.' + SideFile::Stem(file) + '.' + kind + '-';
 }
 
-// The process of a temporary name; 0 for a name that is not one of ours.
-std::uint64_t ProcessOf(std::string_view name, std::string_view prefix) {
-    if (!name.starts_with(prefix) || !name.ends_with(kSuffix)) return 0;
+std::size_t Digits(std::string_view text) {
+    return std::min(text.find_first_not_of("0123456789"), text.size());
+}
+
+bool IsTemporary(std::string_view name, std::string_view prefix) {
+    if (!name.starts_with(prefix)) return false;
     name.remove_prefix(prefix.size());
-    std::uint64_t process = 0;
-    const char* const end = name.data() + name.size();
-    const auto parsed = std::from_chars(name.data(), end, process);
-    const bool ours = parsed.ec == std::errc() && parsed.ptr != end && *parsed.ptr == '-';
-    return ours ? process : 0;
+    const std::size_t process = Digits(name);
+    if (process == 0 || !name.substr(process).starts_with('-')) return false;
+    name.remove_prefix(process + 1);
+    const std::size_t random = Digits(name);
+    return random != 0 && name.substr(random) == kSuffix;
 }
 
 }  // namespace
@@ -48,13 +50,30 @@ std::string SideFile::TemporaryPath(const std::string& file, const std::string& 
                                   std::string(kSuffix));
 }
 
+std::string SideFile::MakeTemporary(const std::string& file, const std::string& kind,
+                                    platform::FileLock& lock) {
+    using Result = platform::FileLock::Result;
+    constexpr int kTries = 100;
+    for (int i = 0; i < kTries; ++i) {
+        std::string path = TemporaryPath(file, kind);
+        if (!platform::CreateNewFile(path)) return "";
+        const Result taken = lock.Take(path);
+        if (taken == Result::Taken || taken == Result::Failed) return path;
+        // Somebody who clears up met it before it was locked.
+        platform::RemoveEntry(path);
+    }
+    return "";
+}
+
 void SideFile::RemoveStale(const std::string& file, const std::string& kind) {
+    using Result = platform::FileLock::Result;
     const std::string folder = platform::FolderOf(file);
     const std::string prefix = Prefix(file, kind);
     for (const std::string& name : platform::ListFolder(folder)) {
-        const std::uint64_t process = ProcessOf(name, prefix);
-        if (process != 0 && !platform::ProcessAlive(process))
-            platform::RemoveEntry(platform::JoinPath(folder, name));
+        if (!IsTemporary(name, prefix)) continue;
+        const std::string path = platform::JoinPath(folder, name);
+        platform::FileLock lock;
+        if (lock.Take(path) == Result::Taken) platform::RemoveEntry(path);
     }
 }
 

@@ -1,5 +1,8 @@
 #include "host/journal/JournalRecord.h"
 
+#include <utility>
+
+#include "format/DocumentLimits.h"
 #include "host/base/Checksum.h"
 
 namespace zmchost {
@@ -31,7 +34,6 @@ public:
         }
         return number;
     }
-    bool AtEnd() const { return good && rest.empty(); }
 
 private:
     std::string_view rest;
@@ -39,6 +41,8 @@ private:
 };
 
 }  // namespace
+
+const std::uint64_t JournalRecord::kMaxBytes = zelm::kMaxDocumentBytes + 1024;
 
 std::string JournalRecord::Encode() const {
     std::string bytes(kMagic);
@@ -51,20 +55,33 @@ std::string JournalRecord::Encode() const {
     return bytes;
 }
 
-std::optional<JournalRecord> JournalRecord::Decode(std::string_view bytes) {
-    if (bytes.size() < kMagic.size() + kNumber || !bytes.starts_with(kMagic)) return std::nullopt;
-    const std::string_view summed = bytes.substr(0, bytes.size() - kNumber);
-    if (Scanner(bytes.substr(summed.size())).Number() != Checksum(summed)) return std::nullopt;
+std::optional<std::uint64_t> JournalRecord::SizeFrom(std::string_view head) {
+    if (head.size() < kHeadBytes || !head.starts_with(kMagic)) return std::nullopt;
+    Scanner sizes(head.substr(kHeadBytes - 2 * kNumber));
+    const std::uint64_t runSize = sizes.Number();
+    const std::uint64_t textSize = sizes.Number();
+    if (runSize > kMaxBytes || textSize > kMaxBytes) return std::nullopt;
+    return kHeadBytes + runSize + textSize + kNumber;
+}
+
+std::optional<JournalRecord> JournalRecord::Decode(std::string bytes) {
+    if (SizeFrom(std::string_view(bytes).substr(0, kHeadBytes)) != bytes.size())
+        return std::nullopt;
+    const std::size_t end = bytes.size() - kNumber;
+    const std::string_view summed = std::string_view(bytes).substr(0, end);
+    if (Scanner(std::string_view(bytes).substr(end)).Number() != Checksum(summed))
+        return std::nullopt;
     Scanner scanner(summed.substr(kMagic.size()));
     JournalRecord record;
     for (std::uint64_t* number : {&record.offset, &record.fileSize, &record.fileNumber,
                                   &record.frontSize, &record.frontSum})
         *number = scanner.Number();
     const std::uint64_t runSize = scanner.Number();
-    const std::uint64_t textSize = scanner.Number();
+    static_cast<void>(scanner.Number());
     record.systemRun = scanner.Text(runSize);
-    record.text = scanner.Text(textSize);
-    if (!scanner.AtEnd()) return std::nullopt;
+    bytes.resize(end);
+    bytes.erase(0, kHeadBytes + record.systemRun.size());
+    record.text = std::move(bytes);
     return record;
 }
 

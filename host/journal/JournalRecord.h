@@ -23,9 +23,16 @@ struct JournalRecord {
     std::string systemRun;         // platform::SystemRun when the copy was made
     std::string text;              // the document; empty if there was none
 
+    // What no record is longer than.
+    static const std::uint64_t kMaxBytes;
+    // Bytes from its start that tell how long a record is.
+    static constexpr std::size_t kHeadBytes = 64;
+
     std::string Encode() const;
-    // None if the bytes are not exactly those of a record.
-    static std::optional<JournalRecord> Decode(std::string_view bytes);
+    // Bytes of the record that begins so; none if no record does.
+    static std::optional<std::uint64_t> SizeFrom(std::string_view head);
+    // None if the bytes are not exactly those of a record. Takes them over for the text.
+    static std::optional<JournalRecord> Decode(std::string bytes);
 };
 
 }  // namespace zmchost

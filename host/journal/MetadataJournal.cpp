@@ -4,52 +4,70 @@
 #include <memory>
 #include <string_view>
 
+#include "files/FileSource.h"
 #include "format/DocumentLimits.h"
 #include "host/base/Checksum.h"
 #include "host/base/Error.h"
 #include "host/base/Text.h"
 #include "host/file/MetadataDocument.h"
 #include "host/file/SideFile.h"
-#include "platform/File.h"
 #include "platform/FileSystem.h"
 
 namespace zmchost {
 namespace {
 
 using Outcome = Recovery::Outcome;
-using platform::File;
 using platform::FileLock;
+using zelm::files::FileSource;
+using zelm::files::OpenMode;
 
 const std::string kKind = "zmcmeta";
 constexpr char kMark = zelm::kUnfinishedDocument;
 const char* const kKeep = "keep a copy of its metadata document";
 
-std::unique_ptr<File> OpenFile(const std::string& path, File::Mode mode) {
-    return File::Open(WideFileName(path).wide, mode);
-}
+// The raster file, opened once: what is said of it and what is done to it is of one file, whatever
+// takes its name meanwhile.
+class Target {
+public:
+    Target(const std::string& name, OpenMode mode) : file(name) {
+        int error = 0;
+        source = FileSource::Open(WideFileName(file), mode, &error);
+        if (!source) throw Error(file, "look at it", platform::ErrorText(error));
+        header = PyramidHeader::Read(*source, file);
+    }
 
-// Some bytes of a file; fewer, or none, where it does not have them or cannot be read.
-std::string ReadPart(const std::string& path, std::uint64_t size) {
-    const auto stream = OpenFile(path, File::Mode::Read);
-    if (!stream) return "";
-    std::string bytes(static_cast<std::size_t>(std::min(size, stream->Size())), '\0');
-    bytes.resize(stream->ReadAt(0, bytes.data(), bytes.size()));
-    return bytes;
-}
+    const PyramidHeader& Header() const { return header; }
+    FileSource& Source() const { return *source; }
+    std::string Document() const { return ReadMetadataText(*source, file, header); }
+    bool IsSameAs(const Target& other) const {
+        return source->Identify().SameThing(other.source->Identify());
+    }
 
-// The record of a file as it is now.
-JournalRecord Describe(const std::string& file, const PyramidHeader& header) {
-    const platform::FileStatus status = platform::StatusOf(file);
-    if (!status.exists) throw Error(file, "look at it", platform::LastErrorText());
-    JournalRecord record;
-    record.offset = header.tileDataEnd;
-    record.fileSize = status.size;
-    record.fileNumber = status.number;
-    record.frontSize = header.tileDataStart;
-    record.frontSum = Checksum(ReadPart(file, header.tileDataStart));
-    record.systemRun = platform::SystemRun();
-    return record;
-}
+    // Whether a copy of that status is by somebody whose word counts.
+    bool Trusts(const platform::FileStatus& copy) const {
+        const platform::FileStatus named = platform::StatusOf(file);
+        return named.number == source->Identify().number && platform::MaySpeakFor(copy, named);
+    }
+
+    // The record of it as it is now, without the text.
+    JournalRecord Describe() const {
+        JournalRecord record;
+        record.offset = header.tileDataEnd;
+        record.fileSize = header.fileSize;
+        record.fileNumber = source->Identify().number;
+        record.frontSize = header.tileDataStart;
+        std::string front(static_cast<std::size_t>(header.tileDataStart), '\0');
+        front.resize(source->ReadAt(0, front.data(), front.size()));
+        record.frontSum = Checksum(front);
+        record.systemRun = platform::SystemRun();
+        return record;
+    }
+
+private:
+    std::string file;
+    std::shared_ptr<FileSource> source;
+    PyramidHeader header;
+};
 
 bool RemoveCopy(const std::string& path) {
     return platform::RemoveEntry(path) && platform::SyncFolder(platform::FolderOf(path));
@@ -59,15 +77,15 @@ bool RemoveCopy(const std::string& path) {
 class LeftOver {
 public:
     LeftOver(const std::string& rasterFile, const JournalRecord& kept)
-        : file(rasterFile), record(kept) {}
+        : file(rasterFile), record(kept), now(rasterFile, OpenMode::Read) {}
 
     // Why the copy is not one of this file; empty if it is.
     std::string Mismatch() const {
-        const JournalRecord now = Describe(file, PyramidHeader::Read(file));
-        const bool same = now.offset == record.offset && now.fileNumber == record.fileNumber &&
-                          now.frontSize == record.frontSize && now.frontSum == record.frontSum;
+        const JournalRecord found = now.Describe();
+        const bool same = found.offset == record.offset && found.fileNumber == record.fileNumber &&
+                          found.frontSize == record.frontSize && found.frontSum == record.frontSum;
         if (!same) return "it is a copy of another file of that name";
-        if (now.fileSize < std::min(record.offset, record.fileSize))
+        if (found.fileSize < std::min(record.offset, record.fileSize))
             return "the file has lost tiles since";
         return "";
     }
@@ -76,8 +94,9 @@ public:
     Outcome Settle(const std::string& copy) {
         const Outcome outcome = IsWhole() ? Outcome::Complete : Outcome::Restored;
         if (outcome == Outcome::Restored) PutBack();
-        if (!platform::SyncFile(file)) Fail();
-        if (!RemoveCopy(copy)) Fail();
+        int error = 0;
+        if (!now.Source().Sync(&error)) Fail(platform::ErrorText(error));
+        if (!RemoveCopy(copy)) Fail(platform::LastErrorText());
         return outcome;
     }
 
@@ -86,8 +105,7 @@ private:
     // as the store left it: whole, or refused by parsers. After a break the disk may hold any
     // mixture, and only the old text is beyond doubt.
     bool IsWhole() const {
-        const PyramidHeader header = PyramidHeader::Read(file);
-        std::string text = ReadMetadataText(file, header);
+        std::string text = now.Document();
         const bool unbroken =
             !record.systemRun.empty() && record.systemRun == platform::SystemRun();
         if (text.empty() || !unbroken)
@@ -99,23 +117,27 @@ private:
 
     // The order of steps is that of a store: mark, rest, first byte.
     void PutBack() const {
-        const auto stream = OpenFile(file, File::Mode::Update);
+        const Target target(file, OpenMode::Update);
+        if (!target.IsSameAs(now)) Fail("another file has taken its name");
+        FileSource& source = target.Source();
+        int error = 0;
         std::uint64_t size = 0;
-        if (!stream || !stream->TellSize(size)) Fail();
+        if (!source.TellSize(size, &error)) Fail(platform::ErrorText(error));
         const auto write = [&](std::uint64_t at, std::string_view bytes) {
-            if (stream->WriteAt(at, bytes.data(), bytes.size()) != bytes.size()) Fail();
+            if (source.WriteAt(at, bytes.data(), bytes.size(), &error) != bytes.size())
+                Fail(platform::ErrorText(error));
         };
         const std::string_view text = record.text;
         if (!text.empty()) write(record.offset, std::string_view(&kMark, 1));
-        const std::uint64_t end = GotTiles(*stream) ? record.offset : record.fileSize;
-        if (size > end && !stream->Truncate(end)) Fail();
+        const std::uint64_t end = GotTiles(source) ? record.offset : record.fileSize;
+        if (size > end && !source.Truncate(end, &error)) Fail(platform::ErrorText(error));
         if (text.empty()) return;
         write(record.offset + 1, text.substr(1));
         write(record.offset, text.substr(0, 1));
     }
 
     // Whether a file that ended within its tiles has, or may have, got some since.
-    bool GotTiles(File& stream) const {
+    bool GotTiles(FileSource& source) const {
         constexpr std::uint64_t kMost = std::uint64_t{256} << 20;
         if (record.fileSize >= record.offset) return false;
         if (record.offset - record.fileSize > kMost) return true;
@@ -123,38 +145,77 @@ private:
         for (std::uint64_t at = record.fileSize; at < record.offset; at += piece.size()) {
             const auto size =
                 static_cast<std::size_t>(std::min<std::uint64_t>(piece.size(), record.offset - at));
-            if (stream.ReadAt(at, piece.data(), size) != size) return true;
+            if (source.ReadAt(at, piece.data(), size) != size) return true;
             if (piece.find_first_not_of('\0') < size) return true;
         }
         return false;
     }
 
-    [[noreturn]] void Fail() const {
-        throw Error(file, "put its metadata document back", platform::LastErrorText());
+    [[noreturn]] void Fail(const std::string& reason) const {
+        throw Error(file, "put its metadata document back", reason);
     }
 
     const std::string& file;
     const JournalRecord& record;
+    const Target now;
 };
 
-// The lock is held. Throws Error.
-Recovery Recover(const std::string& file, const std::string& copy) {
-    const std::string subject = "the copy of its metadata document, " + copy + ", ";
-    const auto size = platform::StatusOf(copy).size;
-    const std::string bytes = ReadPart(copy, size);
-    if (bytes.size() != size)
-        return {Outcome::Failed, subject + "cannot be read: " + platform::LastErrorText()};
-    const auto record = JournalRecord::Decode(bytes);
-    if (!record) return {Outcome::Unusable, subject + "is not used: it is torn"};
-    LeftOver leftOver(file, *record);
-    if (const std::string why = leftOver.Mismatch(); !why.empty())
-        return {Outcome::Unusable, subject + "is not used: " + why};
-    const Outcome outcome = leftOver.Settle(copy);
-    return {outcome, outcome == Outcome::Restored
-                         ? "a store into it did not end; its metadata document is again the one "
-                           "of before"
-                         : "a store into it did not end in good order; its metadata document is "
-                           "whole"};
+// A copy whose lock is held: its record, or why it is not used.
+struct Copy {
+    std::optional<JournalRecord> record;
+    std::string unused;
+};
+
+// Nothing of it is read before it is known whose it is and how long it may be. Throws Error.
+Copy ReadCopy(const FileLock& lock, const std::string& file) {
+    const platform::FileStatus status = lock.Status();
+    if (!Target(file, OpenMode::Read).Trusts(status))
+        return {{}, "it belongs to a user who does not own the file"};
+    if (status.size > JournalRecord::kMaxBytes) return {{}, "it is longer than any copy"};
+    std::string bytes(JournalRecord::kHeadBytes, '\0');
+    bytes.resize(lock.ReadAt(0, bytes.data(), bytes.size()));
+    if (JournalRecord::SizeFrom(bytes) != status.size) return {{}, "it is torn"};
+    bytes.resize(static_cast<std::size_t>(status.size));
+    if (lock.ReadAt(0, bytes.data(), bytes.size()) != bytes.size())
+        throw Error(file, "read the copy", platform::LastErrorText());
+    auto record = JournalRecord::Decode(std::move(bytes));
+    if (!record) return {{}, "it is torn"};
+    std::string unused = LeftOver(file, *record).Mismatch();
+    return {std::move(record), std::move(unused)};
+}
+
+std::string Subject(const std::string& copy) {
+    return "the copy of its metadata document, " + copy + ", ";
+}
+
+// Takes the lock of a file's copy, and lets `settle(target, copy, record)` answer for one that is
+// of use.
+template <class Settle>
+Recovery WithCopy(const std::string& file, FileLock::Kind kind, Settle&& settle) {
+    const std::string copy = MetadataJournal::PathFor(file);
+    FileLock lock;
+    switch (lock.Take(copy, kind)) {
+        case FileLock::Result::Missing:
+            return {};
+        case FileLock::Result::Held:
+            return {Outcome::UnderWay, ""};
+        case FileLock::Result::Failed:
+            return {Outcome::Failed,
+                    Subject(copy) + "cannot be opened: " + platform::LastErrorText()};
+        case FileLock::Result::Taken:
+            break;
+    }
+    try {
+        const std::string target = platform::ResolveLinks(file);
+        const Copy found = ReadCopy(lock, target);
+        if (!found.unused.empty())
+            return {Outcome::Unusable, Subject(copy) + "is not used: " + found.unused};
+        return settle(target, copy, *found.record);
+    } catch (const Error& error) {
+        return {Outcome::Failed,
+                "a store into it did not end, and what it left cannot be put in order: " +
+                    error.Reason()};
+    }
 }
 
 }  // namespace
@@ -165,51 +226,50 @@ std::string MetadataJournal::PathFor(const std::string& file) {
 }
 
 Recovery RecoverMetadata(const std::string& file) {
-    const std::string copy = MetadataJournal::PathFor(file);
-    FileLock lock;
-    switch (lock.Take(copy)) {
-        case FileLock::Result::Missing:
-            return {};
-        case FileLock::Result::Held:
-            return {Outcome::UnderWay, ""};
-        case FileLock::Result::Failed:
-            return {Outcome::Failed, "the copy of its metadata document, " + copy +
-                                         ", cannot be opened: " + platform::LastErrorText()};
-        case FileLock::Result::Taken:
-            break;
-    }
-    try {
-        return Recover(platform::ResolveLinks(file), copy);
-    } catch (const Error& error) {
-        return {Outcome::Failed,
-                "a store into it did not end, and what it left cannot be put in order: " +
-                    error.Reason()};
-    }
+    return WithCopy(file, FileLock::Kind::Alone,
+                    [](const std::string& target, const std::string& copy,
+                       const JournalRecord& record) -> Recovery {
+                        const Outcome outcome = LeftOver(target, record).Settle(copy);
+                        if (outcome == Outcome::Restored)
+                            return {outcome,
+                                    "a store into it did not end; its metadata document is again "
+                                    "the one of before"};
+                        return {outcome,
+                                "a store into it did not end in good order; its metadata document "
+                                "is whole"};
+                    });
+}
+
+Recovery LookForCopy(const std::string& file) {
+    return WithCopy(file, FileLock::Kind::Shared, [](const auto&...) -> Recovery {
+        return {Outcome::Pending,
+                "a store into it did not end; zmcraster recover puts its metadata document in "
+                "order"};
+    });
 }
 
 void DiscardMetadata(const std::string& file) {
     const auto refuse = [&](const std::string& why) {
         throw Error(file, "discard its metadata document", why);
     };
-    const std::string target = platform::ResolveLinks(file);
+    const std::string name = platform::ResolveLinks(file);
     const std::string copy = MetadataJournal::PathFor(file);
     FileLock lock;
     const FileLock::Result taken = lock.Take(copy);
     if (taken == FileLock::Result::Held) refuse("another process is storing into the file");
     if (taken == FileLock::Result::Failed) refuse(platform::LastErrorText());
     const bool hasCopy = taken == FileLock::Result::Taken;
-    const PyramidHeader header = PyramidHeader::Read(target);
-    if (hasCopy) {
-        const auto record = JournalRecord::Decode(ReadPart(copy, platform::StatusOf(copy).size));
-        if (record && LeftOver(target, *record).Mismatch().empty())
-            refuse("there is a copy of it, which can be put back");
-    }
-    const bool damaged = !JudgeMetadata(target, header).empty();
+    if (hasCopy && ReadCopy(lock, name).unused.empty())
+        refuse("there is a copy of it, which can be put back");
+    const Target target(name, OpenMode::Read);
+    const bool damaged = !JudgeMetadata(target.Source(), name, target.Header()).empty();
     if (!damaged && !hasCopy) refuse("it is not damaged");
     if (damaged) {
-        const auto stream = OpenFile(target, File::Mode::Update);
-        if (!stream || !stream->Truncate(header.tileDataEnd) || !stream->Sync())
-            refuse(platform::LastErrorText());
+        const Target changed(name, OpenMode::Update);
+        int error = 0;
+        if (!changed.Source().Truncate(changed.Header().tileDataEnd, &error) ||
+            !changed.Source().Sync(&error))
+            refuse(platform::ErrorText(error));
     }
     if (hasCopy && !RemoveCopy(copy)) refuse(platform::LastErrorText());
 }
@@ -221,9 +281,9 @@ MetadataJournal::MetadataJournal(const std::string& fileName)
         throw Error(given, kKeep, "another process is storing into the file");
     if (before.outcome == Outcome::Unusable || before.outcome == Outcome::Failed)
         throw Error(given, kKeep, before.text);
-    const PyramidHeader header = PyramidHeader::Read(file);
-    record = Describe(file, header);
-    record.text = ReadMetadataText(file, header);
+    const Target target(file, OpenMode::Read);
+    record = target.Describe();
+    record.text = target.Document();
     if (!record.text.empty())
         if (const std::string wrong = JudgeMetadataText(record.text); !wrong.empty())
             throw Error(given, kKeep, wrong);
@@ -232,19 +292,18 @@ MetadataJournal::MetadataJournal(const std::string& fileName)
 
 void MetadataJournal::Write(const std::string& bytes) {
     SideFile::RemoveStale(file, kKind);
-    const std::string path = SideFile::TemporaryPath(file, kKind);
+    const std::string path = SideFile::MakeTemporary(file, kKind, lock);
     const auto fail = [&](const std::string& reason) {
-        platform::RemoveEntry(path);
+        if (!path.empty()) platform::RemoveEntry(path);
         throw Error(given, kKeep, reason);
     };
-    if (!platform::CreateNewFile(path)) fail(platform::LastErrorText());
-    {
-        const auto stream = OpenFile(path, File::Mode::Update);
-        if (!stream || stream->WriteAt(0, bytes.data(), bytes.size()) != bytes.size() ||
-            !stream->Sync())
-            fail(platform::LastErrorText());
-    }
-    if (lock.Take(path) != FileLock::Result::Taken) fail("it cannot be locked");
+    if (path.empty()) fail(platform::LastErrorText());
+    if (!lock.Status().exists) fail("it cannot be locked");
+    int error = 0;
+    const auto source = FileSource::Open(WideFileName(path), OpenMode::Update, &error);
+    if (!source || source->WriteAt(0, bytes.data(), bytes.size(), &error) != bytes.size() ||
+        !source->Sync(&error))
+        fail(platform::ErrorText(error));
     const std::string copy = PathFor(file);
     if (!platform::RenameToNewName(path, copy))
         fail(platform::StatusOf(copy).exists ? "another process is storing into the file"

@@ -10,9 +10,14 @@
 //     journal.Finish();  // the store is on the disk, and can be read; the copy is gone
 //
 // The copy of "scene.pyr" is "scene.pyr.zmcmeta". One that is found when nobody is storing is left
-// over: RecoverMetadata, which Raster::Open calls, puts the old document back, or removes the copy
-// where the store is whole. Storing takes a lock on the copy, so that of several processes one
-// stores at a time; those that store without a copy know nothing of it.
+// over: RecoverMetadata, which Raster::Open calls where it opens for update, puts the old document
+// back, or removes the copy where the store is whole. Who opens for reading alone writes nothing,
+// and asks LookForCopy. Storing takes a lock on the copy, so that of several processes one stores
+// at a time; those that store without a copy know nothing of it.
+//
+// Whoever may write the folder can put a file of that name there. It counts if it belongs to the
+// owner of the raster file, to the superuser or to the user of the process, and was made of that
+// very file, by its number and its front; and no more of it is read than a copy can have.
 #ifndef ZMC_HOST_JOURNAL_METADATAJOURNAL_H
 #define ZMC_HOST_JOURNAL_METADATAJOURNAL_H
 
@@ -57,8 +62,9 @@ struct Recovery {
         UnderWay,  // another process is storing now
         Complete,  // the document is whole, and the copy was removed
         Restored,  // the document of before was put back, and the copy removed
-        Unusable,  // the copy is torn or of another file; nothing was changed
+        Unusable,  // the copy is torn, of another file or somebody else's; nothing was changed
         Failed,    // the copy or the file cannot be read or written; the copy stays
+        Pending,   // the copy is of use; nothing was changed, since nobody asked for that
     };
     Outcome outcome = Outcome::Nothing;
     std::string text;  // what was found and done, for people; empty for Nothing and UnderWay
@@ -66,6 +72,10 @@ struct Recovery {
 
 // Looks for a left-over copy and does what is to be done. Never throws, but for memory.
 Recovery RecoverMetadata(const std::string& file);
+
+// Looks for a left-over copy and changes nothing, the lock of a store included: Nothing, UnderWay,
+// Unusable, Failed or Pending. Never throws, but for memory.
+Recovery LookForCopy(const std::string& file);
 
 // Cuts off the metadata document of a file and removes its copy, so that statistics can be stored
 // anew. Throws Error where nothing is damaged, a copy can be put back, or it cannot be done.

@@ -127,12 +127,18 @@ std::string LentFile::LossOfName() const {
                                        : "its name leads to no file any more";
 }
 
-std::string LentFile::Change() const {
+std::string LentFile::ContentChange() const {
     const std::uint64_t size = recording->Size();
     if (size != ByteSource::kUnknownSize && size < acceptedSize) return CutTo(acceptedSize, size);
-    if (std::string loss = LossOfName(); !loss.empty()) return loss;
     const bool same = !accepted.known || recording->Identify().SameContent(accepted);
     return same ? "" : "others have written to it";
+}
+
+std::string LentFile::Change() const {
+    const std::uint64_t size = recording->Size();
+    const bool cut = size != ByteSource::kUnknownSize && size < acceptedSize;
+    std::string loss = cut ? "" : LossOfName();
+    return loss.empty() ? ContentChange() : loss;
 }
 
 }  // namespace zmchost

@@ -58,9 +58,12 @@ public:
     // of asking are not told.
     void AcceptOwnChange(std::uint64_t least);
     std::uint64_t AcceptedSize() const { return acceptedSize; }
+    const zelm::files::Identity& Accepted() const { return accepted; }
     // What others have done to it since, in words: that it was cut, replaced, removed or written
     // to. Empty if nothing is to be seen.
     std::string Change() const;
+    // The part of it that concerns the bytes: that it was cut or written to.
+    std::string ContentChange() const;
     // Whether its name leads to another file now, or to none, in words; empty if it does not.
     std::string LossOfName() const;
 

@@ -127,9 +127,10 @@ void Raster::TakeReader() {
 }
 
 // Here and below the caller's hold on the module outlasts the connection, whatever is thrown.
-Raster Raster::Open(ModulePtr module, const std::string& file) {
-    const auto opened = std::make_shared<LentFile>(OpenPlainFile(file, true), file);
-    const Recovery recovery = RecoverMetadata(file);
+Raster Raster::Open(ModulePtr module, const std::string& file, Access access) {
+    const auto opened =
+        std::make_shared<LentFile>(OpenPlainFile(file, access == Access::Update), file);
+    const Recovery recovery = opened->IsWritable() ? RecoverMetadata(file) : LookForCopy(file);
     opened->Accept();
     Raster raster = OpenLent(std::move(module), file, opened);
     raster.recoveryNote = recovery.text;
@@ -258,6 +259,12 @@ bool Raster::IsComplete() {
 bool Raster::IsWritable() const { return !file || file->IsWritable(); }
 
 std::string Raster::Change() const { return file ? file->Change() : ""; }
+
+std::string Raster::ContentChange() const { return file ? file->ContentChange() : ""; }
+
+zelm::files::Identity Raster::OpenedAs() const {
+    return file ? file->Accepted() : zelm::files::Identity{};
+}
 
 std::string Raster::TakeFailure() const { return file ? file->TakeFailure() : ""; }
 

@@ -40,11 +40,17 @@ class LentFile;
 template <class T>
 class StoredRecords;
 
+// What a pyramid file is opened for.
+enum class Access {
+    Read,    // nothing is ever written, neither into the file nor beside it
+    Update,  // for writing too where the file allows it
+};
+
 class Raster {
 public:
-    // Opens a pyramid file, for writing too where the file allows it. What a store with a copy
-    // (KeepCopies) left behind when it was cut off is put in order first; RecoveryNote tells of it.
-    static Raster Open(ModulePtr module, const std::string& file);
+    // Opens a pyramid file. What a store with a copy (KeepCopies) left behind when it was cut off
+    // is put in order first where the file is opened for writing; RecoveryNote tells of it.
+    static Raster Open(ModulePtr module, const std::string& file, Access access = Access::Update);
     // The same from an open source, which `name` stands for in messages: a file of another kind, or
     // one that the caller has looked at already. Nothing is put in order, and copies are kept of
     // plain files alone (FileSource.h).
@@ -93,6 +99,13 @@ public:
     // What others have done to the file since it was opened, or last written to by this object, for
     // people: that it was cut, replaced, removed or written to. Empty if nothing is to be seen.
     std::string Change() const;
+    // The part of it that concerns what is read: that the file was cut or written to. What was read
+    // while this is empty is of one file in one state, but for writes within the clock tick of the
+    // file system in which the file was last written before (Identity in ByteSource.h).
+    std::string ContentChange() const;
+    // Which file it is, in which state, as it was opened or last written to by this object; unknown
+    // of a memory raster.
+    zelm::files::Identity OpenedAs() const;
 
     std::optional<double> NoDataValue(std::uint32_t band) const;
     // By band; they live in this object, since files have no place for them. A value that the pixel

@@ -8,6 +8,7 @@
 #include <cerrno>
 
 #include "platform/posix/Descriptor.h"
+#include "platform/posix/StatusFrom.h"
 #include "platform/posix/Uninterrupted.h"
 
 namespace platform {
@@ -21,21 +22,36 @@ bool StillBears(int descriptor, const std::string& path) {
            ours.st_ino == named.st_ino && ours.st_dev == named.st_dev;
 }
 
-int LockNow(int descriptor) {
-    return Uninterrupted([&] { return ::flock(descriptor, LOCK_EX | LOCK_NB); });
+int LockNow(int descriptor, FileLock::Kind kind) {
+    const int wanted = kind == FileLock::Kind::Shared ? LOCK_SH : LOCK_EX;
+    return Uninterrupted([&] { return ::flock(descriptor, wanted | LOCK_NB); });
+}
+
+// For writing where that is allowed, since some file systems lock nothing else for one alone.
+int OpenToLock(const char* path, FileLock::Kind kind) {
+    constexpr int kFlags = O_NONBLOCK | O_NOCTTY | O_NOFOLLOW;
+    if (kind == FileLock::Kind::Alone) {
+        const int opened = OpenForData(path, O_RDWR | kFlags);
+        if (opened >= 0 || (errno != EACCES && errno != EROFS && errno != EPERM)) return opened;
+    }
+    return OpenForData(path, O_RDONLY | kFlags);
 }
 
 }  // namespace
 
-FileLock::Result FileLock::Take(const std::string& path) {
+FileLock::Result FileLock::Take(const std::string& path, Kind kind) {
     Release();
-    descriptor = OpenForData(path.c_str(), O_RDONLY | O_NONBLOCK);
+    descriptor = OpenToLock(path.c_str(), kind);
     if (descriptor < 0) return errno == ENOENT ? Result::Missing : Result::Failed;
     Result result = Result::Taken;
-    if (LockNow(descriptor) != 0)
+    if (const FileStatus status = Status(); status.exists && !status.isRegular) {
+        errno = status.isFolder ? EISDIR : EINVAL;
+        result = Result::Failed;
+    } else if (LockNow(descriptor, kind) != 0) {
         result = errno == EWOULDBLOCK ? Result::Held : Result::Failed;
-    else if (!StillBears(descriptor, path))
+    } else if (!StillBears(descriptor, path)) {
         result = Result::Missing;
+    }
     const int kept = errno;
     if (result != Result::Taken) Release();
     errno = kept;
@@ -45,6 +61,23 @@ FileLock::Result FileLock::Take(const std::string& path) {
 void FileLock::Release() {
     if (descriptor >= 0) ::close(descriptor);
     descriptor = -1;
+}
+
+FileStatus FileLock::Status() const noexcept {
+    struct stat info {};
+    return descriptor >= 0 && ::fstat(descriptor, &info) == 0 ? StatusFrom(info) : FileStatus();
+}
+
+std::size_t FileLock::ReadAt(std::uint64_t offset, void* buffer, std::size_t size) const noexcept {
+    std::size_t done = 0;
+    while (done < size) {
+        const ssize_t got = ::pread(descriptor, static_cast<char*>(buffer) + done, size - done,
+                                    static_cast<off_t>(offset + done));
+        if (got < 0 && errno == EINTR) continue;
+        if (got <= 0) break;
+        done += static_cast<std::size_t>(got);
+    }
+    return done;
 }
 
 }  // namespace platform

@@ -2,7 +2,6 @@
 
 #include <dirent.h>
 #include <fcntl.h>
-#include <signal.h>
 #include <sys/stat.h>
 #include <sys/statvfs.h>
 #include <unistd.h>
@@ -18,6 +17,7 @@
 
 #include "platform/Random.h"
 #include "platform/posix/Descriptor.h"
+#include "platform/posix/StatusFrom.h"
 #include "platform/posix/Uninterrupted.h"
 
 namespace platform {
@@ -50,17 +50,15 @@ std::string ErrorText(int error) { return std::generic_category().message(error)
 std::string LastErrorText() { return ErrorText(errno); }
 
 FileStatus StatusOf(const std::string& path) noexcept {
-    FileStatus status;
     struct stat info {};
-    if (::stat(path.c_str(), &info) != 0) return status;
-    status.exists = true;
-    status.isFolder = S_ISDIR(info.st_mode);
-    status.isRegular = S_ISREG(info.st_mode);
-    const bool nobodyWrites = (info.st_mode & (S_IWUSR | S_IWGRP | S_IWOTH)) == 0;
-    status.readOnly = nobodyWrites || ::access(path.c_str(), W_OK) != 0;
-    if (status.isRegular) status.size = static_cast<std::uint64_t>(info.st_size);
-    status.number = static_cast<std::uint64_t>(info.st_ino);
+    if (::stat(path.c_str(), &info) != 0) return FileStatus();
+    FileStatus status = StatusFrom(info);
+    status.readOnly = status.readOnly || ::access(path.c_str(), W_OK) != 0;
     return status;
+}
+
+bool MaySpeakFor(const FileStatus& note, const FileStatus& file) noexcept {
+    return note.owner == file.owner || note.owner == 0 || note.owner == ::geteuid();
 }
 
 std::string FolderOf(const std::string& path) {
@@ -119,6 +117,10 @@ bool RenameToNewName(const std::string& from, const std::string& to) noexcept {
     return ::link(from.c_str(), to.c_str()) == 0 && ::unlink(from.c_str()) == 0;
 }
 
+bool LinkFile(const std::string& file, const std::string& name) noexcept {
+    return ::link(file.c_str(), name.c_str()) == 0;
+}
+
 bool RemoveEntry(const std::string& path) noexcept { return ::unlink(path.c_str()) == 0; }
 
 bool SyncFile(const std::string& path) noexcept { return Sync(path, O_RDONLY); }
@@ -164,11 +166,6 @@ std::string SystemRun() {
 }
 
 std::uint64_t CurrentProcess() noexcept { return static_cast<std::uint64_t>(::getpid()); }
-
-bool ProcessAlive(std::uint64_t process) noexcept {
-    if (process == 0 || process > INT_MAX) return false;
-    return ::kill(static_cast<pid_t>(process), 0) == 0 || errno != ESRCH;
-}
 
 std::uint64_t RandomNumber() noexcept {
     std::uint64_t number = 0;

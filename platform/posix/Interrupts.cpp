@@ -22,6 +22,10 @@ void CatchInterrupts() {
         action.sa_flags = static_cast<int>(SA_RESTART | SA_RESETHAND);
         sigaction(signal, &action, nullptr);
     }
+    struct sigaction before = {};
+    if (sigaction(SIGXFSZ, nullptr, &before) != 0 || before.sa_handler != SIG_DFL) return;
+    before.sa_handler = SIG_IGN;
+    sigaction(SIGXFSZ, &before, nullptr);
 }
 
 bool IsInterrupted() { return interrupted != 0; }

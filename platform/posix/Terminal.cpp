@@ -1,5 +1,6 @@
 #include "platform/Terminal.h"
 
+#include <fcntl.h>
 #include <sys/ioctl.h>
 #include <unistd.h>
 
@@ -11,6 +12,16 @@ int DescriptorOf(StandardStream stream) {
 }
 
 }  // namespace
+
+bool HoldStandardStreams() {
+    for (int number = STDIN_FILENO; number <= STDERR_FILENO; ++number) {
+        if (fcntl(number, F_GETFD) != -1) continue;
+        // Open for the other direction than the stream is used in.
+        const int opened = open("/dev/null", number == STDIN_FILENO ? O_WRONLY : O_RDONLY);
+        if (opened != number) return false;
+    }
+    return true;
+}
 
 bool IsTerminal(StandardStream stream) { return isatty(DescriptorOf(stream)) == 1; }
 

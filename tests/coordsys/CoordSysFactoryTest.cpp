@@ -3,6 +3,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <filesystem>
 #include <sstream>
 
 #include "tests/coordsys/ProbeRun.h"
@@ -59,6 +60,19 @@ TEST_F(CoordSysFactoryRun, MissingSettingsAreNotSet) {
     const ChildResult result = RunProbe({"factory", StubDirectory(0), "-", ""});
     EXPECT_THAT(result.err, HasSubstr("Initialize(Not Set,Not Set)"));
     EXPECT_THAT(result.err, HasSubstr("log=0"));
+}
+
+// Whoever starts the process has a folder of that name, with an engine and a log that is on.
+TEST_F(CoordSysFactoryRun, WhatIsNotSetIsNoFolderBelowTheWorkingDirectory) {
+    const std::filesystem::path trap = scratch / "Not Set";
+    std::filesystem::create_directory(trap);
+    std::filesystem::copy_file(StubDirectory(0) + "/libzmcpe.so", trap / "libzmcpe.so");
+    zmctest::WriteText(trap / "pelog.txt", "# notes\n0110,0000,0000,0000\n");
+    const ChildResult result =
+        zmctest::RunChild({"sh", "-c", "cd \"$0\" && exec \"$@\"", scratch.String(),
+                           ZMC_COORDSYS_PROBE, "factory", "-", "-", "-"});
+    EXPECT_EQ(result.err, "factory=1 module=0 pointers=0000 mutex=0 log=0\ninit=1\n");
+    EXPECT_FALSE(std::filesystem::exists(trap / "logs"));
 }
 
 TEST_F(CoordSysFactoryRun, MissingLibraryIsLogged) {

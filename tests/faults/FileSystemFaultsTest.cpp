@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "platform/FileSystem.h"
+#include "platform/Rights.h"
 #include "tests/support/AllocationFaults.h"
 #include "tests/support/ScratchDirectory.h"
 
@@ -85,7 +86,7 @@ TEST(FileSystemMemory, OperationsTakeNoMemory) {
         answers[4] = SyncFile(path) && SyncFolder(place);
         answers[5] = RenameFile(path, other);
         answers[6] = RenameToNewName(other, path);
-        answers[7] = FreeSpace(place).has_value() && ProcessAlive(CurrentProcess());
+        answers[7] = FreeSpace(place).has_value() && CurrentProcess() != 0;
         answers[8] = RandomNumber() != RandomNumber() && RemoveEntry(path);
     });
     EXPECT_EQ(allocations, 0u);
@@ -94,11 +95,12 @@ TEST(FileSystemMemory, OperationsTakeNoMemory) {
 
 // Not one of them is able to throw.
 const std::string kPath;
-static_assert(
-    noexcept(StatusOf(kPath)) && noexcept(CreateNewFile(kPath)) && noexcept(RenameFile(kPath, kPath)) && noexcept(RenameToNewName(kPath, kPath)) && noexcept(RemoveEntry(kPath)) && noexcept(SyncFile(kPath)) && noexcept(
-        SyncFolder(
-            kPath)) && noexcept(FreeSpace(kPath)) && noexcept(ReserveSpace(kPath,
-                                                                           0)) && noexcept(ReleaseReserve(kPath)) && noexcept(CurrentProcess()) && noexcept(ProcessAlive(1)) && noexcept(RandomNumber()));
+static_assert(noexcept(StatusOf(kPath)) && noexcept(CreateNewFile(kPath)) && noexcept(RenameFile(kPath, kPath)) && noexcept(RenameToNewName(
+    kPath,
+    kPath)) && noexcept(RemoveEntry(kPath)) && noexcept(SyncFile(kPath)) && noexcept(SyncFolder(kPath)) && noexcept(FreeSpace(kPath)) && noexcept(ReserveSpace(kPath, 0)) && noexcept(ReleaseReserve(kPath)) && noexcept(CurrentProcess()) && noexcept(RandomNumber()) && noexcept(LinkFile(kPath,
+                                                                                                                                                                                                                                                                                            kPath)) && noexcept(MakePrivate(kPath)) && noexcept(CopyRights(kPath,
+                                                                                                                                                                                                                                                                                                                                                           kPath)) && noexcept(MaySpeakFor({},
+                                                                                                                                                                                                                                                                                                                                                                                           {})));
 
 }  // namespace
 }  // namespace platform

@@ -5,6 +5,7 @@
 #include <gdal_alg.h>
 #include <gdal_priv.h>
 #include <gtest/gtest.h>
+#include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -20,6 +21,7 @@
 
 #include "gdal/Options.h"
 #include "gdal/SampleType.h"
+#include "gdal/VsiSource.h"
 #include "host/file/PyramidHeader.h"
 #include "host/journal/MetadataJournal.h"
 #include "tests/support/LenientHeaders.h"
@@ -341,12 +343,77 @@ TEST_F(DriverTest, StoreThatWasCutOffIsPutInOrder) {
     std::fstream(name, std::ios::in | std::ios::out | std::ios::binary)
             .seekp(static_cast<std::streamoff>(document))
         << '\x1A';
+    const std::string damaged = zmctest::ReadText(name);
     CPLPushErrorHandler(CPLQuietErrorHandler);
-    const DatasetPtr opened = Open(name);
+    EXPECT_TRUE(Open(name));
+    EXPECT_NE(std::string(CPLGetLastErrorMsg()).find("zmcraster recover"), std::string::npos);
+    EXPECT_EQ(zmctest::ReadText(name), damaged) << "who opens for reading writes nothing";
+    const DatasetPtr opened = Open(name, GDAL_OF_UPDATE);
     EXPECT_NE(std::string(CPLGetLastErrorMsg()).find("again the one of before"), std::string::npos);
     CPLPopErrorHandler();
     EXPECT_EQ(MeanOf(*opened), mean);
     EXPECT_FALSE(fs::exists(zmchost::MetadataJournal::PathFor(name)));
+}
+
+// What a build leaves that is ended between the names of its files.
+TEST_F(DriverTest, StagedSidecarOfThisFileIsSeenAndGetsItsNameForUpdate) {
+    const std::string name = MakeCopy(*Memory(20, 10, 1, GDT_Byte));
+    const std::string usual = name + ".aux.xml";
+    const auto unitOf = [&](unsigned flags) {
+        const DatasetPtr dataset = Open(name, flags);
+        return std::string(dataset->GetRasterBand(1)->GetUnitType());
+    };
+    const auto sidecar = [](const std::string& unit) {
+        return "<PAMDataset><PAMRasterBand band=\"1\"><UnitType>" + unit +
+               "</UnitType></PAMRasterBand></PAMDataset>";
+    };
+    zmctest::WriteText(usual, sidecar("old"));
+    const auto source = OpenByName(name, false);
+    const auto header = zmchost::PyramidHeader::Read(*source, name);
+    const std::string base =
+        fs::path(name).parent_path() / ("." + fs::path(name).filename().string() + ".zmcside-" +
+                                        std::to_string(source->Identify().number) + "-");
+    const std::string staged = base + std::to_string(header.tileDataEnd) + ".aux.xml";
+    const std::string foreign = base + "1.aux.xml";
+    zmctest::WriteText(foreign, sidecar("foreign"));
+    EXPECT_EQ(unitOf(GDAL_OF_READONLY), "old") << "that is of another file";
+    zmctest::WriteText(staged, sidecar("new"));
+    EXPECT_EQ(unitOf(GDAL_OF_READONLY), "new");
+    EXPECT_EQ(zmctest::ReadText(usual), sidecar("old")) << "who reads changes nothing";
+    EXPECT_EQ(unitOf(GDAL_OF_UPDATE), "new");
+    EXPECT_EQ(zmctest::ReadText(usual), sidecar("new"));
+    EXPECT_FALSE(fs::exists(staged));
+    EXPECT_TRUE(fs::exists(foreign)) << "the next build removes it";
+    zmctest::WriteText(staged, "<PAMDataset />\n");
+    EXPECT_EQ(unitOf(GDAL_OF_READONLY), "");
+    EXPECT_EQ(unitOf(GDAL_OF_UPDATE), "");
+    EXPECT_FALSE(fs::exists(usual));
+}
+
+// Opening a pipe would wait for its other end.
+TEST_F(DriverTest, PipesBesideARasterAreNotOpened) {
+    const std::string name = MakeCopy(*Memory(20, 10, 1, GDT_Byte));
+    for (const char* const ending : {".aux.xml", ".msk", ".ovr"}) {
+        const std::string pipe = name + ending;
+        fs::remove(pipe);
+        ASSERT_EQ(mkfifo(pipe.c_str(), 0600), 0);
+        alarm(60);
+        CPLPushErrorHandler(CPLQuietErrorHandler);
+        for (const int flags : {GDAL_OF_READONLY, GDAL_OF_UPDATE}) {
+            const DatasetPtr dataset = Open(name, static_cast<unsigned>(flags));
+            ASSERT_TRUE(dataset) << ending;
+            EXPECT_NE(std::string(CPLGetLastErrorMsg()).find("is no regular file"),
+                      std::string::npos);
+            EXPECT_EQ(dataset->GetRasterBand(1)->GetMaskFlags(), GMF_ALL_VALID);
+            unsigned char pixel = 0;
+            EXPECT_EQ(dataset->GetRasterBand(1)->RasterIO(GF_Read, 0, 0, 1, 1, &pixel, 1, 1,
+                                                          GDT_Byte, 0, 0, nullptr),
+                      CE_None);
+        }
+        CPLPopErrorHandler();
+        alarm(0);
+        fs::remove(pipe);
+    }
 }
 
 class LenientHeaders : public DriverTest,

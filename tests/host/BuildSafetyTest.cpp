@@ -14,6 +14,7 @@
 #include "host/build/PyramidBuilder.h"
 #include "host/build/TileStore.h"
 #include "host/raster/Raster.h"
+#include "platform/FileLock.h"
 #include "tests/support/MemorySource.h"
 #include "tests/support/ScratchDirectory.h"
 
@@ -177,22 +178,46 @@ TEST_F(BuildSafety, KilledBuildLeavesNameThatTheNextOneRemoves) {
     EXPECT_THAT(NamesIn(folder.String()), testing::ElementsAre("old.zmc"));
 }
 
-TEST_F(BuildSafety, OnlyLeavingsOfDeadProcessesAreRemoved) {
-    const pid_t child = fork();
-    if (child == 0) _exit(0);
-    waitpid(child, nullptr, 0);
-    const std::string dead = std::to_string(child);
-    const std::string stale = ".old.zmc.zmcbuild-" + dead + "-1.tmp";
+// A number of a process tells nothing: it may be one of another container, or used again.
+TEST_F(BuildSafety, OnlyLeavingsThatNobodyHoldsAreRemoved) {
+    const std::string alive = std::to_string(getppid()), dead = "99999999";
+    const std::vector<std::string> stale = {".old.zmc.zmcbuild-" + alive + "-1.tmp",
+                                            ".old.zmc.zmcbuild-" + dead + "-1.tmp"};
     const std::vector<std::string> kept = {
-        ".old.zmc.zmcbuild-" + std::to_string(getppid()) + "-1.tmp",
-        ".old.zmc.zmcbuild-" + dead + ".tmp", ".old.zmc.zmcbuild-" + dead + "-1.txt",
+        ".old.zmc.zmcbuild-" + dead + "-2.tmp",   ".old.zmc.zmcbuild-" + dead + ".tmp",
+        ".old.zmc.zmcbuild-" + dead + "-1.txt",   ".old.zmc.zmcbuild-" + dead + "-1.tmp.txt",
         ".other.zmc.zmcbuild-" + dead + "-1.tmp", "old.zmc.zmcbuild-" + dead + "-1.tmp"};
-    zmctest::WriteText(folder / stale, "");
-    for (const std::string& name : kept) zmctest::WriteText(folder / name, "");
+    for (const auto* const names : {&stale, &kept})
+        for (const std::string& name : *names) zmctest::WriteText(folder / name, "");
+    platform::FileLock lock;
+    ASSERT_EQ(lock.Take(folder / kept[0]), platform::FileLock::Result::Taken);
     builder.Build(source, target, Overwriting());
     const auto names = NamesIn(folder.String());
-    EXPECT_THAT(names, testing::Not(testing::Contains(stale)));
+    for (const std::string& name : stale) EXPECT_THAT(names, testing::Not(testing::Contains(name)));
     for (const std::string& name : kept) EXPECT_THAT(names, testing::Contains(name));
+}
+
+TEST_F(BuildSafety, FileUnderConstructionIsHeld) {
+    BuildOptions options = Overwriting();
+    std::size_t held = 0;
+    options.beforeNaming = [&](const std::string& path) {
+        platform::FileLock lock;
+        held += lock.Take(path) == platform::FileLock::Result::Held;
+        EXPECT_EQ(zmctest::ReadText(target), "the old file");
+    };
+    builder.Build(source, target, options);
+    EXPECT_EQ(held, 1u);
+    platform::FileLock lock;
+    EXPECT_EQ(lock.Take(target), platform::FileLock::Result::Taken) << "and not any longer";
+}
+
+TEST_F(BuildSafety, WhatIsThrownBeforeNamingLeavesTheOldFile) {
+    BuildOptions options = Overwriting();
+    options.beforeNaming = [](const std::string&) {
+        throw std::runtime_error("no room beside it");
+    };
+    EXPECT_THROW(builder.Build(source, target, options), std::runtime_error);
+    ExpectNothingChanged();
 }
 
 TEST_F(BuildSafety, FullDiskIsSeenBeforeTheBuild) {

@@ -6,7 +6,6 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <climits>
 #include <filesystem>
 #include <string>
 
@@ -144,17 +143,6 @@ TEST_F(FileSystemFaults, ReadOnlyIsWhatNobodyMayWrite) {
     EXPECT_FALSE(StatusOf(path).readOnly);
     ASSERT_EQ(chmod(path.c_str(), 0444), 0);
     EXPECT_TRUE(StatusOf(path).readOnly);
-}
-
-TEST_F(FileSystemFaults, ProcessesThatLiveAndThatDoNot) {
-    EXPECT_TRUE(ProcessAlive(CurrentProcess()));
-    EXPECT_TRUE(ProcessAlive(1));
-    EXPECT_FALSE(ProcessAlive(0));
-    EXPECT_FALSE(ProcessAlive(std::uint64_t{INT_MAX} + 1));
-    const pid_t child = fork();
-    if (child == 0) _exit(0);
-    ASSERT_EQ(waitpid(child, nullptr, 0), child);
-    EXPECT_FALSE(ProcessAlive(static_cast<std::uint64_t>(child)));
 }
 
 TEST_F(FileSystemFaults, LocksTellWhyTheyFail) {

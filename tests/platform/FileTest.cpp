@@ -14,6 +14,7 @@
 
 #include "platform/FileLock.h"
 #include "platform/FileSystem.h"
+#include "platform/Rights.h"
 
 namespace platform {
 namespace {
@@ -234,6 +235,107 @@ TEST_F(FileTest, LockHasOneHolder) {
     EXPECT_EQ(second.Take(path + "2"), FileLock::Result::Held) << "it goes with the file";
     first.Release();
     EXPECT_EQ(second.Take(path + "2"), FileLock::Result::Taken);
+}
+
+TEST_F(FileTest, ThoseWhoLookShareALock) {
+    const std::string path = (directory / "lock").string();
+    ASSERT_TRUE(CreateNewFile(path));
+    FileLock first, second, alone;
+    EXPECT_EQ(first.Take(path, FileLock::Kind::Shared), FileLock::Result::Taken);
+    EXPECT_EQ(second.Take(path, FileLock::Kind::Shared), FileLock::Result::Taken);
+    EXPECT_EQ(alone.Take(path), FileLock::Result::Held);
+    first.Release();
+    second.Release();
+    EXPECT_EQ(alone.Take(path), FileLock::Result::Taken);
+    EXPECT_EQ(second.Take(path, FileLock::Kind::Shared), FileLock::Result::Held);
+}
+
+TEST_F(FileTest, LockIsOfARegularFileUnderItsOwnName) {
+    const std::string path = (directory / "file").string();
+    ASSERT_TRUE(CreateNewFile(path));
+    const std::string link = (directory / "link").string();
+    std::filesystem::create_symlink(path, link);
+    const std::string fifo = (directory / "pipe").string();
+    ASSERT_EQ(mkfifo(fifo.c_str(), 0600), 0);
+    for (const auto kind : {FileLock::Kind::Alone, FileLock::Kind::Shared})
+        for (const std::string& name : {link, fifo, directory.string()}) {
+            FileLock lock;
+            EXPECT_EQ(lock.Take(name, kind), FileLock::Result::Failed) << name;
+            EXPECT_NE(errno, 0);
+            EXPECT_FALSE(lock.Status().exists);
+        }
+}
+
+TEST_F(FileTest, FileThatIsLockedIsReadWhateverTakesItsName) {
+    const std::string path = (directory / "lock").string();
+    ASSERT_TRUE(CreateNewFile(path));
+    const auto file = File::Open(Name("lock").c_str(), File::Mode::Update);
+    ASSERT_EQ(file->WriteAt(0, "text", 4), 4u);
+    FileLock lock;
+    ASSERT_EQ(lock.Take(path), FileLock::Result::Taken);
+    std::filesystem::rename(path, path + "2");
+    ASSERT_TRUE(CreateNewFile(path));
+    char text[8] = {};
+    EXPECT_EQ(lock.ReadAt(1, text, sizeof text), 3u);
+    EXPECT_STREQ(text, "ext");
+    EXPECT_EQ(lock.Status().size, 4u);
+    EXPECT_EQ(lock.Status().number, StatusOf(path + "2").number);
+    EXPECT_EQ(lock.Status().owner, geteuid());
+    lock.Release();
+    EXPECT_EQ(lock.ReadAt(0, text, sizeof text), 0u);
+}
+
+TEST_F(FileTest, AFileHasSeveralNamesWhereNoneIsTaken) {
+    const std::string path = (directory / "a").string();
+    ASSERT_TRUE(CreateNewFile(path));
+    EXPECT_TRUE(LinkFile(path, path + "2"));
+    EXPECT_EQ(StatusOf(path).number, StatusOf(path + "2").number);
+    EXPECT_FALSE(LinkFile(path, path + "2"));
+}
+
+TEST(MaySpeakFor, IsTrueOfTheOwnerTheSuperuserAndOurselves) {
+    FileStatus note, file;
+    file.owner = 70001;
+    for (const std::uint64_t owner :
+         {std::uint64_t{70001}, std::uint64_t{0}, std::uint64_t{geteuid()}}) {
+        note.owner = owner;
+        EXPECT_TRUE(MaySpeakFor(note, file)) << owner;
+    }
+    note.owner = 70002;
+    EXPECT_FALSE(MaySpeakFor(note, file));
+}
+
+mode_t ModeOf(const std::string& path) {
+    struct stat info {};
+    return stat(path.c_str(), &info) == 0 ? info.st_mode & 07777 : 0;
+}
+
+TEST_F(FileTest, RightsGoFromOneFileToAnother) {
+    const std::string from = (directory / "from").string(), to = (directory / "to").string();
+    ASSERT_TRUE(CreateNewFile(from) && CreateNewFile(to));
+    EXPECT_TRUE(MakePrivate(to));
+    EXPECT_EQ(ModeOf(to), 0600u);
+    ASSERT_EQ(chmod(from.c_str(), 0646), 0);
+    EXPECT_TRUE(CopyRights(from, to));
+    EXPECT_EQ(ModeOf(to), 0646u);
+    EXPECT_FALSE(CopyRights((directory / "none").string(), to));
+    EXPECT_FALSE(CopyRights(from, (directory / "none").string()));
+}
+
+// Whoever may write the folder can put another file under the name meanwhile.
+TEST_F(FileTest, RightsAreGivenToNoFileOfOthers) {
+    const std::string from = (directory / "from").string(), other = (directory / "other").string();
+    ASSERT_TRUE(CreateNewFile(from) && CreateNewFile(other));
+    ASSERT_EQ(chmod(from.c_str(), 0666), 0);
+    ASSERT_EQ(chmod(other.c_str(), 0600), 0);
+    const std::string link = (directory / "link").string(), name = (directory / "name").string();
+    std::filesystem::create_symlink(other, link);
+    EXPECT_FALSE(CopyRights(from, link));
+    EXPECT_FALSE(MakePrivate(link));
+    ASSERT_TRUE(LinkFile(other, name));
+    EXPECT_FALSE(CopyRights(from, name));
+    EXPECT_FALSE(CopyRights(from, directory.string()));
+    EXPECT_EQ(ModeOf(other), 0600u);
 }
 
 TEST_F(FileTest, LockGoesWithItsProcess) {

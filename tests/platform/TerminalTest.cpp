@@ -3,9 +3,12 @@
 #include <gtest/gtest.h>
 #include <stdlib.h>
 #include <sys/ioctl.h>
+#include <sys/resource.h>
 #include <unistd.h>
 
+#include <cerrno>
 #include <csignal>
+#include <cstdio>
 #include <string>
 
 #include "platform/Interrupts.h"
@@ -89,6 +92,45 @@ TEST(Terminal, TextsGoOutWhole) {
     close(ends[1]);
 }
 
+// Each in a process of its own, whose streams these are.
+TEST(Terminal, StreamsThatAreMissingAreHeldAndStillFail) {
+    for (const int closed : {STDIN_FILENO, STDOUT_FILENO, STDERR_FILENO})
+        EXPECT_EXIT(
+            {
+                close(closed);
+                const bool held = HoldStandardStreams();
+                const int next = open("/dev/null", O_RDWR);
+                char byte = 0;
+                const bool fails = closed == STDIN_FILENO ? read(closed, &byte, 1) == -1
+                                                          : write(closed, &byte, 1) == -1;
+                _exit(held && next > STDERR_FILENO && fails ? 7 : 1);
+            },
+            testing::ExitedWithCode(7), "");
+    EXPECT_EXIT(
+        {
+            for (const int number : {STDIN_FILENO, STDOUT_FILENO, STDERR_FILENO}) close(number);
+            const bool held = HoldStandardStreams();
+            _exit(held && open("/dev/null", O_RDWR) > STDERR_FILENO ? 7 : 1);
+        },
+        testing::ExitedWithCode(7), "");
+}
+
+TEST(Terminal, StreamsThatAreThereStayAsTheyAre) {
+    int ends[2];
+    ASSERT_EQ(pipe(ends), 0);
+    EXPECT_EXIT(
+        {
+            dup2(ends[1], STDOUT_FILENO);
+            const bool held = HoldStandardStreams();
+            _exit(held && write(STDOUT_FILENO, "x", 1) == 1 ? 7 : 1);
+        },
+        testing::ExitedWithCode(7), "");
+    char byte = 0;
+    EXPECT_EQ(read(ends[0], &byte, 1), 1);
+    close(ends[0]);
+    close(ends[1]);
+}
+
 // Each in a process of its own, as the mark and the handlers are the process's.
 TEST(Interrupts, TheFirstSetsAMarkAndTheSecondEndsTheProcess) {
     EXPECT_EXIT(
@@ -119,6 +161,22 @@ TEST(Interrupts, WhatTheCallerIgnoresStaysIgnored) {
             std::raise(SIGHUP);
             std::raise(SIGHUP);
             std::_Exit(IsInterrupted() ? 1 : 7);
+        },
+        testing::ExitedWithCode(7), "");
+}
+
+TEST(Interrupts, AFileThatGrowsTooLargeFailsItsWrite) {
+    EXPECT_EXIT(
+        {
+            std::signal(SIGXFSZ, SIG_DFL);
+            CatchInterrupts();
+            rlimit limit{};
+            limit.rlim_cur = limit.rlim_max = 4;
+            setrlimit(RLIMIT_FSIZE, &limit);
+            std::FILE* const file = std::tmpfile();
+            const bool first = write(fileno(file), "text", 4) == 4;
+            const bool second = write(fileno(file), "more", 4) == -1 && errno == EFBIG;
+            _exit(first && second && !IsInterrupted() ? 7 : 1);
         },
         testing::ExitedWithCode(7), "");
 }

@@ -173,7 +173,7 @@ class Failures(ToolTest):
 
     def test_names_with_line_ends_give_one_line(self):
         done = self.run_tool("info", "two\nlines")
-        self.assertEqual(done.stderr, "zmcraster: two lines: there is no such file\n")
+        self.assertEqual(done.stderr, "zmcraster: two\\x0alines: there is no such file\n")
 
     def test_names_that_are_not_utf8(self):
         name = os.fsdecode(b"b\xffd.pyr")

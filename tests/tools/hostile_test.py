@@ -1,0 +1,562 @@
+"""Folders in which somebody else works at the same time, and who is not a friend."""
+import hashlib
+import os
+import resource
+import signal
+import socket
+import stat
+import subprocess
+import threading
+import time
+import unittest
+
+import numpy as np
+from osgeo import gdal, osr
+
+from frame import TOOL, ToolTest, geotiff, samples
+from pyramid import Pyramid
+
+READERS = (["info", "{}"], ["hash", "{}"], ["verify", "{}"], ["recover", "{}"],
+           ["compare", "{}", "picture.pyr"], ["compare", "picture.pyr", "{}"],
+           ["verify", "picture.pyr", "--against", "{}"], ["export", "{}", "out.png"],
+           ["build", "{}", "out.pyr"], ["export", "picture.pyr", "{}"])
+
+
+class NoFiles(ToolTest):
+    """What waits for ever, or does anything, when it is opened."""
+
+    def plant(self, name, kind):
+        path = self.path(name)
+        if kind == "pipe":
+            os.mkfifo(path)
+        elif kind == "socket":
+            plug = socket.socket(socket.AF_UNIX)
+            self.addCleanup(plug.close)
+            plug.bind(path)
+        elif kind == "folder":
+            os.mkdir(path)
+        else:
+            os.symlink("/dev/zero", path)
+
+    def test_are_refused_at_once_in_one_line(self):
+        self.pyramid()
+        for kind in ("pipe", "socket", "device", "folder"):
+            self.plant(kind, kind)
+            for command in READERS:
+                with self.subTest((kind, *command)):
+                    words = [word.format(kind) for word in command]
+                    begin = time.monotonic()
+                    done = self.run_tool(*words)
+                    self.assertLess(time.monotonic() - begin, 20)
+                    self.assertEqual((done.returncode, done.stdout), (1, ""), done)
+                    self.assertRegex(done.stderr, r"^zmcraster: [^\n]+\n$")
+                    if kind != "folder":
+                        self.assertEqual(done.stderr,
+                                         f"zmcraster: {kind}: it is not a regular file\n")
+            self.assertEqual(self.run_tool("build", "picture.tif", kind, "--overwrite").returncode, 1)
+        self.assertEqual(self.files(),
+                         ["device", "folder", "picture.pyr", "picture.tif", "pipe", "socket"])
+
+    def test_beside_a_raster_they_are_not_opened(self):
+        self.pyramid()
+        expected = self.good("hash", "picture.pyr").split()[0]
+        for ending in (".aux.xml", ".msk", ".ovr"):
+            for name in ("picture.pyr", "picture.tif"):
+                self.plant(name + ending, "pipe")
+        for words in (["hash", "picture.pyr"], ["hash", "picture.tif"],
+                      ["verify", "picture.pyr", "--against", "picture.tif"],
+                      ["compare", "picture.tif", "picture.pyr"], ["info", "picture.pyr"],
+                      ["build", "picture.tif", "other.pyr"],
+                      ["export", "picture.pyr", "back.tif"]):
+            done = self.run_tool(*words)
+            self.assertEqual(done.returncode, 0, done)
+            if words[0] == "hash":
+                self.assertEqual(done.stdout.split()[0], expected)
+
+    def test_in_a_virtual_raster_they_are_not_opened(self):
+        os.mkfifo(self.path("pipe"))
+        with open(self.path("trap.vrt"), "w") as file:
+            file.write('<VRTDataset rasterXSize="10" rasterYSize="10"><VRTRasterBand '
+                       'dataType="Byte" band="1"><SimpleSource><SourceFilename relativeToVRT="1">'
+                       'pipe</SourceFilename></SimpleSource></VRTRasterBand></VRTDataset>')
+        self.assertEqual(self.run_tool("build", "trap.vrt", "made.pyr").returncode, 1)
+        self.assertEqual(self.run_tool("hash", "trap.vrt").returncode, 1)
+        self.assertEqual(self.files(), ["pipe", "trap.vrt"])
+
+
+class Names(ToolTest):
+    """A name of a file may hold anything but a slash."""
+
+    EVIL = "a\x1b]0;owned\x07\x1b[2Jb\r\nzmcraster: c\x9b31m\u202egpj.\x7f"
+    SHOWN = (r"a\x1b]0;owned\x07\x1b[2Jb\x0d\x0azmcraster: c\xc2\x9b31m\xe2\x80\xaegpj.\x7f")
+
+    def check(self, done, status):
+        self.assertEqual(done.returncode, status, done)
+        for text in (done.stdout, done.stderr):
+            bad = [c for c in text if c != "\n" and (ord(c) < 32 or 127 <= ord(c) < 160 or
+                                                     c in "\u202e\u2066")]
+            self.assertEqual(bad, [], text)
+        self.assertTrue(done.stderr == "" or done.stderr.count("\n") == 1, done)
+        return done.stdout + done.stderr
+
+    def test_nothing_of_them_steers_a_terminal(self):
+        pixels = self.picture()
+        os.rename(self.path("picture.tif"), self.path(self.EVIL + ".tif"))
+        source, made = self.EVIL + ".tif", self.EVIL + ".pyr"
+        self.assertTrue(self.check(self.run_tool("build", source, made), 0)
+                        .startswith(self.SHOWN + ".pyr: 700 x 300 pixels"))
+        self.assertTrue(self.check(self.run_tool("info", made), 0).startswith(self.SHOWN + ".pyr\n"))
+        digest = hashlib.sha256(pixels.tobytes()).hexdigest()
+        self.assertEqual(self.check(self.run_tool("hash", made), 0),
+                         f"{digest}  {self.SHOWN}.pyr\n")
+        self.assertEqual(self.check(self.run_tool("compare", source, made), 0),
+                         f"{self.SHOWN}.tif and {self.SHOWN}.pyr are equal\n")
+        self.check(self.run_tool("export", made, self.EVIL + ".png"), 0)
+        self.check(self.run_tool("recover", made), 0)
+        self.check(self.run_tool("verify", made, "--against", source), 0)
+        self.picture("other.tif", seed=2)
+        self.check(self.run_tool("verify", made, "--against", "other.tif"), 3)
+        self.picture("narrow.tif", width=500)
+        os.rename(self.path("narrow.tif"), self.path(self.EVIL))
+        self.assertIn(self.SHOWN + " has 500 x 300 pixels",
+                      self.check(self.run_tool("verify", made, "--against", self.EVIL), 3))
+
+    def test_messages_show_them_too(self):
+        name = self.EVIL
+        for words in (["info", name], ["hash", name], ["build", name, "x.pyr"],
+                      ["export", name, "x.tif"], ["compare", name, name], ["verify", name],
+                      ["recover", name]):
+            self.assertEqual(self.check(self.run_tool(*words), 1),
+                             f"zmcraster: {self.SHOWN}: there is no such file\n")
+        self.pyramid()
+        for words in ([name], ["hash", "picture.pyr", "--bands", name],
+                      ["hash", "picture.pyr", "--" + name], ["build", "picture.tif", "a", "b", name],
+                      ["export", "picture.pyr", "x", "--format", name]):
+            self.assertIn(r"\x1b[2J", self.check(self.run_tool(*words), 2))
+        os.rename(self.path("picture.pyr"), self.path(name))
+        with open(self.path(name + ".zmcmeta"), "w") as copy:
+            copy.write("torn")
+        self.assertIn(r"\x1b[2J", self.check(self.run_tool("hash", name), 0))
+        os.remove(self.path(name + ".zmcmeta"))
+        os.truncate(self.path(name), 1000)
+        self.check(self.run_tool("verify", name), 3)
+        self.assertTrue(self.check(self.run_tool("hash", name), 1)
+                        .startswith(f"zmcraster: {self.SHOWN}: cannot read "))
+
+    def test_documents_have_them_exactly(self):
+        self.pyramid()
+        os.rename(self.path("picture.pyr"), self.path(self.EVIL))
+        for command in ("info", "hash", "verify"):
+            self.assertEqual(self.document(command, self.EVIL)["file"], self.EVIL)
+
+
+class Limits(ToolTest):
+    def test_a_limit_of_file_sizes_is_a_refusal_and_leaves_nothing(self):
+        self.pyramid("made.pyr")
+        with open(self.path("made.pyr"), "rb") as file:
+            old = file.read()
+        self.picture("large.tif", 2600, 2600, 3)
+        for target, status in (("made.pyr", 1), ("new.pyr", 1)):
+            done = self.run_tool(
+                "build", "large.tif", target, "--overwrite",
+                preexec_fn=lambda: resource.setrlimit(resource.RLIMIT_FSIZE, (12 << 20, 12 << 20)))
+            self.assertEqual((done.returncode, done.stdout), (status, ""), done)
+            self.assertRegex(done.stderr, rf"^zmcraster: {target}: [^\n]*File too large[^\n]*\n$")
+            self.assertEqual(self.files(), ["large.tif", "made.pyr", "picture.tif"])
+        with open(self.path("made.pyr"), "rb") as file:
+            self.assertEqual(file.read(), old)
+        done = self.run_tool(
+            "export", "made.pyr", "back.tif",
+            preexec_fn=lambda: resource.setrlimit(resource.RLIMIT_FSIZE, (65536, 65536)))
+        self.assertEqual((done.returncode, self.files()),
+                         (1, ["large.tif", "made.pyr", "picture.tif"]), done)
+
+
+@unittest.skipUnless(os.geteuid() == 0, "only root makes containers here")
+class Containers(ToolTest):
+    def test_a_build_in_another_container_is_alive(self):
+        """Its process has a number here that no process has, or another one."""
+        dataset = gdal.GetDriverByName("GTiff").Create(
+            self.path("large.tif"), 20000, 20000, 3, gdal.GDT_Byte, ["SPARSE_OK=TRUE"])
+        dataset = None
+        self.picture()
+        build = subprocess.Popen(["unshare", "--pid", "--fork", "--kill-child", TOOL, "build",
+                                  "large.tif", "made.pyr"], cwd=self.folder,
+                                 stdout=subprocess.PIPE, stderr=subprocess.PIPE, text=True)
+        deadline = time.monotonic() + 60
+        while not [name for name in self.files() if ".zmcbuild-" in name]:
+            if build.poll() is not None:
+                self.skipTest("no container can be made here: " + build.communicate()[1])
+            self.assertLess(time.monotonic(), deadline)
+            time.sleep(0.001)
+        ours = [name for name in self.files() if ".zmcbuild-" in name]
+        self.good("build", "picture.tif", "made.pyr", "--quiet")
+        self.assertEqual([name for name in self.files() if ".zmcbuild-" in name], ours)
+        build.kill()
+        build.communicate()
+        deadline = time.monotonic() + 60
+        while [name for name in self.files() if ".zmcbuild-" in name]:
+            self.assertLess(time.monotonic(), deadline)
+            self.good("build", "picture.tif", "made.pyr", "--quiet", "--overwrite")
+        self.assertEqual(self.files(), ["large.tif", "made.pyr", "picture.tif"])
+
+
+class Rights(ToolTest):
+    """What may be done with a target outlives its replacement."""
+
+    def build(self, name="made.pyr", mask=0o022, source="picture.tif"):
+        done = self.run_tool("build", source, name, "--overwrite", preexec_fn=lambda: os.umask(mask))
+        self.assertEqual(done.returncode, 0, done)
+
+    def mode(self, name):
+        return stat.S_IMODE(os.stat(self.path(name)).st_mode)
+
+    def test_a_new_file_obeys_the_mask_of_the_process(self):
+        geotiff(self.path("picture.tif"), samples("Byte", 20, 20, 1), nodata=7)
+        for mask, mode in ((0o022, 0o644), (0o077, 0o600), (0o002, 0o664)):
+            name = f"made{mask:o}.pyr"
+            self.build(name, mask)
+            self.assertEqual(self.mode(name), mode)
+            self.assertEqual(self.mode(name + ".aux.xml"), mode)
+
+    def test_the_mode_stays(self):
+        geotiff(self.path("picture.tif"), samples("Byte", 20, 20, 1), nodata=7)
+        self.build()
+        for mode in (0o600, 0o640, 0o664, 0o606, 0o700):
+            os.chmod(self.path("made.pyr"), mode)
+            os.chmod(self.path("made.pyr.aux.xml"), mode)
+            self.build()
+            self.assertEqual((self.mode("made.pyr"), self.mode("made.pyr.aux.xml")), (mode, mode))
+
+    def test_a_sidecar_that_comes_new_is_no_more_open_than_its_pyramid(self):
+        self.picture("plain.tif", 20, 20, 1)
+        geotiff(self.path("with.tif"), samples("Byte", 20, 20, 1), nodata=7)
+        self.build(source="plain.tif")
+        os.chmod(self.path("made.pyr"), 0o600)
+        self.build(source="with.tif")
+        self.assertEqual(self.mode("made.pyr.aux.xml"), 0o600)
+
+    def test_while_it_grows_it_is_nobody_elses(self):
+        self.pyramid("made.pyr")
+        dataset = gdal.GetDriverByName("GTiff").Create(
+            self.path("large.tif"), 9000, 9000, 3, gdal.GDT_Byte, ["SPARSE_OK=TRUE"])
+        dataset = None
+        os.chmod(self.path("made.pyr"), 0o600)
+        child = subprocess.Popen([TOOL, "build", "large.tif", "made.pyr", "--overwrite", "-q"],
+                                 cwd=self.folder)
+        seen = set()
+        while child.poll() is None:
+            for name in self.files():
+                if ".zmcbuild-" in name:
+                    try:
+                        status = os.stat(self.path(name))
+                    except FileNotFoundError:
+                        continue
+                    if status.st_size > 0:
+                        seen.add(stat.S_IMODE(status.st_mode))
+        self.assertEqual((child.returncode, seen), (0, {0o600}))
+
+    @unittest.skipUnless(os.geteuid() == 0, "only root gives files away")
+    def test_owner_and_group_stay(self):
+        self.picture()
+        self.build()
+        os.chown(self.path("made.pyr"), 1234, 2345)
+        os.chmod(self.path("made.pyr"), 0o640)
+        self.build()
+        status = os.stat(self.path("made.pyr"))
+        self.assertEqual((status.st_uid, status.st_gid, self.mode("made.pyr")), (1234, 2345, 0o640))
+
+    @unittest.skipUnless(os.geteuid() == 0, "only root becomes somebody else")
+    def test_a_group_that_cannot_be_given_is_not_replaced_by_a_wider_one(self):
+        self.picture()
+        self.build()
+        os.chmod(self.folder, 0o777)
+        os.chown(self.path("made.pyr"), 1234, 2345)
+        os.chmod(self.path("made.pyr"), 0o666)
+        done = self.run_tool("build", "picture.tif", "made.pyr", "--overwrite", user=4321,
+                             group=5432, extra_groups=[])
+        if "Permission" in done.stderr:
+            self.skipTest("the program is not for others here: " + done.stderr)
+        self.assertEqual(done.returncode, 0, done)
+        status = os.stat(self.path("made.pyr"))
+        self.assertEqual((status.st_uid, status.st_gid, self.mode("made.pyr")), (4321, 5432, 0o666))
+        os.chown(self.path("made.pyr"), 4321, 2345)
+        os.chmod(self.path("made.pyr"), 0o664)
+        self.run_tool("build", "picture.tif", "made.pyr", "--overwrite", user=4321, group=5432,
+                      extra_groups=[])
+        status = os.stat(self.path("made.pyr"))
+        self.assertEqual((status.st_uid, status.st_gid, self.mode("made.pyr")), (4321, 5432, 0o644))
+
+    def test_attributes_and_the_access_list_stay(self):
+        self.picture()
+        self.build()
+        path = self.path("made.pyr")
+        # Version 2; the owner rw, user 1234 r, the group -, the mask r, others -.
+        entries = ((1, 6, 0xFFFFFFFF), (2, 4, 1234), (4, 0, 0xFFFFFFFF), (16, 4, 0xFFFFFFFF),
+                   (32, 0, 0xFFFFFFFF))
+        access = (2).to_bytes(4, "little") + b"".join(
+            tag.to_bytes(2, "little") + bits.to_bytes(2, "little") + who.to_bytes(4, "little")
+            for tag, bits, who in entries)
+        wanted = {"user.origin": b"survey 7", "system.posix_acl_access": access}
+        for name, value in list(wanted.items()):
+            try:
+                os.setxattr(path, name, value)
+            except OSError:
+                del wanted[name]
+        if not wanted:
+            self.skipTest("the file system has no attributes")
+        mode = self.mode("made.pyr")
+        self.build()
+        self.assertEqual({name: os.getxattr(path, name) for name in wanted}, wanted)
+        self.assertEqual(self.mode("made.pyr"), mode)
+
+
+class Moments(ToolTest):
+    """A raster that changes while it is read."""
+
+    SIDE = 3000
+
+    def setUp(self):
+        super().setUp()
+        self.digests = set()
+        for number in (1, 2):
+            pixels = samples("Byte", self.SIDE, self.SIDE, 3, seed=number)
+            geotiff(self.path(f"{number}.tif"), pixels)
+            self.good("build", f"{number}.tif", f"{number}.pyr")
+            self.digests.add(hashlib.sha256(pixels.tobytes()).hexdigest())
+
+    def contents(self, kind):
+        parts = []
+        for number in (1, 2):
+            with open(self.path(f"{number}.{kind}"), "rb") as file:
+                parts.append(file.read())
+        return parts
+
+    def hash_while(self, name, change):
+        """Digests of a raster that `change` goes on changing; each is one of the two or a failure."""
+        stop = threading.Event()
+
+        def work():
+            turn = 0
+            while not stop.is_set():
+                change(turn % 2)
+                turn += 1
+        thread = threading.Thread(target=work)
+        thread.start()
+        good = failed = 0
+        try:
+            for _ in range(12):
+                done = self.run_tool("hash", name)
+                if done.returncode == 0:
+                    good += 1
+                    self.assertIn(done.stdout.split()[0], self.digests)
+                else:
+                    failed += 1
+                    self.assertEqual((done.returncode, done.stdout), (1, ""), done)
+                    self.assertRegex(done.stderr, r"^(zmcraster: [^\n]+\n)+$")
+        finally:
+            stop.set()
+            thread.join()
+        return good, failed
+
+    def replace(self, name, kind):
+        parts = self.contents(kind)
+
+        def change(turn):
+            with open(self.path("next"), "wb") as file:
+                file.write(parts[turn])
+            os.rename(self.path("next"), self.path(name))
+            time.sleep(0.1)
+        change(0)
+        return change
+
+    def rewrite(self, name, kind):
+        parts = self.contents(kind)
+
+        def change(turn):
+            with open(self.path(name), "r+b" if os.path.exists(self.path(name)) else "wb") as file:
+                for at in range(0, len(parts[turn]), 1 << 20):
+                    file.seek(at)
+                    file.write(parts[turn][at:at + (1 << 20)])
+        change(0)
+        return change
+
+    def test_a_pyramid_that_is_replaced_has_the_digest_of_one_file(self):
+        good, failed = self.hash_while("a.pyr", self.replace("a.pyr", "pyr"))
+        self.assertGreater(good, 0, failed)
+
+    def test_a_pyramid_that_is_rewritten_has_the_digest_of_one_file_or_none(self):
+        self.hash_while("a.pyr", self.rewrite("a.pyr", "pyr"))
+
+    def test_a_picture_that_is_replaced_has_the_digest_of_one_file_or_none(self):
+        self.hash_while("a.tif", self.replace("a.tif", "tif"))
+
+    def test_a_picture_that_is_rewritten_has_the_digest_of_one_file_or_none(self):
+        self.hash_while("a.tif", self.rewrite("a.tif", "tif"))
+
+    def test_a_pyramid_that_was_built_just_now_has_a_digest(self):
+        for _ in range(3):
+            self.good("build", "1.tif", "new.pyr", "--overwrite", "--quiet")
+            self.assertIn(self.good("hash", "new.pyr").split()[0], self.digests)
+
+
+class ClosedStreams(ToolTest):
+    """Programs of some starters have no standard streams at all."""
+
+    def started(self, words, closed):
+        def close():
+            for number in closed:
+                os.close(number)
+        return subprocess.run([TOOL, *words], cwd=self.folder, preexec_fn=close, timeout=120,
+                              stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL,
+                              stderr=subprocess.DEVNULL).returncode
+
+    def content(self):
+        parts = {}
+        for name in ("picture.pyr", "picture.tif", "damaged.pyr"):
+            with open(self.path(name), "rb") as file:
+                parts[name] = file.read()
+        return parts
+
+    def test_no_file_gets_their_numbers(self):
+        self.pyramid()
+        # The parsers of libraries have something to say about this one.
+        with open(self.path("picture.pyr"), "rb") as file:
+            data = bytearray(file.read())
+        data[Pyramid(self.path("picture.pyr")).end + 60] = 0x3C
+        with open(self.path("damaged.pyr"), "wb") as file:
+            file.write(data)
+        before = self.content()
+        expected = Pyramid(self.path("picture.pyr")).read(0)
+        for closed in ((0,), (1,), (2,), (0, 1), (0, 2), (1, 2), (0, 1, 2)):
+            for words in (["info", "picture.pyr"], ["info", "damaged.pyr"], ["hash", "picture.pyr"],
+                          ["hash", "picture.tif"], ["verify", "damaged.pyr"],
+                          ["verify", "picture.pyr", "--against", "picture.tif"],
+                          ["compare", "picture.tif", "picture.pyr"], ["recover", "picture.pyr"],
+                          ["build", "picture.tif", "out.pyr", "--overwrite"],
+                          ["export", "picture.pyr", "out.tif"], ["hash", "nonesuch"]):
+                with self.subTest((closed, *words)):
+                    status = self.started(words, closed)
+                    self.assertIn(status, (0, 1, 3))
+                    self.assertEqual(self.content(), before)
+            # What is written is whole and has no message in it.
+            np.testing.assert_array_equal(Pyramid(self.path("out.pyr")).read(0), expected)
+            made = np.moveaxis(gdal.Open(self.path("out.tif")).ReadAsArray(), 0, -1)
+            np.testing.assert_array_equal(made, expected)
+
+    def test_a_result_that_nobody_can_read_is_a_failure(self):
+        self.pyramid()
+        self.assertEqual(self.started(["hash", "picture.pyr"], (1,)), 1)
+        self.assertEqual(self.started(["info", "picture.pyr", "--json"], (0, 1, 2)), 1)
+
+
+class ReadOnly(ToolTest):
+    def modes(self, words, path):
+        """The access modes of all descriptors of a file that the program was seen to have."""
+        child = subprocess.Popen([TOOL, *words], cwd=self.folder, stdout=subprocess.DEVNULL,
+                                 stderr=subprocess.DEVNULL)
+        modes = set()
+        while child.poll() is None:
+            folder = f"/proc/{child.pid}/fd"
+            try:
+                for number in os.listdir(folder):
+                    if os.readlink(f"{folder}/{number}") == path:
+                        with open(f"/proc/{child.pid}/fdinfo/{number}") as info:
+                            flags = int(info.read().split("flags:")[1].split()[0], 8)
+                        modes.add(flags & os.O_ACCMODE)
+            except OSError:
+                pass
+        self.assertEqual(child.returncode, 0, words)
+        return modes
+
+    def test_commands_that_read_open_for_reading_only(self):
+        geotiff(self.path("large.tif"), samples("Byte", 2500, 2500, 3))
+        self.good("build", "large.tif", "large.pyr")
+        path = os.path.realpath(self.path("large.pyr"))
+        for words in (["hash", "large.pyr"], ["verify", "large.pyr"],
+                      ["compare", "large.pyr", "large.tif"], ["export", "large.pyr", "back.tif"],
+                      ["build", "large.pyr", "other.pyr"]):
+            self.assertEqual(self.modes(words, path), {os.O_RDONLY}, words)
+
+
+class Endings(ToolTest):
+    """A build that is ended anywhere leaves the old raster or the new one, each with its own
+    georeference, no-data value and mask."""
+
+    RENAME, REMOVE, OPEN, SYNC = 64, 128, 1, 16
+
+    def raster(self, name, place, nodata, mask):
+        geotiff(self.path(name), np.full((30, 40, 1), place, np.uint8), nodata=nodata)
+        dataset = gdal.Open(self.path(name), gdal.GA_Update)
+        reference = osr.SpatialReference()
+        reference.ImportFromEPSG(32631)
+        dataset.SetSpatialRef(reference)
+        dataset.SetGeoTransform([place, 1, 0, place, 0, -1])
+        if mask is not None:
+            dataset.CreateMaskBand(gdal.GMF_PER_DATASET)
+            dataset.GetRasterBand(1).GetMaskBand().WriteArray(np.full((30, 40), mask, np.uint8))
+        dataset = None
+
+    def state(self, name):
+        """All that a reader sees of a raster, as one value."""
+        if os.path.exists(self.path("seen.tif")):
+            os.remove(self.path("seen.tif"))
+        done = self.run_tool("export", name, "seen.tif", "--quiet")
+        self.assertEqual((done.returncode, done.stderr), (0, ""))
+        seen = gdal.Open(self.path("seen.tif"))
+        band = seen.GetRasterBand(1)
+        return (int(band.ReadAsArray()[0, 0]), seen.GetGeoTransform(), band.GetNoDataValue(),
+                band.GetMaskFlags(), band.GetMaskBand().ReadAsArray().tobytes())
+
+    def kinds(self):
+        preload = os.environ.get("ZMC_FILE_FAULTS_LIBRARY")
+        if not preload:
+            self.skipTest("nothing can be loaded ahead of the program here")
+        return preload
+
+    def ended(self, n, source):
+        """Builds, and is killed before the n-th call on the folder; whether it was."""
+        preload = self.kinds()
+        calls = self.RENAME | self.REMOVE | self.OPEN | self.SYNC
+        done = self.run_tool(
+            "build", source, self.path("made.pyr"), "--overwrite", "--threads", "1", "--quiet",
+            env={**os.environ, "LD_PRELOAD": preload,
+                 "ZMC_FILE_FAULTS": f"{calls} {n} 0 3 0 {self.folder}"})
+        self.assertIn(done.returncode, (0, -signal.SIGKILL), done)
+        return done.returncode != 0
+
+    def every_ending(self, old, new):
+        self.raster("old.tif", *old)
+        self.raster("new.tif", *new)
+        states = []
+        for source in ("old.tif", "new.tif"):
+            self.good("build", source, "made.pyr", "--overwrite", "--quiet")
+            states.append(self.state("made.pyr"))
+        self.assertNotEqual(*states)
+        seen = []
+        n = 1
+        while True:
+            self.good("build", "old.tif", "made.pyr", "--overwrite", "--quiet")
+            clean = self.files()
+            self.assertEqual(self.state("made.pyr"), states[0], n)
+            if not self.ended(n, "new.tif"):
+                break
+            state = self.state("made.pyr")
+            self.assertIn(state, states, n)
+            seen.append(states.index(state))
+            self.good("build", "old.tif", "made.pyr", "--overwrite", "--quiet")
+            self.assertEqual(self.files(), clean, n)
+            n += 1
+        self.assertEqual(seen, sorted(seen), "once it is new it stays new")
+        self.assertEqual(set(seen), {0, 1})
+        self.assertGreater(n, 30)
+
+    def test_with_other_sidecars(self):
+        self.every_ending((10, 3, None), (20, 4, None))
+
+    def test_with_a_mask_before_and_after(self):
+        self.every_ending((10, None, 0), (20, None, 255))
+
+    def test_without_a_sidecar_afterwards(self):
+        self.raster("old.tif", 10, 3, None)
+        self.every_ending((10, 3, 0), (20, None, None))
