@@ -151,6 +151,7 @@ void PyramidXMLReaderCore::Leave(std::int32_t state) {
     } else if (state == StateOf(HISTOGRAMS)) {
         EndHistogram();
     } else if (state == StateOf(PALETTE)) {
+        if (!IsWhole(currentPalette)) throw std::bad_alloc();
         KeepPalette();
     }
 }
@@ -168,9 +169,7 @@ void PyramidXMLReaderCore::AddColor(ColorList::Rgba rgba) {
 // Sets no length: the colours are counted. The lookup leaves a null colour behind.
 void PyramidXMLReaderCore::LookUpColor(std::uint32_t index) { currentPalette.GetColor(index); }
 
-// CopyTo throws where memory runs out.
 void PyramidXMLReaderCore::KeepPalette() {
-    if (!IsWhole(currentPalette)) throw std::bad_alloc();
     currentPalette.CopyTo(palettes[paletteBand]);
 }
 
@@ -322,7 +321,6 @@ void PyramidRecordReader<T>::KeepPalette() {
     const auto& open = this->stateStack;
     if (std::find(open.begin(), open.end(), StateOf(PALETTE)) != open.end())
         return PyramidXMLReaderHandlers<T>::KeepPalette();
-    if (!IsWhole(this->currentPalette)) throw std::bad_alloc();
     Palette& kept = this->palettes[this->paletteBand];
     kept.Clear();
     kept.colors.swap(this->currentPalette.colors);

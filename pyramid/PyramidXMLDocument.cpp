@@ -158,6 +158,7 @@ public:
         if (found == childTexts.end()) return FILTER_ACCEPT;
         const std::string& text = found->second.text;
         const XMLSize_t length = target.getLen();
+        // unreachable: the serializer has written the start of the record before it asks for this
         failed |= length == 0 || target.getRawBuffer()[length - 1] != '>';
         target.writeChars(reinterpret_cast<const XMLByte*>(text.data()), text.size(), nullptr);
         return FILTER_REJECT;
@@ -215,7 +216,7 @@ PyramidXMLDocument::Taken PyramidXMLDocument::TakeTree(const xercesc::InputSourc
     if (!parsed) return Taken::Malformed;
     document = adoptDocument();
     elementCount = limits.nodes;
-    return document ? Taken::Tree : Taken::Malformed;
+    return Taken::Tree;
 }
 
 void PyramidXMLDocument::DropTree() {
@@ -353,7 +354,9 @@ bool PyramidXMLDocument::SerializeDocument(files::ByteSource& file, std::uint64_
         Serialize(*document, target, filler, complete);
         const std::size_t length = target.getLen();
         tooLong = length > kMaxDocumentBytes;
-        if (!complete || filler.HasFailed() || tooLong) return false;
+        // unreachable: the filler does not fail, and a target in memory takes all
+        if (!complete || filler.HasFailed()) return false;
+        if (tooLong) return false;
         return DocumentStore<files::ByteSource>(file, offset).Write(target.getRawBuffer(), length);
     });
 }

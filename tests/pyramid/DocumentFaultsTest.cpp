@@ -109,6 +109,35 @@ TEST_F(FetchFaults, AreWholeOrNothing) {
     EXPECT_GT(points, 100u);
 }
 
+// Of two palettes, one of which ends within the other, each is kept whole or the fetch is none.
+TEST_F(FetchFaults, PaletteWithinAnotherIsWholeOrNothing) {
+    PyramidDescription d;
+    d.samples = d.lines = 4;
+    PyramidModel model(d);
+    model.StoreAllImages();
+    const std::string text =
+        "<DATASET><PALETTE><PALETTE_BAND>0</PALETTE_BAND><PALETTE_RGBA>1|2|3|4</PALETTE_RGBA>"
+        "<PALETTE><PALETTE_RGBA>5|6|7|8</PALETTE_RGBA></PALETTE></PALETTE></DATASET>";
+    model.file.insert(model.file.end(), text.begin(), text.end());
+    model.Save(path);
+    const auto dataset = Open();
+    ASSERT_TRUE(dataset);
+    // The inner one begins afresh, and the outer one ends with what is there then.
+    const zelm::PalettePtr whole = dataset->GetPalette<unsigned char>(0);
+    ASSERT_EQ(whole->nextIndex, 1u);
+    ASSERT_EQ(whole->GetColor(0)->red, 5);
+    testing::internal::CaptureStderr();
+    const std::size_t points = ForEachAllocationFailing([&](AllocationFaults& faults) {
+        const zelm::PalettePtr palette = dataset->GetPalette<unsigned char>(0);
+        faults.Disarm();
+        if (!palette || palette->nextIndex == 0) return;
+        ASSERT_EQ(palette->nextIndex, 1u);
+        EXPECT_EQ(palette->GetColor(0)->red, 5);
+    });
+    testing::internal::GetCapturedStderr();
+    EXPECT_GT(points, 10u);
+}
+
 // Memory that is short at a store is no reason to refuse the next.
 TEST_F(FetchFaults, TreeThatFoundNoMemoryIsMadeByTheNextStore) {
     PyramidDescription d;

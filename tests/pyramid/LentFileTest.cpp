@@ -301,6 +301,42 @@ TEST_F(LentFileTest, MergeThatCannotReadTheOldSamplesWritesNothing) {
     EXPECT_EQ(recording->Take().Failures(), 0u);
 }
 
+// A file that did not tell its size while it was opened is looked at again by the first store, so
+// that no record goes.
+TEST_F(LentFileTest, DocumentOfAFileThatDidNotTellItsSizeIsReadByTheFirstStore) {
+    zelm::Array<zelm::RasterBandStats<unsigned char>> stats;
+    stats.Append({});
+    ASSERT_TRUE(Open()->SetBandStats(stats));
+    std::size_t opened = 0;
+    for (const bool fetchesFirst : {false, true})
+        for (std::size_t from = 1; from < 10; ++from) {
+            const auto memory = InMemory();
+            const auto faulty = std::make_shared<FaultySource>(memory);
+            faulty->beforeTransfer = [&](std::size_t n) {
+                if (n == from) faulty->sizeError = EIO;
+            };
+            const LentName name = Lend(faulty);
+            const auto dataset = OpenLent(name);
+            faulty->beforeTransfer = nullptr;
+            if (!dataset) continue;
+            ++opened;
+            const bool wasUnknown = faulty->sizeError != 0;
+            EXPECT_EQ(dataset->SetBandStats(stats), !wasUnknown);
+            faulty->sizeError = 0;
+            if (fetchesFirst) {
+                EXPECT_TRUE(dataset->HasBandStats<unsigned char>(0));
+            }
+            EXPECT_TRUE(dataset->SetBandStats(stats));
+            const auto bytes = memory->Content();
+            const std::string text(bytes.begin(), bytes.end());
+            std::size_t records = 0;
+            for (std::size_t at = 0; (at = text.find("<BANDSTATISTICS>", at)) != text.npos; ++at)
+                ++records;
+            EXPECT_EQ(records, wasUnknown ? 2u : 3u) << from;
+        }
+    EXPECT_GT(opened, 2u);
+}
+
 TEST_F(LentFileTest, AnswersOfASourceThatThrowsOutsideItsTransfersAreThoseOfAFailure) {
     const auto faulty = std::make_shared<FaultySource>(InMemory());
     const LentName name = Lend(faulty);
