@@ -87,10 +87,8 @@ public:
 
     // False, with the buffer as it was, if memory ran out.
     bool Read(unsigned char* buffer) const {
-        // A whole tile as it lies: what cannot be read stays as it was.
-        if (!request.planar && request.allInOrder && request.IsWholeTile()) {
-            file.ReadAt(PlaneStart(0, request.FirstTileX(), request.FirstTileY()), buffer,
-                        request.PlaneBytes());
+        if (request.LiesAlike() && request.IsWholeTile()) {
+            ReadWholeTile(buffer);
             return true;
         }
         const std::uint64_t runBytes = request.RunBytes();
@@ -103,6 +101,15 @@ public:
     }
 
 private:
+    // A whole tile as it lies. Where it holds all bands, what cannot be read stays as it was.
+    void ReadWholeTile(unsigned char* buffer) const {
+        const std::uint64_t start = PlaneStart(0, request.FirstTileX(), request.FirstTileY());
+        if (request.planar)
+            ReadOrZero(start, buffer, request.PlaneBytes());
+        else
+            file.ReadAt(start, buffer, request.PlaneBytes());
+    }
+
     void ReadSegment(const TilePart& piece, const TileSegment& segment, unsigned char* work,
                      unsigned char* buffer) const {
         if (segment.straight)
