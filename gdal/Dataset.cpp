@@ -9,6 +9,7 @@
 #include "gdal/Create.h"
 #include "gdal/LevelRefresh.h"
 #include "gdal/VsiSource.h"
+#include "host/file/Limits.h"
 #include "host/raster/LentFile.h"
 
 namespace zmcgdal {
@@ -18,6 +19,7 @@ constexpr const char* kStructureDomain = "IMAGE_STRUCTURE";
 constexpr const char* kOwnDomain = "ZMCPYRAMID";
 
 constexpr std::uint64_t kMaxTileBytes = INT_MAX;
+constexpr int kMostReadyBands = 1024;  // of a level
 
 zmchost::PyramidFileInfo CheckedInfo(const std::string& fileName,
                                      const zmchost::PyramidHeader& header) {
@@ -31,7 +33,8 @@ zmchost::PyramidFileInfo CheckedInfo(const std::string& fileName,
     const auto bands = std::min<std::uint32_t>(header.bandCount, INT_MAX);
     if (!GDALCheckBandCount(static_cast<int>(bands), FALSE)) refuse("of its number of bands");
     const std::uint64_t tilePixels = std::uint64_t{header.tileSize} * header.tileSize;
-    if (tilePixels * zelm::PixelSize(header.pixelType) > kMaxTileBytes / bands)
+    const std::uint64_t together = header.IsPlanar() ? 1 : bands;
+    if (tilePixels * zelm::PixelSize(header.pixelType) > kMaxTileBytes / together)
         refuse("its tiles are too large");
     return info;
 }
@@ -44,6 +47,17 @@ OpenFile::OpenFile(const std::string& fileName, GDALAccess access, const OpenOpt
       raster(fileName, source, info.header, options.keepCopies),
       tiles(raster, info, GdalTypeOf(info.header.pixelType, options.signedByteAs)),
       archive(raster, info.HasMetadataDocument()) {}
+
+void OpenFile::CheckTile(std::uint32_t level, std::uint32_t bands, const char* operation) const {
+    const zelm::LevelGeometry grid = info.header.Geometry(level);
+    const std::uint64_t bytes = std::uint64_t{std::min(grid.tileSize, grid.samples)} *
+                                std::min(grid.tileSize, grid.lines) * bands *
+                                zelm::PixelSize(info.header.pixelType);
+    const std::string wrong =
+        zmchost::Limits::Judge("tile", bytes, zmchost::Limits::Current().tile,
+                               "its tiles have " + std::to_string(bytes) + " bytes");
+    if (!wrong.empty()) throw zmchost::Error(raster.Name(), operation, wrong);
+}
 
 Dataset::Dataset(std::shared_ptr<OpenFile> openFile, std::uint32_t levelShown, GDALAccess access,
                  Dataset* mainDataset)
@@ -71,9 +85,18 @@ std::unique_ptr<Dataset> Dataset::FromFile(std::shared_ptr<OpenFile> file, GDALA
     return std::unique_ptr<Dataset>(new Dataset(std::move(file), base, access, nullptr));
 }
 
+// GDAL holds half a kilobyte and more for each band of each level, and of tens of thousands only
+// some are looked at: levels have them when they are asked for. The last one tells the number.
 void Dataset::AddBands() {
     const auto count = static_cast<int>(file->info.header.bandCount);
-    for (int number = 1; number <= count; ++number) SetBand(number, new Band(*this, number));
+    const bool all = !main || count <= kMostReadyBands;
+    for (int number = all ? 1 : count; number <= count; ++number)
+        SetBand(number, new Band(*this, number));
+}
+
+GDALRasterBand* Dataset::BandOf(int number) {
+    if (!GetRasterBand(number)) SetBand(number, new Band(*this, number));
+    return GetRasterBand(number);
 }
 
 const std::vector<std::unique_ptr<Dataset>>& Dataset::Overviews() {
@@ -182,6 +205,13 @@ CPLErr Dataset::IBuildOverviews(const char* resampling, int overviewCount, const
                                 int bandCount, const int* bands, GDALProgressFunc progress,
                                 void* progressData, CSLConstList options) {
     if (creation) return creation->ChooseLevels(*this, resampling, overviewCount, factors);
+    if (file->info.bytesMissing > 0) {
+        CPLError(CE_Failure, CPLE_NotSupported,
+                 "%s: the pyramid is incomplete, " CPL_FRMT_GUIB
+                 " bytes are missing; no levels are made of it",
+                 GetDescription(), static_cast<GUIntBig>(file->info.bytesMissing));
+        return CE_Failure;
+    }
     if (Overviews().empty())
         return GDALPamDataset::IBuildOverviews(resampling, overviewCount, factors, bandCount, bands,
                                                progress, progressData, options);

@@ -32,6 +32,8 @@ public:
     virtual std::uint32_t Height(std::uint32_t level) const = 0;
     virtual void Read(std::uint32_t level, const zmchost::Window& window,
                       std::span<const std::uint32_t> bands, void* pixels) = 0;
+    // Throws where nothing can be read, before anything is made ready for it.
+    virtual void CheckReadable() {}
 
     // Throws UsageError for a level that there is not.
     void CheckLevel(std::uint32_t level) const;
@@ -59,9 +61,9 @@ struct Selection {
 };
 
 // Calls take(strip) for strips of the window from the top to the bottom. A strip is whole rows of
-// tiles as long as these fit some 32 MiB for each view, and single lines at the least. Throws
-// Interruption.
-void WalkStrips(const RasterView& view, const Selection& selection, TerminalProgress& progress,
+// tiles as long as these fit some 32 MiB for each view; else lines, or parts of a line from the
+// left to the right. Throws Interruption, and where the view has nothing to read.
+void WalkStrips(RasterView& view, const Selection& selection, TerminalProgress& progress,
                 const std::function<void(const zmchost::Window& strip)>& take);
 
 std::size_t StripBytes(const RasterView& view, const Selection& selection,

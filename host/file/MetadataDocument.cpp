@@ -9,6 +9,7 @@
 #include "host/base/Error.h"
 #include "host/base/Text.h"
 #include "host/base/Xerces.h"
+#include "host/file/Limits.h"
 #include "platform/FileSystem.h"
 
 namespace zmchost {
@@ -69,7 +70,9 @@ std::string JudgeMetadataParse(const std::string& fault, bool hasOurRoot) {
 }
 
 std::string JudgeMetadataSize(std::uint64_t bytes) {
-    return bytes > zelm::kMaxDocumentBytes ? std::string(kSubject) + kTooLong : "";
+    if (bytes > zelm::kMaxDocumentBytes) return std::string(kSubject) + kTooLong;
+    return Limits::Judge("document", bytes, Limits::Current().document,
+                         kSubject + ("has " + std::to_string(bytes) + " bytes"));
 }
 
 std::string JudgeMetadataText(std::string text) {
@@ -83,7 +86,8 @@ std::string JudgeMetadataText(std::string text) {
 std::string ReadMetadataText(ByteSource& source, const std::string& name,
                              const PyramidHeader& header) {
     const std::uint64_t size = DocumentSize(source, name, header);
-    if (size > zelm::kMaxDocumentBytes) Fail(name, std::string("it ") + kTooLong);
+    if (const std::string wrong = JudgeMetadataSize(size); !wrong.empty())
+        Fail(name, "it" + wrong.substr(sizeof kSubject - 2));
     std::string text(static_cast<std::size_t>(size), '\0');
     int error = 0;
     if (source.ReadAt(header.tileDataEnd, text.data(), text.size(), &error) != text.size())

@@ -41,12 +41,16 @@ private:
     zelm::ColorList current;  // the palette in hand
 };
 
-// Why the text behind `offset` could not be had; empty if there is none.
-std::string JudgeAbsence(zelm::files::ByteSource& source, std::uint64_t offset) {
+// Whether the text behind `offset` is beyond what is read.
+std::string JudgeSize(const zelm::files::ByteSource& source, std::uint64_t offset) {
     std::uint64_t size = 0;
-    if (source.TellSize(size) && size <= offset) return "";
-    const std::string wrong = JudgeMetadataSize(size > offset ? size - offset : 0);
-    return wrong.empty() ? "the metadata document cannot be read" : wrong;
+    return source.TellSize(size) && size > offset ? JudgeMetadataSize(size - offset) : "";
+}
+
+// Why the text behind `offset` could not be had; empty if there is none.
+std::string JudgeAbsence(const zelm::files::ByteSource& source, std::uint64_t offset) {
+    std::uint64_t size = 0;
+    return source.TellSize(size) && size <= offset ? "" : "the metadata document cannot be read";
 }
 
 template <class Record>
@@ -66,6 +70,8 @@ template <class T>
 std::shared_ptr<const StoredRecords<T>> StoredRecords<T>::Read(zelm::files::ByteSource& source,
                                                                std::uint64_t offset) {
     auto records = std::make_shared<StoredRecords>();
+    records->fault = JudgeSize(source, offset);
+    if (!records->fault.empty()) return records;
     zelm::DocumentText text = zelm::DocumentText::Take(source, offset);
     records->settled = text.bytes && !text.IsUnfinished();
     if (text.bytes)
