@@ -143,6 +143,8 @@ bool Dataset::ReadsDirectly(int x, int y, int width, int height) const {
     // Blocks may wait in the cache to be written.
     const bool quiet = eAccess != GA_Update || (creation && creation->IsSealed());
     if (!quiet || bForceCachedIO) return false;
+    // Blocks of such tiles would fill the cache.
+    if (!file->tiles.IsHeld(file->tiles.TileAt(level, 0, 0))) return true;
     const int side = static_cast<int>(file->info.header.tileSize);
     const auto touched = [side](int start, int extent, int limit) {
         const int end = std::min((start + extent - 1) / side * side + side, limit);
@@ -181,6 +183,9 @@ CPLErr Dataset::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, 
                           GDALRasterIOExtraArg* extra) {
     if (mode == GF_Read && bufferWidth < width && bufferHeight < height) {
         int tried = FALSE;
+        // GDAL takes the bands from the level as a dataset of its own.
+        for (const auto& overview : Overviews())
+            for (int i = 0; i < bandCount; ++i) overview->BandOf(bandMap[i]);
         const CPLErr result = TryOverviewRasterIO(mode, x, y, width, height, data, bufferWidth,
                                                   bufferHeight, bufferType, bandCount, bandMap,
                                                   pixelSpace, lineSpace, bandSpace, extra, &tried);

@@ -62,7 +62,7 @@ public:
     void LoadSidecar(const char* fileName, char** siblings);
 
     // True if pixels of this window are better read past GDAL's block cache: it is not a sliver of
-    // the tiles that it touches, and no block waits to be written.
+    // the tiles that it touches, or these are very large; and no block waits to be written.
     bool ReadsDirectly(int x, int y, int width, int height) const;
 
     // Makes this dataset the place where pixels of a new file are gathered; see gdal/Create.h.

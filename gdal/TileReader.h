@@ -51,6 +51,9 @@ public:
     void Forget() { held = heldApart = TileKey(); }
 
     // The tile of the grid of `level`, clipped to the level.
+    // Whether a tile that was read is kept for whoever reads its next part. Of one that is not,
+    // what is asked for alone is read.
+    bool IsHeld(const zelm::Rectangle& tile) const;
     zelm::Rectangle TileAt(std::uint32_t level, int tileX, int tileY) const;
 
 private:
@@ -89,7 +92,6 @@ private:
                     const Target& target) const;
     bool LoadSamples(std::uint32_t level, const zelm::Rectangle& area, const int* bands,
                      int bandCount);
-    bool IsHeld(const zelm::Rectangle& tile) const;
     bool CopyPieces(std::uint32_t level, const zelm::Rectangle& part, const zelm::Rectangle& window,
                     const int* bands, int bandCount, const Target& target);
     const unsigned char* LoadTile(std::uint32_t level, const zelm::Rectangle& tile, int band);

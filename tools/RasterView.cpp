@@ -35,6 +35,7 @@ public:
               std::span<const std::uint32_t> bands, void* pixels) override {
         raster.Read(level, window, bands, pixels);
     }
+    std::uint32_t TileSide() const override { return raster.TileSide(); }
     void CheckReadable() override {
         if (!raster.IsComplete())
             throw zmchost::Error(raster.Name(), "read its pixels",
@@ -129,10 +130,11 @@ void WalkStrips(RasterView& view, const Selection& selection, TerminalProgress& 
     view.CheckReadable();
     const zmchost::Window& window = selection.window;
     const std::uint64_t lineBytes = std::max<std::uint64_t>(LineBytes(view, selection), 1);
-    const std::uint64_t lines = std::max<std::uint64_t>(kStripBudget / lineBytes, 1);
+    const std::uint64_t budget = BytesAtOnce(kStripBudget, view.TileSide());
+    const std::uint64_t lines = std::max<std::uint64_t>(budget / lineBytes, 1);
     // Of a line that is longer.
     const auto columns = static_cast<std::uint32_t>(std::clamp<std::uint64_t>(
-        std::uint64_t{window.width} * kStripBudget / lineBytes, 1, std::max(window.width, 1u)));
+        std::uint64_t{window.width} * budget / lineBytes, 1, std::max(window.width, 1u)));
     const std::uint64_t total = std::uint64_t{window.width} * window.height;
     for (std::uint32_t done = 0; done < window.height;) {
         // Up to the end of a row of tiles, so that the next strip begins with one.

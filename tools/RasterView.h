@@ -14,11 +14,23 @@
 #include <string>
 #include <vector>
 
+#include "format/PyramidHeaderRecord.h"
 #include "host/file/PyramidFileInfo.h"
 #include "host/raster/Raster.h"
 #include "tools/TerminalProgress.h"
 
 namespace zmctools {
+
+// Of the files that builds write.
+inline constexpr std::uint32_t kUsualTile = zelm::kWrittenTileSize;
+
+// Of so many bytes that are gone through between two looks at whether somebody wants an end, as
+// many as take no longer with small tiles: each is moved by itself.
+constexpr std::uint64_t BytesAtOnce(std::uint64_t bytes, std::uint32_t tileSide) {
+    constexpr std::uint64_t kSmall = 64;
+    const std::uint64_t side = tileSide < kSmall ? tileSide : kSmall;
+    return bytes / (kSmall * kSmall) * side * side;
+}
 
 class RasterView {
 public:
@@ -32,6 +44,8 @@ public:
     virtual std::uint32_t Height(std::uint32_t level) const = 0;
     virtual void Read(std::uint32_t level, const zmchost::Window& window,
                       std::span<const std::uint32_t> bands, void* pixels) = 0;
+    // Side of the tiles that are moved at once.
+    virtual std::uint32_t TileSide() const { return kUsualTile; }
     // Throws where nothing can be read, before anything is made ready for it.
     virtual void CheckReadable() {}
 

@@ -7,6 +7,7 @@
 #include "host/statistics/Histogram.h"
 #include "tools/Interrupt.h"
 #include "tools/Message.h"
+#include "tools/RasterView.h"
 #include "tools/Verification.h"
 
 namespace zmctools {
@@ -34,7 +35,8 @@ template <class T, class Take>
 void WalkLines(zmchost::Raster& raster, std::span<const std::uint32_t> bands, const char* label,
                bool quiet, Take&& take) {
     const std::uint64_t lineBytes = std::uint64_t{raster.Width()} * bands.size() * (sizeof(T) + 1);
-    std::uint64_t lines = std::max<std::uint64_t>((std::uint64_t{48} << 20) / lineBytes, 1);
+    std::uint64_t lines = std::max<std::uint64_t>(
+        BytesAtOnce(std::uint64_t{48} << 20, raster.TileSide()) / lineBytes, 1);
     if (lines >= raster.TileSide()) lines -= lines % raster.TileSide();
     TerminalProgress bar(label, !quiet);
     std::vector<T> pixels;

@@ -62,10 +62,10 @@ Program::Program() {
                          "format and of the libraries");
     app.set_help_flag("--help,-h", "Print this help");
     OptionTable(app)
-        .Texts(
-            "--limit", limits,
-            "What a file may claim: bands=65536, tile=16M, header=4M, document=256M are the usual "
-            "limits, and one that names another changes it; stands before COMMAND")
+        .Texts("--limit", limits,
+               "What a file may claim: bands=65536, tile=16M, elements=131072, header=4M, "
+               "document=256M are the usual "
+               "limits, and one that names another changes it; stands before COMMAND")
         .Named("NAME=N");
     app.require_subcommand(1);
     Add(MakeBuildCommand());

@@ -22,6 +22,7 @@ struct Entry {
 };
 constexpr Entry kKnown[] = {{"bands", &Limits::bands},
                             {"tile", &Limits::tile},
+                            {"elements", &Limits::elements},
                             {"header", &Limits::header},
                             {"document", &Limits::document}};
 

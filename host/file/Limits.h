@@ -21,6 +21,8 @@ struct Limits {
     // Bytes of a tile with all its bands, where it has to be held as a whole, in several copies: to
     // write into it.
     std::uint64_t tile = std::uint64_t{16} << 20;
+    // Elements of a metadata document that the driver stores into: each takes half a kilobyte then.
+    std::uint64_t elements = 131072;
     // Bytes of a header document.
     std::uint64_t header = std::uint64_t{4} << 20;
     // Bytes of a metadata document that is read; more than the format allows is not.

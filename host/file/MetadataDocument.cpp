@@ -1,5 +1,6 @@
 #include "host/file/MetadataDocument.h"
 
+#include <algorithm>
 #include <memory>
 #include <utility>
 
@@ -20,6 +21,7 @@ using zelm::files::FileSource;
 using zelm::files::OpenMode;
 
 constexpr char kSubject[] = "the metadata document ";
+constexpr std::uint64_t kPiece = std::uint64_t{1} << 20;
 constexpr char kTooLong[] = "is longer than 256 MiB";
 
 class RootReader : public zelm::FaultReader {
@@ -88,10 +90,18 @@ std::string ReadMetadataText(ByteSource& source, const std::string& name,
     const std::uint64_t size = DocumentSize(source, name, header);
     if (const std::string wrong = JudgeMetadataSize(size); !wrong.empty())
         Fail(name, "it" + wrong.substr(sizeof kSubject - 2));
-    std::string text(static_cast<std::size_t>(size), '\0');
-    int error = 0;
-    if (source.ReadAt(header.tileDataEnd, text.data(), text.size(), &error) != text.size())
-        Fail(name, error != 0 ? platform::ErrorText(error) : "the file was cut");
+    std::string text;
+    // What has a NUL is no document, and the rest of it, which may be a hole, is not read.
+    for (bool hasNul = false; !hasNul && text.size() < size;) {
+        const std::size_t before = text.size();
+        const auto piece = static_cast<std::size_t>(std::min<std::uint64_t>(size - before, kPiece));
+        text.resize(before + piece);
+        int error = 0;
+        if (source.ReadAt(header.tileDataEnd + before, text.data() + before, piece, &error) !=
+            piece)
+            Fail(name, error != 0 ? platform::ErrorText(error) : "the file was cut");
+        hasNul = text.find('\0', before) != text.npos;
+    }
     return text;
 }
 

@@ -1,5 +1,6 @@
 #include "host/file/StoredRecords.h"
 
+#include <string_view>
 #include <utility>
 
 #include "core/ElementTypes.h"
@@ -53,6 +54,15 @@ std::string JudgeAbsence(const zelm::files::ByteSource& source, std::uint64_t of
     return source.TellSize(size) && size <= offset ? "" : "the metadata document cannot be read";
 }
 
+// Of start tags, or what looks like them.
+std::uint64_t CountElements(std::string_view text) {
+    std::uint64_t count = 0;
+    for (std::size_t at = text.find('<'); at != text.npos; at = text.find('<', at + 1))
+        if (at + 1 < text.size() && std::string_view("/!?").find(text[at + 1]) == text.npos)
+            ++count;
+    return count;
+}
+
 template <class Record>
 std::span<const Record> SpanOf(const zelm::Array<Record>& records) {
     return {records.data, records.data ? records.shape.elements : 0};
@@ -84,7 +94,9 @@ std::shared_ptr<const StoredRecords<T>> StoredRecords<T>::Read(zelm::files::Byte
 template <class T>
 void StoredRecords<T>::Parse(zelm::DocumentText text) {
     // The parse changes the bytes.
-    fault = JudgeMetadataBytes({reinterpret_cast<const char*>(text.bytes.get()), text.size});
+    const std::string_view bytes(reinterpret_cast<const char*>(text.bytes.get()), text.size);
+    fault = JudgeMetadataBytes(bytes);
+    elements = CountElements(bytes);
     InitialiseXerces();
     auto reader = std::make_unique<JudgingReader<T>>();
     const std::string wrong =

@@ -4,11 +4,14 @@ Nothing may crash, hang, write where it was to read, leave a file open, or cost 
 second of processor time, 64 MiB of memory and 64 MiB of files beyond what the same takes on a small
 good file, and as much again for each 32 MiB of what it is asked to go through or prints. Commands go
 through all pixels of a complete file, holes included; where that is more than GOES_THROUGH, what is
-judged is that they end when they are asked to.
+judged is that they end when they are asked to. So are levels that the driver makes. A store makes a
+tree of the document, which takes several times its text. The memory of a build is what it is told.
 
     attack.py FOLDER [--files N] [--first K] [--jobs N]
 
-Needs ZMC_TOOL, the program, and the plug-in on GDAL_DRIVER_PATH. Prints a line for each finding and a
+Needs ZMC_TOOL, the program, and the plug-in on GDAL_DRIVER_PATH. With ZMC_ATTACK=sanitized the program
+is one with sanitizers, which a driver in Python cannot be: only commands run, and what they cost is not
+judged. Prints a line for each finding and a
 summary, and keeps the files of findings in FOLDER. The exit status is 1 if there is a finding.
 """
 import argparse
@@ -16,6 +19,7 @@ import hashlib
 import multiprocessing
 import os
 import random
+import re
 import signal
 import subprocess
 import sys
@@ -24,11 +28,13 @@ import time
 import hostile
 
 TOOL = os.environ["ZMC_TOOL"]
+SANITIZED = os.environ.get("ZMC_ATTACK") == "sanitized"
 SECONDS = 1.0
 MEMORY = 64 << 20
-PATIENCE = 60  # seconds of waiting, after which a run is taken to hang
-ENDS_WITHIN = 5  # seconds, where it is asked to end
+PATIENCE = 300 if SANITIZED else 60  # seconds of waiting, after which a run is taken to hang
+ENDS_WITHIN = 60 if SANITIZED else 5  # seconds, where it is asked to end
 PER_BYTES = 32 << 20  # for which the budget is granted once more
+TREE = 6  # bytes for each of a document that is stored into
 PER_BAND = 1024  # bytes that GDAL may take for a band that a dataset shows
 GOES_THROUGH = 256 << 20  # bytes of pixels
 READING = {
@@ -38,8 +44,10 @@ READING = {
     "hash": ["hash", "FILE"],
     "compare": ["compare", "FILE", "GOOD"],
     "export": ["export", "FILE", "OUT.tif"],
-    "build": ["build", "FILE", "OUT.pyr"],
+    "build": ["build", "FILE", "OUT.pyr", "--memory", "32M"],
 }
+# What the module says, by its contract, of a file that it opens all the same.
+WARNED = re.compile(r"\nWarning at file .*\n Message: .*\n")
 LONG = ("verify", "hash", "compare", "export", "build")  # with the pixels of a complete file
 WRITING = {"recover": ["recover", "FILE"], "discard": ["recover", "FILE", "--discard"]}
 
@@ -83,7 +91,8 @@ def driver_edits(name):
     if band.XSize and band.YSize:
         band.WriteRaster(0, 0, 1, 1, b"\0" * 16, 1, 1, gdal.GDT_CFloat64)
     if dataset.RasterCount <= 20:
-        dataset.BuildOverviews("NEAREST", [2])
+        end = time.process_time() + 0.3
+        dataset.BuildOverviews("NEAREST", [2], callback=lambda *_: time.process_time() < end)
     dataset = None
 
 
@@ -94,20 +103,14 @@ def digest(names):
     found = {}
     for name in names:
         status = os.lstat(name)
-        head = tail = b""
+        total = hashlib.sha256()
         with open(name, "rb") as file:  # holes may be terabytes
-            head = file.read(8 << 20)
-            if status.st_size > len(head):
-                file.seek(max(len(head), status.st_size - 4096))
-                tail = file.read(4096)
-        found[name] = (status.st_size, status.st_mode, hashlib.sha256(head + tail).hexdigest())
+            for _ in range(64):
+                total.update(file.read(1 << 17))
+            file.seek(max(file.tell(), status.st_size - 4096))
+            total.update(file.read(4096))
+        found[name] = (status.st_size, status.st_mode, total.hexdigest())
     return found
-
-
-def read_start(name):
-    """All of a file but for a hole at its end."""
-    with open(name, "rb") as file:
-        return file.read(min(os.stat(name).st_blocks * 512 + 4096, 64 << 20))
 
 
 class Cost:
@@ -174,6 +177,34 @@ def run_driver(action, name, folder):
         return wait(child, errors)
 
 
+class Runner:
+    """A process of its own that starts the others: what those who start a process hold in memory is
+    counted as its own, and the makers of hostile files hold much."""
+
+    def __init__(self):
+        context = multiprocessing.get_context("spawn")
+        self.pipe, other = context.Pipe()
+        self.process = context.Process(target=serve, args=(other,), daemon=True)
+        self.process.start()
+        other.close()
+
+    def run(self, function, *arguments):
+        self.pipe.send((function, arguments))
+        return self.pipe.recv()
+
+
+def serve(pipe):
+    if not SANITIZED:
+        from osgeo import gdal
+        assert gdal.GetDriverByName("ZMCPyramid"), "the driver's plug-in is not found"
+    while True:
+        try:
+            function, arguments = pipe.recv()
+        except EOFError:
+            return
+        pipe.send(function(*arguments))
+
+
 LEFT_OPEN = "left open: "
 
 
@@ -201,10 +232,9 @@ def room(folder):
 
 class Attacker:
     def __init__(self, folder):
-        from osgeo import gdal
         self.folder = folder
         os.makedirs(folder, exist_ok=True)
-        assert gdal.GetDriverByName("ZMCPyramid"), "the driver's plug-in is not found"
+        self.runner = Runner()
         self.good = os.path.join(folder, "good.pyr")
         good = hostile.Draft(random.Random(1))
         good.fields.update(BANDS="1", PIXEL_HEIGHT="30", PIXEL_WIDTH="40", LEVELMAX="0",
@@ -224,24 +254,32 @@ class Attacker:
         for name, arguments in READING.items():
             texts = [file if text == "FILE" else self.good if text == "GOOD" else text
                      for text in arguments]
-            cost = run_tool(texts, self.folder, ask_after if name in LONG else None)
+            cost = self.runner.run(run_tool, texts, self.folder,
+                                   ask_after if name in LONG else None)
             cost.written = room(self.folder) - before
             for made in ("OUT.tif", "OUT.tif.aux.xml", "OUT.pyr", "OUT.pyr.aux.xml"):
                 if os.path.lexists(os.path.join(self.folder, made)):
                     os.remove(os.path.join(self.folder, made))
             yield name, cost
-        yield "gdal-read", run_driver(driver_reads, file, self.folder)
+        if not SANITIZED:
+            yield "gdal-read", self.runner.run(run_driver, driver_reads, file, self.folder)
         for name in WRITING:
-            yield name, run_tool([file if text == "FILE" else text for text in WRITING[name]],
-                                 self.folder)
-        cost = run_driver(driver_edits, file, self.folder)
-        cost.written = room(self.folder) - before
-        yield "gdal-edit", cost
+            texts = [file if text == "FILE" else text for text in WRITING[name]]
+            yield name, self.runner.run(run_tool, texts, self.folder)
+        if not SANITIZED:
+            cost = self.runner.run(run_driver, driver_edits, file, self.folder)
+            cost.written = room(self.folder) - before
+            yield "gdal-edit", cost
 
-    def judge(self, name, cost, size, bands):
+    def judge(self, name, cost, size, held, bands):
+        """`size` bytes may be gone through, of which `held` are no holes."""
         base = self.base[name]
-        grants = 1 + (size + 8 * cost.printed) // PER_BYTES
+        goes_through = size if name in LONG or name in DRIVER else held
+        longer = 1 + (goes_through + 8 * cost.printed) / PER_BYTES
+        grants = 1 + ((size if name in LONG else held) + 8 * cost.printed) / PER_BYTES
         shown = bands * PER_BAND if name in DRIVER else 0
+        if name == "gdal-edit":
+            shown += TREE * held
         if cost.hung and cost.asked:
             yield f"does not end within {ENDS_WITHIN} s when it is asked to"
         elif cost.asked:
@@ -252,14 +290,10 @@ class Attacker:
             yield f"is killed by signal {-cost.status}"
         elif name not in DRIVER and cost.status not in (0, 1, 2, 3):
             yield f"ends with status {cost.status}"
-        if cost.seconds - base.seconds > SECONDS * grants:
-            yield f"takes {cost.seconds:.2f} s of processor time"
-        if cost.memory - base.memory > MEMORY * grants + shown:
-            yield f"takes {(cost.memory - base.memory) >> 20} MiB"
-        if cost.written - base.written > MEMORY * grants:
-            yield f"writes {(cost.written - base.written) >> 20} MiB"
+        if not SANITIZED:
+            yield from self.judge_cost(cost, base, longer, grants, shown)
         if name not in DRIVER and cost.status in (1, 2):
-            lines = cost.message.splitlines()
+            lines = WARNED.sub("", cost.message).splitlines()
             if not lines or not all(line.startswith("zmcraster: ") for line in lines):
                 yield f"says {cost.message[:200]!r}"
             if len([line for line in lines if "warning: " not in line]) != 1:
@@ -269,13 +303,24 @@ class Attacker:
             if sign in cost.message:
                 yield f"reports {cost.message[:2000]}"
 
+    @staticmethod
+    def judge_cost(cost, base, longer, grants, shown):
+        if cost.seconds - base.seconds > SECONDS * longer:
+            yield f"takes {cost.seconds:.2f} s of processor time"
+        if cost.memory - base.memory > MEMORY * grants + shown:
+            yield f"takes {(cost.memory - base.memory) >> 20} MiB"
+        if cost.written - base.written > MEMORY * grants:
+            yield f"writes {(cost.written - base.written) >> 20} MiB"
+
     def attack(self, seed):
         """Findings on the file of that number."""
         file = os.path.join(self.folder, f"hostile-{seed}.pyr")
         draft = hostile.draft(seed)
-        names = draft.save(file)
         return [f"{seed} ({', '.join(draft.kinds)}): {text}"
-                for text in self.judge_file(file, names, draft.number("BANDS", 65536))]
+                for text in self.judge_draft(draft, file)]
+
+    def judge_draft(self, draft, file):
+        return self.judge_file(file, draft.save(file), draft.number("BANDS", 65536))
 
     def judge_file(self, file, names, bands):
         """Findings on a file, which goes, with those of `names` beside it. Copies of what was found
@@ -285,11 +330,12 @@ class Attacker:
         held = min(size, os.stat(file).st_blocks * 512)
         before = digest(names)
         findings = []
+        for name in names:
+            subprocess.run(["cp", "--sparse=always", name, self.copy_of(name)], check=True)
         listed = set(os.listdir(self.folder))
-        copies = {name: (read_start(name), os.path.getsize(name)) for name in names}
         for name, cost in self.all_runs(file, 2 if whole > GOES_THROUGH else None):
             # Nothing else has to look at more than the document that is in the file.
-            for what in self.judge(name, cost, size if name in LONG else held, bands):
+            for what in self.judge(name, cost, size, held, bands):
                 findings.append(f"{name} {what}")
             if name in READING or name == "gdal-read":
                 if digest(names) != before:
@@ -302,11 +348,12 @@ class Attacker:
         for name in os.listdir(self.folder):
             if name.startswith(os.path.basename(file)):
                 os.remove(os.path.join(self.folder, name))
-        for name, (start, length) in copies.items() if findings else ():
-            with open(os.path.join(self.folder, "found-" + os.path.basename(name)), "wb") as copy:
-                copy.write(start)
-                copy.truncate(length)
+        for name in () if findings else names:
+            os.remove(self.copy_of(name))
         return findings
+
+    def copy_of(self, name):
+        return os.path.join(self.folder, "found-" + os.path.basename(name))
 
 
 def work(folder, seeds, results):
