@@ -65,6 +65,7 @@ set(ZMC_PUBLIC_HEADERS
     files/RecordingSource.h
     # The host's side: pyramids built, read with errors, looked into, and put in order.
     host/base/Error.h
+    host/file/Limits.h
     host/build/PyramidBuilder.h
     host/file/PyramidFileInfo.h
     host/file/PyramidHeader.h

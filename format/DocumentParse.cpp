@@ -1,5 +1,6 @@
 #include "format/DocumentParse.h"
 
+#include <algorithm>
 #include <atomic>
 #include <cstring>
 #include <new>
@@ -11,6 +12,7 @@
 #include <xercesc/util/XMLException.hpp>
 
 #include "format/BoundedParser.h"
+#include "format/DocumentLimits.h"
 #include "format/NumberText.h"
 #include "format/XercesText.h"
 
@@ -74,6 +76,88 @@ bool ParseWithKept(unsigned char* bytes, std::size_t size, xercesc::HandlerBase&
     return end.kind == ParseEnd::Kind::Parsed;
 }
 
+// The signs of mark-up in the families of encodings that parsers find out by themselves. The two of
+// EBCDIC differ in their brackets.
+struct Signs {
+    unsigned char open, close, equals, quote, apostrophe, bang, question, dash, bracket, endBracket;
+};
+constexpr Signs kAscii = {'<', '>', '=', '"', '\'', '!', '?', '-', '[', ']'};
+constexpr Signs kEbcdic037 = {0x4C, 0x6E, 0x7E, 0x7F, 0x7D, 0x5A, 0x6F, 0x60, 0xBA, 0xBB};
+constexpr Signs kEbcdic1047 = {0x4C, 0x6E, 0x7E, 0x7F, 0x7D, 0x5A, 0x6F, 0x60, 0xAD, 0xBD};
+
+// A look through a text for elements with too many attributes. Where it is malformed the look may
+// go astray: a parser does not come behind that place.
+class AttributeGuard {
+public:
+    AttributeGuard(unsigned char* text, unsigned char* behind, const Signs& family)
+        : at(text), end(behind), signs(family) {}
+
+    void Run() {
+        while ((at = Find(at, signs.open)) != end && ++at != end)
+            if (*at == signs.question)
+                Skip(1, signs.question, 1);
+            else if (*at == signs.bang)
+                SkipMarkup();
+            else
+                Look();
+    }
+
+private:
+    unsigned char* Find(unsigned char* from, unsigned char sign) const {
+        const auto size = static_cast<std::size_t>(end - from);
+        void* const found = size == 0 ? nullptr : std::memchr(from, sign, size);
+        return found ? static_cast<unsigned char*>(found) : end;
+    }
+
+    // Comments and CDATA sections. Nothing is read behind a document type.
+    void SkipMarkup() {
+        const unsigned char kind = end - at > 1 ? at[1] : 0;
+        if (kind == signs.dash) return Skip(3, signs.dash, 2);           // !--
+        if (kind == signs.bracket) return Skip(8, signs.endBracket, 2);  // ![CDATA[
+        at = end;
+    }
+
+    // Goes behind what begins with so many bytes, may hold anything, and ends with a sign, given
+    // once or twice, and the one that closes.
+    void Skip(std::ptrdiff_t start, unsigned char sign, std::ptrdiff_t times) {
+        if (end - at < start) {
+            at = end;
+            return;
+        }
+        unsigned char* const content = at + start;
+        for (at = content; (at = Find(at, signs.close)) != end; ++at)
+            if (at - content >= times &&
+                std::all_of(at - times, at, [sign](unsigned char each) { return each == sign; }))
+                return;
+    }
+
+    // Goes through one start tag.
+    void Look() {
+        std::uint32_t attributes = 0;
+        for (; at != end && *at != signs.close && *at != signs.open; ++at) {
+            if (*at == signs.equals) ++attributes;
+            if (*at != signs.quote && *at != signs.apostrophe) continue;
+            at = Find(at + 1, *at);
+            if (at == end) return;
+            if (attributes > kMaxAttributes && at + 1 != end) {
+                at[1] = signs.close;
+                at = end;
+                return;
+            }
+        }
+    }
+
+    unsigned char* at;
+    unsigned char* end;
+    const Signs& signs;
+};
+
+void GuardAttributes(unsigned char* text, std::size_t size) {
+    const bool ebcdic = size != 0 && *text == kEbcdic037.open;
+    AttributeGuard(text, text + size, ebcdic ? kEbcdic037 : kAscii).Run();
+    if (ebcdic) AttributeGuard(text, text + size, kEbcdic1047).Run();
+}
+
 }  // namespace
 
 std::unique_ptr<xercesc::SAXParser> MakeDocumentParser() {
@@ -89,6 +173,7 @@ void GuardText(unsigned char* text, std::size_t size) {
     constexpr unsigned char refused = 1;
     unsigned char* const behind = text + size;
     for (unsigned char* at = text; (at = FindNul(at, behind)) != nullptr; ++at) *at = refused;
+    GuardAttributes(text, size);
     for (std::size_t end = size; end != 0 && text[end - 1] >= 0x80; --end) text[end - 1] = refused;
 }
 

@@ -25,9 +25,11 @@ namespace zelm {
 // The parser for both documents (BoundedParser.h); null if memory ran out.
 std::unique_ptr<xercesc::SAXParser> MakeDocumentParser();
 
-// Makes the bytes of a text, in place, such that a parser judges all of them. It takes a NUL behind
-// the root element for the end of the text, and so it takes a character that lacks its last bytes,
-// and would believe the front part of a torn document.
+// Makes the bytes of a text, in place, such that a parser judges all of them, and in proportion to
+// their number. It takes a NUL behind the root element for the end of the text, and so it takes a
+// character that lacks its last bytes, and would believe the front part of a torn document. It
+// stores all attributes of an element before anybody is asked about it, in time and memory beyond
+// all measure: behind the first that is one too many, the element ends.
 void GuardText(unsigned char* text, std::size_t size);
 
 struct ParseEnd {

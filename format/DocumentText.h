@@ -4,6 +4,9 @@
 // after. A store (DocumentStore.h) marks the first byte before it touches the others, and writes
 // each of them once: where both readings agree, nothing was under way between them, and the text is
 // that of one moment, old or new. Where they do not, they are repeated a few times.
+//
+// No document has a NUL. Where the file has one the text ends shortly behind it: a hole takes no
+// place on the disk, and is to take none in memory.
 #ifndef ZMC_FORMAT_DOCUMENTTEXT_H
 #define ZMC_FORMAT_DOCUMENTTEXT_H
 
@@ -55,10 +58,22 @@ private:
         return bytes != nullptr;
     }
 
+    template <class File>
+    bool ReadUpToNul(File& file, std::uint64_t offset) {
+        constexpr std::size_t kPiece = std::size_t{1} << 20;
+        for (std::size_t at = 0; at < size; at += kPiece) {
+            const std::size_t piece = std::min(size - at, kPiece);
+            unsigned char* const to = bytes.get() + at;
+            if (file.ReadAt(offset + at, to, piece) != piece) return false;
+            if (std::memchr(to, 0, piece)) size = at + piece;
+        }
+        return true;
+    }
+
     // True if both readings agree.
     template <class File>
     bool Read(File& file, std::uint64_t offset) {
-        if (file.ReadAt(offset, bytes.get(), size) != size) return false;
+        if (!ReadUpToNul(file, offset)) return false;
         unsigned char again[16384];
         for (std::size_t at = 0; at < size; at += sizeof again) {
             const std::size_t piece = std::min(size - at, sizeof again);

@@ -19,6 +19,9 @@ inline constexpr std::uint64_t kMaxTableBytes = std::uint64_t{4} << 30;
 // Tile tables up to this size are built when a file is opened. Larger ones wait for the first tile:
 // touching their fresh memory would take longer than all the rest of an open.
 inline constexpr std::uint64_t kMaxEagerTableBytes = std::uint64_t{64} << 10;
+// Beyond this no table is made at all, and the place of each tile is computed when it is asked for
+// (TilePlaces): that takes longer, and no memory.
+inline constexpr std::uint64_t kMaxHeldTableBytes = std::uint64_t{4} << 20;
 // The tile data, so that no sum of offsets leaves 64 bits.
 inline constexpr std::uint64_t kMaxTileDataBytes = std::uint64_t{1} << 62;
 // The Morton curve has 16 bits for each direction.

@@ -9,6 +9,20 @@
 namespace zelm {
 namespace {
 
+// Above the logarithm of the tile size every tile shrinks to nothing: no blocks.
+std::uint32_t EndOfBlocks(std::uint32_t tileSize, std::uint32_t levelMax) {
+    return std::min(static_cast<std::uint32_t>(std::bit_width(tileSize)), levelMax + 1u);
+}
+
+// Extent at a level of some tiles of a row of the grid, of which the last has its own extent. Each
+// tile is shifted by itself, and the bits lost with it: that differs from the level's own geometry
+// where 2^L does not divide the tile size.
+std::uint32_t ReducedExtent(std::uint32_t first, std::uint32_t covered, std::uint32_t tiles,
+                            std::uint32_t tileSize, std::uint32_t last, std::uint32_t level) {
+    const std::uint32_t whole = first + covered == tiles ? covered - 1u : covered;
+    return whole * (tileSize >> level) + (whole != covered ? last >> level : 0u);
+}
+
 // Lays one band of tiles of all levels along the Morton curve over the tile grid of level 0.
 //
 // A block is the square of 2^L x 2^L tiles that one tile of level L covers, and on the curve it is
@@ -22,7 +36,7 @@ public:
                std::uint64_t start)
         : grid(levelZero),
           firstLevel(levelMin),
-          endLevel(EndLevel(levelZero.tileSize, levelMax)),
+          endLevel(EndOfBlocks(levelZero.tileSize, levelMax)),
           bytes(sampleBytes),
           table(offsets),
           stride(rowStride),
@@ -44,11 +58,6 @@ private:
         std::uint32_t x = kNoBlock;
         std::uint32_t y = kNoBlock;
     };
-
-    // Above the logarithm of the tile size every tile shrinks to nothing: no blocks.
-    static std::uint32_t EndLevel(std::uint32_t tileSize, std::uint32_t levelMax) {
-        return std::min(static_cast<std::uint32_t>(std::bit_width(tileSize)), levelMax + 1u);
-    }
 
     std::uint32_t TilesAcross(std::uint32_t level) const {
         return LevelGeometry(grid.samples, 0, grid.tileSize, level).tilesAcross;
@@ -102,13 +111,11 @@ private:
         Advance(width, height);
     }
 
-    // Extent of a block at its level. Each tile is shifted by itself, and the bits lost with it:
-    // that differs from the level's own geometry where 2^L does not divide the tile size.
+    // Extent of a block at its level.
     std::uint32_t Reduced(std::uint32_t first, std::uint32_t tiles, std::uint32_t last,
                           std::uint32_t level) const {
-        const std::uint32_t covered = std::min(tiles - first, 1u << level);
-        const std::uint32_t whole = first + covered == tiles ? covered - 1u : covered;
-        return whole * (grid.tileSize >> level) + (whole != covered ? last >> level : 0u);
+        return ReducedExtent(first, std::min(tiles - first, 1u << level), tiles, grid.tileSize,
+                             last, level);
     }
 
     void Advance(std::uint32_t width, std::uint32_t height) {
@@ -164,6 +171,132 @@ void TileTable::Place(Array<std::uint64_t>& offsets, std::uint64_t& cursor) cons
             std::transform(row, row + placed, table + level * stride + band * tiles,
                            [&](std::uint64_t offset) { return offset + (end - start) * band; });
     }
+}
+
+// The walk (MortonWalk) as sums: what lies before a tile on the curve is whole quadrants of the
+// quadtree, and the tiles of a quadrant at a level have the product of their summed widths and
+// heights. Reduced tiles come one tile late: before a tile stand those of the blocks that end
+// before the tile before it.
+TilePlaces::TilePlaces(const TileTable& described, std::uint64_t startOffset)
+    : table(described),
+      endLevel(EndOfBlocks(table.levelZero.tileSize, table.levelMax)),
+      depth(static_cast<std::uint32_t>(std::bit_width(
+          std::max({table.levelZero.tilesAcross, table.levelZero.tilesDown, 1u}) - 1u))),
+      start(startOffset) {
+    for (std::uint32_t level = table.levelMin; level < endLevel; ++level)
+        bandBytes += Bytes({}, 1u << depth, level);
+}
+
+std::uint64_t TilePlaces::At(std::uint32_t band, std::uint32_t level, std::uint32_t tileX,
+                             std::uint32_t tileY) const {
+    if (level < table.levelMin || level >= endLevel) return 0;
+    const Tile block{tileX << level, tileY << level};
+    const std::uint64_t later = band * bandBytes;
+    if (level == 0) return PlaceOfTile(block) + later;
+    return (BlockBytes(block, level) == 0 ? 0 : PlaceOfBlock(block, level)) + later;
+}
+
+// The last tile, on the curve too, of a square or of what the grid has of it.
+TilePlaces::Tile TilePlaces::LastOf(Tile corner, std::uint32_t side) const {
+    return {std::min(corner.x + side, table.levelZero.tilesAcross) - 1u,
+            std::min(corner.y + side, table.levelZero.tilesDown) - 1u};
+}
+
+bool TilePlaces::Has(Tile tile) const {
+    return tile.x < table.levelZero.tilesAcross && tile.y < table.levelZero.tilesDown;
+}
+
+std::optional<TilePlaces::Tile> TilePlaces::Previous(Tile tile) const {
+    for (std::uint32_t level = 1; level <= depth; ++level) {
+        const std::uint32_t half = 1u << (level - 1u);
+        const Tile corner{tile.x >> level << level, tile.y >> level << level};
+        const bool right = (tile.x & half) != 0;
+        const bool below = (tile.y & half) != 0;
+        const Tile rightOf{corner.x + half, corner.y};
+        if (right && below) return LastOf({corner.x, corner.y + half}, half);
+        if (below && Has(rightOf)) return LastOf(rightOf, half);
+        if (right || below) return LastOf(corner, half);
+    }
+    return std::nullopt;
+}
+
+// The first tile behind a block.
+std::optional<TilePlaces::Tile> TilePlaces::Following(Tile block, std::uint32_t level) const {
+    while (++level <= depth) {
+        const std::uint32_t half = 1u << (level - 1u);
+        const Tile corner{block.x >> level << level, block.y >> level << level};
+        const bool right = (block.x & half) != 0;
+        const bool below = (block.y & half) != 0;
+        const Tile beside{corner.x + half, block.y & ~(half - 1u)};
+        if (!right && Has(beside)) return beside;
+        const Tile under{corner.x, corner.y + half};
+        if (!below && Has(under)) return under;
+    }
+    return std::nullopt;
+}
+
+// What the level has of a square of tiles.
+std::uint64_t TilePlaces::Bytes(Tile corner, std::uint32_t side, std::uint32_t level) const {
+    const LevelGeometry& grid = table.levelZero;
+    if (!Has(corner)) return 0;
+    const auto width = ReducedExtent(corner.x, std::min(grid.tilesAcross - corner.x, side),
+                                     grid.tilesAcross, grid.tileSize, grid.lastWidth, level);
+    const auto height = ReducedExtent(corner.y, std::min(grid.tilesDown - corner.y, side),
+                                      grid.tilesDown, grid.tileSize, grid.lastHeight, level);
+    return std::uint64_t{width} * height * table.sampleBytes;
+}
+
+// Of the block with that tile.
+std::uint64_t TilePlaces::BlockBytes(Tile tile, std::uint32_t level) const {
+    return Bytes({tile.x >> level << level, tile.y >> level << level}, 1u << level, level);
+}
+
+// What the level has of the blocks before the one with that tile.
+std::uint64_t TilePlaces::BytesBefore(Tile tile, std::uint32_t level) const {
+    std::uint64_t bytes = 0;
+    for (std::uint32_t above = depth; above > level; --above) {
+        const std::uint32_t half = 1u << (above - 1u);
+        const Tile corner{tile.x >> above << above, tile.y >> above << above};
+        const bool right = (tile.x & half) != 0;
+        const bool below = (tile.y & half) != 0;
+        if (right || below) bytes += Bytes(corner, half, level);
+        if (below) bytes += Bytes({corner.x + half, corner.y}, half, level);
+        if (right && below) bytes += Bytes({corner.x, corner.y + half}, half, level);
+    }
+    return bytes;
+}
+
+std::uint64_t TilePlaces::PlaceOfTile(Tile tile) const {
+    std::uint64_t place = start;
+    if (table.levelMin == 0) place += BytesBefore(tile, 0);
+    if (const auto previous = Previous(tile))
+        for (std::uint32_t level = FirstReduced(); level < endLevel; ++level)
+            place += BytesBefore(*previous, level);
+    return place;
+}
+
+// Behind the tile that the curve comes to next stand the blocks that it has left, the smallest
+// first; behind the last of the grid, its own ones in between.
+std::uint64_t TilePlaces::PlaceOfBlock(Tile block, std::uint32_t level) const {
+    const Tile last = LastOf({}, 1u << depth);
+    const Tile next = Following(block, level).value_or(last);
+    const auto previous = Previous(next);
+    const auto blockOf = [](Tile tile, std::uint32_t at) {
+        return Tile{tile.x >> at << at, tile.y >> at << at};
+    };
+    std::uint64_t place = PlaceOfTile(next);
+    if (table.levelMin == 0) place += BlockBytes(next, 0);
+    for (std::uint32_t at = FirstReduced();; ++at) {
+        if (previous && blockOf(*previous, at) != blockOf(next, at)) {
+            if (at == level && blockOf(*previous, at) == block) break;
+            place += BlockBytes(*previous, at);
+        }
+        if (next == last) {
+            if (at == level) break;
+            place += BlockBytes(next, at);
+        }
+    }
+    return place;
 }
 
 }  // namespace zelm

@@ -6,6 +6,7 @@
 #include "core/ElementTypes.h"
 #include "gdal/ColorTables.h"
 #include "gdal/NearestValue.h"
+#include "host/file/Limits.h"
 #include "host/file/StoredRecords.h"
 
 namespace zmcgdal {
@@ -122,21 +123,25 @@ void Archive::FetchStatistics(std::uint32_t band) {
     if (known) statistics.emplace(band, newest);
 }
 
-void Archive::FetchHistograms() {
-    std::vector<StoredHistogram> found;
+// The newest of those that have counts.
+void Archive::FetchHistogram(std::uint32_t band, std::uint32_t level) {
+    std::optional<StoredHistogram> found;
     const bool known = LookAtRecords([&](const auto& records) {
-        for (const auto& record : records.Histograms()) found.push_back(Convert(record));
+        const auto all = records.Histograms();
+        const auto newest = std::find_if(all.rbegin(), all.rend(), [&](const auto& each) {
+            return each.band == band && each.level == level && each.binCount != 0 &&
+                   each.counts.data && each.counts.shape.elements != 0;
+        });
+        if (newest != all.rend()) found = Convert(*newest);
     });
-    if (known) histograms = std::move(found);
+    if (known) histograms.emplace(std::pair(band, level), std::move(found));
 }
 
 const StoredHistogram* Archive::Histogram(std::uint32_t band, std::uint32_t level) {
-    if (documentExists && !histograms) FetchHistograms();
-    if (!histograms) return nullptr;
-    const auto newest = std::find_if(histograms->rbegin(), histograms->rend(), [&](auto& each) {
-        return each.band == band && each.level == level && !each.counts.empty();
-    });
-    return newest == histograms->rend() ? nullptr : &*newest;
+    const std::pair key(band, level);
+    if (documentExists && histograms.count(key) == 0) FetchHistogram(band, level);
+    const auto found = histograms.find(key);
+    return found != histograms.end() && found->second ? &*found->second : nullptr;
 }
 
 GDALColorTable* Archive::ColorTable(std::uint32_t band) {
@@ -162,11 +167,21 @@ bool Archive::Store(Setter&& setter) {
     raster.Visit([&](auto& reader) {
         if (!raster.Get().IsWritable()) return;
         bool taken = false;
+        CheckElements();
         documentExists = true;
         raster.Get().Store([&] { taken = setter(reader); });
         stored = taken;
     });
     return stored;
+}
+
+void Archive::CheckElements() {
+    if (!elements) elements = documentExists ? raster.Get().DocumentElements() : 0;
+    const std::string wrong =
+        zmchost::Limits::Judge("elements", *elements, zmchost::Limits::Current().elements,
+                               "it has " + std::to_string(*elements) + " elements");
+    if (!wrong.empty())
+        throw zmchost::Error(raster.Name(), "store into its metadata document", wrong);
 }
 
 bool Archive::StoreStatistics(std::uint32_t band, const StoredStatistics& given) {
@@ -193,7 +208,7 @@ bool Archive::StoreHistogram(const StoredHistogram& histogram) {
         zelm::Array<zelm::RasterBandHistogram<T>> records;
         return record.counts.data && records.Append(record) && reader.SetHistograms(records);
     });
-    histograms.reset();
+    histograms.clear();
     return stored;
 }
 

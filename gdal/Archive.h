@@ -13,6 +13,7 @@
 #include <map>
 #include <memory>
 #include <optional>
+#include <utility>
 #include <vector>
 
 #include "gdal/LazyRaster.h"
@@ -52,7 +53,8 @@ public:
     // Whether what Statistics gave last for that band will be given again.
     bool RemembersStatistics(std::uint32_t band) const;
 
-    // Appends a record to the file; false if the module did not take it.
+    // Appends a record to the file; false if the module did not take it. A store makes a tree of
+    // all that the document has, so that one with more elements than are taken on is left alone.
     bool StoreStatistics(std::uint32_t band, const StoredStatistics& statistics);
     bool StoreHistogram(const StoredHistogram& histogram);
     // A null table hides the one that is there.
@@ -61,8 +63,9 @@ public:
 private:
     LazyRaster& raster;
     bool documentExists;
+    std::optional<std::uint64_t> elements;  // of the document, once somebody stores into it
     std::map<std::uint32_t, std::optional<StoredStatistics>> statistics;
-    std::optional<std::vector<StoredHistogram>> histograms;
+    std::map<std::pair<std::uint32_t, std::uint32_t>, std::optional<StoredHistogram>> histograms;
     std::map<std::uint32_t, std::unique_ptr<GDALColorTable>> colorTables;
 
     // Lets `setter(reader)` store; false where the file cannot be written or it answers false.
@@ -73,7 +76,8 @@ private:
     template <class Look>
     bool LookAtRecords(Look&& look) const;
     void FetchStatistics(std::uint32_t band);
-    void FetchHistograms();
+    void FetchHistogram(std::uint32_t band, std::uint32_t level);
+    void CheckElements();
     void FetchColorTable(std::uint32_t band);
 };
 

@@ -159,6 +159,8 @@ std::vector<unsigned char> Band::GatherTile(int blockX, int blockY, const zelm::
         bands = raster.AllBands();
     else
         bands = {index};
+    owner.File().CheckTile(owner.Level(), static_cast<std::uint32_t>(bands.size()),
+                           "write a block");
     const auto size = static_cast<std::size_t>(GDALGetDataTypeSizeBytes(eDataType));
     const std::size_t stride = size * bands.size();
     std::vector<unsigned char> samples(tile.Pixels() * stride);
@@ -167,7 +169,7 @@ std::vector<unsigned char> Band::GatherTile(int blockX, int blockY, const zelm::
         if (band == index)
             CopyFromBlock(data, tile, first, stride);
         else
-            static_cast<Band*>(owner.GetRasterBand(static_cast<int>(band) + 1))
+            static_cast<Band*>(owner.BandOf(static_cast<int>(band) + 1))
                 ->CompleteTile(blockX, blockY, tile, first, stride, waiting);
         first += size;
     }
@@ -307,7 +309,7 @@ GDALRasterBand* Band::GetOverview(int overview) {
     const auto& own = owner.Overviews();
     if (own.empty() && !owner.IsOverview()) return GDALPamRasterBand::GetOverview(overview);
     if (overview < 0 || overview >= static_cast<int>(own.size())) return nullptr;
-    return own[static_cast<std::size_t>(overview)]->GetRasterBand(nBand);
+    return own[static_cast<std::size_t>(overview)]->BandOf(nBand);
 }
 
 // --- colours ---

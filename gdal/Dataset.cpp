@@ -10,6 +10,7 @@
 #include "gdal/LevelRefresh.h"
 #include "gdal/SidecarStage.h"
 #include "gdal/VsiSource.h"
+#include "host/file/Limits.h"
 #include "host/raster/LentFile.h"
 #include "platform/FileSystem.h"
 
@@ -20,6 +21,7 @@ constexpr const char* kStructureDomain = "IMAGE_STRUCTURE";
 constexpr const char* kOwnDomain = "ZMCPYRAMID";
 
 constexpr std::uint64_t kMaxTileBytes = INT_MAX;
+constexpr int kMostReadyBands = 1024;  // of a level
 
 zmchost::PyramidFileInfo CheckedInfo(const std::string& fileName,
                                      const zmchost::PyramidHeader& header) {
@@ -33,7 +35,8 @@ zmchost::PyramidFileInfo CheckedInfo(const std::string& fileName,
     const auto bands = std::min<std::uint32_t>(header.bandCount, INT_MAX);
     if (!GDALCheckBandCount(static_cast<int>(bands), FALSE)) refuse("of its number of bands");
     const std::uint64_t tilePixels = std::uint64_t{header.tileSize} * header.tileSize;
-    if (tilePixels * zelm::PixelSize(header.pixelType) > kMaxTileBytes / bands)
+    const std::uint64_t together = header.IsPlanar() ? 1 : bands;
+    if (tilePixels * zelm::PixelSize(header.pixelType) > kMaxTileBytes / together)
         refuse("its tiles are too large");
     return info;
 }
@@ -61,6 +64,17 @@ OpenFile::OpenFile(const std::string& fileName, GDALAccess access, const OpenOpt
       tiles(raster, info, GdalTypeOf(info.header.pixelType, options.signedByteAs)),
       archive(raster, info.HasMetadataDocument()) {}
 
+void OpenFile::CheckTile(std::uint32_t level, std::uint32_t bands, const char* operation) const {
+    const zelm::LevelGeometry grid = info.header.Geometry(level);
+    const std::uint64_t bytes = std::uint64_t{std::min(grid.tileSize, grid.samples)} *
+                                std::min(grid.tileSize, grid.lines) * bands *
+                                zelm::PixelSize(info.header.pixelType);
+    const std::string wrong =
+        zmchost::Limits::Judge("tile", bytes, zmchost::Limits::Current().tile,
+                               "its tiles have " + std::to_string(bytes) + " bytes");
+    if (!wrong.empty()) throw zmchost::Error(raster.Name(), operation, wrong);
+}
+
 Dataset::Dataset(std::shared_ptr<OpenFile> openFile, std::uint32_t levelShown, GDALAccess access,
                  Dataset* mainDataset)
     : file(std::move(openFile)), level(levelShown), main(mainDataset) {
@@ -87,9 +101,18 @@ std::unique_ptr<Dataset> Dataset::FromFile(std::shared_ptr<OpenFile> file, GDALA
     return std::unique_ptr<Dataset>(new Dataset(std::move(file), base, access, nullptr));
 }
 
+// GDAL holds half a kilobyte and more for each band of each level, and of tens of thousands only
+// some are looked at: levels have them when they are asked for. The last one tells the number.
 void Dataset::AddBands() {
     const auto count = static_cast<int>(file->info.header.bandCount);
-    for (int number = 1; number <= count; ++number) SetBand(number, new Band(*this, number));
+    const bool all = !main || count <= kMostReadyBands;
+    for (int number = all ? 1 : count; number <= count; ++number)
+        SetBand(number, new Band(*this, number));
+}
+
+GDALRasterBand* Dataset::BandOf(int number) {
+    if (!GetRasterBand(number)) SetBand(number, new Band(*this, number));
+    return GetRasterBand(number);
 }
 
 const std::vector<std::unique_ptr<Dataset>>& Dataset::Overviews() {
@@ -149,6 +172,8 @@ bool Dataset::ReadsDirectly(int x, int y, int width, int height) const {
     // Blocks may wait in the cache to be written.
     const bool quiet = eAccess != GA_Update || (creation && creation->IsSealed());
     if (!quiet || bForceCachedIO) return false;
+    // Blocks of such tiles would fill the cache.
+    if (!file->tiles.IsHeld(file->tiles.TileAt(level, 0, 0))) return true;
     const int side = static_cast<int>(file->info.header.tileSize);
     const auto touched = [side](int start, int extent, int limit) {
         const int end = std::min((start + extent - 1) / side * side + side, limit);
@@ -187,6 +212,9 @@ CPLErr Dataset::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, 
                           GDALRasterIOExtraArg* extra) {
     if (mode == GF_Read && bufferWidth < width && bufferHeight < height) {
         int tried = FALSE;
+        // GDAL takes the bands from the level as a dataset of its own.
+        for (const auto& overview : Overviews())
+            for (int i = 0; i < bandCount; ++i) overview->BandOf(bandMap[i]);
         const CPLErr result = TryOverviewRasterIO(mode, x, y, width, height, data, bufferWidth,
                                                   bufferHeight, bufferType, bandCount, bandMap,
                                                   pixelSpace, lineSpace, bandSpace, extra, &tried);
@@ -211,6 +239,13 @@ CPLErr Dataset::IBuildOverviews(const char* resampling, int overviewCount, const
                                 int bandCount, const int* bands, GDALProgressFunc progress,
                                 void* progressData, CSLConstList options) {
     if (creation) return creation->ChooseLevels(*this, resampling, overviewCount, factors);
+    if (file->info.bytesMissing > 0) {
+        CPLError(CE_Failure, CPLE_NotSupported,
+                 "%s: the pyramid is incomplete, " CPL_FRMT_GUIB
+                 " bytes are missing; no levels are made of it",
+                 GetDescription(), static_cast<GUIntBig>(file->info.bytesMissing));
+        return CE_Failure;
+    }
     if (Overviews().empty())
         return GDALPamDataset::IBuildOverviews(resampling, overviewCount, factors, bandCount, bands,
                                                progress, progressData, options);

@@ -32,6 +32,10 @@ public:
     // it cannot be opened, is no pyramid, or one that GDAL cannot hold.
     OpenFile(const std::string& fileName, GDALAccess access, const OpenOptions& options);
 
+    // Throws zmchost::Error where a tile of that level, with so many bands, is beyond the limit of
+    // those that are held as a whole. `operation` stands behind "cannot".
+    void CheckTile(std::uint32_t level, std::uint32_t bands, const char* operation) const;
+
     const std::shared_ptr<zelm::files::ByteSource> source;
     const zmchost::PyramidFileInfo info;
     LazyRaster raster;
@@ -48,15 +52,18 @@ public:
     std::uint32_t Level() const { return level; }
     bool IsOverview() const { return main != nullptr; }
     Dataset& Main() { return main ? *main : *this; }
-    // From fine to coarse; made when first asked for.
+    // From fine to coarse; made when first asked for. Of a raster of very many bands they have
+    // those alone that BandOf was asked for.
     const std::vector<std::unique_ptr<Dataset>>& Overviews();
+    // A band that the raster has, counted from 1.
+    GDALRasterBand* BandOf(int number);
 
     // Reads the sidecar, and looks for other companions, of a file of that name. Those that are
     // staged for it (SidecarStage.h) are given their names first if it is open for update.
     void LoadSidecar(const char* fileName, char** siblings);
 
     // True if pixels of this window are better read past GDAL's block cache: it is not a sliver of
-    // the tiles that it touches, and no block waits to be written.
+    // the tiles that it touches, or these are very large; and no block waits to be written.
     bool ReadsDirectly(int x, int y, int width, int height) const;
 
     // Makes this dataset the place where pixels of a new file are gathered; see gdal/Create.h.

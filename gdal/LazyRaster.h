@@ -36,6 +36,8 @@ public:
           header(told),
           keepsCopies(keepCopies) {}
 
+    const std::string& Name() const { return name; }
+
     // Throws zmchost::Error, each time anew, if the module does not open the file, or as another
     // raster than the header told.
     zmchost::Raster& Get() {

@@ -120,6 +120,9 @@ CPLErr RefreshLevels(Dataset& dataset, const char* resampling, const std::vector
     const auto levels = LevelsOf(dataset, factors);
     if (!levels || !WritePixels(dataset)) return CE_Failure;
     try {
+        for (const std::uint32_t level : *levels)
+            dataset.File().CheckTile(level, dataset.File().info.header.bandCount,
+                                     "make its levels anew");
         TellNoDataValues(dataset);
         bool finished = false;
         zelm::VisitElementType(pixelType, [&]<class T>(std::type_identity<T>) {

@@ -86,21 +86,49 @@ const unsigned char* TileReader::LoadTile(std::uint32_t level, const Rectangle& 
     const bool together = IsPixelInterleaved();
     const TileKey key{level, tile.x, tile.y, together ? 0 : band};
     if (key == held) return scratch.data();
-    const int* const bands = together ? allBands.data() : &band;
-    const int bandCount = together ? fileBands : 1;
-    const std::size_t samples =
-        std::size_t{tileSize} * tileSize * static_cast<std::size_t>(bandCount);
-    scratch.resize(samples * sampleSize);
-    held = TileKey();
-    if (sampleSize == rawSampleSize) {
-        if (!ReadRaw(level, tile, bands, bandCount, scratch.data())) return nullptr;
-    } else {
-        raw.resize(samples * rawSampleSize);
-        if (!ReadRaw(level, tile, bands, bandCount, raw.data())) return nullptr;
-        Widen(raw.data(), samples, scratch.data());
-    }
+    if (!LoadSamples(level, tile, together ? allBands.data() : &band, together ? fileBands : 1))
+        return nullptr;
     held = key;
     return scratch.data();
+}
+
+bool TileReader::LoadSamples(std::uint32_t level, const Rectangle& area, const int* bands,
+                             int bandCount) {
+    const std::size_t samples = area.Pixels() * static_cast<std::size_t>(bandCount);
+    held = TileKey();
+    scratch.resize(samples * sampleSize);
+    if (sampleSize == rawSampleSize) return ReadRaw(level, area, bands, bandCount, scratch.data());
+    raw.resize(samples * rawSampleSize);
+    if (!ReadRaw(level, area, bands, bandCount, raw.data())) return false;
+    Widen(raw.data(), samples, scratch.data());
+    return true;
+}
+
+bool TileReader::IsHeld(const Rectangle& tile) const {
+    const auto together = static_cast<std::uint64_t>(IsPixelInterleaved() ? fileBands : 1);
+    return tile.Pixels() * together * sampleSize <= kMostHeld;
+}
+
+// What the window has of a tile that is not held, by as many bands and rows as make a piece.
+bool TileReader::CopyPieces(std::uint32_t level, const Rectangle& part, const Rectangle& window,
+                            const int* bands, int bandCount, const Target& target) {
+    const std::uint64_t rowBytes = std::uint64_t{part.width} * sampleSize;
+    const auto most = static_cast<int>(std::clamp<std::uint64_t>(
+        kPieceBytes / rowBytes, 1, static_cast<std::uint64_t>(fileBands)));
+    for (int first = 0; first < bandCount; first += most) {
+        const int count = std::min(most, bandCount - first);
+        const auto rows = static_cast<std::uint32_t>(std::clamp<std::uint64_t>(
+            kPieceBytes / (rowBytes * static_cast<std::uint64_t>(count)), 1, part.height));
+        Target group = target;
+        group.data = static_cast<unsigned char*>(target.data) + first * target.bandSpace;
+        for (std::uint32_t row = 0; row < part.height; row += rows) {
+            const Rectangle piece{part.x, part.y + row, part.width,
+                                  std::min(rows, part.height - row)};
+            if (!LoadSamples(level, piece, bands + first, count)) return false;
+            CopyTile(piece, scratch.data(), count, window, allBands.data(), count, group);
+        }
+    }
+    return true;
 }
 
 // Who reads one band of a picture mostly goes on to the next, and all bands are taken apart by
@@ -147,10 +175,11 @@ bool TileReader::Read(std::uint32_t level, const Rectangle& window, const int* b
     if (FitsTarget(window, bands, bandCount, target))
         return ReadRaw(level, window, bands, bandCount, target.data);
     const TileKey key{level, window.x, window.y, 0};
-    if (IsPlainPlane(window, bandCount, target) && heldApart != key)
+    if (IsPlainPlane(window, bandCount, target) && heldApart != key && IsHeld(window))
         return SplitTile(level, window, bands[0], target.data);
     return zelm::VisitTiles(layout.header.Geometry(level), window, [&](const zelm::TilePart& part) {
-        return CopyPart(level, part.tile, window, bands, bandCount, target);
+        return IsHeld(part.tile) ? CopyPart(level, part.tile, window, bands, bandCount, target)
+                                 : CopyPieces(level, part.part, window, bands, bandCount, target);
     });
 }
 

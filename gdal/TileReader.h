@@ -51,6 +51,9 @@ public:
     void Forget() { held = heldApart = TileKey(); }
 
     // The tile of the grid of `level`, clipped to the level.
+    // Whether a tile that was read is kept for whoever reads its next part. Of one that is not,
+    // what is asked for alone is read.
+    bool IsHeld(const zelm::Rectangle& tile) const;
     zelm::Rectangle TileAt(std::uint32_t level, int tileX, int tileY) const;
 
 private:
@@ -75,6 +78,9 @@ private:
     };
     // Bands that GDAL has vector code for, to put them apart.
     static constexpr int kMostPlanes = 4;
+    // Bytes of a tile that is kept for whoever reads its next part; larger ones are read in pieces.
+    static constexpr std::uint64_t kMostHeld = std::uint64_t{16} << 20;
+    static constexpr std::uint64_t kPieceBytes = std::uint64_t{4} << 20;
 
     TileKey held;        // tile in `scratch`
     TileKey heldApart;   // tile in `planes`, and the
@@ -84,6 +90,10 @@ private:
                  void* buffer);
     bool FitsTarget(const zelm::Rectangle& window, const int* bands, int bandCount,
                     const Target& target) const;
+    bool LoadSamples(std::uint32_t level, const zelm::Rectangle& area, const int* bands,
+                     int bandCount);
+    bool CopyPieces(std::uint32_t level, const zelm::Rectangle& part, const zelm::Rectangle& window,
+                    const int* bands, int bandCount, const Target& target);
     const unsigned char* LoadTile(std::uint32_t level, const zelm::Rectangle& tile, int band);
     const unsigned char* LoadPlane(std::uint32_t level, const zelm::Rectangle& tile, int band);
     bool SplitTile(std::uint32_t level, const zelm::Rectangle& tile, int band, void* out);

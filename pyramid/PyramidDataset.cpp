@@ -12,7 +12,6 @@
 #include "format/DocumentParse.h"
 #include "format/LevelGeometry.h"
 #include "format/PyramidFront.h"
-#include "format/TileTable.h"
 
 namespace zelm {
 namespace {
@@ -211,8 +210,16 @@ void PyramidDataset::BuildTileTable(std::uint32_t width, std::uint32_t height,
         .Place(TileOffsets, TileCursor);
 }
 
+TileTable PyramidDataset::DescribeTileTable() const {
+    return {LevelGeometry(Samples, Lines, TileSize, 0), LevelMin, LevelMax, BandCount,
+            BytesPerSample};
+}
+
 bool PyramidDataset::EnsureTileTable() {
-    if (TileOffsets.data) return true;
+    using namespace PyramidLimits;
+    if (TileOffsets.data ||
+        TileTableBytes(DescribeTileTable().Tiles(), BandCount, LevelMax) > kMaxHeldTableBytes)
+        return true;
     TileCursor = TileDataStart;
     BuildTileTable(Samples, Lines, TileSize, TileSize, BandCount, BytesPerSample);
     return TileOffsets.data != nullptr;

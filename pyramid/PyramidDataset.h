@@ -25,6 +25,7 @@
 #include "format/PyramidHeaderRecord.h"
 #include "format/PyramidLayout.h"
 #include "format/PyramidLimits.h"
+#include "format/TileTable.h"
 #include "pyramid/DocumentOnDemand.h"
 #include "pyramid/PyramidXMLDocument.h"
 #include "raster/RasterBandHistogram.h"
@@ -69,8 +70,8 @@ public:
     std::uint64_t TileCursor = 0;    // running offset of BuildTileTable
     // Absolute offset of every tile: (LevelMax + 1) x BandCount x tiles of level 0, of which a
     // level uses the start of its row; what it does not use is 0. Filled in the ordering Morton
-    // alone, since nothing addresses by it in the others, and a large one with the first tile that
-    // moves.
+    // alone, since nothing addresses by it in the others: at once where it is small, with the first
+    // tile that moves where it is larger, and never where it is large (PyramidLimits.h).
     Array<std::uint64_t> TileOffsets;
     // Room for 2 x 2 tiles with all bands, in the orderings Scanline and Blocked. Null until a
     // transfer needs it, and where it would be larger than PyramidLimits allow.
@@ -225,7 +226,9 @@ private:
     bool ReadHeaderText(PyramidLayout& layout, DocumentSource& text);
     bool ParseHeaderText(DocumentSource& text, bool& loaded, PyramidHeaderRecord& out);
     bool WriteFront(PyramidLayout& layout);
+    // Whether tiles can be addressed by TileOffsets, or have to be without.
     bool EnsureTileTable();
+    TileTable DescribeTileTable() const;
     // Judges a transfer that has something to move, and makes sure of the tile table.
     bool PrepareTransfer(std::uint32_t x, std::uint32_t y, std::uint32_t width,
                          std::uint32_t height, const Array<int>& bandList, std::int32_t level,

@@ -4,6 +4,7 @@
 // judged, and its segments (TileRequest.h) are read or written one after the other; those that are
 // not straight go through work space that stays in the cache. What the disk does is not reported.
 #include <cstring>
+#include <optional>
 
 #include "core/ElementTypes.h"
 #include "core/PixelVocabulary.h"
@@ -18,7 +19,10 @@ namespace zelm {
 class TileTransfer {
 protected:
     TileTransfer(PyramidDataset& owner, const TileRequest& accepted)
-        : dataset(owner), request(accepted), file(*owner.File) {}
+        : dataset(owner), request(accepted), file(*owner.File) {
+        if (request.planar && !owner.TileOffsets.data)
+            places.emplace(owner.DescribeTileTable(), owner.TileDataStart);
+    }
 
     // Absolute offset of a tile's plane, the i-th of the list; only the ordering Morton has more
     // than one.
@@ -30,6 +34,7 @@ protected:
     }
 
     std::uint64_t TableEntry(std::uint32_t band, std::uint32_t tileX, std::uint32_t tileY) const {
+        if (places) return places->At(band, request.level, tileX, tileY);
         const auto& table = dataset.TileOffsets;
         const std::uint64_t row = std::uint64_t{request.level} * dataset.BandCount + band;
         return table.data[row * table.shape.extents[2] +
@@ -56,6 +61,7 @@ protected:
     PyramidDataset& dataset;
     const TileRequest& request;
     files::ByteSource& file;
+    std::optional<TilePlaces> places;  // in place of a table that is too large
 
     // At least `bytes`; null if memory ran out.
     unsigned char* WorkSpace(std::uint64_t bytes) const { return dataset.WorkSpace(bytes); }

@@ -241,8 +241,16 @@ void BuildCommand::Report(const zmchost::BuildReport& report, std::uint32_t pixe
     }
 }
 
+// What is missing reads as zeros, and a few bytes of header can claim terabytes of them.
+void CheckComplete(GDALDataset& dataset, const std::string& source) {
+    if (const char* const missing = dataset.GetMetadataItem("BYTES_MISSING", "ZMCPYRAMID"))
+        throw Failure(source, std::string("the pyramid is incomplete, ") + missing +
+                                  " bytes of tiles are missing; build it anew");
+}
+
 ExitStatus BuildCommand::Run() {
     const DatasetPtr dataset = OpenDataset(source);
+    CheckComplete(*dataset, source);
     zmcgdal::GdalRasterSource pixels(*dataset);
     const zelm::RasterProps props = pixels.Props();
     const zmchost::BuildOptions options = Options(props);

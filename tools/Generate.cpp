@@ -94,7 +94,8 @@ std::string MakeManPage(const CLI::App& app) {
         << Escape(kExitStatusText) << ".\n"
         << ".SH ENVIRONMENT\n.TP\n.B ZMCRASTER_MODULE\nAbsolute path of the raster module, where "
            "it "
-           "is not to be the one that was installed with the program.\n";
+           "is not to be the one that was installed with the program.\n.TP\n.B ZMC_LIMITS\nWhat a "
+           "file may claim, as with \\-\\-limit: bands=100000,tile=1G.\n";
     return out.str();
 }
 

@@ -5,6 +5,7 @@
 #include "host/build/LevelReduction.h"
 #include "tools/Interrupt.h"
 #include "tools/Message.h"
+#include "tools/RasterView.h"
 #include "tools/SampleDifferences.h"
 #include "tools/Verification.h"
 
@@ -23,10 +24,11 @@ public:
     // A multiple of the tile's side: whole tiles are read once but for the margins.
     std::uint32_t BlockSide() const {
         std::uint32_t side = raster.TileSide();
+        const std::uint64_t most = BytesAtOnce(kBlockBytes, side);
         const auto bytes = [&](std::uint64_t next) {
             return next * next * 4 * bands * (sizeof(T) + 1);
         };
-        while (side < 4096 && bytes(std::uint64_t{side} * 2) <= kBlockBytes) side *= 2;
+        while (side < 4096 && bytes(std::uint64_t{side} * 2) <= most) side *= 2;
         return side;
     }
 

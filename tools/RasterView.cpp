@@ -76,6 +76,14 @@ public:
         if (const std::string change = raster.ContentChange(); !change.empty())
             FailAsChanged(Name(), change);
     }
+    std::uint32_t TileSide() const override { return raster.TileSide(); }
+    void CheckReadable() override {
+        if (!raster.IsComplete())
+            throw zmchost::Error(raster.Name(), "read its pixels",
+                                 "the file is incomplete, " +
+                                     std::to_string(raster.Header().BytesMissing()) +
+                                     " bytes are missing");
+    }
 
 private:
     Identity before;
@@ -176,14 +184,20 @@ std::unique_ptr<RasterView> OpenView(const std::string& name) {
 
 std::size_t StripBytes(const RasterView& view, const Selection& selection,
                        const zmchost::Window& strip) {
-    return static_cast<std::size_t>(LineBytes(view, selection) * strip.height);
+    return static_cast<std::size_t>(std::uint64_t{strip.width} * strip.height *
+                                    selection.bands.size() * zelm::PixelSize(view.PixelType()));
 }
 
-void WalkStrips(const RasterView& view, const Selection& selection, TerminalProgress& progress,
+void WalkStrips(RasterView& view, const Selection& selection, TerminalProgress& progress,
                 const std::function<void(const zmchost::Window& strip)>& take) {
+    view.CheckReadable();
     const zmchost::Window& window = selection.window;
-    const std::uint64_t lines = std::max<std::uint64_t>(
-        kStripBudget / std::max<std::uint64_t>(LineBytes(view, selection), 1), 1);
+    const std::uint64_t lineBytes = std::max<std::uint64_t>(LineBytes(view, selection), 1);
+    const std::uint64_t budget = BytesAtOnce(kStripBudget, view.TileSide());
+    const std::uint64_t lines = std::max<std::uint64_t>(budget / lineBytes, 1);
+    // Of a line that is longer.
+    const auto columns = static_cast<std::uint32_t>(std::clamp<std::uint64_t>(
+        std::uint64_t{window.width} * budget / lineBytes, 1, std::max(window.width, 1u)));
     const std::uint64_t total = std::uint64_t{window.width} * window.height;
     for (std::uint32_t done = 0; done < window.height;) {
         // Up to the end of a row of tiles, so that the next strip begins with one.
@@ -192,10 +206,15 @@ void WalkStrips(const RasterView& view, const Selection& selection, TerminalProg
         if (aligned > window.y + done) end = aligned;
         end = std::min<std::uint64_t>(end, std::uint64_t{window.y} + window.height);
         const auto height = static_cast<std::uint32_t>(end - window.y - done);
-        take({window.x, window.y + done, window.width, height});
+        for (std::uint32_t x = 0; x < window.width;) {
+            const std::uint32_t width = std::min(columns, window.width - x);
+            take({window.x + x, window.y + done, width, height});
+            x += width;
+            if (!progress.Show(std::uint64_t{done} * window.width + std::uint64_t{x} * height,
+                               total))
+                throw Interruption(view.Name());
+        }
         done += height;
-        if (!progress.Show(std::uint64_t{done} * window.width, total))
-            throw Interruption(view.Name());
     }
 }
 

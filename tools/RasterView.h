@@ -14,11 +14,23 @@
 #include <string>
 #include <vector>
 
+#include "format/PyramidHeaderRecord.h"
 #include "host/file/PyramidFileInfo.h"
 #include "host/raster/Raster.h"
 #include "tools/TerminalProgress.h"
 
 namespace zmctools {
+
+// Of the files that builds write.
+inline constexpr std::uint32_t kUsualTile = zelm::kWrittenTileSize;
+
+// Of so many bytes that are gone through between two looks at whether somebody wants an end, as
+// many as take no longer with small tiles: each is moved by itself.
+constexpr std::uint64_t BytesAtOnce(std::uint64_t bytes, std::uint32_t tileSide) {
+    constexpr std::uint64_t kSmall = 64;
+    const std::uint64_t side = tileSide < kSmall ? tileSide : kSmall;
+    return bytes / (kSmall * kSmall) * side * side;
+}
 
 class RasterView {
 public:
@@ -36,6 +48,10 @@ public:
     // pyramid, if it was written to; of others, which are looked up by name, if they or a file of
     // theirs were replaced as well. A file that takes the name of an open pyramid is not met.
     virtual void CheckUnchanged() const = 0;
+    // Side of the tiles that are moved at once.
+    virtual std::uint32_t TileSide() const { return kUsualTile; }
+    // Throws where nothing can be read, before anything is made ready for it.
+    virtual void CheckReadable() {}
 
     // Throws UsageError for a level that there is not.
     void CheckLevel(std::uint32_t level) const;
@@ -66,9 +82,9 @@ struct Selection {
 };
 
 // Calls take(strip) for strips of the window from the top to the bottom. A strip is whole rows of
-// tiles as long as these fit some 32 MiB for each view, and single lines at the least. Throws
-// Interruption.
-void WalkStrips(const RasterView& view, const Selection& selection, TerminalProgress& progress,
+// tiles as long as these fit some 32 MiB for each view; else lines, or parts of a line from the
+// left to the right. Throws Interruption, and where the view has nothing to read.
+void WalkStrips(RasterView& view, const Selection& selection, TerminalProgress& progress,
                 const std::function<void(const zmchost::Window& strip)>& take);
 
 std::size_t StripBytes(const RasterView& view, const Selection& selection,

@@ -1,11 +1,13 @@
 #include <algorithm>
 #include <cmath>
 #include <limits>
+#include <span>
 
 #include "host/statistics/BandStatistics.h"
 #include "host/statistics/Histogram.h"
 #include "tools/Interrupt.h"
 #include "tools/Message.h"
+#include "tools/RasterView.h"
 #include "tools/Verification.h"
 
 namespace zmctools {
@@ -28,24 +30,24 @@ bool Near(double stored, double computed, double error) {
                std::numeric_limits<double>::denorm_min();
 }
 
-// Calls take(row, mask, width) for every line of level 0.
+// Calls take(row, mask) for every line of level 0, with those bands.
 template <class T, class Take>
-void WalkLines(zmchost::Raster& raster, const char* label, bool quiet, Take&& take) {
-    const std::uint64_t lineBytes =
-        std::uint64_t{raster.Width()} * raster.Bands() * (sizeof(T) + 1);
-    std::uint64_t lines = std::max<std::uint64_t>((std::uint64_t{48} << 20) / lineBytes, 1);
+void WalkLines(zmchost::Raster& raster, std::span<const std::uint32_t> bands, const char* label,
+               bool quiet, Take&& take) {
+    const std::uint64_t lineBytes = std::uint64_t{raster.Width()} * bands.size() * (sizeof(T) + 1);
+    std::uint64_t lines = std::max<std::uint64_t>(
+        BytesAtOnce(std::uint64_t{48} << 20, raster.TileSide()) / lineBytes, 1);
     if (lines >= raster.TileSide()) lines -= lines % raster.TileSide();
     TerminalProgress bar(label, !quiet);
     std::vector<T> pixels;
     std::vector<unsigned char> mask;
-    const std::size_t stride = std::size_t{raster.Width()} * raster.Bands();
+    const std::size_t stride = std::size_t{raster.Width()} * bands.size();
     for (std::uint32_t line = 0; line < raster.Height();) {
         const auto height =
             static_cast<std::uint32_t>(std::min<std::uint64_t>(lines, raster.Height() - line));
         pixels.resize(stride * height);
         mask.assign(stride * height, 0);
-        raster.Read(0, {0, line, raster.Width(), height}, raster.AllBands(), pixels.data(),
-                    mask.data());
+        raster.Read(0, {0, line, raster.Width(), height}, bands, pixels.data(), mask.data());
         for (std::uint32_t row = 0; row < height; ++row)
             take(pixels.data() + row * stride, mask.data() + row * stride);
         line += height;
@@ -79,15 +81,28 @@ private:
     bool quiet;
     CheckResult& result;
 
+    // Exact sums of reals take up to 200 kB for each band.
+    static constexpr std::size_t kBandsAtOnce = 128;
+
     void CheckRecords() {
-        std::vector<zmchost::BandAccumulator<T>> sums(raster.Bands());
-        WalkLines<T>(raster, "statistics", quiet, [&](const T* row, const unsigned char* mask) {
-            for (std::uint32_t band = 0; band < raster.Bands(); ++band)
-                sums[band].AddRow(row, mask, band, raster.Bands(), raster.Width());
-        });
+        std::vector<std::uint32_t> bands;
         for (std::uint32_t band = 0; band < raster.Bands(); ++band)
-            if (raster.HasStatistics(band))
-                Compare(raster.Statistics<T>(band), sums[band].Stats(band));
+            if (raster.HasStatistics(band)) bands.push_back(band);
+        const std::span<const std::uint32_t> all = bands;
+        for (std::size_t done = 0; done < all.size(); done += kBandsAtOnce)
+            CheckRecords(all.subspan(done, std::min(kBandsAtOnce, all.size() - done)));
+    }
+
+    void CheckRecords(std::span<const std::uint32_t> bands) {
+        const auto count = static_cast<std::uint32_t>(bands.size());
+        std::vector<zmchost::BandAccumulator<T>> sums(count);
+        WalkLines<T>(raster, bands, "statistics", quiet,
+                     [&](const T* row, const unsigned char* mask) {
+                         for (std::uint32_t i = 0; i < count; ++i)
+                             sums[i].AddRow(row, mask, i, count, raster.Width());
+                     });
+        for (std::uint32_t i = 0; i < count; ++i)
+            Compare(raster.Statistics<T>(bands[i]), sums[i].Stats(bands[i]));
     }
 
     void Compare(const zelm::RasterBandStats<T>& stored, const zelm::RasterBandStats<T>& computed) {
@@ -145,10 +160,13 @@ private:
                 counters.emplace_back(bins);
             }
             if (records.empty()) return;
-            WalkLines<T>(raster, "histograms", quiet, [&](const T* row, const unsigned char* mask) {
-                for (std::size_t i = 0; i < records.size(); ++i)
-                    counters[i].AddRow(row, mask, records[i]->band, raster.Bands(), raster.Width());
-            });
+            const auto bands = raster.AllBands();
+            WalkLines<T>(raster, bands, "histograms", quiet,
+                         [&](const T* row, const unsigned char* mask) {
+                             for (std::size_t i = 0; i < records.size(); ++i)
+                                 counters[i].AddRow(row, mask, records[i]->band, raster.Bands(),
+                                                    raster.Width());
+                         });
             for (std::size_t i = 0; i < records.size(); ++i) Compare(*records[i], counters[i]);
         } else {
             static_cast<void>(stored);

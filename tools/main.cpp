@@ -8,6 +8,7 @@
 
 #include "files/Lending.h"
 #include "host/base/Error.h"
+#include "host/file/Limits.h"
 #include "platform/Interrupts.h"
 #include "platform/Terminal.h"
 #include "tools/Command.h"
@@ -48,9 +49,11 @@ private:
     std::vector<CLI::App*> parts;
     CLI::App* generate = nullptr;
     std::string generated;
+    std::vector<std::string> limits;
 
     void Add(std::unique_ptr<Command> command);
     ExitStatus RunChosen();
+    void ChangeLimits() const;
     void CheckCommand(const std::string& word) const;
 };
 
@@ -59,6 +62,12 @@ Program::Program() {
                          "Print the versions of this program, of the file "
                          "format and of the libraries");
     app.set_help_flag("--help,-h", "Print this help");
+    OptionTable(app)
+        .Texts("--limit", limits,
+               "What a file may claim: bands=65536, tile=16M, elements=131072, header=4M, "
+               "document=256M are the usual "
+               "limits, and one that names another changes it; stands before COMMAND")
+        .Named("NAME=N");
     app.require_subcommand(1);
     Add(MakeBuildCommand());
     Add(MakeInfoCommand());
@@ -100,12 +109,21 @@ ExitStatus Program::RunChosen() {
         if (!parts[i]->parsed()) continue;
         SetQuiet(commands[i]->quiet);
         platform::CatchInterrupts();
+        ChangeLimits();
         StartGdal();
         const ExitStatus status = commands[i]->Run();
         if (std::fflush(stdout) != 0) throw Failure("standard output", "it cannot be written");
         return status;
     }
     return ExitStatus::Usage;
+}
+
+void Program::ChangeLimits() const {
+    for (const std::string& text : limits) try {
+            zmchost::Limits::Change(text);
+        } catch (const zmchost::Error& error) {
+            throw UsageError("--limit", error.what());
+        }
 }
 
 // "-co K=V", as GDAL's own programs have it, is one dash with two letters.

@@ -1,5 +1,6 @@
 #include "host/file/MetadataDocument.h"
 
+#include <algorithm>
 #include <memory>
 #include <utility>
 
@@ -9,6 +10,7 @@
 #include "host/base/Error.h"
 #include "host/base/Text.h"
 #include "host/base/Xerces.h"
+#include "host/file/Limits.h"
 #include "platform/FileSystem.h"
 
 namespace zmchost {
@@ -19,6 +21,7 @@ using zelm::files::FileSource;
 using zelm::files::OpenMode;
 
 constexpr char kSubject[] = "the metadata document ";
+constexpr std::uint64_t kPiece = std::uint64_t{1} << 20;
 constexpr char kTooLong[] = "is longer than 256 MiB";
 
 class RootReader : public zelm::FaultReader {
@@ -69,7 +72,9 @@ std::string JudgeMetadataParse(const std::string& fault, bool hasOurRoot) {
 }
 
 std::string JudgeMetadataSize(std::uint64_t bytes) {
-    return bytes > zelm::kMaxDocumentBytes ? std::string(kSubject) + kTooLong : "";
+    if (bytes > zelm::kMaxDocumentBytes) return std::string(kSubject) + kTooLong;
+    return Limits::Judge("document", bytes, Limits::Current().document,
+                         kSubject + ("has " + std::to_string(bytes) + " bytes"));
 }
 
 std::string JudgeMetadataText(std::string text) {
@@ -83,11 +88,20 @@ std::string JudgeMetadataText(std::string text) {
 std::string ReadMetadataText(ByteSource& source, const std::string& name,
                              const PyramidHeader& header) {
     const std::uint64_t size = DocumentSize(source, name, header);
-    if (size > zelm::kMaxDocumentBytes) Fail(name, std::string("it ") + kTooLong);
-    std::string text(static_cast<std::size_t>(size), '\0');
-    int error = 0;
-    if (source.ReadAt(header.tileDataEnd, text.data(), text.size(), &error) != text.size())
-        Fail(name, error != 0 ? platform::ErrorText(error) : "the file was cut");
+    if (const std::string wrong = JudgeMetadataSize(size); !wrong.empty())
+        Fail(name, "it" + wrong.substr(sizeof kSubject - 2));
+    std::string text;
+    // What has a NUL is no document, and the rest of it, which may be a hole, is not read.
+    for (bool hasNul = false; !hasNul && text.size() < size;) {
+        const std::size_t before = text.size();
+        const auto piece = static_cast<std::size_t>(std::min<std::uint64_t>(size - before, kPiece));
+        text.resize(before + piece);
+        int error = 0;
+        if (source.ReadAt(header.tileDataEnd + before, text.data() + before, piece, &error) !=
+            piece)
+            Fail(name, error != 0 ? platform::ErrorText(error) : "the file was cut");
+        hasNul = text.find('\0', before) != text.npos;
+    }
     return text;
 }
 

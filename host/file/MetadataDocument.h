@@ -27,7 +27,7 @@ std::string JudgeMetadataParse(const std::string& fault, bool hasOurRoot);
 std::string JudgeMetadataSize(std::uint64_t bytes);
 
 // The text behind the tiles of a file; empty if there is none. Throws Error if it cannot be read or
-// is too long.
+// is too long. One with a NUL, which is no document, ends shortly behind it.
 std::string ReadMetadataText(const std::string& file, const PyramidHeader& header);
 // The same from an open source; `name` stands for it in errors.
 std::string ReadMetadataText(zelm::files::ByteSource& source, const std::string& name,

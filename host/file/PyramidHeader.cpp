@@ -11,6 +11,7 @@
 #include "host/base/Error.h"
 #include "host/base/Text.h"
 #include "host/base/Xerces.h"
+#include "host/file/Limits.h"
 #include "platform/FileSystem.h"
 
 namespace zmchost {
@@ -26,6 +27,12 @@ constexpr std::uint64_t kUsualStart = 1024;  // holds the header of every file t
     throw Error(name, "read the header", reason);
 }
 
+void Demand(const std::string& name, const char* limit, std::uint64_t claimed, std::uint64_t most,
+            const std::string& what) {
+    if (const std::string wrong = Limits::Judge(limit, claimed, most, what); !wrong.empty())
+        Refuse(name, wrong);
+}
+
 // Where the tiles begin, from the first bytes of a file.
 std::uint64_t TileDataStart(const std::string& name, std::string_view start,
                             std::uint64_t fileSize) {
@@ -34,6 +41,8 @@ std::uint64_t TileDataStart(const std::string& name, std::string_view start,
     if (fault == zelm::FrontFault::NoPyramid) Refuse(name, "it is no pyramid file");
     if (fault == zelm::FrontFault::NoHeader || front.HeaderBytes() > zelm::kMaxDocumentBytes)
         Refuse(name, "its header is damaged or was never finished");
+    Demand(name, "header", front.HeaderBytes(), Limits::Current().header,
+           "its header has " + std::to_string(front.HeaderBytes()) + " bytes");
     return front.tileDataStart;
 }
 
@@ -55,6 +64,8 @@ void Check(const std::string& name, const PyramidHeader& header) {
                          std::to_string(header.levelMax));
     if (zelm::CheckedPixelType(header.pixelType) == 0) Refuse(name, "its pixel type is not known");
     if (!Allow(header)) Refuse(name, "its sizes are too large");
+    Demand(name, "bands", header.bandCount, Limits::Current().bands,
+           "it has " + std::to_string(header.bandCount) + " bands");
 }
 
 }  // namespace

@@ -35,7 +35,8 @@ struct PyramidHeader : zelm::PyramidHeaderRecord {
 
     // Reads the header of the file of that UTF-8 name. Throws Error if it is no pyramid file, its
     // header is damaged, or nobody could read samples by it: a tile size of 0 or above 2048, no
-    // level, a level or sizes beyond the limits of the format, a pixel type without a reader.
+    // level, a level or sizes beyond the limits of the format, a pixel type without a reader, more
+    // bands than are taken on (Limits.h).
     static PyramidHeader Read(const std::string& file);
     // The same from an open source; `name` stands for it in errors.
     static PyramidHeader Read(zelm::files::ByteSource& source, const std::string& name);

@@ -1,5 +1,6 @@
 #include "host/file/StoredRecords.h"
 
+#include <string_view>
 #include <utility>
 
 #include "core/ElementTypes.h"
@@ -41,12 +42,25 @@ private:
     zelm::ColorList current;  // the palette in hand
 };
 
-// Why the text behind `offset` could not be had; empty if there is none.
-std::string JudgeAbsence(zelm::files::ByteSource& source, std::uint64_t offset) {
+// Whether the text behind `offset` is beyond what is read.
+std::string JudgeSize(const zelm::files::ByteSource& source, std::uint64_t offset) {
     std::uint64_t size = 0;
-    if (source.TellSize(size) && size <= offset) return "";
-    const std::string wrong = JudgeMetadataSize(size > offset ? size - offset : 0);
-    return wrong.empty() ? "the metadata document cannot be read" : wrong;
+    return source.TellSize(size) && size > offset ? JudgeMetadataSize(size - offset) : "";
+}
+
+// Why the text behind `offset` could not be had; empty if there is none.
+std::string JudgeAbsence(const zelm::files::ByteSource& source, std::uint64_t offset) {
+    std::uint64_t size = 0;
+    return source.TellSize(size) && size <= offset ? "" : "the metadata document cannot be read";
+}
+
+// Of start tags, or what looks like them.
+std::uint64_t CountElements(std::string_view text) {
+    std::uint64_t count = 0;
+    for (std::size_t at = text.find('<'); at != text.npos; at = text.find('<', at + 1))
+        if (at + 1 < text.size() && std::string_view("/!?").find(text[at + 1]) == text.npos)
+            ++count;
+    return count;
 }
 
 template <class Record>
@@ -66,6 +80,8 @@ template <class T>
 std::shared_ptr<const StoredRecords<T>> StoredRecords<T>::Read(zelm::files::ByteSource& source,
                                                                std::uint64_t offset) {
     auto records = std::make_shared<StoredRecords>();
+    records->fault = JudgeSize(source, offset);
+    if (!records->fault.empty()) return records;
     zelm::DocumentText text = zelm::DocumentText::Take(source, offset);
     records->settled = text.bytes && !text.IsUnfinished();
     if (text.bytes)
@@ -78,7 +94,9 @@ std::shared_ptr<const StoredRecords<T>> StoredRecords<T>::Read(zelm::files::Byte
 template <class T>
 void StoredRecords<T>::Parse(zelm::DocumentText text) {
     // The parse changes the bytes.
-    fault = JudgeMetadataBytes({reinterpret_cast<const char*>(text.bytes.get()), text.size});
+    const std::string_view bytes(reinterpret_cast<const char*>(text.bytes.get()), text.size);
+    fault = JudgeMetadataBytes(bytes);
+    elements = CountElements(bytes);
     InitialiseXerces();
     auto reader = std::make_unique<JudgingReader<T>>();
     const std::string wrong =

@@ -39,6 +39,8 @@ public:
     // What is wrong with the form of the document, as JudgeMetadata tells it; empty if nothing, or
     // if there is none. One of another root keeps its records all the same.
     virtual const std::string& Fault() const = 0;
+    // Elements of the text, malformed or not.
+    virtual std::uint64_t Elements() const = 0;
     // Whether the text came to rest: one that is missing, or that a store has marked as unfinished,
     // may be another a moment later.
     virtual bool IsSettled() const = 0;
@@ -66,6 +68,7 @@ public:
     bool HasStatistics(std::uint32_t band) const override { return FirstStatistics(band); }
     const zelm::ColorList* BandPalette(std::uint32_t band) const override;
     const std::string& Fault() const override { return fault; }
+    std::uint64_t Elements() const override { return elements; }
     bool IsSettled() const override { return settled; }
 
 private:
@@ -79,6 +82,7 @@ private:
     Places first, newest;                                       // in Statistics(), by band
     std::unordered_map<std::uint32_t, zelm::ColorList> colors;  // of palettes, by band
     std::string fault;
+    std::uint64_t elements = 0;
     bool settled = false;
 };
 

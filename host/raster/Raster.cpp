@@ -455,21 +455,34 @@ std::shared_ptr<const StoredRecords<T>> Raster::Records() const {
     return std::static_pointer_cast<const StoredRecords<T>>(AnyRecords());
 }
 
-// What is not settled is looked at again.
+// What is not settled is looked at again, but not all of a long text for each of ten thousand
+// bands.
 std::shared_ptr<const DocumentRecords> Raster::AnyRecords() const {
+    using Clock = std::chrono::steady_clock;
+    if (records && !records->IsSettled() && Clock::now() >= recordsExpire) records.reset();
     if (!file || records) return records;
+    const Clock::time_point begin = Clock::now();
     std::shared_ptr<const DocumentRecords> read;
     zelm::VisitElementType(props.pixelType, [&]<class T>(std::type_identity<T>) {
         read = StoredRecords<T>::Read(file->Source(), header->tileDataEnd);
     });
     CheckDisk("read its metadata document");
-    if (read->IsSettled()) records = read;
+    constexpr int kRest = 20;  // times as long as the look has taken
+    constexpr std::chrono::milliseconds kQuick(5);
+    const auto took = Clock::now() - begin;
+    recordsExpire = Clock::now() + took * kRest;
+    if (read->IsSettled() || took > kQuick) records = read;
     return read;
 }
 
 std::string Raster::DocumentFault() const {
     const auto stored = AnyRecords();
     return stored ? stored->Fault() : "";
+}
+
+std::uint64_t Raster::DocumentElements() const {
+    const auto stored = AnyRecords();
+    return stored ? stored->Elements() : 0;
 }
 
 bool Raster::HasStatistics(std::uint32_t band) const {

@@ -18,6 +18,7 @@
 #ifndef ZMC_HOST_RASTER_RASTER_H
 #define ZMC_HOST_RASTER_RASTER_H
 
+#include <chrono>
 #include <cstdint>
 #include <functional>
 #include <map>
@@ -156,6 +157,8 @@ public:
     // What is wrong with the form of the file's document, by the parse that Records keeps; empty if
     // nothing, or if there is none.
     std::string DocumentFault() const;
+    // Elements that the document has, malformed or not; by the same parse.
+    std::uint64_t DocumentElements() const;
 
     bool HasStatistics(std::uint32_t band) const;
     // The record of a band. Throws if there is none.
@@ -226,6 +229,8 @@ private:
     std::string recoveryNote;
     bool keepsCopies = false;
     mutable std::shared_ptr<const DocumentRecords> records;  // null: to be read
+    // Until when records are kept that are not settled.
+    mutable std::chrono::steady_clock::time_point recordsExpire;
 };
 
 }  // namespace zmchost

@@ -1,12 +1,17 @@
 """Runs every command and every entry of the driver on hostile files, and judges what they did.
 
-Nothing may crash, hang, write where it was to read, or cost more than it shows: a second of processor
-time and 64 MiB beyond what the same takes on a small good file, and as much again for each 32 MiB
-of file, since a reader may well read what there is.
+Nothing may crash, hang, write where it was to read, leave a file open, or cost more than it shows: a
+second of processor time, 64 MiB of memory and 64 MiB of files beyond what the same takes on a small
+good file, and as much again for each 32 MiB of what it is asked to go through or prints. Commands go
+through all pixels of a complete file, holes included; where that is more than GOES_THROUGH, what is
+judged is that they end when they are asked to. So are levels that the driver makes. A store makes a
+tree of the document, which takes several times its text. The memory of a build is what it is told.
 
     attack.py FOLDER [--files N] [--first K] [--jobs N]
 
-Needs ZMC_TOOL, the program, and the plug-in on GDAL_DRIVER_PATH. Prints a line for each finding and a
+Needs ZMC_TOOL, the program, and the plug-in on GDAL_DRIVER_PATH. With ZMC_ATTACK=sanitized the program
+is one with sanitizers, which a driver in Python cannot be: only commands run, and what they cost is not
+judged. Prints a line for each finding and a
 summary, and keeps the files of findings in FOLDER. The exit status is 1 if there is a finding.
 """
 import argparse
@@ -14,6 +19,7 @@ import hashlib
 import multiprocessing
 import os
 import random
+import re
 import signal
 import subprocess
 import sys
@@ -22,10 +28,15 @@ import time
 import hostile
 
 TOOL = os.environ["ZMC_TOOL"]
+SANITIZED = os.environ.get("ZMC_ATTACK") == "sanitized"
 SECONDS = 1.0
 MEMORY = 64 << 20
-PATIENCE = 20  # seconds of waiting, after which a run is taken to hang
-PER_BYTES = 32 << 20  # of the file, for which the budget is granted once more
+PATIENCE = 300 if SANITIZED else 60  # seconds of waiting, after which a run is taken to hang
+ENDS_WITHIN = 60 if SANITIZED else 5  # seconds, where it is asked to end
+PER_BYTES = 32 << 20  # for which the budget is granted once more
+TREE = 6  # bytes for each of a document that is stored into
+PER_BAND = 1024  # bytes that GDAL may take for a band that a dataset shows
+GOES_THROUGH = 256 << 20  # bytes of pixels
 READING = {
     "info": ["info", "FILE"],
     "info-json": ["info", "FILE", "--json"],
@@ -33,8 +44,11 @@ READING = {
     "hash": ["hash", "FILE"],
     "compare": ["compare", "FILE", "GOOD"],
     "export": ["export", "FILE", "OUT.tif"],
-    "build": ["build", "FILE", "OUT.pyr"],
+    "build": ["build", "FILE", "OUT.pyr", "--memory", "32M"],
 }
+# What the module says, by its contract, of a file that it opens all the same.
+WARNED = re.compile(r"\nWarning at file .*\n Message: .*\n")
+LONG = ("verify", "hash", "compare", "export", "build")  # with the pixels of a complete file
 WRITING = {"recover": ["recover", "FILE"], "discard": ["recover", "FILE", "--discard"]}
 
 
@@ -77,7 +91,8 @@ def driver_edits(name):
     if band.XSize and band.YSize:
         band.WriteRaster(0, 0, 1, 1, b"\0" * 16, 1, 1, gdal.GDT_CFloat64)
     if dataset.RasterCount <= 20:
-        dataset.BuildOverviews("NEAREST", [2])
+        end = time.process_time() + 0.3
+        dataset.BuildOverviews("NEAREST", [2], callback=lambda *_: time.process_time() < end)
     dataset = None
 
 
@@ -88,30 +103,40 @@ def digest(names):
     found = {}
     for name in names:
         status = os.lstat(name)
-        head = tail = b""
+        total = hashlib.sha256()
         with open(name, "rb") as file:  # holes may be terabytes
-            head = file.read(8 << 20)
-            if status.st_size > len(head):
-                file.seek(max(len(head), status.st_size - 4096))
-                tail = file.read(4096)
-        found[name] = (status.st_size, status.st_mode, hashlib.sha256(head + tail).hexdigest())
+            for _ in range(64):
+                total.update(file.read(1 << 17))
+            file.seek(max(file.tell(), status.st_size - 4096))
+            total.update(file.read(4096))
+        found[name] = (status.st_size, status.st_mode, total.hexdigest())
     return found
 
 
 class Cost:
-    def __init__(self, seconds, memory, status, message, hung):
+    """What a run took, and how it ended."""
+
+    def __init__(self, seconds, memory, status, message, hung, asked):
         self.seconds, self.memory, self.status = seconds, memory, status
-        self.message, self.hung = message, hung
+        self.message, self.hung, self.asked = message, hung, asked
+        self.printed = self.written = 0
 
 
-def wait(child, pipe, begin):
-    """The end of a child process: its cost, as the system counted it."""
-    hung = False
+def wait(child, pipe, ask_after=None):
+    """The end of a child process: its cost, as the system counted it. One that is still at work after
+    some seconds is asked to end, if they are given, and in the end made to."""
+    hung = asked = False
+    begin = time.monotonic()
+    patience = PATIENCE
     while True:
         done, status, usage = os.wait4(child, os.WNOHANG)
         if done:
             break
-        if time.monotonic() - begin > PATIENCE:
+        waited = time.monotonic() - begin
+        if ask_after is not None and not asked and waited > ask_after:
+            os.kill(child, signal.SIGTERM)
+            asked, patience = True, waited + ENDS_WITHIN
+        if waited > patience:
             os.kill(child, signal.SIGKILL)
             hung = True
             _, status, usage = os.wait4(child, 0)
@@ -120,23 +145,23 @@ def wait(child, pipe, begin):
     pipe.seek(0)
     message = pipe.read(100000).decode("utf-8", "replace")
     return Cost(usage.ru_utime + usage.ru_stime, usage.ru_maxrss << 10,
-                os.waitstatus_to_exitcode(status), message, hung)
+                os.waitstatus_to_exitcode(status), message, hung, asked)
 
 
-def run_tool(arguments, folder):
-    with open(os.path.join(folder, "stderr"), "w+b") as errors:
-        begin = time.monotonic()
+def run_tool(arguments, folder, ask_after=None):
+    with open(os.path.join(folder, "stderr"), "w+b") as errors, \
+            open(os.path.join(folder, "stdout"), "w+b") as output:
         child = subprocess.Popen([TOOL, *arguments], cwd=folder, stdin=subprocess.DEVNULL,
-                                 stdout=subprocess.DEVNULL, stderr=errors)
-        cost = wait(child.pid, errors, begin)
+                                 stdout=output, stderr=errors)
+        cost = wait(child.pid, errors, ask_after)
         child.returncode = cost.status  # it has been waited for
+        cost.printed = os.path.getsize(output.name)
         return cost
 
 
 def run_driver(action, name, folder):
     """In a process of its own that shares the library that is loaded already."""
     with open(os.path.join(folder, "stderr"), "w+b") as errors:
-        begin = time.monotonic()
         child = os.fork()
         if child == 0:
             try:
@@ -145,17 +170,71 @@ def run_driver(action, name, folder):
                 gdal.DontUseExceptions()
                 gdal.PushErrorHandler("CPLQuietErrorHandler")
                 action(name)
+                for left in left_open(folder):
+                    os.write(2, f"{LEFT_OPEN}{left}\n".encode())
             finally:
                 os._exit(0)
-        return wait(child, errors, begin)
+        return wait(child, errors)
+
+
+class Runner:
+    """A process of its own that starts the others: what those who start a process hold in memory is
+    counted as its own, and the makers of hostile files hold much."""
+
+    def __init__(self):
+        context = multiprocessing.get_context("spawn")
+        self.pipe, other = context.Pipe()
+        self.process = context.Process(target=serve, args=(other,), daemon=True)
+        self.process.start()
+        other.close()
+
+    def run(self, function, *arguments):
+        self.pipe.send((function, arguments))
+        return self.pipe.recv()
+
+
+def serve(pipe):
+    if not SANITIZED:
+        from osgeo import gdal
+        assert gdal.GetDriverByName("ZMCPyramid"), "the driver's plug-in is not found"
+    while True:
+        try:
+            function, arguments = pipe.recv()
+        except EOFError:
+            return
+        pipe.send(function(*arguments))
+
+
+LEFT_OPEN = "left open: "
+
+
+def left_open(folder):
+    """Files of the folder, but for what was said, that this process has open."""
+    for number in os.listdir("/proc/self/fd"):
+        try:
+            path = os.readlink(f"/proc/self/fd/{number}")
+        except OSError:
+            continue  # of the list itself
+        if path.startswith(os.path.realpath(folder) + os.sep) and not path.endswith("/stderr"):
+            yield path
+
+
+def room(folder):
+    """Bytes that the files of a folder take on the disk."""
+    total = 0
+    for entry in os.scandir(folder):
+        try:
+            total += entry.stat(follow_symlinks=False).st_blocks * 512
+        except FileNotFoundError:
+            pass
+    return total
 
 
 class Attacker:
     def __init__(self, folder):
-        from osgeo import gdal
         self.folder = folder
         os.makedirs(folder, exist_ok=True)
-        assert gdal.GetDriverByName("ZMCPyramid"), "the driver's plug-in is not found"
+        self.runner = Runner()
         self.good = os.path.join(folder, "good.pyr")
         good = hostile.Draft(random.Random(1))
         good.fields.update(BANDS="1", PIXEL_HEIGHT="30", PIXEL_WIDTH="40", LEVELMAX="0",
@@ -163,75 +242,118 @@ class Attacker:
         good.records = [good.statistics(0)]
         good.save(self.good)
         self.base = {}
-        for name, cost in self.all_runs(self.good):
+        for name, cost in self.all_runs(self.good, None):
             assert not cost.hung and cost.status >= 0, (name, cost.status, cost.message)
             self.base[name] = cost
         good.save(self.good)  # edits have changed it
 
-    def all_runs(self, file):
+    def all_runs(self, file, ask_after):
+        """Each run's name and cost. Those that go through all pixels are asked to end after some
+        seconds, if they are given."""
+        before = room(self.folder)
         for name, arguments in READING.items():
             texts = [file if text == "FILE" else self.good if text == "GOOD" else text
                      for text in arguments]
-            cost = run_tool(texts, self.folder)
+            cost = self.runner.run(run_tool, texts, self.folder,
+                                   ask_after if name in LONG else None)
+            cost.written = room(self.folder) - before
             for made in ("OUT.tif", "OUT.tif.aux.xml", "OUT.pyr", "OUT.pyr.aux.xml"):
                 if os.path.lexists(os.path.join(self.folder, made)):
                     os.remove(os.path.join(self.folder, made))
             yield name, cost
-        yield "gdal-read", run_driver(driver_reads, file, self.folder)
+        if not SANITIZED:
+            yield "gdal-read", self.runner.run(run_driver, driver_reads, file, self.folder)
         for name in WRITING:
-            yield name, run_tool([file if text == "FILE" else text for text in WRITING[name]],
-                                 self.folder)
-        yield "gdal-edit", run_driver(driver_edits, file, self.folder)
+            texts = [file if text == "FILE" else text for text in WRITING[name]]
+            yield name, self.runner.run(run_tool, texts, self.folder)
+        if not SANITIZED:
+            cost = self.runner.run(run_driver, driver_edits, file, self.folder)
+            cost.written = room(self.folder) - before
+            yield "gdal-edit", cost
 
-    def judge(self, name, cost, size):
+    def judge(self, name, cost, size, held, bands):
+        """`size` bytes may be gone through, of which `held` are no holes."""
         base = self.base[name]
-        grants = 1 + size // PER_BYTES
-        if cost.hung:
+        goes_through = size if name in LONG or name in DRIVER else held
+        longer = 1 + (goes_through + 8 * cost.printed) / PER_BYTES
+        grants = 1 + ((size if name in LONG else held) + 8 * cost.printed) / PER_BYTES
+        shown = bands * PER_BAND if name in DRIVER else 0
+        if name == "gdal-edit":
+            shown += TREE * held
+        if cost.hung and cost.asked:
+            yield f"does not end within {ENDS_WITHIN} s when it is asked to"
+        elif cost.asked:
+            return
+        elif cost.hung:
             yield f"hangs ({cost.seconds:.1f} s of processor time)"
         elif cost.status < 0:
             yield f"is killed by signal {-cost.status}"
         elif name not in DRIVER and cost.status not in (0, 1, 2, 3):
             yield f"ends with status {cost.status}"
-        if cost.seconds - base.seconds > SECONDS * grants:
-            yield f"takes {cost.seconds:.2f} s of processor time"
-        if cost.memory - base.memory > MEMORY * grants:
-            yield f"takes {(cost.memory - base.memory) >> 20} MiB"
+        if not SANITIZED:
+            yield from self.judge_cost(cost, base, longer, grants, shown)
         if name not in DRIVER and cost.status in (1, 2):
-            lines = cost.message.splitlines()
+            lines = WARNED.sub("", cost.message).splitlines()
             if not lines or not all(line.startswith("zmcraster: ") for line in lines):
                 yield f"says {cost.message[:200]!r}"
             if len([line for line in lines if "warning: " not in line]) != 1:
                 yield f"says it in {len(lines)} lines: {cost.message[:300]!r}"
-        for sign in ("AddressSanitizer", "runtime error:", "Traceback", "terminate called"):
+        for sign in ("AddressSanitizer", "runtime error:", "Traceback", "terminate called",
+                     LEFT_OPEN):
             if sign in cost.message:
                 yield f"reports {cost.message[:2000]}"
+
+    @staticmethod
+    def judge_cost(cost, base, longer, grants, shown):
+        if cost.seconds - base.seconds > SECONDS * longer:
+            yield f"takes {cost.seconds:.2f} s of processor time"
+        if cost.memory - base.memory > MEMORY * grants + shown:
+            yield f"takes {(cost.memory - base.memory) >> 20} MiB"
+        if cost.written - base.written > MEMORY * grants:
+            yield f"writes {(cost.written - base.written) >> 20} MiB"
 
     def attack(self, seed):
         """Findings on the file of that number."""
         file = os.path.join(self.folder, f"hostile-{seed}.pyr")
         draft = hostile.draft(seed)
-        names = draft.save(file)
-        size = min(os.path.getsize(file), 64 << 20)
+        return [f"{seed} ({', '.join(draft.kinds)}): {text}"
+                for text in self.judge_draft(draft, file)]
+
+    def judge_draft(self, draft, file):
+        return self.judge_file(file, draft.save(file), draft.number("BANDS", 65536))
+
+    def judge_file(self, file, names, bands):
+        """Findings on a file, which goes, with those of `names` beside it. Copies of what was found
+        stay."""
+        whole = os.path.getsize(file)
+        size = min(whole, GOES_THROUGH)
+        held = min(size, os.stat(file).st_blocks * 512)
         before = digest(names)
         findings = []
+        for name in names:
+            subprocess.run(["cp", "--sparse=always", name, self.copy_of(name)], check=True)
         listed = set(os.listdir(self.folder))
-        for name, cost in self.all_runs(file):
-            for what in self.judge(name, cost, size):
+        for name, cost in self.all_runs(file, 2 if whole > GOES_THROUGH else None):
+            # Nothing else has to look at more than the document that is in the file.
+            for what in self.judge(name, cost, size, held, bands):
                 findings.append(f"{name} {what}")
             if name in READING or name == "gdal-read":
                 if digest(names) != before:
                     findings.append(f"{name} changes what it reads")
                     before = digest(names)
-                left = set(os.listdir(self.folder)) - listed - {"stderr"}
+                left = set(os.listdir(self.folder)) - listed - {"stderr", "stdout"}
                 if left:
                     findings.append(f"{name} leaves {sorted(left)}")
                     listed |= left
         for name in os.listdir(self.folder):
-            if name.startswith(f"hostile-{seed}."):
+            if name.startswith(os.path.basename(file)):
                 os.remove(os.path.join(self.folder, name))
-        if findings:
-            draft.save(os.path.join(self.folder, f"found-{seed}.pyr"))
-        return [f"{seed} ({', '.join(draft.kinds)}): {text}" for text in findings]
+        for name in () if findings else names:
+            os.remove(self.copy_of(name))
+        return findings
+
+    def copy_of(self, name):
+        return os.path.join(self.folder, "found-" + os.path.basename(name))
 
 
 def work(folder, seeds, results):

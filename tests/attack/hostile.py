@@ -56,8 +56,8 @@ class Draft:
 
     def number(self, field, most):
         try:
-            return min(int(self.fields[field]), most)
-        except ValueError:
+            return max(0, min(int(self.fields[field]), most))
+        except (KeyError, ValueError):
             return 0
 
     def value(self):

@@ -3,6 +3,9 @@
 
 #include <gtest/gtest.h>
 
+#include <chrono>
+#include <string>
+
 #include <xercesc/sax/SAXParseException.hpp>
 
 #include "tests/support/XercesEnvironment.h"
@@ -33,6 +36,78 @@ TEST(ParseDocumentText, ParseThatEndsWithoutAFaultIsAFailureToo) {
     EXPECT_EQ(ParseDocumentText("<DATASET/>", thrower), "it cannot be parsed");
     FaultReader reader;
     EXPECT_EQ(ParseDocumentText("<DATASET/>", reader), "") << "the next parse";
+}
+
+std::string WithAttributes(int count, const char* quote = "'") {
+    std::string text;
+    for (int i = 0; i < count; ++i) text += " b" + std::to_string(i) + " = " + quote + ">=" + quote;
+    return text;
+}
+
+std::string Guarded(std::string text) {
+    zelm::GuardText(reinterpret_cast<unsigned char*>(text.data()), text.size());
+    return text;
+}
+
+std::string FaultOf(const std::string& text) {
+    FaultReader reader;
+    return ParseDocumentText(text, reader);
+}
+
+TEST(GuardText, AnElementEndsBehindTheFirstAttributeTooMany) {
+    for (const char* const quote : {"'", "\""}) {
+        const std::string good = "<a><b" + WithAttributes(64, quote) + "/></a>";
+        EXPECT_EQ(Guarded(good), good);
+        EXPECT_EQ(FaultOf(good), "");
+        const std::string most = "<a>\n<b" + WithAttributes(65, quote);
+        EXPECT_EQ(Guarded(most + "/></a>"), most + ">></a>");
+        EXPECT_EQ(Guarded(most + " c='1' d='2'/></a>"), most + ">c='1' d='2'/></a>");
+        EXPECT_EQ(FaultOf(most + " c='1' d='2'/></a>"), FaultOf(most + "/></a>"));
+        EXPECT_NE(FaultOf(most + "/></a>").find("attributes"), std::string::npos);
+    }
+}
+
+TEST(GuardText, WhatOnlyLooksLikeAttributesStays) {
+    const std::string tag = "<b" + WithAttributes(70) + "/>";
+    for (const std::string& text :
+         {"<!--" + tag + "--><a/>", "<!-->" + tag + "--><a/>", "<!-- -> ->" + tag + "--><a/>",
+          "<a><![CDATA[" + tag + "]]></a>", "<a><![CDATA[>]>" + tag + "]]>b</a>",
+          "<?p " + tag + "?><a/>", "<?p >" + tag + "?><a/>", "<a>" + WithAttributes(70) + "</a>",
+          "<a b='" + WithAttributes(70, "\"") + "'/>"}) {
+        EXPECT_EQ(Guarded(text), text);
+        EXPECT_EQ(FaultOf(text), "") << text;
+    }
+    EXPECT_NE(Guarded("<!-- --><a/>" + tag), "<!-- --><a/>" + tag) << "behind them it is looked on";
+    EXPECT_NE(Guarded("<?p ? ?><a><![CDATA[]]>" + tag), "<?p ? ?><a><![CDATA[]]>" + tag);
+}
+
+TEST(GuardText, TornMarkupIsLeftToTheParser) {
+    for (const std::string text : {"<", "<!", "<!-", "<!--", "<!-->", "<!--->", "<![", "<![CDATA[",
+                                   "<?", "<?>", "<a b='", "<a b", "<a <b='1'", "<!DOCTYPE a>", ""})
+        EXPECT_EQ(Guarded(text), text);
+}
+
+// The parser finds that family of encodings out by itself: its quotes and brackets are others.
+TEST(GuardText, EbcdicIsLookedThroughToo) {
+    std::string tag = "\x4C\x81";                                // <a
+    for (int i = 0; i < 70; ++i) tag += "\x40\x82\x7E\x7D\x7D";  //  b=''
+    EXPECT_EQ(Guarded(tag).substr(2 + 65 * 5, 1), "\x6E");
+    for (const std::string brackets : {"\xBA\xBB", "\xAD\xBD"}) {
+        const std::string cdata = "\x4C\x5A" + brackets.substr(0, 1) + "\xC3\xC4\xC1\xE3\xC1" +
+                                  brackets.substr(0, 1) + tag + brackets.substr(1) +
+                                  brackets.substr(1) + "\x6E";
+        EXPECT_EQ(Guarded(cdata), cdata);
+    }
+}
+
+// To store them all took fifteen seconds and more than a gigabyte.
+TEST(ParseDocumentText, MillionsOfAttributesAreRefusedAtOnce) {
+    std::string text = "<a";
+    for (int i = 0; i < 2'000'000; ++i) text += " b" + std::to_string(i) + "='1'";
+    const auto start = std::chrono::steady_clock::now();
+    EXPECT_NE(FaultOf(text + "/>").find("attributes"), std::string::npos);
+    const std::chrono::duration<double> took = std::chrono::steady_clock::now() - start;
+    EXPECT_LT(took.count(), 1.0);
 }
 
 }  // namespace

@@ -350,16 +350,33 @@ TEST_F(DatasetFileTest, HostileHeadersAreAnsweredFast) {
 TEST_F(DatasetFileTest, LargeTileTableIsBuiltWithTheFirstTile) {
     PyramidDescription d;
     d.tile = 1;
-    d.samples = 2000;
-    d.lines = 1500;  // 24 MB of table
+    d.samples = 400;
+    d.lines = 300;  // 960 kB of table
     d.ordering = 2;
     const auto dataset = Create(d);
     EXPECT_EQ(dataset->TileOffsets.data, nullptr);
-    EXPECT_TRUE(WriteBytes(*dataset, 1999, 1499, 1, 1, BandList({0}), 0, Bytes{42}));
+    EXPECT_TRUE(WriteBytes(*dataset, 399, 299, 1, 1, BandList({0}), 0, Bytes{42}));
     EXPECT_NE(dataset->TileOffsets.data, nullptr);
     EXPECT_TRUE(dataset->RefreshPyramidState());
     EXPECT_TRUE(dataset->HasPyramid);
-    EXPECT_EQ(ReadRect(*dataset, 1999, 1499, 1, 1, BandList({0}), 0), Bytes{42});
+    EXPECT_EQ(ReadRect(*dataset, 399, 299, 1, 1, BandList({0}), 0), Bytes{42});
+}
+
+TEST_F(DatasetFileTest, AVeryLargeTileTableIsNeverBuilt) {
+    PyramidDescription d;
+    d.tile = 1;
+    d.samples = 2000;
+    d.lines = 1500;  // 72 MB of table
+    d.bands = 3;
+    d.ordering = 2;
+    const auto dataset = Create(d);
+    EXPECT_TRUE(WriteBytes(*dataset, 1999, 1499, 1, 1, BandList({0, 1, 2}), 0, Bytes{42, 43, 44}));
+    EXPECT_TRUE(WriteBytes(*dataset, 1, 0, 1, 1, BandList({2, 0, 1}), 0, Bytes{7, 8, 9}));
+    EXPECT_EQ(dataset->TileOffsets.data, nullptr);
+    EXPECT_TRUE(dataset->RefreshPyramidState());
+    EXPECT_TRUE(dataset->HasPyramid);
+    EXPECT_EQ(ReadRect(*dataset, 1999, 1499, 1, 1, BandList({0, 1, 2}), 0), (Bytes{42, 43, 44}));
+    EXPECT_EQ(ReadRect(*dataset, 1, 0, 1, 1, BandList({0, 1, 2}), 0), (Bytes{8, 9, 7}));
 }
 
 TEST_F(DatasetFileTest, MortonWalkEndsAtTheEndOfTheTileData) {
