@@ -189,8 +189,10 @@ bool Creation::Finish(Dataset& dataset) {
     });
     if (!built) return false;
     // The palettes are in the file now.
-    for (int number = 1; number <= dataset.GetRasterCount(); ++number)
-        static_cast<Band*>(dataset.GetRasterBand(number))->DropSidecarColors();
+    Reported([&] {
+        for (int number = 1; number <= dataset.GetRasterCount(); ++number)
+            static_cast<Band*>(dataset.GetRasterBand(number))->DropSidecarColors();
+    });
     return true;
 }
 

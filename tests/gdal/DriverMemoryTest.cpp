@@ -201,6 +201,7 @@ TEST_F(DriverMemory, CreationFailsWithAnError) {
     // Without memory for good the threads of several would not come to an end.
     CPLStringList options;
     options.SetNameValue("NUM_THREADS", "1");
+    options.SetNameValue("STATISTICS", "NO");
     const std::size_t points = zmctest::ForEachAllocationFailing(
         [&](AllocationFaults& faults) {
             faults.Disarm();
