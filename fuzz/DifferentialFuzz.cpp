@@ -83,8 +83,7 @@ private:
         const bool has = reader.HasBandStats(band);
         ZMC_EXPECT(has == raster.HasStatistics(band));
         const auto records = raster.Records<T>();
-        const zelm::RasterBandStats<T> atPlace =
-            reader.GetBandStats(static_cast<std::int32_t>(band));
+        const zelm::RasterBandStats<T> atPlace = reader.GetBandStats(band);
         if (band < records->Statistics().size()) {
             const zelm::RasterBandStats<T>& same = records->Statistics()[band];
             ZMC_EXPECT(atPlace.band == same.band && atPlace.flags == same.flags &&
