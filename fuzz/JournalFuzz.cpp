@@ -5,8 +5,8 @@
 // script it is taken as it is, or made one that fits the file but for what the script says.
 #include <algorithm>
 #include <cstdint>
+#include <filesystem>
 #include <fstream>
-#include <iterator>
 #include <string>
 
 #include "fuzz/support/Expect.h"
@@ -28,8 +28,10 @@ void Write(const std::string& name, const std::string& bytes) {
 }
 
 std::string Read(const std::string& name) {
+    std::string bytes(static_cast<std::size_t>(std::filesystem::file_size(name)), '\0');
     std::ifstream file(name, std::ios::binary);
-    return {std::istreambuf_iterator<char>(file), {}};
+    file.read(bytes.data(), static_cast<std::streamsize>(bytes.size()));
+    return bytes;
 }
 
 // What a store into the file would have kept, with some of its numbers changed.

@@ -212,6 +212,11 @@ CPLErr Dataset::ReadOrWrite(GDALRWFlag mode, int x, int y, int width, int height
 CPLErr Dataset::IBuildOverviews(const char* resampling, int overviewCount, const int* factors,
                                 int bandCount, const int* bands, GDALProgressFunc progress,
                                 void* progressData, CSLConstList options) {
+    // GDAL divides by them where it makes levels beside the file.
+    if (std::any_of(factors, factors + overviewCount, [](int factor) { return factor < 1; })) {
+        ReportError(CE_Failure, CPLE_IllegalArg, "levels are reduced by 1 at the least");
+        return CE_Failure;
+    }
     return Reporting(CE_Failure, [&] {
         if (creation) return creation->ChooseLevels(*this, resampling, overviewCount, factors);
         if (Overviews().empty())

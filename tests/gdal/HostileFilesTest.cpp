@@ -390,6 +390,22 @@ TEST_F(HostileFiles, LevelsUpToTheLastOfTheFormatAreOpened) {
     EXPECT_FALSE(Open(name));
 }
 
+// Without levels of its own a file gets them beside it, from GDAL, which divides by the factor.
+TEST_F(HostileFiles, LevelsReducedByNothingAreRefused) {
+    zmctest::HeaderText header = Plain();
+    header.levelMax = 0;
+    zmctest::WriteText(name, header.File());
+    for (const unsigned flags : {0u, unsigned{GDAL_OF_UPDATE}}) {
+        const DatasetPtr dataset = Open(name, flags);
+        ASSERT_TRUE(dataset);
+        for (const int factor : {0, -1, INT_MIN}) {
+            const int factors[] = {2, factor};
+            EXPECT_EQ(dataset->BuildOverviews("NEAREST", 2, factors, 0, nullptr, nullptr, nullptr),
+                      CE_Failure);
+        }
+    }
+}
+
 // GDAL counts to 2^31 - 1. The tiles are holes of a file.
 TEST_F(HostileFiles, RastersAsLongAsGdalCountsAreReadAtTheirEnds) {
     for (const bool wide : {true, false}) {
