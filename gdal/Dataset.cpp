@@ -98,7 +98,8 @@ void Dataset::AddOverviews() {
     if (!main && file->info.complete)
         for (const zmchost::PyramidLevelInfo& coarser : file->info.levels)
             if (coarser.level > level && coarser.width > 0 && coarser.height > 0)
-                made.emplace_back(new Dataset(file, coarser.level, eAccess, this));
+                made.push_back(
+                    std::unique_ptr<Dataset>(new Dataset(file, coarser.level, eAccess, this)));
     overviews = std::move(made);
     overviewsMade = true;
 }

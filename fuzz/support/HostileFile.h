@@ -46,9 +46,12 @@ struct FileAndScript {
     }
 };
 
+// It grows no further than a run has memory for, as a disk that is full.
 inline std::shared_ptr<zelm::files::MemorySource> SourceOf(const std::string& bytes) {
-    return std::make_shared<zelm::files::MemorySource>(
-        zelm::files::MemorySource::Bytes(bytes.begin(), bytes.end()));
+    using zelm::files::MemorySource;
+    constexpr std::uint64_t kLimit = 16 << 20;
+    return std::make_shared<MemorySource>(MemorySource::Bytes(bytes.begin(), bytes.end()),
+                                          MemorySource::Access::Writable, kLimit);
 }
 
 // The header, if it is one.
