@@ -363,7 +363,81 @@ def wide_format_seeds():
         yield f"broken-{broken}", bytes([15, broken, 19])
 
 
+# Bytes of all kinds, so that each of the first steps of a script does something else.
+STEPS = [bytes((start * 37 + i * 29 + (i * i * start) % 11) % 256 for i in range(60))
+         for start in range(12)]
+
+
+def plain_files():
+    metadata = metadata_document(statistics(0), statistics(1), HISTOGRAM, PALETTE)
+    for order in ("Scanline", "Blocked", "Morton"):
+        for number, pixel_type in enumerate(SAMPLE_BYTES):
+            yield f"{order}-{pixel_type}", pyramid_file(
+                metadata if number % 3 else b"", bands=number % 3 + 1, order=order, width=37,
+                height=21, tile=8, pixel_type=pixel_type)
+    yield "cut", pyramid_file()[:-20]
+    yield "old", pyramid_file(version=(1, 0))
+    yield "malformed", pyramid_file(metadata[:-12])
+    yield "second-set", pyramid_file(metadata_document(statistics(0), statistics(0), statistics(1)),
+                                     bands=2)
+    large = b"<HEADER_PIXEL_TYPE>ComplexDouble</HEADER_PIXEL_TYPE>"
+    for name, header in (
+            ("behind", header_document().replace(b"</DATASET>", b"<X>" + large + b"</X></DATASET>")),
+            ("inside", header_document().replace(b"</HEADER>", b"<X>" + large + b"</X></HEADER>"))):
+        front = b"KOBT" + struct.pack("<QQ", 20 + len(header), 0) + header
+        yield f"two-types-{name}", front + bytes(2000)
+
+
+def driver_seeds():
+    sidecar = (b"<PAMDataset><SRS>EPSG:4326</SRS><PAMRasterBand band='1'><NoDataValue>0"
+               b"</NoDataValue><ColorInterp>Red</ColorInterp></PAMRasterBand>"
+               b"<Metadata domain='OVERVIEWS'><MDI key='OVERVIEW_FILE'>/vsimem/a.pyr</MDI>"
+               b"</Metadata></PAMDataset>")
+    for number, (name, data) in enumerate(plain_files()):
+        second = sidecar if number % 2 else b""
+        for update in (0, 1):
+            script = bytes([update]) + STEPS[(number + 5 * update) % len(STEPS)]
+            yield f"{name}-{update}", (data + second + struct.pack("<H", len(second)) + script +
+                                       bytes([len(script)]))
+
+
+def host_seeds():
+    for number, (name, data) in enumerate(plain_files()):
+        for kind in (0, 6):
+            script = STEPS[(number + kind) % len(STEPS)]
+            yield f"{name}-{kind}", data + script + bytes([len(script)])
+
+
+def journal_seeds():
+    text = metadata_document(statistics(0))
+    for name, data in plain_files():
+        for script in (b"\0", b"\1\0" + bytes(6), b"\1\1" + bytes(6), b"\1\1\7\62\0\0\0"):
+            yield f"{name}-{script.hex()}", (data + text + struct.pack("<H", len(text)) + script +
+                                             bytes([len(script)]))
+
+
+def arguments_seeds():
+    texts = {
+        0: (b"0", b"42", b"18446744073709551615", b"18446744073709551616", b"-1", b" 1"),
+        1: (b"1.5", b"-1e308", b"1e999", b"nan", b"-inf", b"0x1p-3", b"1e-400"),
+        2: (b"512K", b"256MiB", b"2gb", b"18446744073709551615K", b"B", b"1.5G"),
+        3: (b"1,2,3", b"3,,1", b"4294967297", b"1,", b"0"),
+        4: (b"0,0,5,5", b"1,1,18446744073709551615,1", b"1,2,3", b"9,9,1,1"),
+        5: (b"a.pyr\0--method\0nearest", b"--co\0a=b\0--co=c\0-q\0a.pyr", b"--help",
+            b"--\0-t", b"-m=x\0a", b"--flag=false\0a\0b"),
+    }
+    for kind, values in texts.items():
+        for number, value in enumerate(values):
+            front = {0: b"\0", 3: b"\7", 4: b"\x0a\x0a"}.get(kind, b"")
+            yield f"{kind}-{number}", bytes([kind]) + front + value
+
+
 TARGETS = {
+    "driver": driver_seeds,
+    "differential": host_seeds,
+    "host": host_seeds,
+    "journal": journal_seeds,
+    "arguments": arguments_seeds,
     "string": string_seeds,
     "memory_parameters": memory_parameters_seeds,
     "layout": layout_seeds,

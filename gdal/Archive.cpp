@@ -111,6 +111,9 @@ bool Archive::LookAtRecords(Look&& look) const {
         const auto records = raster.Get().Records<T>();
         look(*records);
         settled = records->IsSettled();
+        if (!settled && !records->Fault().empty())
+            CPLError(CE_Warning, CPLE_FileIO, "its records are not known now: %s",
+                     records->Fault().c_str());
     });
     return told && settled;
 }

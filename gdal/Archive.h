@@ -71,8 +71,8 @@ private:
     // Lets `setter(reader)` store; false where the file cannot be written or it answers false.
     template <class Setter>
     bool Store(Setter&& setter);
-    // Calls look(zmchost::StoredRecords<T>). What is thrown goes to GDAL as a failure. False if
-    // what was seen, or was not, may be something else the next time.
+    // Calls look(zmchost::StoredRecords<T>). What is thrown goes to GDAL as a failure. False,
+    // after a warning, if what was seen, or was not, may be something else the next time.
     template <class Look>
     bool LookAtRecords(Look&& look) const;
     void FetchStatistics(std::uint32_t band);

@@ -3,12 +3,12 @@
 #include <algorithm>
 #include <climits>
 #include <cstring>
-#include <exception>
 
 #include "core/PixelVocabulary.h"
 #include "gdal/Create.h"
 #include "gdal/MaskBand.h"
 #include "gdal/NoDataValues.h"
+#include "gdal/Reporting.h"
 #include "gdal/Sidecar.h"
 #include "raster/RasterBandStats.h"
 
@@ -71,26 +71,29 @@ bool Band::StoresInFile() const {
 // --- pixels ---
 
 CPLErr Band::IReadBlock(int blockX, int blockY, void* data) {
-    const Creation* const creation = owner.UnderCreation();
-    if (creation && !creation->IsWritten(BlockNumber(blockX, blockY), index)) {
-        FillUnwritten(
-            data, static_cast<std::size_t>(GDALGetDataTypeSizeBytes(eDataType)),
-            static_cast<std::size_t>(nBlockXSize) * static_cast<std::size_t>(nBlockYSize));
-        return CE_None;
-    }
-    TileReader& tiles = owner.File().tiles;
-    const zelm::Rectangle tile = tiles.TileAt(owner.Level(), blockX, blockY);
-    const auto size = static_cast<GSpacing>(GDALGetDataTypeSizeBytes(eDataType));
-    const int band = static_cast<int>(index);
-    // Blocks at the right and bottom edge are padded with zeros.
-    if (tile.width < static_cast<std::uint32_t>(nBlockXSize) ||
-        tile.height < static_cast<std::uint32_t>(nBlockYSize))
-        std::memset(data, 0,
-                    static_cast<std::size_t>(nBlockXSize) * static_cast<std::size_t>(nBlockYSize) *
-                        static_cast<std::size_t>(size));
-    if (tiles.Read(owner.Level(), tile, &band, 1, {data, eDataType, size, size * nBlockXSize, 0}))
-        return CE_None;
-    return CE_Failure;
+    return Reporting<CPLErr>(CE_Failure, [&]() -> CPLErr {
+        const Creation* const creation = owner.UnderCreation();
+        if (creation && !creation->IsWritten(BlockNumber(blockX, blockY), index)) {
+            FillUnwritten(
+                data, static_cast<std::size_t>(GDALGetDataTypeSizeBytes(eDataType)),
+                static_cast<std::size_t>(nBlockXSize) * static_cast<std::size_t>(nBlockYSize));
+            return CE_None;
+        }
+        TileReader& tiles = owner.File().tiles;
+        const zelm::Rectangle tile = tiles.TileAt(owner.Level(), blockX, blockY);
+        const auto size = static_cast<GSpacing>(GDALGetDataTypeSizeBytes(eDataType));
+        const int band = static_cast<int>(index);
+        // Blocks at the right and bottom edge are padded with zeros.
+        if (tile.width < static_cast<std::uint32_t>(nBlockXSize) ||
+            tile.height < static_cast<std::uint32_t>(nBlockYSize))
+            std::memset(data, 0,
+                        static_cast<std::size_t>(nBlockXSize) *
+                            static_cast<std::size_t>(nBlockYSize) * static_cast<std::size_t>(size));
+        if (tiles.Read(owner.Level(), tile, &band, 1,
+                       {data, eDataType, size, size * nBlockXSize, 0}))
+            return CE_None;
+        return CE_Failure;
+    });
 }
 
 std::size_t Band::BlockNumber(int blockX, int blockY) const {
@@ -195,7 +198,7 @@ CPLErr Band::IWriteBlock(int blockX, int blockY, void* data) {
     TileReader& tiles = owner.File().tiles;
     const zelm::Rectangle tile = tiles.TileAt(owner.Level(), blockX, blockY);
     Creation* const creation = owner.UnderCreation();
-    try {
+    const auto write = [&] {
         std::vector<std::uint32_t> bands;
         WaitingBlocks waiting;
         const auto samples = GatherTile(blockX, blockY, tile, data, bands, waiting);
@@ -206,76 +209,93 @@ CPLErr Band::IWriteBlock(int blockX, int blockY, void* data) {
         for (const WaitingBlock& other : waiting) other.Settle();
         for (const std::uint32_t band : bands)
             if (creation) creation->MarkWritten(BlockNumber(blockX, blockY), band);
-        return CE_None;
-    } catch (const std::exception& error) {
-        if (creation) creation->MarkLost(BlockNumber(blockX, blockY), index);
-        ReportError(CE_Failure, CPLE_FileIO, "%s", error.what());
-        return CE_Failure;
-    }
+    };
+    if (Reported(write, CPLE_FileIO)) return CE_None;
+    if (creation) creation->MarkLost(BlockNumber(blockX, blockY), index);
+    return CE_Failure;
 }
 
 CPLErr Band::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, void* data,
                        int bufferWidth, int bufferHeight, GDALDataType bufferType,
                        GSpacing pixelSpace, GSpacing lineSpace, GDALRasterIOExtraArg* extra) {
-    if (mode == GF_Read && bufferWidth < width && bufferHeight < height) {
-        int tried = FALSE;
-        const CPLErr result =
-            TryOverviewRasterIO(mode, x, y, width, height, data, bufferWidth, bufferHeight,
-                                bufferType, pixelSpace, lineSpace, extra, &tried);
-        if (tried) return result;
-    }
-    if (mode == GF_Read && bufferWidth == width && bufferHeight == height &&
-        owner.ReadsDirectly(x, y, width, height)) {
-        const int band = static_cast<int>(index);
-        const Target target{data, bufferType, pixelSpace, lineSpace, 0};
-        if (owner.File().tiles.Read(owner.Level(), RectangleOf(x, y, width, height), &band, 1,
-                                    target))
-            return CE_None;
-        return CE_Failure;
-    }
-    return GDALPamRasterBand::IRasterIO(mode, x, y, width, height, data, bufferWidth, bufferHeight,
-                                        bufferType, pixelSpace, lineSpace, extra);
+    return Reporting<CPLErr>(CE_Failure, [&]() -> CPLErr {
+        if (mode == GF_Read && bufferWidth < width && bufferHeight < height) {
+            int tried = FALSE;
+            const CPLErr result =
+                TryOverviewRasterIO(mode, x, y, width, height, data, bufferWidth, bufferHeight,
+                                    bufferType, pixelSpace, lineSpace, extra, &tried);
+            if (tried) return result;
+        }
+        if (mode == GF_Read && bufferWidth == width && bufferHeight == height &&
+            owner.ReadsDirectly(x, y, width, height)) {
+            const int band = static_cast<int>(index);
+            const Target target{data, bufferType, pixelSpace, lineSpace, 0};
+            if (owner.File().tiles.Read(owner.Level(), RectangleOf(x, y, width, height), &band, 1,
+                                        target))
+                return CE_None;
+            return CE_Failure;
+        }
+        return GDALPamRasterBand::IRasterIO(mode, x, y, width, height, data, bufferWidth,
+                                            bufferHeight, bufferType, pixelSpace, lineSpace, extra);
+    });
 }
 
 // --- no-data values and masks ---
 
 double Band::GetNoDataValue(int* success) {
-    if (owner.IsOverview()) return MainBand()->GetNoDataValue(success);
-    return GDALPamRasterBand::GetNoDataValue(success);
+    ReportSuccess(success, false);
+    return Reporting<double>(0.0, [&]() -> double {
+        if (owner.IsOverview()) return MainBand()->GetNoDataValue(success);
+        return GDALPamRasterBand::GetNoDataValue(success);
+    });
 }
 
 std::int64_t Band::GetNoDataValueAsInt64(int* success) {
-    if (owner.IsOverview()) return MainBand()->GetNoDataValueAsInt64(success);
-    return GDALPamRasterBand::GetNoDataValueAsInt64(success);
+    ReportSuccess(success, false);
+    return Reporting<std::int64_t>(0, [&]() -> std::int64_t {
+        if (owner.IsOverview()) return MainBand()->GetNoDataValueAsInt64(success);
+        return GDALPamRasterBand::GetNoDataValueAsInt64(success);
+    });
 }
 
 std::uint64_t Band::GetNoDataValueAsUInt64(int* success) {
-    if (owner.IsOverview()) return MainBand()->GetNoDataValueAsUInt64(success);
-    return GDALPamRasterBand::GetNoDataValueAsUInt64(success);
+    ReportSuccess(success, false);
+    return Reporting<std::uint64_t>(0, [&]() -> std::uint64_t {
+        if (owner.IsOverview()) return MainBand()->GetNoDataValueAsUInt64(success);
+        return GDALPamRasterBand::GetNoDataValueAsUInt64(success);
+    });
 }
 
 CPLErr Band::SetNoDataValue(double value) {
-    if (owner.IsOverview()) return MainBand()->SetNoDataValue(value);
-    InvalidateMaskBand();
-    return GDALPamRasterBand::SetNoDataValue(value);
+    return Reporting<CPLErr>(CE_Failure, [&]() -> CPLErr {
+        if (owner.IsOverview()) return MainBand()->SetNoDataValue(value);
+        InvalidateMaskBand();
+        return GDALPamRasterBand::SetNoDataValue(value);
+    });
 }
 
 CPLErr Band::SetNoDataValueAsInt64(std::int64_t value) {
-    if (owner.IsOverview()) return MainBand()->SetNoDataValueAsInt64(value);
-    InvalidateMaskBand();
-    return GDALPamRasterBand::SetNoDataValueAsInt64(value);
+    return Reporting<CPLErr>(CE_Failure, [&]() -> CPLErr {
+        if (owner.IsOverview()) return MainBand()->SetNoDataValueAsInt64(value);
+        InvalidateMaskBand();
+        return GDALPamRasterBand::SetNoDataValueAsInt64(value);
+    });
 }
 
 CPLErr Band::SetNoDataValueAsUInt64(std::uint64_t value) {
-    if (owner.IsOverview()) return MainBand()->SetNoDataValueAsUInt64(value);
-    InvalidateMaskBand();
-    return GDALPamRasterBand::SetNoDataValueAsUInt64(value);
+    return Reporting<CPLErr>(CE_Failure, [&]() -> CPLErr {
+        if (owner.IsOverview()) return MainBand()->SetNoDataValueAsUInt64(value);
+        InvalidateMaskBand();
+        return GDALPamRasterBand::SetNoDataValueAsUInt64(value);
+    });
 }
 
 CPLErr Band::DeleteNoDataValue() {
-    if (owner.IsOverview()) return MainBand()->DeleteNoDataValue();
-    InvalidateMaskBand();
-    return GDALPamRasterBand::DeleteNoDataValue();
+    return Reporting<CPLErr>(CE_Failure, [&]() -> CPLErr {
+        if (owner.IsOverview()) return MainBand()->DeleteNoDataValue();
+        InvalidateMaskBand();
+        return GDALPamRasterBand::DeleteNoDataValue();
+    });
 }
 
 // GDAL's own search comes first: a mask file, an alpha band or a set of values over all bands
@@ -289,27 +309,37 @@ bool Band::UsesOwnMask() {
 }
 
 GDALRasterBand* Band::GetMaskBand() {
-    if (!UsesOwnMask()) return GDALPamRasterBand::GetMaskBand();
-    if (!ownMask) ownMask = std::make_unique<MaskBand>(*this);
-    return ownMask.get();
+    return Reporting<GDALRasterBand*>(nullptr, [&]() -> GDALRasterBand* {
+        if (!UsesOwnMask()) return GDALPamRasterBand::GetMaskBand();
+        if (!ownMask) ownMask = std::make_unique<MaskBand>(*this);
+        return ownMask.get();
+    });
 }
 
 // A mask of samples that are not finite follows from the pixels as well as one by value does: told
 // as a mask of its own, it would be copied into a mask file with every translation.
-int Band::GetMaskFlags() { return UsesOwnMask() ? GMF_NODATA : GDALPamRasterBand::GetMaskFlags(); }
+int Band::GetMaskFlags() {
+    return Reporting<int>(GMF_ALL_VALID, [&]() -> int {
+        return UsesOwnMask() ? GMF_NODATA : GDALPamRasterBand::GetMaskFlags();
+    });
+}
 
 // --- levels ---
 
 int Band::GetOverviewCount() {
-    const auto own = static_cast<int>(owner.Overviews().size());
-    return own > 0 || owner.IsOverview() ? own : GDALPamRasterBand::GetOverviewCount();
+    return Reporting<int>(0, [&]() -> int {
+        const auto own = static_cast<int>(owner.Overviews().size());
+        return own > 0 || owner.IsOverview() ? own : GDALPamRasterBand::GetOverviewCount();
+    });
 }
 
 GDALRasterBand* Band::GetOverview(int overview) {
-    const auto& own = owner.Overviews();
-    if (own.empty() && !owner.IsOverview()) return GDALPamRasterBand::GetOverview(overview);
-    if (overview < 0 || overview >= static_cast<int>(own.size())) return nullptr;
-    return own[static_cast<std::size_t>(overview)]->BandOf(nBand);
+    return Reporting<GDALRasterBand*>(nullptr, [&]() -> GDALRasterBand* {
+        const auto& own = owner.Overviews();
+        if (own.empty() && !owner.IsOverview()) return GDALPamRasterBand::GetOverview(overview);
+        if (overview < 0 || overview >= static_cast<int>(own.size())) return nullptr;
+        return own[static_cast<std::size_t>(overview)]->BandOf(nBand);
+    });
 }
 
 // --- colours ---
@@ -325,23 +355,29 @@ GDALColorInterp Band::DefaultInterpretation() {
 }
 
 GDALColorInterp Band::GetColorInterpretation() {
-    if (owner.IsOverview()) return MainBand()->GetColorInterpretation();
-    const GDALColorInterp chosen = GDALPamRasterBand::GetColorInterpretation();
-    if (chosen != GCI_Undefined) return chosen;
-    return GetColorTable() ? GCI_PaletteIndex : DefaultInterpretation();
+    return Reporting<GDALColorInterp>(GCI_Undefined, [&]() -> GDALColorInterp {
+        if (owner.IsOverview()) return MainBand()->GetColorInterpretation();
+        const GDALColorInterp chosen = GDALPamRasterBand::GetColorInterpretation();
+        if (chosen != GCI_Undefined) return chosen;
+        return GetColorTable() ? GCI_PaletteIndex : DefaultInterpretation();
+    });
 }
 
 GDALColorTable* Band::GetColorTable() {
-    if (owner.IsOverview()) return MainBand()->GetColorTable();
-    GDALColorTable* const stored = owner.File().archive.ColorTable(index);
-    return stored ? stored : GDALPamRasterBand::GetColorTable();
+    return Reporting<GDALColorTable*>(nullptr, [&]() -> GDALColorTable* {
+        if (owner.IsOverview()) return MainBand()->GetColorTable();
+        GDALColorTable* const stored = owner.File().archive.ColorTable(index);
+        return stored ? stored : GDALPamRasterBand::GetColorTable();
+    });
 }
 
 CPLErr Band::SetColorTable(GDALColorTable* table) {
-    if (!StoresInFile()) return GDALPamRasterBand::SetColorTable(table);
-    if (owner.File().archive.StoreColorTable(index, table)) return CE_None;
-    ReportError(CE_Failure, CPLE_FileIO, "the color table was not stored");
-    return CE_Failure;
+    return Reporting<CPLErr>(CE_Failure, [&]() -> CPLErr {
+        if (!StoresInFile()) return GDALPamRasterBand::SetColorTable(table);
+        if (owner.File().archive.StoreColorTable(index, table)) return CE_None;
+        ReportError(CE_Failure, CPLE_FileIO, "the color table was not stored");
+        return CE_Failure;
+    });
 }
 
 // --- statistics and metadata ---
@@ -367,97 +403,120 @@ const CPLStringList& Band::StatisticsItems() {
 }
 
 char** Band::GetMetadataDomainList() {
-    return BuildMetadataDomainList(GDALPamRasterBand::GetMetadataDomainList(), TRUE, "",
-                                   kStructureDomain, nullptr);
+    return Reporting<char**>(nullptr, [&]() -> char** {
+        return BuildMetadataDomainList(GDALPamRasterBand::GetMetadataDomainList(), TRUE, "",
+                                       kStructureDomain, nullptr);
+    });
 }
 
 char** Band::GetMetadata(const char* domain) {
-    if (domain && EQUAL(domain, kStructureDomain) && structure.Count() > 0) return structure.List();
-    if (!IsDefaultDomain(domain) || StatisticsItems().Count() == 0)
-        return GDALPamRasterBand::GetMetadata(domain);
-    merged = CPLStringList(CSLDuplicate(GDALPamRasterBand::GetMetadata(domain)));
-    for (int i = 0; i < statistics.Count(); ++i) {
-        char* name = nullptr;
-        const char* const value = CPLParseNameValue(statistics[i], &name);
-        merged.SetNameValue(name, value);
-        CPLFree(name);
-    }
-    return merged.List();
+    return Reporting<char**>(nullptr, [&]() -> char** {
+        if (domain && EQUAL(domain, kStructureDomain) && structure.Count() > 0)
+            return structure.List();
+        if (!IsDefaultDomain(domain) || StatisticsItems().Count() == 0)
+            return GDALPamRasterBand::GetMetadata(domain);
+        merged = CPLStringList(CSLDuplicate(GDALPamRasterBand::GetMetadata(domain)));
+        for (int i = 0; i < statistics.Count(); ++i) {
+            char* name = nullptr;
+            const char* const value = CPLParseNameValue(statistics[i], &name);
+            merged.SetNameValue(name, value);
+            CPLFree(name);
+        }
+        return merged.List();
+    });
 }
 
 const char* Band::GetMetadataItem(const char* name, const char* domain) {
-    if (domain && EQUAL(domain, kStructureDomain) && structure.Count() > 0)
-        return structure.FetchNameValue(name);
-    if (IsDefaultDomain(domain) && STARTS_WITH_CI(name, "STATISTICS_"))
-        if (const char* const value = StatisticsItems().FetchNameValue(name)) return value;
-    return GDALPamRasterBand::GetMetadataItem(name, domain);
+    return Reporting<const char*>(nullptr, [&]() -> const char* {
+        if (domain && EQUAL(domain, kStructureDomain) && structure.Count() > 0)
+            return structure.FetchNameValue(name);
+        if (IsDefaultDomain(domain) && STARTS_WITH_CI(name, "STATISTICS_"))
+            if (const char* const value = StatisticsItems().FetchNameValue(name)) return value;
+        return GDALPamRasterBand::GetMetadataItem(name, domain);
+    });
 }
 
 double Band::GetMinimum(int* success) {
-    const StoredStatistics* const stored = Stored();
-    if (!stored || !(stored->flags & zelm::StatsFlag::Minimum))
-        return GDALPamRasterBand::GetMinimum(success);
-    ReportSuccess(success, true);
-    return stored->minimum;
+    ReportSuccess(success, false);
+    return Reporting<double>(0.0, [&]() -> double {
+        const StoredStatistics* const stored = Stored();
+        if (!stored || !(stored->flags & zelm::StatsFlag::Minimum))
+            return GDALPamRasterBand::GetMinimum(success);
+        ReportSuccess(success, true);
+        return stored->minimum;
+    });
 }
 
 double Band::GetMaximum(int* success) {
-    const StoredStatistics* const stored = Stored();
-    if (!stored || !(stored->flags & zelm::StatsFlag::Maximum))
-        return GDALPamRasterBand::GetMaximum(success);
-    ReportSuccess(success, true);
-    return stored->maximum;
+    ReportSuccess(success, false);
+    return Reporting<double>(0.0, [&]() -> double {
+        const StoredStatistics* const stored = Stored();
+        if (!stored || !(stored->flags & zelm::StatsFlag::Maximum))
+            return GDALPamRasterBand::GetMaximum(success);
+        ReportSuccess(success, true);
+        return stored->maximum;
+    });
 }
 
 CPLErr Band::GetStatistics(int approximate, int force, double* minimum, double* maximum,
                            double* mean, double* deviation) {
-    const StoredStatistics* const stored = Stored();
-    if (!stored || !stored->IsFull())
-        return GDALPamRasterBand::GetStatistics(approximate, force, minimum, maximum, mean,
-                                                deviation);
-    if (minimum) *minimum = stored->minimum;
-    if (maximum) *maximum = stored->maximum;
-    if (mean) *mean = stored->mean;
-    if (deviation) *deviation = stored->standardDeviation;
-    return CE_None;
+    return Reporting<CPLErr>(CE_Failure, [&]() -> CPLErr {
+        const StoredStatistics* const stored = Stored();
+        if (!stored || !stored->IsFull())
+            return GDALPamRasterBand::GetStatistics(approximate, force, minimum, maximum, mean,
+                                                    deviation);
+        if (minimum) *minimum = stored->minimum;
+        if (maximum) *maximum = stored->maximum;
+        if (mean) *mean = stored->mean;
+        if (deviation) *deviation = stored->standardDeviation;
+        return CE_None;
+    });
 }
 
 CPLErr Band::SetStatistics(double minimum, double maximum, double mean, double deviation) {
-    if (!StoresInFile()) return GDALPamRasterBand::SetStatistics(minimum, maximum, mean, deviation);
-    constexpr std::uint32_t kFlags = zelm::StatsFlag::Minimum | zelm::StatsFlag::Maximum |
-                                     zelm::StatsFlag::Mean | zelm::StatsFlag::StandardDeviation;
-    statisticsFetched = false;
-    if (owner.File().archive.StoreStatistics(index, {kFlags, minimum, maximum, mean, deviation}))
-        return CE_None;
-    ReportError(CE_Failure, CPLE_FileIO, "the statistics were not stored");
-    return CE_Failure;
+    return Reporting<CPLErr>(CE_Failure, [&]() -> CPLErr {
+        if (!StoresInFile())
+            return GDALPamRasterBand::SetStatistics(minimum, maximum, mean, deviation);
+        constexpr std::uint32_t kFlags = zelm::StatsFlag::Minimum | zelm::StatsFlag::Maximum |
+                                         zelm::StatsFlag::Mean | zelm::StatsFlag::StandardDeviation;
+        statisticsFetched = false;
+        if (owner.File().archive.StoreStatistics(index,
+                                                 {kFlags, minimum, maximum, mean, deviation}))
+            return CE_None;
+        ReportError(CE_Failure, CPLE_FileIO, "the statistics were not stored");
+        return CE_Failure;
+    });
 }
 
 CPLErr Band::GetDefaultHistogram(double* lower, double* upper, int* bucketCount, GUIntBig** counts,
                                  int force, GDALProgressFunc progress, void* progressData) {
-    const StoredHistogram* const stored = owner.File().archive.Histogram(index, owner.Level());
-    if (!stored)
-        return GDALPamRasterBand::GetDefaultHistogram(lower, upper, bucketCount, counts, force,
-                                                      progress, progressData);
-    auto* const copy =
-        static_cast<GUIntBig*>(VSI_MALLOC2_VERBOSE(stored->counts.size(), sizeof(GUIntBig)));
-    if (!copy) return CE_Failure;
-    std::copy(stored->counts.begin(), stored->counts.end(), copy);
-    *lower = stored->lower;
-    *upper = stored->upper;
-    *bucketCount = static_cast<int>(stored->counts.size());
-    *counts = copy;
-    return CE_None;
+    return Reporting<CPLErr>(CE_Failure, [&]() -> CPLErr {
+        const StoredHistogram* const stored = owner.File().archive.Histogram(index, owner.Level());
+        if (!stored)
+            return GDALPamRasterBand::GetDefaultHistogram(lower, upper, bucketCount, counts, force,
+                                                          progress, progressData);
+        auto* const copy =
+            static_cast<GUIntBig*>(VSI_MALLOC2_VERBOSE(stored->counts.size(), sizeof(GUIntBig)));
+        if (!copy) return CE_Failure;
+        std::copy(stored->counts.begin(), stored->counts.end(), copy);
+        *lower = stored->lower;
+        *upper = stored->upper;
+        *bucketCount = static_cast<int>(stored->counts.size());
+        *counts = copy;
+        return CE_None;
+    });
 }
 
 CPLErr Band::SetDefaultHistogram(double lower, double upper, int bucketCount, GUIntBig* counts) {
-    if (!StoresInFile() || bucketCount <= 0)
-        return GDALPamRasterBand::SetDefaultHistogram(lower, upper, bucketCount, counts);
-    StoredHistogram histogram{index, owner.Level(), lower, upper, {}};
-    histogram.counts.assign(counts, counts + bucketCount);
-    if (owner.File().archive.StoreHistogram(histogram)) return CE_None;
-    ReportError(CE_Failure, CPLE_FileIO, "the histogram was not stored");
-    return CE_Failure;
+    return Reporting<CPLErr>(CE_Failure, [&]() -> CPLErr {
+        if (!StoresInFile() || bucketCount <= 0)
+            return GDALPamRasterBand::SetDefaultHistogram(lower, upper, bucketCount, counts);
+        StoredHistogram histogram{index, owner.Level(), lower, upper, {}};
+        histogram.counts.assign(counts, counts + bucketCount);
+        if (owner.File().archive.StoreHistogram(histogram)) return CE_None;
+        ReportError(CE_Failure, CPLE_FileIO, "the histogram was not stored");
+        return CE_Failure;
+    });
 }
 
 }  // namespace zmcgdal

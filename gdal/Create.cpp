@@ -1,7 +1,6 @@
 #include "gdal/Create.h"
 
 #include <algorithm>
-#include <exception>
 #include <new>
 
 #include "core/PixelVocabulary.h"
@@ -9,26 +8,12 @@
 #include "gdal/Band.h"
 #include "gdal/Dataset.h"
 #include "gdal/GdalRasterSource.h"
+#include "gdal/Reporting.h"
 #include "gdal/Sidecar.h"
 #include "host/build/PyramidBuilder.h"
 
 namespace zmcgdal {
 namespace {
-
-// Calls `work` and reports what it throws to GDAL.
-template <class Work>
-auto Reporting(Work&& work) -> decltype(work()) {
-    try {
-        return work();
-    } catch (const zmchost::Cancelled& error) {
-        CPLError(CE_Failure, CPLE_UserInterrupt, "%s", error.what());
-    } catch (const std::bad_alloc&) {
-        CPLError(CE_Failure, CPLE_OutOfMemory, "out of memory");
-    } catch (const std::exception& error) {
-        CPLError(CE_Failure, CPLE_AppDefined, "%s", error.what());
-    }
-    return {};
-}
 
 // Names what cannot be kept; false if that is not acceptable.
 bool AcceptLosses(const GdalRasterSource& source, bool strict) {
@@ -122,20 +107,20 @@ bool RefuseLent(const char* target) {
 
 GDALDataset* CreateCopy(const char* target, GDALDataset* source, int strict, char** options,
                         GDALProgressFunc progress, void* progressData) {
-    if (RefuseLent(target)) return nullptr;
-    auto parsed = ParseCreationOptions(options);
-    if (!parsed) return nullptr;
-    return Reporting([&] {
+    return Reporting<GDALDataset*>(nullptr, [&]() -> GDALDataset* {
+        if (RefuseLent(target)) return nullptr;
+        auto parsed = ParseCreationOptions(options);
+        if (!parsed) return nullptr;
         return CopyTo(target, *source, strict != FALSE, std::move(*parsed), progress, progressData);
     });
 }
 
 GDALDataset* CreateNew(const char* target, int width, int height, int bands, GDALDataType type,
                        char** options) {
-    if (RefuseLent(target)) return nullptr;
-    auto parsed = ParseCreationOptions(options);
-    if (!parsed) return nullptr;
-    return Reporting([&]() -> GDALDataset* {
+    return Reporting<GDALDataset*>(nullptr, [&]() -> GDALDataset* {
+        if (RefuseLent(target)) return nullptr;
+        auto parsed = ParseCreationOptions(options);
+        if (!parsed) return nullptr;
         const zelm::RasterProps props =
             PropsOf(target, width, height, bands, PixelTypeFor(type, parsed->signedByte));
         auto spool = std::make_unique<zmchost::BuildFile>(target, true);
@@ -153,6 +138,14 @@ Creation::Creation(std::string targetName, CreationOptions creationOptions,
       spool(std::move(spoolFile)),
       bands(bandCount),
       written(blockCount * bandCount) {}
+
+void Creation::MarkLost(std::size_t block, std::size_t band) noexcept {
+    try {
+        lost.insert(block * bands + band);
+    } catch (const std::bad_alloc&) {
+        lostCount = true;
+    }
+}
 
 void Creation::Check(Dataset& dataset, const zmchost::BuildOptions& build) const {
     GdalRasterSource source(dataset, options.signedByte);
@@ -180,29 +173,26 @@ CPLErr Creation::ChooseLevels(Dataset& dataset, const char* resampling, int coun
     zmchost::BuildOptions chosen = options.build;
     chosen.resampling = method;
     chosen.levels = coarsest;
-    const bool possible = Reporting([&] {
-        Check(dataset, chosen);
-        return true;
-    });
-    if (!possible) return CE_Failure;
+    if (!Reported([&] { Check(dataset, chosen); })) return CE_Failure;
     options.build = std::move(chosen);
     return CE_None;
 }
 
 bool Creation::Finish(Dataset& dataset) {
     sealed = std::find(written.begin(), written.end(), false) == written.end();
-    const bool built = Reporting([&] {
-        if (!lost.empty())
+    const bool built = Reported([&] {
+        if (!lost.empty() || lostCount)
             throw zmchost::Error(target, "build it", "some of its blocks could not be written");
         GdalRasterSource source(dataset, options.signedByte);
         AcceptLosses(source, false);
         zmchost::PyramidBuilder(SharedModule()).Build(source, target, options.build);
-        return true;
     });
     if (!built) return false;
     // The palettes are in the file now.
-    for (int number = 1; number <= dataset.GetRasterCount(); ++number)
-        static_cast<Band*>(dataset.GetRasterBand(number))->DropSidecarColors();
+    Reported([&] {
+        for (int number = 1; number <= dataset.GetRasterCount(); ++number)
+            static_cast<Band*>(dataset.GetRasterBand(number))->DropSidecarColors();
+    });
     return true;
 }
 

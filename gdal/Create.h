@@ -43,7 +43,7 @@ public:
         lost.erase(block * bands + band);
     }
     // The spool did not take a block: without it there will be no target.
-    void MarkLost(std::size_t block, std::size_t band) { lost.insert(block * bands + band); }
+    void MarkLost(std::size_t block, std::size_t band) noexcept;
     // Every block has been written, and none will be any more.
     bool IsSealed() const { return sealed; }
 
@@ -64,6 +64,7 @@ private:
     std::size_t bands;
     std::vector<bool> written;   // by block and band
     std::set<std::size_t> lost;  // likewise
+    bool lostCount = false;      // more of them than could be noted
     bool sealed = false;
 };
 

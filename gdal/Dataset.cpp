@@ -8,6 +8,7 @@
 #include "gdal/Band.h"
 #include "gdal/Create.h"
 #include "gdal/LevelRefresh.h"
+#include "gdal/Reporting.h"
 #include "gdal/SidecarStage.h"
 #include "gdal/VsiSource.h"
 #include "host/file/Limits.h"
@@ -55,6 +56,16 @@ bool HasPipesBeside(const std::string& base) {
     return false;
 }
 
+// Flushes answer nothing before GDAL 3.7.
+template <class Work>
+auto ReportingFlush(Work&& work) {
+    using Flushed = decltype(work());
+    if constexpr (std::is_void_v<Flushed>)
+        Reported(work);
+    else
+        return Reporting<Flushed>(CE_Failure, work);
+}
+
 }  // namespace
 
 OpenFile::OpenFile(const std::string& fileName, GDALAccess access, const OpenOptions& options)
@@ -89,10 +100,10 @@ Dataset::Dataset(std::shared_ptr<OpenFile> openFile, std::uint32_t levelShown, G
 
 Dataset::~Dataset() {
     // NOLINTNEXTLINE(bugprone-parent-virtual-call): the pixels, and the sidecar not yet.
-    GDALDataset::FlushCache(true);
+    const bool flushed = Reported([&] { GDALDataset::FlushCache(true); });
     // Without a raster there is nothing that a sidecar could belong to.
-    if (creation && !creation->Finish(*this)) nPamFlags &= ~GPF_DIRTY;
-    GDALPamDataset::FlushCache(true);
+    if (creation && !(flushed && creation->Finish(*this))) nPamFlags &= ~GPF_DIRTY;
+    Reported([&] { GDALPamDataset::FlushCache(true); });
     CloseDependentDatasets();
 }
 
@@ -122,16 +133,18 @@ const std::vector<std::unique_ptr<Dataset>>& Dataset::Overviews() {
 
 // What an incomplete file holds of its coarser levels is anyone's guess.
 void Dataset::AddOverviews() {
+    std::vector<std::unique_ptr<Dataset>> made;
+    if (!main && file->info.complete)
+        for (const zmchost::PyramidLevelInfo& coarser : file->info.levels)
+            if (coarser.level > level && coarser.width > 0 && coarser.height > 0)
+                made.push_back(
+                    std::unique_ptr<Dataset>(new Dataset(file, coarser.level, eAccess, this)));
+    overviews = std::move(made);
     overviewsMade = true;
-    if (main || !file->info.complete) return;
-    for (const zmchost::PyramidLevelInfo& coarser : file->info.levels)
-        if (coarser.level > level && coarser.width > 0 && coarser.height > 0)
-            overviews.emplace_back(new Dataset(file, coarser.level, eAccess, this));
 }
 
 void Dataset::DescribeFile() {
     const zmchost::PyramidHeader& header = file->info.header;
-    structure.SetNameValue("INTERLEAVE", file->tiles.IsPixelInterleaved() ? "PIXEL" : "BAND");
     const auto set = [&](const char* name, const std::string& value) {
         description.SetNameValue(name, value.c_str());
     };
@@ -145,6 +158,8 @@ void Dataset::DescribeFile() {
     set("LEVEL_MAX", std::to_string(header.levelMax));
     set("COMPLETE", file->info.complete ? "YES" : "NO");
     if (file->info.bytesMissing > 0) set("BYTES_MISSING", std::to_string(file->info.bytesMissing));
+    // Last, since it tells that all of it is there.
+    structure.SetNameValue("INTERLEAVE", file->tiles.IsPixelInterleaved() ? "PIXEL" : "BAND");
 }
 
 void Dataset::BeginCreation(std::unique_ptr<Creation> state) { creation = std::move(state); }
@@ -174,10 +189,11 @@ bool Dataset::ReadsDirectly(int x, int y, int width, int height) const {
     if (!quiet || bForceCachedIO) return false;
     // Blocks of such tiles would fill the cache.
     if (!file->tiles.IsHeld(file->tiles.TileAt(level, 0, 0))) return true;
-    const int side = static_cast<int>(file->info.header.tileSize);
-    const auto touched = [side](int start, int extent, int limit) {
-        const int end = std::min((start + extent - 1) / side * side + side, limit);
-        return static_cast<std::int64_t>(end - start / side * side);
+    // In 64 bits: a raster may have as many columns as an int can tell.
+    const std::int64_t side = file->info.header.tileSize;
+    const auto touched = [side](std::int64_t start, std::int64_t extent, std::int64_t limit) {
+        const std::int64_t end = std::min((start + extent - 1) / side * side + side, limit);
+        return end - start / side * side;
     };
     constexpr int kLeastShare = 4;
     return std::int64_t{width} * height * kLeastShare >=
@@ -192,24 +208,40 @@ CPLStringList* Dataset::OwnDomain(const char* domain) {
 }
 
 char** Dataset::GetMetadataDomainList() {
-    return BuildMetadataDomainList(GDALPamDataset::GetMetadataDomainList(), TRUE, kStructureDomain,
-                                   kOwnDomain, nullptr);
+    return Reporting<char**>(nullptr, [&] {
+        return BuildMetadataDomainList(GDALPamDataset::GetMetadataDomainList(), TRUE,
+                                       kStructureDomain, kOwnDomain, nullptr);
+    });
 }
 
 char** Dataset::GetMetadata(const char* domain) {
-    if (CPLStringList* const own = OwnDomain(domain)) return own->List();
-    return GDALPamDataset::GetMetadata(domain);
+    return Reporting<char**>(nullptr, [&] {
+        if (CPLStringList* const own = OwnDomain(domain)) return own->List();
+        return GDALPamDataset::GetMetadata(domain);
+    });
 }
 
 const char* Dataset::GetMetadataItem(const char* name, const char* domain) {
-    if (CPLStringList* const own = OwnDomain(domain)) return own->FetchNameValue(name);
-    return GDALPamDataset::GetMetadataItem(name, domain);
+    return Reporting<const char*>(nullptr, [&] {
+        if (CPLStringList* const own = OwnDomain(domain)) return own->FetchNameValue(name);
+        return GDALPamDataset::GetMetadataItem(name, domain);
+    });
 }
 
 CPLErr Dataset::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, void* data,
                           int bufferWidth, int bufferHeight, GDALDataType bufferType, int bandCount,
                           int* bandMap, GSpacing pixelSpace, GSpacing lineSpace, GSpacing bandSpace,
                           GDALRasterIOExtraArg* extra) {
+    return Reporting(CE_Failure, [&] {
+        return ReadOrWrite(mode, x, y, width, height, data, bufferWidth, bufferHeight, bufferType,
+                           bandCount, bandMap, pixelSpace, lineSpace, bandSpace, extra);
+    });
+}
+
+CPLErr Dataset::ReadOrWrite(GDALRWFlag mode, int x, int y, int width, int height, void* data,
+                            int bufferWidth, int bufferHeight, GDALDataType bufferType,
+                            int bandCount, int* bandMap, GSpacing pixelSpace, GSpacing lineSpace,
+                            GSpacing bandSpace, GDALRasterIOExtraArg* extra) {
     if (mode == GF_Read && bufferWidth < width && bufferHeight < height) {
         int tried = FALSE;
         // GDAL takes the bands from the level as a dataset of its own.
@@ -238,35 +270,46 @@ CPLErr Dataset::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, 
 CPLErr Dataset::IBuildOverviews(const char* resampling, int overviewCount, const int* factors,
                                 int bandCount, const int* bands, GDALProgressFunc progress,
                                 void* progressData, CSLConstList options) {
-    if (creation) return creation->ChooseLevels(*this, resampling, overviewCount, factors);
-    if (file->info.bytesMissing > 0) {
-        CPLError(CE_Failure, CPLE_NotSupported,
-                 "%s: the pyramid is incomplete, " CPL_FRMT_GUIB
-                 " bytes are missing; no levels are made of it",
-                 GetDescription(), static_cast<GUIntBig>(file->info.bytesMissing));
+    // GDAL divides by them where it makes levels beside the file.
+    if (std::any_of(factors, factors + overviewCount, [](int factor) { return factor < 1; })) {
+        ReportError(CE_Failure, CPLE_IllegalArg, "levels are reduced by 1 at the least");
         return CE_Failure;
     }
-    if (Overviews().empty())
-        return GDALPamDataset::IBuildOverviews(resampling, overviewCount, factors, bandCount, bands,
-                                               progress, progressData, options);
-    return RefreshLevels(*this, resampling, std::vector<int>(factors, factors + overviewCount),
-                         progress, progressData);
+    return Reporting(CE_Failure, [&] {
+        if (creation) return creation->ChooseLevels(*this, resampling, overviewCount, factors);
+        if (file->info.bytesMissing > 0) {
+            CPLError(CE_Failure, CPLE_NotSupported,
+                     "%s: the pyramid is incomplete, " CPL_FRMT_GUIB
+                     " bytes are missing; no levels are made of it",
+                     GetDescription(), static_cast<GUIntBig>(file->info.bytesMissing));
+            return CE_Failure;
+        }
+        if (Overviews().empty())
+            return GDALPamDataset::IBuildOverviews(resampling, overviewCount, factors, bandCount,
+                                                   bands, progress, progressData, options);
+        return RefreshLevels(*this, resampling, std::vector<int>(factors, factors + overviewCount),
+                             progress, progressData);
+    });
 }
 
 // The sidecar of a raster that there is not yet waits for it.
 Dataset::Flushed Dataset::FlushCache(bool atClosing) {
-    if (!creation) return GDALPamDataset::FlushCache(atClosing);
-    // NOLINTNEXTLINE(bugprone-parent-virtual-call): the pixels alone.
-    return GDALDataset::FlushCache(atClosing);
+    return ReportingFlush([&] {
+        if (!creation) return GDALPamDataset::FlushCache(atClosing);
+        // NOLINTNEXTLINE(bugprone-parent-virtual-call): the pixels alone.
+        return GDALDataset::FlushCache(atClosing);
+    });
 }
 
 int Dataset::CloseDependentDatasets() {
-    int closed = GDALPamDataset::CloseDependentDatasets();
-    if (!overviews.empty()) {
-        overviews.clear();
-        closed = TRUE;
-    }
-    return closed;
+    return Reporting(FALSE, [&] {
+        int closed = GDALPamDataset::CloseDependentDatasets();
+        if (!overviews.empty()) {
+            overviews.clear();
+            closed = TRUE;
+        }
+        return closed;
+    });
 }
 
 }  // namespace zmcgdal

@@ -97,6 +97,10 @@ private:
     void AddOverviews();
     void DescribeFile();
     CPLStringList* OwnDomain(const char* domain);
+    CPLErr ReadOrWrite(GDALRWFlag mode, int x, int y, int width, int height, void* data,
+                       int bufferWidth, int bufferHeight, GDALDataType bufferType, int bandCount,
+                       int* bandMap, GSpacing pixelSpace, GSpacing lineSpace, GSpacing bandSpace,
+                       GDALRasterIOExtraArg* extra);
 
     std::shared_ptr<OpenFile> file;
     std::uint32_t level;

@@ -2,13 +2,13 @@
 
 #include <gdal_priv.h>
 
-#include <exception>
 #include <memory>
 
 #include "files/Lending.h"
 #include "gdal/Create.h"
 #include "gdal/Dataset.h"
 #include "gdal/Options.h"
+#include "gdal/Reporting.h"
 #include "gdal/VsiSource.h"
 #include "host/base/Xerces.h"
 #include "host/file/PyramidFileInfo.h"
@@ -28,8 +28,10 @@ std::string_view StartOf(const GDALOpenInfo& info) {
 // Names of lent sources are made and used within code of one process: one that comes from a user of
 // GDAL is nobody's.
 int Identify(GDALOpenInfo* info) {
-    const bool lent = zelm::files::LooksLent(info->pszFilename);
-    return !lent && zmchost::LooksLikePyramid(StartOf(*info)) ? TRUE : FALSE;
+    return Reporting<int>(FALSE, [&] {
+        const bool lent = zelm::files::LooksLent(info->pszFilename);
+        return !lent && zmchost::LooksLikePyramid(StartOf(*info)) ? TRUE : FALSE;
+    });
 }
 
 void WarnIfIncomplete(const Dataset& dataset, const zmchost::PyramidFileInfo& info) {
@@ -69,14 +71,8 @@ std::unique_ptr<Dataset> OpenDataset(GDALOpenInfo* info) {
 
 GDALDataset* Open(GDALOpenInfo* info) {
     if (!Identify(info)) return nullptr;
-    try {
-        return OpenDataset(info).release();
-    } catch (const std::bad_alloc&) {
-        CPLError(CE_Failure, CPLE_OutOfMemory, "%s: out of memory", info->pszFilename);
-    } catch (const std::exception& error) {
-        CPLError(CE_Failure, CPLE_OpenFailed, "%s", error.what());
-    }
-    return nullptr;
+    return Reporting<GDALDataset*>(
+        nullptr, [&] { return OpenDataset(info).release(); }, CPLE_OpenFailed);
 }
 
 void Describe(GDALDriver& driver) {
@@ -104,12 +100,10 @@ void Describe(GDALDriver& driver) {
 
 void GDALRegister_ZMCPyramid(void) {
     if (!GDAL_CHECK_VERSION("ZMCPyramid") || GDALGetDriverByName(zmcgdal::kName)) return;
-    try {
+    zmcgdal::Reported([] {
         zmchost::InitialiseXerces();
         auto driver = std::make_unique<GDALDriver>();
         zmcgdal::Describe(*driver);
         GetGDALDriverManager()->RegisterDriver(driver.release());
-    } catch (const std::exception& error) {
-        CPLError(CE_Failure, CPLE_AppDefined, "%s", error.what());
-    }
+    });
 }

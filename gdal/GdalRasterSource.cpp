@@ -29,7 +29,12 @@ public:
 private:
     static void CPL_STDCALL Take(CPLErr kind, CPLErrorNum, const char* message) {
         auto* const self = static_cast<ErrorCatcher*>(CPLGetErrorHandlerUserData());
-        if (kind >= CE_Failure && self->text.empty()) self->text = message;
+        if (kind < CE_Failure || !self->text.empty()) return;
+        try {
+            self->text = message;
+        } catch (const std::bad_alloc&) {
+            self->text = "out of memory";  // without any: so short a text lies in the string itself
+        }
     }
 };
 

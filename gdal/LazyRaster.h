@@ -7,14 +7,12 @@
 #ifndef ZMC_GDAL_LAZYRASTER_H
 #define ZMC_GDAL_LAZYRASTER_H
 
-#include <cpl_error.h>
-
-#include <exception>
 #include <memory>
 #include <optional>
 #include <string>
 #include <utility>
 
+#include "gdal/Reporting.h"
 #include "host/raster/Raster.h"
 
 namespace zmcgdal {
@@ -55,14 +53,10 @@ public:
     // a failure, as does what the source told of the disk, and the answer is false.
     template <class Visitor>
     bool Visit(Visitor&& visit) {
-        try {
+        return Reported([&] {
             Get().Visit(std::forward<Visitor>(visit));
             raster->CheckDisk("read it");
-            return true;
-        } catch (const std::exception& error) {
-            CPLError(CE_Failure, CPLE_AppDefined, "%s", error.what());
-            return false;
-        }
+        });
     }
 
 private:

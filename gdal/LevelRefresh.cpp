@@ -1,7 +1,6 @@
 #include "gdal/LevelRefresh.h"
 
 #include <algorithm>
-#include <exception>
 #include <map>
 #include <optional>
 #include <set>
@@ -9,6 +8,7 @@
 #include "format/TileWalk.h"
 #include "gdal/NoDataValues.h"
 #include "gdal/Options.h"
+#include "gdal/Reporting.h"
 #include "host/build/LevelReduction.h"
 
 namespace zmcgdal {
@@ -46,7 +46,8 @@ std::optional<std::set<std::uint32_t>> LevelsOf(Dataset& dataset, const std::vec
     for (const int factor : factors) {
         const auto& all = dataset.Overviews();
         const auto match = std::find_if(all.begin(), all.end(), [&](const auto& overview) {
-            return factor == 1 << (overview->Level() - dataset.Level());
+            return factor > 0 &&
+                   std::int64_t{factor} == std::int64_t{1} << (overview->Level() - dataset.Level());
         });
         if (match == all.end()) {
             CPLError(CE_Failure, CPLE_NotSupported,
@@ -119,24 +120,21 @@ CPLErr RefreshLevels(Dataset& dataset, const char* resampling, const std::vector
         return Refuse("this resampling is not known for the pixel type");
     const auto levels = LevelsOf(dataset, factors);
     if (!levels || !WritePixels(dataset)) return CE_Failure;
-    try {
+    bool finished = false;
+    const auto make = [&] {
         for (const std::uint32_t level : *levels)
             dataset.File().CheckTile(level, dataset.File().info.header.bandCount,
                                      "make its levels anew");
         TellNoDataValues(dataset);
-        bool finished = false;
-        zelm::VisitElementType(pixelType, [&]<class T>(std::type_identity<T>) {
-            finished = MakeLevels<T>(dataset.File().raster.Get(), *method, *levels, progress,
-                                     progressData);
+        zmchost::Raster& raster = dataset.File().raster.Get();
+        zelm::VisitElementType(raster.PixelType(), [&]<class T>(std::type_identity<T>) {
+            finished = MakeLevels<T>(raster, *method, *levels, progress, progressData);
         });
-        DropCaches(dataset);
-        if (finished) return CE_None;
-        CPLError(CE_Failure, CPLE_UserInterrupt, "cancelled");
-    } catch (const std::exception& error) {
-        DropCaches(dataset);
-        CPLError(CE_Failure, CPLE_FileIO, "%s", error.what());
-    }
-    return CE_Failure;
+        if (!finished) CPLError(CE_Failure, CPLE_UserInterrupt, "cancelled");
+    };
+    Reported(make, CPLE_FileIO);
+    DropCaches(dataset);
+    return finished ? CE_None : CE_Failure;
 }
 
 }  // namespace zmcgdal

@@ -50,15 +50,17 @@ Rectangle TileReader::TileAt(std::uint32_t level, int tileX, int tileY) const {
 }
 
 bool TileReader::ReadRaw(std::uint32_t level, const Rectangle& tile, const int* bands,
-                         int bandCount, void* buffer) {
+                         int bandCount, std::span<unsigned char> buffer) {
     const std::size_t samples = tile.Pixels() * static_cast<std::size_t>(bandCount);
     // A short read leaves the buffer as it was.
-    if (!layout.complete) std::memset(buffer, 0, samples * rawSampleSize);
+    if (!layout.complete) std::fill(buffer.begin(), buffer.end(), 0);
     bool done = false;
     const bool told = raster.Visit([&]<class T>(zelm::RasterReader<T>& reader) {
+        if (sizeof(T) != rawSampleSize || samples > buffer.size() / sizeof(T)) return;
         done = reader.ReadTile(static_cast<std::int32_t>(tile.x), static_cast<std::int32_t>(tile.y),
                                tile.width, tile.height, ListOf(bands, bandCount),
-                               static_cast<std::int32_t>(level), static_cast<T*>(buffer), nullptr);
+                               static_cast<std::int32_t>(level),
+                               static_cast<T*>(static_cast<void*>(buffer.data())), nullptr);
     });
     if (told && !done)
         CPLError(CE_Failure, CPLE_FileIO, "the raster module refuses a tile of level %u", level);
@@ -97,9 +99,9 @@ bool TileReader::LoadSamples(std::uint32_t level, const Rectangle& area, const i
     const std::size_t samples = area.Pixels() * static_cast<std::size_t>(bandCount);
     held = TileKey();
     scratch.resize(samples * sampleSize);
-    if (sampleSize == rawSampleSize) return ReadRaw(level, area, bands, bandCount, scratch.data());
+    if (sampleSize == rawSampleSize) return ReadRaw(level, area, bands, bandCount, scratch);
     raw.resize(samples * rawSampleSize);
-    if (!ReadRaw(level, area, bands, bandCount, raw.data())) return false;
+    if (!ReadRaw(level, area, bands, bandCount, raw)) return false;
     Widen(raw.data(), samples, scratch.data());
     return true;
 }
@@ -173,7 +175,9 @@ bool TileReader::IsPlainPlane(const Rectangle& window, int bandCount, const Targ
 bool TileReader::Read(std::uint32_t level, const Rectangle& window, const int* bands, int bandCount,
                       const Target& target) {
     if (FitsTarget(window, bands, bandCount, target))
-        return ReadRaw(level, window, bands, bandCount, target.data);
+        return ReadRaw(level, window, bands, bandCount,
+                       {static_cast<unsigned char*>(target.data),
+                        static_cast<std::size_t>(target.lineSpace) * window.height});
     const TileKey key{level, window.x, window.y, 0};
     if (IsPlainPlane(window, bandCount, target) && heldApart != key && IsHeld(window))
         return SplitTile(level, window, bands[0], target.data);

@@ -10,6 +10,7 @@
 #include <gdal_priv.h>
 
 #include <cstdint>
+#include <span>
 #include <vector>
 
 #include "format/Rectangle.h"
@@ -86,8 +87,10 @@ private:
     TileKey heldApart;   // tile in `planes`, and the
     int planeAway = -1;  // band whose plane went straight to a caller
 
+    // The one place where the module fills a buffer: it has to hold what the module's reader
+    // writes, whatever the header has said of the samples.
     bool ReadRaw(std::uint32_t level, const zelm::Rectangle& tile, const int* bands, int bandCount,
-                 void* buffer);
+                 std::span<unsigned char> buffer);
     bool FitsTarget(const zelm::Rectangle& window, const int* bands, int bandCount,
                     const Target& target) const;
     bool LoadSamples(std::uint32_t level, const zelm::Rectangle& area, const int* bands,

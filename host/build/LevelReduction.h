@@ -28,6 +28,8 @@ public:
           halo(ReductionHalo(resampling)),
           margin((halo + 1) / 2),
           bands(finer.Bands()) {
+        if (finer.PixelType() != zelm::ElementTraits<T>::code)
+            throw Error(finer.Name(), "reduce it", "it is of another pixel type");
         for (std::uint32_t band = 0; band < bands; ++band)
             rules.push_back(RuleOfBand<T>(finer.Props(), band));
     }

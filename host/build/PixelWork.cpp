@@ -148,6 +148,8 @@ class TypedWork : public PixelWork {
 public:
     TypedWork(Raster& raster, const PixelWorkSetup& setup)
         : target(raster), method(setup.resampling), bands(setup.props.bands), harvest(setup) {
+        if (target.Bands() != bands)
+            throw Error(target.Name(), "build it", "it is of another number of bands");
         for (std::uint32_t band = 0; band < bands; ++band) {
             rules.push_back(RuleOfBand<T>(setup.props, band));
             anyValue = anyValue || rules.back().hasValue;

@@ -151,6 +151,10 @@ Raster Raster::OpenLent(ModulePtr module, const std::string& name, std::shared_p
         throw Error(name, "open the raster", failure.empty() ? "the module refuses it" : failure);
     Raster raster(module, name, connection);
     raster.TakeReader();
+    // Whoever uses both reads samples by the one and sizes by the other.
+    if (header.pixelType != raster.props.pixelType || header.bandCount != raster.props.bands ||
+        header.width != raster.props.samples || header.height != raster.props.lines)
+        throw Error(name, "open the raster", "it has changed while it was opened");
     raster.file = std::move(file);
     raster.header = header;
     raster.minLevel = header.levelMin;
@@ -183,7 +187,8 @@ Raster Raster::Create(ModulePtr module, const std::string& file, zelm::RasterPro
     raster.header = opened->ReadHeader();
     raster.maxLevel = maxLevel;
     if (raster.header->levelMax != maxLevel || raster.header->width != props.samples ||
-        raster.header->height != props.lines || raster.header->bandCount != props.bands)
+        raster.header->height != props.lines || raster.header->bandCount != props.bands ||
+        raster.header->pixelType != raster.props.pixelType)
         throw Error(file, "lay out the raster", "an older file stands in its place");
     platform::RemoveEntry(MetadataJournal::PathFor(file));
     opened->Accept();
@@ -497,8 +502,8 @@ zelm::RasterReader<T>& Raster::Typed() const {
 }
 
 // The module fetches by the place of the record in the file: what stands at a band's own place is
-// what any host gets for it. A file that was written band by band has them in another order; a host
-// that looks for it there ends at the place of the last band.
+// what any host gets for it. A file that was written band by band, or some bands twice, has them in
+// another order: then the first record of the band counts, wherever it stands.
 template <class T>
 zelm::RasterBandStats<T> Raster::Statistics(std::uint32_t band) const {
     const auto stored = Records<T>();
@@ -507,11 +512,7 @@ zelm::RasterBandStats<T> Raster::Statistics(std::uint32_t band) const {
                     "the file has none");
     const auto all = stored->Statistics();
     if (band < all.size() && all[band].band == band) return all[band];
-    const zelm::RasterBandStats<T>* const first = stored->FirstStatistics(band);
-    if (first - all.data() >= std::int64_t{Bands()})
-        throw Error(name, "read the statistics of band " + std::to_string(band),
-                    "the module does not find the record that the file has");
-    return *first;
+    return *stored->FirstStatistics(band);
 }
 
 void Raster::Store(const std::function<void()>& action) {

@@ -9,6 +9,7 @@
 #include <cstdlib>
 #include <filesystem>
 #include <functional>
+#include <optional>
 #include <vector>
 
 #include "gdal/Driver.h"
@@ -250,6 +251,106 @@ TEST_F(DriverFaults, NewFileIsMadeOnceItsBlocksAreWritten) {
     ASSERT_TRUE(dataset);
     EXPECT_TRUE(Holds(Read(*dataset, 1), 8));
 }
+
+// The three stores of the driver's users; each answers for what has reached the file.
+struct Setter {
+    const char* name;
+    CPLErr (*store)(GDALRasterBand&);
+};
+
+const Setter kSetters[] = {
+    {"SetStatistics", [](GDALRasterBand& band) { return band.SetStatistics(1, 2, 1.5, 0.25); }},
+    {"SetDefaultHistogram",
+     [](GDALRasterBand& band) {
+         std::vector<GUIntBig> counts(2000, 7);
+         return band.SetDefaultHistogram(-0.5, 1999.5, 2000, counts.data());
+     }},
+    {"SetColorTable",
+     [](GDALRasterBand& band) {
+         GDALColorTable table;
+         const GDALColorEntry color{1, 2, 3, 255};
+         for (int i = 0; i < 256; ++i) table.SetColorEntry(i, &color);
+         return band.SetColorTable(&table);
+     }},
+};
+
+class DriverStores : public DriverFaults, public testing::WithParamInterface<Setter> {
+protected:
+    // Whether a store into the file, made anew, is told as one that failed.
+    bool TellsFailure(const std::function<void()>& before, const std::function<void()>& after) {
+        const DatasetPtr dataset = Open(GDAL_OF_UPDATE);
+        EXPECT_TRUE(dataset);
+        EXPECT_NE(dataset->GetRasterBand(1)->GetMetadataItem("STATISTICS_MEAN"), nullptr);
+        CPLErrorReset();
+        before();
+        const CPLErr answer = GetParam().store(*dataset->GetRasterBand(1));
+        const bool told = CPLGetLastErrorType() == CE_Failure;
+        after();
+        EXPECT_EQ(answer == CE_Failure, told);
+        return answer == CE_Failure;
+    }
+};
+
+TEST_P(DriverStores, TellWhatACallOfTheSystemDidNotDo) {
+    Make(1);
+    const std::string whole = zmctest::ReadText(name);
+    for (const FileFaultAction action : {FileFaultAction::Error, FileFaultAction::Nothing})
+        for (const bool fromThenOn : {false, true}) {
+            std::size_t points = 0;
+            for (bool met = true; met; ++points) {
+                zmctest::WriteText(name, whole);
+                std::optional<FileFaults> faults;
+                const bool failed = TellsFailure(
+                    [&] {
+                        faults.emplace(zmctest::FileFault{
+                            folder.String(), zmctest::kWriteCall | zmctest::kResizeCall, points + 1,
+                            fromThenOn, action, ENOSPC});
+                    },
+                    [&] { faults->Disarm(); });
+                met = faults->Failed() != 0;
+                // A call that moves nothing is made again.
+                const bool mayPass = action == FileFaultAction::Nothing && !fromThenOn;
+                EXPECT_TRUE(mayPass || failed == met) << points;
+                faults.reset();
+                EXPECT_TRUE(Holds(Read(*Open(), 1), 1));
+            }
+            EXPECT_GT(points, 3u);
+        }
+}
+
+TEST_P(DriverStores, TellThatTheDiskIsFull) {
+    Make(1);
+    const auto size = std::filesystem::file_size(name);
+    std::optional<FileSizeLimit> limit;
+    EXPECT_TRUE(TellsFailure([&] { limit.emplace(size); }, [&] { limit.reset(); }));
+    EXPECT_TRUE(Holds(Read(*Open(), 1), 1));
+    EXPECT_FALSE(TellsFailure([] {}, [] {}));
+}
+
+TEST_P(DriverStores, TellThatARealDiskIsFull) {
+    const std::string place = folder / "disk";
+    std::filesystem::create_directory(place);
+    zmctest::SmallDisk disk(place, "size=512k");
+    if (!disk.IsMounted()) GTEST_SKIP() << "no right to mount a disk here";
+    Make(1);
+    std::filesystem::copy(name, place + "/a.pyr");
+    disk.Fill();
+    const DatasetPtr dataset(
+        GDALDataset::Open((place + "/a.pyr").c_str(), GDAL_OF_RASTER | GDAL_OF_UPDATE));
+    ASSERT_TRUE(dataset);
+    // What is left of the last block of the file takes the first few stores.
+    CPLErr answer = CE_None;
+    for (int i = 0; i < 100 && answer == CE_None; ++i) {
+        CPLErrorReset();
+        answer = GetParam().store(*dataset->GetRasterBand(1));
+    }
+    EXPECT_EQ(answer, CE_Failure);
+    EXPECT_EQ(CPLGetLastErrorType(), CE_Failure);
+    EXPECT_TRUE(Holds(Read(*dataset, 1), 1));
+}
+
+INSTANTIATE_TEST_SUITE_P(All, DriverStores, testing::ValuesIn(kSetters),
+                         [](const auto& each) { return each.param.name; });
 
 }  // namespace
 }  // namespace zmcgdal

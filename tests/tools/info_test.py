@@ -51,6 +51,24 @@ class Info(ToolTest):
             counts = np.bincount(pixels[:, :, band].ravel(), minlength=256)
             self.assertEqual(record["counts"], counts.tolist())
 
+    def test_records_behind_those_of_as_many_bands_as_there_are(self):
+        """As GDAL's users leave them who ask for the statistics of the first band again."""
+        pixels = self.pyramid()
+        file = Pyramid(self.path("picture.pyr"))
+        records = "".join(
+            f"<BANDSTATISTICS><RSTC_BAND>{band}</RSTC_BAND><RSTC_MEAN>"
+            f"{pixels[:, :, band].astype(np.float64).mean():.15g}</RSTC_MEAN></BANDSTATISTICS>"
+            for band in (0, 0, 0, 1, 2))
+        with open(self.path("picture.pyr"), "r+b") as handle:
+            handle.truncate(file.end)
+            handle.seek(file.end)
+            handle.write(f"<DATASET>{records}</DATASET>".encode())
+        shown = self.document("info", "picture.pyr")["statistics"]
+        self.assertEqual([record["band"] for record in shown], [1, 2, 3])
+        for band, record in enumerate(shown):
+            self.assertAlmostEqual(record["mean"], pixels[:, :, band].mean(), 9)
+        self.assertEqual(self.document("verify", "picture.pyr")["file"], "picture.pyr")
+
     def parses(self, *arguments):
         """How many documents the tool parses for a command."""
         count = self.path("parses")
