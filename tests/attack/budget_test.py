@@ -10,7 +10,7 @@ import unittest
 import attack
 import hostile
 
-GENERATED_SECONDS = 20  # for generated files, after the first
+GENERATED_SECONDS = 10  # for generated files, after the first
 DRIVER = not attack.SANITIZED
 
 

@@ -216,7 +216,7 @@ class Headers(FolderTest):
                 "holds no pixels": {"PIXEL_WIDTH": 0},
                 "no pixels": {"LEVELMIN": 5, "LEVELMAX": 5},
                 "too large": {"PIXEL_WIDTH": 2147483648, "PIXEL_HEIGHT": 1},
-                "number of bands": {"BANDS": 70000},
+                "70000 bands, beyond the limit of 65536; ZMC_LIMITS=bands=70000": {"BANDS": 70000},
                 "tiles are too large": {"BANDS": 2000, "TILESIZE": 2048},
                 "of its number of bands": {"BANDS": "many"},
                 "tile size is 0": {"TILESIZE": ""}}.items():

@@ -196,6 +196,14 @@ class Beside(ToolTest):
         self.good("build", "without.tif", "made.pyr", "--overwrite")
         self.assertNotIn("made.pyr.aux.xml", self.files())
 
+    def test_an_incomplete_pyramid_is_no_source(self):
+        self.pyramid()
+        end = Pyramid(self.path("picture.pyr")).end
+        with open(self.path("picture.pyr"), "r+b") as handle:
+            handle.truncate(end - 10)
+        self.refused(1, "picture.pyr: the pyramid is incomplete, 10 bytes of tiles are missing; "
+                     "build it anew", "build", "picture.pyr", "again.pyr", "--quiet")
+
     def test_a_pyramid_is_a_source_too(self):
         pixels = self.pyramid("first.pyr")
         self.good("build", "first.pyr", "second.pyr")

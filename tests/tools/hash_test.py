@@ -39,6 +39,12 @@ class Hash(ToolTest):
         self.assertEqual(
             self.document("hash", "made.pyr", "--window", "7,100,1992,901")["sha256"], digest)
 
+    def test_lines_beyond_one_strip(self):
+        pixels = samples("Double", 2, 2200000, 2)
+        geotiff(self.path("source.tif"), pixels, "Double")
+        digest = hashlib.sha256(pixels.tobytes()).hexdigest()
+        self.assertEqual(self.good("hash", "source.tif"), f"{digest}  source.tif\n")
+
     def test_an_incomplete_file_has_no_hash(self):
         self.pyramid()
         with open(self.path("picture.pyr"), "r+b") as handle:
