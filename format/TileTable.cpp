@@ -193,7 +193,8 @@ std::uint64_t TilePlaces::At(std::uint32_t band, std::uint32_t level, std::uint3
     const Tile block{tileX << level, tileY << level};
     const std::uint64_t later = band * bandBytes;
     if (level == 0) return PlaceOfTile(block) + later;
-    return (BlockBytes(block, level) == 0 ? 0 : PlaceOfBlock(block, level)) + later;
+    // Where 2^level is at most the side of a tile, a block in the grid of its level has pixels.
+    return PlaceOfBlock(block, level) + later;
 }
 
 // The last tile, on the curve too, of a square or of what the grid has of it.

@@ -62,6 +62,7 @@ TEST(GuardText, AnElementEndsBehindTheFirstAttributeTooMany) {
         const std::string most = "<a>\n<b" + WithAttributes(65, quote);
         EXPECT_EQ(Guarded(most + "/></a>"), most + ">></a>");
         EXPECT_EQ(Guarded(most + " c='1' d='2'/></a>"), most + ">c='1' d='2'/></a>");
+        EXPECT_EQ(Guarded(most), most) << "the text ends there by itself";
         EXPECT_EQ(FaultOf(most + " c='1' d='2'/></a>"), FaultOf(most + "/></a>"));
         EXPECT_NE(FaultOf(most + "/></a>").find("attributes"), std::string::npos);
     }
