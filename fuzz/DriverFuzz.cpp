@@ -33,7 +33,7 @@ constexpr std::int64_t kMostPixels = 1 << 18;  // that a whole band is gone thro
 // GDAL with no other driver: what a sidecar names is opened by this one, or not at all.
 void StartOnce() {
     static const bool started = [] {
-        setenv("ZMCRASTER_MODULE", ZMC_MODULE_PATH, 1);
+        zmcfuzz::TellModulePath();
         CPLSetErrorHandler(CPLQuietErrorHandler);
         CPLSetConfigOption("GDAL_HTTP_TIMEOUT", "1");
         GDALSetCacheMax64(16 << 20);

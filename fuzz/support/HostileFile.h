@@ -75,10 +75,15 @@ inline bool IsAffordable(const zmchost::PyramidHeader& header) {
                                       tiles, header.bandCount, header.levelMax) <= (8u << 20));
 }
 
+// Where whoever loads the module finds it. Before any thread is started.
+inline void TellModulePath() {
+    setenv("ZMCRASTER_MODULE", ZMC_MODULE_PATH, 1);  // NOLINT(concurrency-mt-unsafe): one thread
+}
+
 // The module, loaded once.
 inline const zmchost::ModulePtr& TheModule() {
     static const zmchost::ModulePtr module = [] {
-        setenv("ZMCRASTER_MODULE", ZMC_MODULE_PATH, 1);
+        TellModulePath();
         return zmchost::Module::Load();
     }();
     return module;
