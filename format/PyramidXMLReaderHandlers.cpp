@@ -169,9 +169,7 @@ void PyramidXMLReaderCore::AddColor(ColorList::Rgba rgba) {
 // Sets no length: the colours are counted. The lookup leaves a null colour behind.
 void PyramidXMLReaderCore::LookUpColor(std::uint32_t index) { currentPalette.GetColor(index); }
 
-void PyramidXMLReaderCore::KeepPalette() {
-    currentPalette.CopyTo(palettes[paletteBand]);
-}
+void PyramidXMLReaderCore::KeepPalette() { currentPalette.CopyTo(palettes[paletteBand]); }
 
 void PyramidXMLReaderCore::TakeText(ElementName name, std::string_view text) {
     if (name < HIST_LEVEL)
