@@ -211,6 +211,7 @@ void FaultReader::fatalError(const xercesc::SAXParseException& exception) { erro
 
 void FaultReader::TakeText(ElementName, std::string_view) {}
 
+// cppcheck-suppress passedByValue ; the parse changes its own copy
 std::string ParseDocumentText(std::string text, FaultReader& reader) {
     return ParseDocumentBytes(reinterpret_cast<unsigned char*>(text.data()), text.size(), reader,
                               reader.fault);

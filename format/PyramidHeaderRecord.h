@@ -36,7 +36,7 @@ struct PyramidHeaderRecord {
     // ordering Morton this serves to tell the end alone.
     std::uint64_t LevelStart(std::uint32_t level) const {
         std::uint64_t start = 0;
-        for (std::uint64_t coarser = std::uint64_t{level} + 1; coarser <= levelMax; ++coarser)
+        for (std::uint64_t coarser = level + std::uint64_t{1}; coarser <= levelMax; ++coarser)
             start += LevelBytes(static_cast<std::uint32_t>(coarser));
         return start;
     }
