@@ -108,12 +108,13 @@ template <class Look>
 bool Archive::LookAtRecords(Look&& look) const {
     bool settled = false;
     const bool told = raster.Visit([&]<class T>(zelm::RasterReader<T>&) {
-        const auto records = raster.Get().Records<T>();
-        look(*records);
-        settled = records->IsSettled();
-        if (!settled && !records->Fault().empty())
-            CPLError(CE_Warning, CPLE_FileIO, "its records are not known now: %s",
-                     records->Fault().c_str());
+        const std::shared_ptr<const zmchost::StoredRecords<T>> held = raster.Get().Records<T>();
+        const zmchost::StoredRecords<T>& records = *held;
+        look(records);
+        if (records.IsSettled()) settled = true;
+        const std::string& fault = records.Fault();
+        if (!settled && !fault.empty())
+            CPLError(CE_Warning, CPLE_FileIO, "its records are not known now: %s", fault.c_str());
     });
     return told && settled;
 }

@@ -114,7 +114,7 @@ bool TileReader::IsHeld(const Rectangle& tile) const {
 // What the window has of a tile that is not held, by as many bands and rows as make a piece.
 bool TileReader::CopyPieces(std::uint32_t level, const Rectangle& part, const Rectangle& window,
                             const int* bands, int bandCount, const Target& target) {
-    const std::uint64_t rowBytes = std::uint64_t{part.width} * sampleSize;
+    const std::uint64_t rowBytes = std::max<std::uint64_t>(part.width * sampleSize, 1);
     const auto most = static_cast<int>(std::clamp<std::uint64_t>(
         kPieceBytes / rowBytes, 1, static_cast<std::uint64_t>(fileBands)));
     for (int first = 0; first < bandCount; first += most) {

@@ -49,7 +49,7 @@ template <class T>
 HistogramBins<T> HistogramBins<T>::ForBand(T lowest, T highest, std::uint32_t binCount) {
     if constexpr (sizeof(T) == 1)
         return HistogramBins(std::numeric_limits<T>::min(), std::numeric_limits<T>::max(),
-                             1u << (8 * sizeof(T)));
+                             std::uint32_t{std::numeric_limits<unsigned char>::max()} + 1u);
     else
         return HistogramBins(lowest, highest, binCount);
 }
