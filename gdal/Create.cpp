@@ -36,7 +36,7 @@ class Unfinished {
 public:
     explicit Unfinished(const std::string& target) : name(target) {}
     ~Unfinished() {
-        for (const char* const ending : {"", ".aux.xml", ".msk"})
+        for (const char* const ending : {"", kSidecarEnding, kMaskEnding})
             if (!kept) VSIUnlink((name + ending).c_str());
     }
     Unfinished(const Unfinished&) = delete;
@@ -64,7 +64,7 @@ GDALDataset* CopyTo(const std::string& target, GDALDataset& source, bool strict,
     Unfinished made(target);
     auto dataset = OpenForUpdate(target);
     if (CopySidecar(source, *dataset, strict) != CE_None) return nullptr;
-    dataset->FlushCache(false);
+    SaveSidecar(*dataset, target);
     made.Keep();
     return dataset.release();
 }

@@ -6,6 +6,8 @@
 #include <string>
 
 #include "gdal/Dataset.h"
+#include "gdal/ErrorCatcher.h"
+#include "host/base/Error.h"
 
 namespace zmcgdal {
 namespace {
@@ -39,6 +41,13 @@ void CopyInterpretation(GDALDataset& source, Dataset& target) {
     }
 }
 
+// To GDAL a sidecar that was cut off is worth a warning, and its flush answers nothing before 3.7.
+void Save(GDALDataset& dataset, const std::string& name, const std::string& operation) {
+    const ErrorCatcher errors(CE_Warning);
+    dataset.FlushCache(false);
+    if (!errors.Text().empty()) throw zmchost::Error(name, operation, errors.Text());
+}
+
 }  // namespace
 
 CPLStringList WithoutStatistics(CSLConstList items) {
@@ -61,6 +70,14 @@ CPLErr CopySidecar(GDALDataset& source, Dataset& target, bool strict) {
                           (maskFlags & (GMF_ALPHA | GMF_NODATA | GMF_ALL_VALID)) == 0;
     if (!maskFile) return CE_None;
     return GDALDriver::DefaultCopyMasks(&source, &target, strict ? TRUE : FALSE);
+}
+
+void SaveSidecar(Dataset& dataset, const std::string& name) {
+    Save(dataset, name, "keep its metadata in " + name + kSidecarEnding);
+    GDALRasterBand& first = *dataset.GetRasterBand(1);
+    if ((first.GetMaskFlags() & GMF_PER_DATASET) == 0) return;
+    if (GDALDataset* const mask = first.GetMaskBand()->GetDataset())
+        Save(*mask, name, "keep its mask in " + name + kMaskEnding);
 }
 
 }  // namespace zmcgdal
