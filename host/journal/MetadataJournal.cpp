@@ -170,8 +170,7 @@ struct Copy {
 // Nothing of it is read before it is known whose it is and how long it may be. Throws Error.
 Copy ReadCopy(const FileLock& lock, const Target& target) {
     const platform::FileStatus status = lock.Status();
-    if (!target.Trusts(status))
-        return {{}, "it belongs to a user who does not own the file"};
+    if (!target.Trusts(status)) return {{}, "it belongs to a user who does not own the file"};
     if (status.size > JournalRecord::kMaxBytes) return {{}, "it is longer than any copy"};
     std::string bytes(JournalRecord::kHeadBytes, '\0');
     bytes.resize(lock.ReadAt(0, bytes.data(), bytes.size()));
@@ -227,18 +226,18 @@ std::string MetadataJournal::PathFor(const std::string& file) {
 }
 
 Recovery RecoverMetadata(const std::string& file) {
-    return WithCopy(file, FileLock::Kind::Alone,
-                    [](const Target& target, const std::string& copy,
-                       const JournalRecord& record) -> Recovery {
-                        const Outcome outcome = LeftOver(target, record).Settle(copy);
-                        if (outcome == Outcome::Restored)
-                            return {outcome,
-                                    "a store into it did not end; its metadata document is again "
-                                    "the one of before"};
-                        return {outcome,
-                                "a store into it did not end in good order; its metadata document "
-                                "is whole"};
-                    });
+    return WithCopy(
+        file, FileLock::Kind::Alone,
+        [](const Target& target, const std::string& copy, const JournalRecord& record) -> Recovery {
+            const Outcome outcome = LeftOver(target, record).Settle(copy);
+            if (outcome == Outcome::Restored)
+                return {outcome,
+                        "a store into it did not end; its metadata document is again "
+                        "the one of before"};
+            return {outcome,
+                    "a store into it did not end in good order; its metadata document "
+                    "is whole"};
+        });
 }
 
 Recovery LookForCopy(const std::string& file) {
