@@ -21,6 +21,9 @@ using zelm::files::OpenMode;
 
 const std::string kSidecar = ".aux.xml";
 const std::string kMask = ".msk";
+const std::string kLock = ".lock";
+// Of a file that is to become the lock.
+const std::string kLockKind = "zmclock";
 // Of a pyramid that has none; GDAL reads it as one that says nothing.
 constexpr std::string_view kNothing = "<PAMDataset />\n";
 
@@ -64,7 +67,7 @@ void SettleMask(const std::string& name, const std::string& base) {
     Rename(name, linked ? second : base + kMask, name + kMask);
 }
 
-void SettleBase(const std::string& name, const std::string& base) {
+void SettleFiles(const std::string& name, const std::string& base) {
     SettleMask(name, base);
     if (SaysNothing(base + kSidecar)) {
         Remove(name, name + kSidecar);
@@ -74,6 +77,12 @@ void SettleBase(const std::string& name, const std::string& base) {
     }
     Remove(name, base + kMask);
     platform::SyncFolder(platform::FolderOf(name));
+}
+
+// Somebody else who met them may have done it.
+void SettleBase(const std::string& name, const std::string& base) {
+    if (IsFile(base + kSidecar)) SettleFiles(name, base);
+    Remove(name, base + kLock);
 }
 
 // The staged base of the file that the name leads to; empty if it is no pyramid.
@@ -97,7 +106,7 @@ void RemoveLeftOver(const std::string& name) {
         const std::string end = entry.substr(prefix.size());
         const std::string base = prefix + end.substr(0, end.find('.'));
         FileLock lock;
-        const FileLock::Result taken = lock.Take(platform::JoinPath(folder, base + kSidecar));
+        const FileLock::Result taken = lock.Take(platform::JoinPath(folder, base + kLock));
         if (taken == FileLock::Result::Taken || taken == FileLock::Result::Missing)
             platform::RemoveEntry(platform::JoinPath(folder, entry));
     }
@@ -126,8 +135,9 @@ void SettleSidecar(const std::string& name, const ByteSource& source,
 
 SidecarStage::SidecarStage(std::string targetName) : target(std::move(targetName)) {
     const std::string present = BaseOfFile(target);
-    if (!present.empty() && IsFile(present + kSidecar)) SettleBase(target, present);
+    if (!present.empty()) SettleBase(target, present);
     RemoveLeftOver(target);
+    zmchost::SideFile::RemoveStale(target, kLockKind);
 }
 
 SidecarStage::~SidecarStage() {
@@ -137,7 +147,7 @@ SidecarStage::~SidecarStage() {
         if (platform::StatusOf(target).number == number)
             SettleBase(target, base);
         else
-            for (const std::string& ending : {kSidecar, kMask})
+            for (const std::string& ending : {kSidecar, kMask, kLock})
                 platform::RemoveEntry(base + ending);
     } catch (...) {
         // Staged companions are found by whoever opens the file.
@@ -149,7 +159,18 @@ std::string SidecarStage::Begin(const std::string& finished) {
     if (!source) Fail(target, platform::LastErrorText());
     number = source->Identify().number;
     base = BaseFor(target, number, zmchost::PyramidHeader::Read(*source, finished).tileDataEnd);
+    Lock();
     return base;
+}
+
+// By the time that the lock has its name it is held.
+void SidecarStage::Lock() {
+    const std::string made = zmchost::SideFile::MakeTemporary(target, kLockKind, lock);
+    if (made.empty()) Fail(target, platform::LastErrorText());
+    if (platform::RenameFile(made, base + kLock)) return;
+    const std::string reason = platform::LastErrorText();
+    platform::RemoveEntry(made);
+    Fail(target, reason);
 }
 
 void SidecarStage::Complete() {
@@ -161,7 +182,6 @@ void SidecarStage::Complete() {
         if (!none || none->WriteAt(0, kNothing.data(), kNothing.size(), &error) != kNothing.size())
             Fail(target, platform::ErrorText(error));
     }
-    if (lock.Take(sidecar) == FileLock::Result::Missing) Fail(target, "another build removed it");
     for (const std::string& ending : {kSidecar, kMask}) {
         if (!IsFile(base + ending)) continue;
         TakeRights(target, ending, base + ending);

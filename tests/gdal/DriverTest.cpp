@@ -21,6 +21,7 @@
 
 #include "gdal/Options.h"
 #include "gdal/SampleType.h"
+#include "gdal/SidecarStage.h"
 #include "gdal/VsiSource.h"
 #include "host/file/PyramidHeader.h"
 #include "host/journal/MetadataJournal.h"
@@ -388,6 +389,60 @@ TEST_F(DriverTest, StagedSidecarOfThisFileIsSeenAndGetsItsNameForUpdate) {
     EXPECT_EQ(unitOf(GDAL_OF_READONLY), "");
     EXPECT_EQ(unitOf(GDAL_OF_UPDATE), "");
     EXPECT_FALSE(fs::exists(usual));
+}
+
+std::set<std::string> NamesIn(const fs::path& folder) {
+    std::set<std::string> names;
+    for (const auto& entry : fs::directory_iterator(folder)) names.insert(entry.path().filename());
+    return names;
+}
+
+// To copy a mask takes minutes, and nothing tells of them but a lock.
+TEST_F(DriverTest, CompanionsThatAreBeingWrittenAreNotLeftOver) {
+    const std::string finished = MakeCopy(*Memory(20, 10, 1, GDT_Byte), "finished.pyr");
+    const std::string target = Path("made.pyr");
+    SidecarStage first(target);
+    const std::string base = first.Begin(finished);
+    for (const char* const ending : {".msk", ".aux.xml"}) {
+        zmctest::WriteText(base + ending, ending);
+        const SidecarStage second(target);
+        EXPECT_EQ(zmctest::ReadText(base + ending), ending);
+    }
+    EXPECT_EQ(zmctest::ReadText(base + ".msk"), ".msk");
+    first.Complete();
+    fs::rename(finished, target);
+    first.Settle();
+    EXPECT_EQ(NamesIn(folder),
+              (std::set<std::string>{"made.pyr", "made.pyr.aux.xml", "made.pyr.msk"}));
+    EXPECT_EQ(zmctest::ReadText(target + ".aux.xml"), ".aux.xml");
+    EXPECT_EQ(zmctest::ReadText(target + ".msk"), ".msk");
+}
+
+TEST_F(DriverTest, CompanionsOfABuildThatFailedGo) {
+    const std::string finished = MakeCopy(*Memory(20, 10, 1, GDT_Byte), "finished.pyr");
+    {
+        SidecarStage stage(Path("made.pyr"));
+        const std::string base = stage.Begin(finished);
+        for (const char* const ending : {".msk", ".aux.xml"})
+            zmctest::WriteText(base + ending, ending);
+    }
+    EXPECT_EQ(NamesIn(folder), std::set<std::string>{"finished.pyr"});
+}
+
+TEST_F(DriverTest, CompanionsOfABuildThatWasEndedGoWithTheNextOne) {
+    const std::string finished = MakeCopy(*Memory(20, 10, 1, GDT_Byte), "finished.pyr");
+    const pid_t child = fork();
+    if (child == 0) {
+        SidecarStage stage(Path("made.pyr"));
+        const std::string base = stage.Begin(finished);
+        for (const char* const ending : {".msk", ".aux.xml"})
+            zmctest::WriteText(base + ending, ending);
+        _exit(0);
+    }
+    waitpid(child, nullptr, 0);
+    EXPECT_GT(NamesIn(folder).size(), 2u);
+    const SidecarStage next(Path("made.pyr"));
+    EXPECT_EQ(NamesIn(folder), std::set<std::string>{"finished.pyr"});
 }
 
 // Opening a pipe would wait for its other end.
