@@ -219,7 +219,14 @@ CPLErr Band::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, voi
                        int bufferWidth, int bufferHeight, GDALDataType bufferType,
                        GSpacing pixelSpace, GSpacing lineSpace, GDALRasterIOExtraArg* extra) {
     return Reporting<CPLErr>(CE_Failure, [&]() -> CPLErr {
-        if (mode == GF_Read && bufferWidth < width && bufferHeight < height) {
+        const bool reduced = mode == GF_Read && bufferWidth < width && bufferHeight < height;
+        if (reduced && !owner.Overviews().empty()) {
+            Dataset::Shown shown(x, y, width, height, *extra);
+            if (Dataset* const coarser = owner.CoarserFor(shown, bufferWidth, bufferHeight))
+                return coarser->BandOf(nBand)->RasterIO(
+                    mode, shown.x, shown.y, shown.width, shown.height, data, bufferWidth,
+                    bufferHeight, bufferType, pixelSpace, lineSpace, &shown.extra);
+        } else if (reduced) {
             int tried = FALSE;
             const CPLErr result =
                 TryOverviewRasterIO(mode, x, y, width, height, data, bufferWidth, bufferHeight,

@@ -238,15 +238,29 @@ CPLErr Dataset::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, 
     });
 }
 
+// GDAL chooses by what a band says of its levels, and the last band is there in all of them.
+Dataset* Dataset::CoarserFor(Shown& shown, int bufferWidth, int bufferHeight) {
+    const int chosen = GDALBandGetBestOverviewLevel2(GetRasterBand(GetRasterCount()), shown.x,
+                                                     shown.y, shown.width, shown.height,
+                                                     bufferWidth, bufferHeight, &shown.extra);
+    return chosen < 0 ? nullptr : Overviews()[static_cast<std::size_t>(chosen)].get();
+}
+
 CPLErr Dataset::ReadOrWrite(GDALRWFlag mode, int x, int y, int width, int height, void* data,
                             int bufferWidth, int bufferHeight, GDALDataType bufferType,
                             int bandCount, int* bandMap, GSpacing pixelSpace, GSpacing lineSpace,
                             GSpacing bandSpace, GDALRasterIOExtraArg* extra) {
-    if (mode == GF_Read && bufferWidth < width && bufferHeight < height) {
+    const bool reduced = mode == GF_Read && bufferWidth < width && bufferHeight < height;
+    if (reduced && !Overviews().empty()) {
+        Shown shown(x, y, width, height, *extra);
+        if (Dataset* const coarser = CoarserFor(shown, bufferWidth, bufferHeight)) {
+            for (int i = 0; i < bandCount; ++i) coarser->BandOf(bandMap[i]);
+            return coarser->RasterIO(mode, shown.x, shown.y, shown.width, shown.height, data,
+                                     bufferWidth, bufferHeight, bufferType, bandCount, bandMap,
+                                     pixelSpace, lineSpace, bandSpace, &shown.extra);
+        }
+    } else if (reduced) {
         int tried = FALSE;
-        // GDAL takes the bands from the level as a dataset of its own.
-        for (const auto& overview : Overviews())
-            for (int i = 0; i < bandCount; ++i) overview->BandOf(bandMap[i]);
         const CPLErr result = TryOverviewRasterIO(mode, x, y, width, height, data, bufferWidth,
                                                   bufferHeight, bufferType, bandCount, bandMap,
                                                   pixelSpace, lineSpace, bandSpace, extra, &tried);

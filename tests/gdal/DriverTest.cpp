@@ -445,6 +445,45 @@ TEST_F(DriverTest, CompanionsOfABuildThatWasEndedGoWithTheNextOne) {
     EXPECT_EQ(NamesIn(folder), std::set<std::string>{"finished.pyr"});
 }
 
+// The numbers of the bands that a level has made.
+std::set<int> BandsMade(GDALDataset& level) {
+    std::set<int> made;
+    for (int number = 1; number <= level.GetRasterCount(); ++number)
+        if (level.GetRasterBand(number)) made.insert(number);
+    return made;
+}
+
+TEST_F(DriverTest, ReducedWindowsMakeTheirBandsInTheLevelAloneThatTheyAreReadFrom) {
+    constexpr int kBands = 1025;
+    const char* const options[] = {"LEVELS=3", "STATISTICS=NO", nullptr};
+    const std::string name = Path("a.pyr");
+    ASSERT_TRUE(
+        DatasetPtr(Driver().CreateCopy(name.c_str(), Memory(64, 32, kBands, GDT_Byte).get(), FALSE,
+                                       const_cast<char**>(options), nullptr, nullptr)));
+    const DatasetPtr dataset = Open(name);
+    ASSERT_TRUE(dataset);
+    int bands[] = {3, 700, 20};
+    std::vector<unsigned char> together(16 * 8 * 3), apart(16 * 8 * 3);
+    const auto read = [](auto& from, unsigned char* out, auto... rest) {
+        return from.RasterIO(GF_Read, 0, 0, 64, 32, out, 16, 8, GDT_Byte, rest..., nullptr);
+    };
+    EXPECT_EQ(read(*dataset, together.data(), 3, bands, 0, 0, 0), CE_None);
+    GDALRasterBand& last = *dataset->GetRasterBand(kBands);
+    ASSERT_EQ(last.GetOverviewCount(), 3);
+    const auto made = [&](int level) { return BandsMade(*last.GetOverview(level)->GetDataset()); };
+    EXPECT_EQ(made(0), (std::set<int>{kBands}));
+    EXPECT_EQ(made(1), (std::set<int>{3, 20, 700, kBands}));
+    EXPECT_EQ(made(2), (std::set<int>{kBands}));
+    bands[1] = 800;
+    for (int i = 0; i < 3; ++i)
+        EXPECT_EQ(read(*dataset->GetRasterBand(bands[i]), apart.data() + i * 16 * 8, 0, 0),
+                  CE_None);
+    EXPECT_EQ(made(0), (std::set<int>{kBands}));
+    EXPECT_EQ(made(1), (std::set<int>{3, 20, 700, 800, kBands}));
+    EXPECT_EQ(read(*dataset, together.data(), 3, bands, 0, 0, 0), CE_None);
+    EXPECT_EQ(together, apart);
+}
+
 // Opening a pipe would wait for its other end.
 TEST_F(DriverTest, PipesBesideARasterAreNotOpened) {
     const std::string name = MakeCopy(*Memory(20, 10, 1, GDT_Byte));
