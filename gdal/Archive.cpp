@@ -91,8 +91,8 @@ bool StoredStatistics::IsFull() const {
     return (flags & kNeeded) == kNeeded;
 }
 
-Archive::Archive(LazyRaster& pyramid, bool hasDocument)
-    : raster(pyramid), documentExists(hasDocument) {}
+Archive::Archive(LazyRaster& pyramid, bool hasDocument, std::uint64_t elementLimit)
+    : raster(pyramid), documentExists(hasDocument), mostElements(elementLimit) {}
 
 const StoredStatistics* Archive::Statistics(std::uint32_t band) {
     if (!RemembersStatistics(band)) FetchStatistics(band);
@@ -181,9 +181,8 @@ bool Archive::Store(Setter&& setter) {
 
 void Archive::CheckElements() {
     if (!elements) elements = documentExists ? raster.Get().DocumentElements() : 0;
-    const std::string wrong =
-        zmchost::Limits::Judge("elements", *elements, zmchost::Limits::Current().elements,
-                               "it has " + std::to_string(*elements) + " elements");
+    const std::string wrong = zmchost::Limits::Judge(
+        "elements", *elements, mostElements, "it has " + std::to_string(*elements) + " elements");
     if (!wrong.empty())
         throw zmchost::Error(raster.Name(), "store into its metadata document", wrong);
 }

@@ -11,7 +11,6 @@
 #include "gdal/Reporting.h"
 #include "gdal/SidecarStage.h"
 #include "gdal/VsiSource.h"
-#include "host/file/Limits.h"
 #include "host/raster/LentFile.h"
 #include "platform/FileSystem.h"
 
@@ -73,16 +72,15 @@ OpenFile::OpenFile(const std::string& fileName, GDALAccess access, const OpenOpt
       info(CheckedInfo(fileName, zmchost::PyramidHeader::Read(*source, fileName))),
       raster(fileName, source, info.header, options.keepCopies),
       tiles(raster, info, GdalTypeOf(info.header.pixelType, options.signedByteAs)),
-      archive(raster, info.HasMetadataDocument()) {}
+      archive(raster, info.HasMetadataDocument(), limits.elements) {}
 
 void OpenFile::CheckTile(std::uint32_t level, std::uint32_t bands, const char* operation) const {
     const zelm::LevelGeometry grid = info.header.Geometry(level);
     const std::uint64_t bytes = std::uint64_t{std::min(grid.tileSize, grid.samples)} *
                                 std::min(grid.tileSize, grid.lines) * bands *
                                 zelm::PixelSize(info.header.pixelType);
-    const std::string wrong =
-        zmchost::Limits::Judge("tile", bytes, zmchost::Limits::Current().tile,
-                               "its tiles have " + std::to_string(bytes) + " bytes");
+    const std::string wrong = zmchost::Limits::Judge(
+        "tile", bytes, limits.tile, "its tiles have " + std::to_string(bytes) + " bytes");
     if (!wrong.empty()) throw zmchost::Error(raster.Name(), operation, wrong);
 }
 

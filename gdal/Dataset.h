@@ -19,6 +19,7 @@
 #include "gdal/LazyRaster.h"
 #include "gdal/Options.h"
 #include "gdal/TileReader.h"
+#include "host/file/Limits.h"
 #include "host/file/PyramidFileInfo.h"
 
 namespace zmcgdal {
@@ -38,6 +39,7 @@ public:
 
     const std::shared_ptr<zelm::files::ByteSource> source;
     const zmchost::PyramidFileInfo info;
+    const zmchost::Limits limits = zmchost::Limits::Current();
     LazyRaster raster;
     TileReader tiles;
     Archive archive;

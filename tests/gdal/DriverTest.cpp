@@ -23,6 +23,7 @@
 #include "gdal/SampleType.h"
 #include "gdal/SidecarStage.h"
 #include "gdal/VsiSource.h"
+#include "host/file/Limits.h"
 #include "host/file/PyramidHeader.h"
 #include "host/journal/MetadataJournal.h"
 #include "tests/support/LenientHeaders.h"
@@ -443,6 +444,47 @@ TEST_F(DriverTest, CompanionsOfABuildThatWasEndedGoWithTheNextOne) {
     EXPECT_GT(NamesIn(folder).size(), 2u);
     const SidecarStage next(Path("made.pyr"));
     EXPECT_EQ(NamesIn(folder), std::set<std::string>{"finished.pyr"});
+}
+
+// Changes a limit until the end of a test.
+class LimitsChanged {
+public:
+    explicit LimitsChanged(const char* text) { zmchost::Limits::Change(text); }
+    ~LimitsChanged() {
+        zmchost::Limits::Change("tile=" + std::to_string(before.tile) +
+                                ",elements=" + std::to_string(before.elements));
+    }
+    LimitsChanged(const LimitsChanged&) = delete;
+    LimitsChanged& operator=(const LimitsChanged&) = delete;
+
+private:
+    const zmchost::Limits before = zmchost::Limits::Current();
+};
+
+// Writes a block and stores statistics; how many of the two came to be.
+int Updates(GDALDataset& dataset) {
+    GDALRasterBand& band = *dataset.GetRasterBand(1);
+    std::vector<unsigned char> block(256 * 256);
+    CPLPushErrorHandler(CPLQuietErrorHandler);
+    const bool written = band.WriteBlock(0, 0, block.data()) == CE_None;
+    const bool stored = band.SetStatistics(0, 0, 0, 0) == CE_None;
+    CPLPopErrorHandler();
+    return written + stored;
+}
+
+TEST_F(DriverTest, WhatIsOpenKeepsToTheLimitsThatItWasOpenedBy) {
+    const std::string name = MakeCopy(*Memory(256, 256, 1, GDT_Byte));
+    const unsigned update = GDAL_OF_RASTER | GDAL_OF_UPDATE;
+    const DatasetPtr before = Open(name, update);
+    {
+        const LimitsChanged lowered("tile=1000,elements=1");
+        EXPECT_EQ(Updates(*before), 2);
+        const DatasetPtr under = Open(name, update);
+        EXPECT_EQ(Updates(*under), 0);
+        const LimitsChanged raised("tile=100000,elements=1000");
+        EXPECT_EQ(Updates(*under), 0);
+    }
+    EXPECT_EQ(Updates(*before), 2);
 }
 
 // The numbers of the bands that a level has made.
