@@ -190,8 +190,7 @@ void Band::WaitingBlock::Settle() const {
 void Band::DropSidecarStatistics() {
     if (owner.IsOverview()) return;
     char** const items = GDALPamRasterBand::GetMetadata("");
-    CPLStringList kept = WithoutStatistics(items);
-    if (kept.Count() != CSLCount(items)) GDALPamRasterBand::SetMetadata(kept.List(), "");
+    if (HasStatistics(items)) GDALPamRasterBand::SetMetadata(WithoutStatistics(items).List(), "");
 }
 
 CPLErr Band::IWriteBlock(int blockX, int blockY, void* data) {

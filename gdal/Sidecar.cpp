@@ -20,6 +20,8 @@ bool DescribesTheFile(const char* domain) {
                        [&](const char* name) { return EQUAL(domain, name); });
 }
 
+bool IsStatistic(const char* item) { return STARTS_WITH_CI(item, "STATISTICS_"); }
+
 void CopyMetadata(GDALMajorObject& source, GDALMajorObject& target) {
     CPLStringList domains(source.GetMetadataDomainList());
     if (domains.FindString("") < 0) domains.AddString("");
@@ -50,10 +52,16 @@ void Save(GDALDataset& dataset, const std::string& name, const std::string& oper
 
 }  // namespace
 
+bool HasStatistics(CSLConstList items) {
+    for (; items && *items; ++items)
+        if (IsStatistic(*items)) return true;
+    return false;
+}
+
 CPLStringList WithoutStatistics(CSLConstList items) {
     CPLStringList kept;
     for (; items && *items; ++items)
-        if (!STARTS_WITH_CI(*items, "STATISTICS_")) kept.AddString(*items);
+        if (!IsStatistic(*items)) kept.AddString(*items);
     return kept;
 }
 

@@ -26,7 +26,8 @@ CPLErr CopySidecar(GDALDataset& source, Dataset& target, bool strict);
 // could not save all of it; what there is of it by then is anything.
 void SaveSidecar(Dataset& dataset, const std::string& name);
 
-// The items of a metadata domain that are no statistics.
+// Whether a metadata domain has statistics, and its items that are none.
+bool HasStatistics(CSLConstList items);
 CPLStringList WithoutStatistics(CSLConstList items);
 
 }  // namespace zmcgdal
