@@ -169,10 +169,12 @@ void Dataset::LoadSidecar(const char* fileName, char** siblings) {
     SetDescription(fileName);
     std::string base = fileName;
     if (!IsVirtualName(base)) {
-        if (eAccess == GA_Update) SettleSidecar(base, *file->source, file->info.header);
-        base = SidecarBase(base, *file->source, file->info.header);
+        if (eAccess == GA_Update)
+            SettleSidecar(base, *file->source, file->info.header);
+        else
+            base = SidecarBase(base, *file->source, file->info.header);
+        if (HasPipesBeside(base)) return IgnoreCompanions();
     }
-    if (HasPipesBeside(base)) return IgnoreCompanions();
     const bool staged = base != fileName;
     if (staged) SetPhysicalFilename(base.c_str());
     TryLoadXML(staged ? nullptr : siblings);
