@@ -9,6 +9,7 @@
 #include "gdal/Create.h"
 #include "gdal/LevelRefresh.h"
 #include "gdal/Reporting.h"
+#include "gdal/Sidecar.h"
 #include "gdal/SidecarStage.h"
 #include "gdal/VsiSource.h"
 #include "host/raster/LentFile.h"
@@ -44,7 +45,7 @@ zmchost::PyramidFileInfo CheckedInfo(const std::string& fileName,
 // What is neither a file nor a folder where GDAL looks for companions of a file: to open a pipe is
 // to wait for its other end.
 bool HasPipesBeside(const std::string& base) {
-    for (const char* const ending : {".aux.xml", ".msk", ".ovr"}) {
+    for (const char* const ending : {kSidecarEnding, kMaskEnding, kOverviewsEnding}) {
         const platform::FileStatus status = platform::StatusOf(base + ending);
         if (!status.exists || status.isRegular || status.isFolder) continue;
         CPLError(CE_Warning, CPLE_AppDefined,
