@@ -79,10 +79,11 @@ private:
     // after a warning, if what was seen, or was not, may be something else the next time.
     template <class Look>
     bool LookAtRecords(Look&& look) const;
-    void FetchStatistics(std::uint32_t band);
-    void FetchHistogram(std::uint32_t band, std::uint32_t level);
+    // What is remembered under a key; at first what look(zmchost::StoredRecords<T>) finds, which is
+    // remembered where it will be the same the next time. Null where there is none.
+    template <class Map, class Look>
+    auto* Recall(Map& known, const typename Map::key_type& key, Look&& look);
     void CheckElements();
-    void FetchColorTable(std::uint32_t band);
 };
 
 }  // namespace zmcgdal
