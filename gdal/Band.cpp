@@ -103,20 +103,11 @@ std::size_t Band::BlockNumber(int blockX, int blockY) const {
 
 // Blocks that nobody wrote hold the no-data value, to its last digit, or zeros.
 void Band::FillUnwritten(void* samples, std::size_t stride, std::size_t count) {
-    const auto fill = [&](auto value, GDALDataType type) {
-        GDALCopyWords64(&value, type, 0, samples, eDataType, static_cast<int>(stride),
+    VisitNoData(*this, [&](auto noData, GDALDataType form) {
+        const auto value = noData.value_or(0);
+        GDALCopyWords64(&value, form, 0, samples, eDataType, static_cast<int>(stride),
                         static_cast<GPtrDiff_t>(count));
-    };
-    int has = FALSE;
-    if (eDataType == GDT_Int64) {
-        const std::int64_t value = GetNoDataValueAsInt64(&has);
-        fill(has ? value : 0, GDT_Int64);
-    } else if (eDataType == GDT_UInt64) {
-        const std::uint64_t value = GetNoDataValueAsUInt64(&has);
-        fill(has ? value : 0, GDT_UInt64);
-    } else {
-        fill(NoDataAsDouble(*this).value_or(0.0), GDT_Float64);
-    }
+    });
 }
 
 // Copies the part of a padded block that lies in the tile, at `stride` bytes per pixel.
