@@ -3,11 +3,11 @@
 
 #include <gtest/gtest.h>
 
-#include <chrono>
 #include <string>
 
 #include <xercesc/sax/SAXParseException.hpp>
 
+#include "tests/support/ProcessorTime.h"
 #include "tests/support/XercesEnvironment.h"
 
 namespace zmctest {
@@ -105,10 +105,9 @@ TEST(GuardText, EbcdicIsLookedThroughToo) {
 TEST(ParseDocumentText, MillionsOfAttributesAreRefusedAtOnce) {
     std::string text = "<a";
     for (int i = 0; i < 2'000'000; ++i) text += " b" + std::to_string(i) + "='1'";
-    const auto start = std::chrono::steady_clock::now();
+    const ProcessorTime time;
     EXPECT_NE(FaultOf(text + "/>").find("attributes"), std::string::npos);
-    const std::chrono::duration<double> took = std::chrono::steady_clock::now() - start;
-    EXPECT_LT(took.count(), 1.0);
+    EXPECT_LT(time.Seconds(), 5);
 }
 
 }  // namespace

@@ -9,7 +9,6 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include <cstdlib>
 #include <cstring>
 #include <filesystem>
 #include <fstream>
@@ -26,6 +25,7 @@
 #include "host/file/Limits.h"
 #include "host/file/PyramidHeader.h"
 #include "host/journal/MetadataJournal.h"
+#include "tests/gdal/GdalTest.h"
 #include "tests/support/LenientHeaders.h"
 #include "tests/support/ParseCounter.h"
 #include "tests/support/ScratchDirectory.h"
@@ -34,33 +34,11 @@ namespace zmcgdal {
 namespace {
 
 namespace fs = std::filesystem;
-using DatasetPtr = std::unique_ptr<GDALDataset>;
+using zmctest::DatasetPtr;
 
-class DriverTest : public testing::Test {
+class DriverTest : public zmctest::GdalTest {
 protected:
-    fs::path folder;
-
-    static void SetUpTestSuite() {
-        setenv("ZMCRASTER_MODULE", ZMC_MODULE_PATH, 1);
-        GDALRegister_ZMCPyramid();
-        GDALAllRegister();
-    }
-    void SetUp() override {
-        folder =
-            fs::path(testing::TempDir()) / ("zmcgdal" + std::to_string(std::random_device()()));
-        fs::create_directories(folder);
-    }
-    void TearDown() override { fs::remove_all(folder); }
-
-    std::string Path(const char* name) const { return folder / name; }
-
-    static GDALDriver& Driver(const char* name = "ZMCPyramid") {
-        return *GetGDALDriverManager()->GetDriverByName(name);
-    }
-
-    static DatasetPtr Open(const std::string& name, unsigned flags = GDAL_OF_RASTER) {
-        return DatasetPtr(GDALDataset::Open(name.c_str(), flags));
-    }
+    std::string Path(const char* file) const { return folder / file; }
 
     // Random bytes in memory; floating types get what the bytes happen to mean.
     static DatasetPtr Memory(int width, int height, int bands, GDALDataType type) {
@@ -318,7 +296,7 @@ TEST_F(DriverTest, CancelledCopiesLeaveNothing) {
         const DatasetPtr made(Driver().CreateCopy(Path("gone.pyr").c_str(), source.get(), TRUE,
                                                   nullptr, progress, &limit));
         EXPECT_FALSE(made);
-        EXPECT_TRUE(fs::is_empty(folder));
+        EXPECT_TRUE(fs::is_empty(folder.String()));
     }
     CPLPopErrorHandler();
 }

@@ -245,6 +245,24 @@ TEST_F(MetadataJournalTest, DamagedDocumentIsPutBack) {
     }
 }
 
+TEST_F(MetadataJournalTest, WhoOpensForReadingLeavesACopyAndTheDamageAsTheyAre) {
+    LeaveCopy();
+    const std::string damaged = before.substr(0, front) + "\x1A" + std::string(500, 'x');
+    zmctest::WriteText(file, damaged);
+    const std::string left = zmctest::ReadText(copy);
+    {
+        Raster raster = Raster::Open(TestModule(), file, Access::Read);
+        EXPECT_NE(raster.RecoveryNote(), "");
+        EXPECT_EQ(raster.Read<Pixel>(0, {0, 0, 20, 10}), std::vector<Pixel>(200, 7));
+        EXPECT_NE(FailureOf([&] { Store(std::move(raster), true); }), "no failure");
+    }
+    EXPECT_EQ(zmctest::ReadText(file), damaged);
+    EXPECT_EQ(zmctest::ReadText(copy), left);
+    EXPECT_THAT(Names(), testing::ElementsAre("a.pyr", "a.pyr.zmcmeta"));
+    Open();
+    EXPECT_EQ(zmctest::ReadText(file), before) << "who opens for writing puts it in order";
+}
+
 TEST_F(MetadataJournalTest, RecoveryThatIsKilledIsRepeated) {
     for (const auto how : {FileFaultAction::Kill, FileFaultAction::KillPartway})
         for (std::size_t n = 1;; ++n) {
