@@ -85,6 +85,10 @@ void OpenFile::CheckTile(std::uint32_t level, std::uint32_t bands, const char* o
     if (!wrong.empty()) throw zmchost::Error(raster.Name(), operation, wrong);
 }
 
+void OpenFile::CheckBlock(std::uint32_t level) const {
+    CheckTile(level, tiles.IsPixelInterleaved() ? info.header.bandCount : 1, "write a block");
+}
+
 Dataset::Dataset(std::shared_ptr<OpenFile> openFile, std::uint32_t levelShown, GDALAccess access,
                  Dataset* mainDataset)
     : file(std::move(openFile)), level(levelShown), main(mainDataset) {
@@ -251,6 +255,7 @@ CPLErr Dataset::ReadOrWrite(GDALRWFlag mode, int x, int y, int width, int height
                             int bufferWidth, int bufferHeight, GDALDataType bufferType,
                             int bandCount, int* bandMap, GSpacing pixelSpace, GSpacing lineSpace,
                             GSpacing bandSpace, GDALRasterIOExtraArg* extra) {
+    if (mode == GF_Write) file->CheckBlock(level);
     const bool reduced = mode == GF_Read && bufferWidth < width && bufferHeight < height;
     if (reduced && !Overviews().empty()) {
         Shown shown(x, y, width, height, *extra);

@@ -370,9 +370,10 @@ TEST_F(DriverTest, StagedSidecarOfThisFileIsSeenAndGetsItsNameForUpdate) {
     EXPECT_FALSE(fs::exists(usual));
 }
 
-std::set<std::string> NamesIn(const fs::path& folder) {
+std::set<std::string> NamesIn(const zmctest::ScratchDirectory& folder) {
     std::set<std::string> names;
-    for (const auto& entry : fs::directory_iterator(folder)) names.insert(entry.path().filename());
+    for (const auto& entry : fs::directory_iterator(folder.String()))
+        names.insert(entry.path().filename());
     return names;
 }
 
@@ -463,6 +464,21 @@ TEST_F(DriverTest, WhatIsOpenKeepsToTheLimitsThatItWasOpenedBy) {
         EXPECT_EQ(Updates(*under), 0);
     }
     EXPECT_EQ(Updates(*before), 2);
+}
+
+// Else the whole of its tile would be read before it is refused.
+TEST_F(DriverTest, PixelOfATileBeyondTheLimitIsRefusedAtOnce) {
+    const std::string name = MakeCopy(*Memory(256, 256, 2, GDT_Byte));
+    const LimitsChanged lowered("tile=1000");
+    const DatasetPtr dataset = Open(name, GDAL_OF_RASTER | GDAL_OF_UPDATE);
+    unsigned char pixel[2] = {1, 2};
+    EXPECT_EQ(dataset->GetRasterBand(1)->RasterIO(GF_Write, 0, 0, 1, 1, pixel, 1, 1, GDT_Byte, 0, 0,
+                                                  nullptr),
+              CE_Failure);
+    EXPECT_EQ(dataset->RasterIO(GF_Write, 0, 0, 1, 1, pixel, 1, 1, GDT_Byte, 2, nullptr, 0, 0, 0,
+                                nullptr),
+              CE_Failure);
+    EXPECT_FALSE(dataset->GetRasterBand(1)->TryGetLockedBlockRef(0, 0)) << "its tile was read";
 }
 
 // The numbers of the bands that a level has made.
