@@ -22,8 +22,6 @@ namespace zmctools {
 namespace {
 
 constexpr std::uint64_t kStripBudget = std::uint64_t{32} << 20;
-// Of the files that builds write; those of others are read as well, if slower.
-constexpr std::uint32_t kTileRows = zelm::kWrittenTileSize;
 
 using zelm::files::Identity;
 
@@ -127,11 +125,6 @@ void TellRecovery(const std::string& name, const std::string& text) {
     if (!text.empty()) Warn(Visible(name) + ": warning: " + text);
 }
 
-std::uint64_t LineBytes(const RasterView& view, const Selection& selection) {
-    return std::uint64_t{selection.window.width} * selection.bands.size() *
-           zelm::PixelSize(view.PixelType());
-}
-
 }  // namespace
 
 void RasterView::CheckLevel(std::uint32_t level) const {
@@ -188,21 +181,19 @@ std::size_t StripBytes(const RasterView& view, const Selection& selection,
                                     selection.bands.size() * zelm::PixelSize(view.PixelType()));
 }
 
-void WalkStrips(RasterView& view, const Selection& selection, TerminalProgress& progress,
-                const std::function<void(const zmchost::Window& strip)>& take) {
-    view.CheckReadable();
-    const zmchost::Window& window = selection.window;
-    const std::uint64_t lineBytes = std::max<std::uint64_t>(LineBytes(view, selection), 1);
-    const std::uint64_t budget = BytesAtOnce(kStripBudget, view.TileSide());
-    const std::uint64_t lines = std::max<std::uint64_t>(budget / lineBytes, 1);
+void Strips::Walk(const std::string& name, TerminalProgress& progress,
+                  const std::function<void(const zmchost::Window& strip)>& take) const {
+    const auto atLeastOne = [](std::uint64_t count) { return std::max<std::uint64_t>(count, 1); };
+    const std::uint64_t pixels = BytesAtOnce(bytes, tileSide) / atLeastOne(pixelBytes);
+    const std::uint64_t lines = atLeastOne(pixels / atLeastOne(window.width));
     // Of a line that is longer.
-    const auto columns = static_cast<std::uint32_t>(std::clamp<std::uint64_t>(
-        std::uint64_t{window.width} * budget / lineBytes, 1, std::max(window.width, 1u)));
+    const auto columns =
+        static_cast<std::uint32_t>(std::clamp<std::uint64_t>(pixels, 1, atLeastOne(window.width)));
     const std::uint64_t total = std::uint64_t{window.width} * window.height;
     for (std::uint32_t done = 0; done < window.height;) {
         // Up to the end of a row of tiles, so that the next strip begins with one.
         std::uint64_t end = std::uint64_t{window.y} + done + lines;
-        const std::uint64_t aligned = end / kTileRows * kTileRows;
+        const std::uint64_t aligned = end / tileSide * tileSide;
         if (aligned > window.y + done) end = aligned;
         end = std::min<std::uint64_t>(end, std::uint64_t{window.y} + window.height);
         const auto height = static_cast<std::uint32_t>(end - window.y - done);
@@ -212,10 +203,18 @@ void WalkStrips(RasterView& view, const Selection& selection, TerminalProgress& 
             x += width;
             if (!progress.Show(std::uint64_t{done} * window.width + std::uint64_t{x} * height,
                                total))
-                throw Interruption(view.Name());
+                throw Interruption(name);
         }
         done += height;
     }
+}
+
+void WalkStrips(RasterView& view, const Selection& selection, TerminalProgress& progress,
+                const std::function<void(const zmchost::Window& strip)>& take) {
+    view.CheckReadable();
+    Strips{selection.window, selection.bands.size() * zelm::PixelSize(view.PixelType()),
+           kStripBudget, view.TileSide()}
+        .Walk(view.Name(), progress, take);
 }
 
 }  // namespace zmctools

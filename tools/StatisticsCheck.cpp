@@ -30,31 +30,28 @@ bool Near(double stored, double computed, double error) {
                std::numeric_limits<double>::denorm_min();
 }
 
-// Calls take(row, mask) for every line of level 0, with those bands.
+// Samples and masks that are held at once.
+constexpr std::uint64_t kStripBytes = std::uint64_t{48} << 20;
+
+// Calls take(row, mask, width) for every line of level 0, or the parts of each, with those bands.
 template <class T, class Take>
 void WalkLines(zmchost::Raster& raster, std::span<const std::uint32_t> bands, const char* label,
                bool quiet, Take&& take) {
-    const std::uint64_t lineBytes = std::uint64_t{raster.Width()} * bands.size() * (sizeof(T) + 1);
-    std::uint64_t lines = std::max<std::uint64_t>(
-        BytesAtOnce(std::uint64_t{48} << 20, raster.TileSide()) / lineBytes, 1);
-    if (lines >= raster.TileSide()) lines -= lines % raster.TileSide();
+    const Strips strips{{0, 0, raster.Width(), raster.Height()},
+                        bands.size() * (sizeof(T) + 1),
+                        kStripBytes,
+                        raster.TileSide()};
     TerminalProgress bar(label, !quiet);
     std::vector<T> pixels;
     std::vector<unsigned char> mask;
-    const std::size_t stride = std::size_t{raster.Width()} * bands.size();
-    for (std::uint32_t line = 0; line < raster.Height();) {
-        const auto height =
-            static_cast<std::uint32_t>(std::min<std::uint64_t>(lines, raster.Height() - line));
-        pixels.resize(stride * height);
-        mask.assign(stride * height, 0);
-        raster.Read(0, {0, line, raster.Width(), height}, bands, pixels.data(), mask.data());
-        for (std::uint32_t row = 0; row < height; ++row)
-            take(pixels.data() + row * stride, mask.data() + row * stride);
-        line += height;
-        if (!bar.Show(std::uint64_t{line} * raster.Width(),
-                      std::uint64_t{raster.Height()} * raster.Width()))
-            throw Interruption(raster.Name());
-    }
+    strips.Walk(raster.Name(), bar, [&](const zmchost::Window& strip) {
+        const std::size_t stride = std::size_t{strip.width} * bands.size();
+        pixels.resize(stride * strip.height);
+        mask.assign(stride * strip.height, 0);
+        raster.Read(0, strip, bands, pixels.data(), mask.data());
+        for (std::uint32_t row = 0; row < strip.height; ++row)
+            take(pixels.data() + row * stride, mask.data() + row * stride, strip.width);
+    });
 }
 
 template <class T>
@@ -97,9 +94,9 @@ private:
         const auto count = static_cast<std::uint32_t>(bands.size());
         std::vector<zmchost::BandAccumulator<T>> sums(count);
         WalkLines<T>(raster, bands, "statistics", quiet,
-                     [&](const T* row, const unsigned char* mask) {
+                     [&](const T* row, const unsigned char* mask, std::uint32_t width) {
                          for (std::uint32_t i = 0; i < count; ++i)
-                             sums[i].AddRow(row, mask, i, count, raster.Width());
+                             sums[i].AddRow(row, mask, i, count, width);
                      });
         for (std::uint32_t i = 0; i < count; ++i)
             Compare(raster.Statistics<T>(bands[i]), sums[i].Stats(bands[i]));
@@ -162,10 +159,10 @@ private:
             if (records.empty()) return;
             const auto bands = raster.AllBands();
             WalkLines<T>(raster, bands, "histograms", quiet,
-                         [&](const T* row, const unsigned char* mask) {
+                         [&](const T* row, const unsigned char* mask, std::uint32_t width) {
                              for (std::size_t i = 0; i < records.size(); ++i)
                                  counters[i].AddRow(row, mask, records[i]->band, raster.Bands(),
-                                                    raster.Width());
+                                                    width);
                          });
             for (std::size_t i = 0; i < records.size(); ++i) Compare(*records[i], counters[i]);
         } else {

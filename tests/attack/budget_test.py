@@ -138,6 +138,76 @@ class KnownFiles(AttackTest):
         self.assertHarmless(draft)
 
 
+@unittest.skipIf(attack.SANITIZED, "what commands with sanitizers cost is not judged")
+class Verification(AttackTest):
+    """Goes through all that a complete file claims, holes included, a part at a time."""
+
+    PARTS = 400 << 20  # bytes, of what is held at once
+
+    def memory(self, *arguments, status=0):
+        """Bytes beyond those that a small good file takes."""
+        cost = self.attacker.runner.run(attack.run_tool, ["verify", *arguments],
+                                        self.attacker.folder)
+        self.assertEqual((cost.status, cost.hung, cost.message), (status, False, ""))
+        return cost.memory - self.attacker.base["verify"].memory
+
+    def complete(self, draft, body=b""):
+        """Saves a file whose tiles are those bytes and a hole; its records stand behind that."""
+        records, draft.records, draft.body = draft.records, [], body
+        draft.save(self.file)
+        with open(self.file, "r+b") as file:
+            end = file.seek(0, os.SEEK_END) - len(body) + draft.tile_bytes()
+            file.truncate(end)
+            if records:
+                file.seek(end)
+                file.write(f"<DATASET>{''.join(records)}</DATASET>".encode())
+
+    def test_levels_with_large_tiles_of_many_bands(self):
+        self.complete(plain(PIXEL_WIDTH=2048, PIXEL_HEIGHT=2048, TILESIZE=2048, BANDS=24,
+                            LEVELMAX=1, PIXEL_TYPE="Double"))
+        self.assertLess(self.memory("x.pyr"), self.PARTS)
+
+    def test_statistics_of_a_long_line(self):
+        draft = plain(PIXEL_WIDTH=10**8, PIXEL_HEIGHT=1, PIXEL_TYPE="Double")
+        draft.records = [draft.statistics(0)]
+        self.complete(draft)
+        self.assertLess(self.memory("x.pyr", status=3), self.PARTS)
+
+    def test_a_histogram_of_a_long_line(self):
+        draft = plain(PIXEL_WIDTH=10**8, PIXEL_HEIGHT=1, PIXEL_TYPE="UInt32")
+        draft.records = [self.histogram(0, 10**8)]
+        self.complete(draft)
+        self.assertLess(self.memory("x.pyr"), self.PARTS)
+
+    def test_a_long_line_that_differs_from_its_source(self):
+        other = plain(PIXEL_WIDTH=10**8, PIXEL_HEIGHT=1)
+        self.complete(other)
+        os.rename(self.file, os.path.join(self.scratch.name, "zeros.pyr"))
+        self.complete(other, b"1")
+        self.assertLess(self.memory("x.pyr", "--against", "zeros.pyr", status=3), self.PARTS)
+
+    def test_histograms_of_more_bands_than_are_counted_at_once(self):
+        draft = plain(PIXEL_WIDTH=64, PIXEL_HEIGHT=64, TILESIZE=64, BANDS=400,
+                      BUILD_METHOD="Morton")
+        draft.records = [self.histogram(band, 64 * 64)
+                         for band in [*range(399, 99, -1), 250, 250]]
+        draft.records.append(self.histogram(399, 7))
+        self.complete(draft)
+        self.memory("x.pyr", status=3)
+        with open(os.path.join(self.attacker.folder, "stdout")) as output:
+            told = [line for line in output.read().splitlines() if line.startswith("  ")]
+        self.assertEqual(told, ["  band 400: 1 bins of the histogram differ from the pixels"])
+
+    @staticmethod
+    def histogram(band, zeros):
+        """Two bins, of the values 0 and 1; the second has counted nothing."""
+        return hostile.element("HISTOGRAMS", "".join((
+            hostile.element("HIST_BAND", band), hostile.element("HIST_LEVEL", 0),
+            hostile.element("HIST_BINCOUNT", 2), hostile.element("HIST_BINSIZE", 1),
+            hostile.element("HIST_MIN", 0), hostile.element("HIST_MAX", 1),
+            hostile.element("HIST_COUNTS", f"{zeros}|0"))))
+
+
 class HonestFiles(AttackTest):
     """Limits are for claims: what is large and there is let through."""
 
