@@ -1,7 +1,10 @@
 #include <algorithm>
 #include <cmath>
 #include <limits>
+#include <set>
 #include <span>
+#include <utility>
+#include <vector>
 
 #include "host/statistics/BandStatistics.h"
 #include "host/statistics/Histogram.h"
@@ -81,13 +84,17 @@ private:
     // Exact sums of reals take up to 200 kB for each band.
     static constexpr std::size_t kBandsAtOnce = 128;
 
+    template <class Check>
+    static void InGroups(std::span<const std::uint32_t> bands, Check&& check) {
+        for (std::size_t done = 0; done < bands.size(); done += kBandsAtOnce)
+            check(bands.subspan(done, std::min(kBandsAtOnce, bands.size() - done)));
+    }
+
     void CheckRecords() {
         std::vector<std::uint32_t> bands;
         for (std::uint32_t band = 0; band < raster.Bands(); ++band)
             if (raster.HasStatistics(band)) bands.push_back(band);
-        const std::span<const std::uint32_t> all = bands;
-        for (std::size_t done = 0; done < all.size(); done += kBandsAtOnce)
-            CheckRecords(all.subspan(done, std::min(kBandsAtOnce, all.size() - done)));
+        InGroups(bands, [this](std::span<const std::uint32_t> group) { CheckRecords(group); });
     }
 
     void CheckRecords(std::span<const std::uint32_t> bands) {
@@ -140,34 +147,57 @@ private:
     // whose values a file keeps exactly are counted anew.
     static constexpr bool kExactEnds = std::is_integral_v<T> && sizeof(T) <= 4;
 
+    struct Histogram {
+        const zelm::RasterBandHistogram<T>* stored;
+        zmchost::HistogramAccumulator<T> computed;
+    };
+
     void CheckHistograms(const std::vector<zelm::RasterBandHistogram<T>>& stored) {
         if constexpr (kExactEnds) {
-            std::vector<const zelm::RasterBandHistogram<T>*> records;
-            std::vector<zmchost::HistogramAccumulator<T>> counters;
-            for (const auto& record : stored) {
-                const zmchost::HistogramBins<T> bins(record.minimum, record.maximum,
-                                                     record.binCount);
-                // A number of bins takes memory only where the file has as many counts.
-                const bool usual = record.counts.shape.elements == record.binCount &&
-                                   record.level == 0 && record.band < raster.Bands() &&
-                                   record.minimum <= record.maximum && record.binCount > 0 &&
-                                   Near(bins.Size(), record.binSize, kRealError);
-                if (!usual) continue;
-                records.push_back(&record);
-                counters.emplace_back(bins);
-            }
-            if (records.empty()) return;
-            const auto bands = raster.AllBands();
-            WalkLines<T>(raster, bands, "histograms", quiet,
-                         [&](const T* row, const unsigned char* mask, std::uint32_t width) {
-                             for (std::size_t i = 0; i < records.size(); ++i)
-                                 counters[i].AddRow(row, mask, records[i]->band, raster.Bands(),
-                                                    width);
-                         });
-            for (std::size_t i = 0; i < records.size(); ++i) Compare(*records[i], counters[i]);
+            std::vector<Histogram> histograms;
+            for (const auto& record : stored)
+                if (IsUsual(record))
+                    histograms.push_back({&record, zmchost::HistogramAccumulator<T>(Bins(record))});
+            const std::vector<std::uint32_t> bands = BandsOf(histograms);
+            InGroups(bands,
+                     [&](std::span<const std::uint32_t> group) { Count(histograms, group); });
+            for (const Histogram& each : histograms) Compare(*each.stored, each.computed);
         } else {
             static_cast<void>(stored);
         }
+    }
+
+    // A number of bins takes memory only where the file has as many counts.
+    bool IsUsual(const zelm::RasterBandHistogram<T>& record) const {
+        return record.counts.shape.elements == record.binCount && record.level == 0 &&
+               record.band < raster.Bands() && record.minimum <= record.maximum &&
+               record.binCount > 0 && Near(Bins(record).Size(), record.binSize, kRealError);
+    }
+
+    static zmchost::HistogramBins<T> Bins(const zelm::RasterBandHistogram<T>& record) {
+        return {record.minimum, record.maximum, record.binCount};
+    }
+
+    static std::vector<std::uint32_t> BandsOf(const std::vector<Histogram>& histograms) {
+        std::set<std::uint32_t> bands;
+        for (const Histogram& each : histograms) bands.insert(each.stored->band);
+        return {bands.begin(), bands.end()};
+    }
+
+    // Counts those of these bands, which are in order.
+    void Count(std::vector<Histogram>& histograms, std::span<const std::uint32_t> bands) {
+        std::vector<std::pair<Histogram*, std::uint32_t>> counted;
+        for (Histogram& each : histograms) {
+            const auto found = std::lower_bound(bands.begin(), bands.end(), each.stored->band);
+            if (found != bands.end() && *found == each.stored->band)
+                counted.emplace_back(&each, static_cast<std::uint32_t>(found - bands.begin()));
+        }
+        const auto count = static_cast<std::uint32_t>(bands.size());
+        WalkLines<T>(raster, bands, "histograms", quiet,
+                     [&](const T* row, const unsigned char* mask, std::uint32_t width) {
+                         for (const auto& [histogram, place] : counted)
+                             histogram->computed.AddRow(row, mask, place, count, width);
+                     });
     }
 
     void Compare(const zelm::RasterBandHistogram<T>& stored,

@@ -186,6 +186,13 @@ class Verification(AttackTest):
         self.complete(other, b"1")
         self.assertLess(self.memory("x.pyr", "--against", "zeros.pyr", status=3), self.PARTS)
 
+    def test_histograms_take_the_bands_that_have_one(self):
+        draft = plain(PIXEL_WIDTH=64, PIXEL_HEIGHT=64, TILESIZE=64, BANDS=60000,
+                      BUILD_METHOD="Morton")
+        draft.records = [self.histogram(59998, 64 * 64)]
+        self.complete(draft)
+        self.assertLess(self.memory("x.pyr"), 32 << 20)
+
     def test_histograms_of_more_bands_than_are_counted_at_once(self):
         draft = plain(PIXEL_WIDTH=64, PIXEL_HEIGHT=64, TILESIZE=64, BANDS=400,
                       BUILD_METHOD="Morton")

@@ -55,7 +55,7 @@ TEST(SampleDifferences, LongLinesAreTakenToTheirEnd) {
     constexpr std::uint32_t kWidth = 100000;
     const std::vector<unsigned char> a(std::size_t{kWidth} * 3);
     std::vector<unsigned char> b = a;
-    for (const std::size_t sample : {65535, 65536, 200003, 299998, 299999}) b[sample] = 9;
+    for (const std::size_t sample : {65535u, 65536u, 200003u, 299998u, 299999u}) b[sample] = 9;
     SampleDifferences found(Code::Byte, Code::Byte, 3, 0);
     found.Take({7, 5, kWidth, 1}, a.data(), b.data());
     EXPECT_EQ(found.Bands()[0].samples, 1u);
