@@ -35,6 +35,12 @@ void Warn(const std::string& text) {
     if (said.insert(text).second) Say(text);
 }
 
+void WarnOfLoss() {
+    if (!isQuiet)
+        platform::WriteAtOnce(platform::StandardStream::Errors,
+                              "zmcraster: warning: out of memory, and what it was about is lost\n");
+}
+
 void SetQuiet(bool quiet) { isQuiet = quiet; }
 
 }  // namespace zmctools

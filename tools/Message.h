@@ -42,6 +42,8 @@ void Say(const std::string& text);
 // The same for what does not keep a command from going on, each text once; silent after
 // SetQuiet(true). Any thread may call.
 void Warn(const std::string& text);
+// Tells that a warning was lost for want of memory; takes none itself.
+void WarnOfLoss();
 void SetQuiet(bool quiet);
 
 }  // namespace zmctools

@@ -4,11 +4,22 @@
 
 #include <cerrno>
 #include <memory>
+#include <new>
 
 #include "platform/FileSystem.h"
 
 namespace zmctools {
 namespace {
+
+// 0, or the error by which a file does not open. GDAL calls from C, so that nothing is thrown.
+int Refusal(const char* name) noexcept {
+    try {
+        const platform::FileStatus status = platform::StatusOf(name);
+        return status.exists && !status.isRegular && !status.isFolder ? EINVAL : 0;
+    } catch (const std::bad_alloc&) {
+        return ENOMEM;
+    }
+}
 
 // Hands everything on to the file system that GDAL had before.
 class RegularFiles final : public VSIFilesystemHandler {
@@ -17,10 +28,9 @@ public:
 
     VSIVirtualHandle* Open(const char* name, const char* access, bool setsError,
                            CSLConstList options) override {
-        const platform::FileStatus status = platform::StatusOf(name);
-        if (!status.exists || status.isRegular || status.isFolder)
-            return plain->Open(name, access, setsError, options);
-        errno = EINVAL;
+        const int refusal = Refusal(name);
+        if (refusal == 0) return plain->Open(name, access, setsError, options);
+        errno = refusal;
         return nullptr;
     }
     int Stat(const char* name, VSIStatBufL* status, int flags) override {
