@@ -9,6 +9,7 @@
 #include <cerrno>
 #include <filesystem>
 #include <string>
+#include <vector>
 
 #include "tests/support/AllocationFaults.h"
 
@@ -22,7 +23,22 @@ using zmctest::ForEachAllocationFailing;
 
 class GdalWorld : public testing::Test {
 protected:
-    static void SetUpTestSuite() { StartGdal(); }
+    // What decides how drivers write, of a folder that there is and one that there is not.
+    static std::vector<int> WayOfWriting() {
+        std::vector<int> answers;
+        for (const char* const name : {"/tmp/file", "/nonesuch/file"})
+            answers.insert(answers.end(), {VSISupportsSequentialWrite(name, false),
+                                           VSISupportsRandomWrite(name, false),
+                                           VSIHasOptimizedReadMultiRange(name)});
+        return answers;
+    }
+
+    static void SetUpTestSuite() {
+        before = WayOfWriting();
+        StartGdal();
+    }
+
+    static inline std::vector<int> before;
 };
 
 // Longer than what a text holds without memory of its own.
@@ -71,6 +87,11 @@ TEST_F(GdalWorld, WhatIsNoFileDoesNotOpen) {
     EXPECT_EQ(VSIFOpenL(pipe.c_str(), "rb"), nullptr);
     EXPECT_EQ(errno, EINVAL);
     fs::remove(pipe);
+}
+
+TEST_F(GdalWorld, DriversWriteAsTheyDoElsewhere) {
+    EXPECT_EQ(WayOfWriting(), before);
+    EXPECT_NE(before, std::vector<int>(before.size(), 1)) << "GDAL refuses nothing by itself";
 }
 
 }  // namespace
