@@ -19,6 +19,7 @@
 #include <vector>
 #include <xercesc/util/PlatformUtils.hpp>
 
+#include "format/TileTable.h"
 #include "pyramid/PyramidDataset.h"
 
 namespace {
@@ -235,6 +236,20 @@ void OpenLongGrid(benchmark::State& state) {
     state.counters["limit_ms"] = 100;
 }
 BENCHMARK(OpenLongGrid)->Arg(0)->Arg(1)->Unit(benchmark::kMicrosecond);
+
+// The place of a tile in the largest grid that the curve has, by level.
+void PlaceInLargestGrid(benchmark::State& state) {
+    const auto level = static_cast<std::uint32_t>(state.range(0));
+    const zelm::TilePlaces places({zelm::LevelGeometry(16777216, 16777216, 256, 0), 0, 8, 12, 1},
+                                  0);
+    std::uint32_t x = 1, y = 1;
+    for (auto _ : state) {
+        benchmark::DoNotOptimize(places.At(0, level, x >> level, y >> level));
+        x = (x * 48271u) & 0xFFFFu;
+        y = (y * 16807u) & 0xFFFFu;
+    }
+}
+BENCHMARK(PlaceInLargestGrid)->Arg(0)->Arg(3)->Arg(8);
 
 // --- transfers, on data that lie in the page cache ---
 

@@ -37,7 +37,8 @@ public:
     virtual bool IsAvailable() = 0;
     // Pixel type code, 0 if not open.
     virtual std::uint32_t GetPixelType() = 0;
-    // Whether pixels can be read from it.
+    // What a memory raster answers by whether it is open; false of every pyramid, which is read by
+    // its reader all the same.
     virtual bool IsReadable() = 0;
     // A place of the interface that nobody asks: always false.
     virtual bool ReservedConnectionQuery() = 0;

@@ -1,9 +1,10 @@
-// Description of a coordinate system, as the engine fills it in (DescribeCoordSys, through
-// BindCoordSys.h). A plain record, copied with its handle's owner; one thread at a time.
+// Description of a coordinate system: what handles carry of it. A plain record; one thread at a
+// time.
 //
-// Fields without a meaning of their own here are the engine's; the order of the fields is fixed,
-// since host and engine are compiled apart. The defaults are those of a system that nobody has
-// described: an unknown datum, in metres.
+// DescribeCoordSys (BindCoordSys.h) fills in the name of the datum and the unit, which is all that
+// the engine here tells. The other fields are places for engines and hosts of other makes; the
+// order of the fields is fixed, since both sides are compiled apart. The defaults are those of a
+// system that nobody has described: an unknown datum, in metres.
 #ifndef ZMC_COORDSYS_COORDSYSINFO_H
 #define ZMC_COORDSYS_COORDSYSINFO_H
 
@@ -23,7 +24,7 @@ struct CoordSysInfo {
     String thirdText;
     String datumName = "D_Unknown";
     String fifthText;
-    CoordSysParameter parameters[3];  // of the projection, in the engine's order
+    CoordSysParameter parameters[3];  // of the projection
     String unitName = "Meter";        // of coordinates, as the engine calls it
     double unitFactor = 1.0;          // metres for a linear unit, degrees for an angular one
     std::uint32_t unitKind = 0;       // 0: linear, 1: angular

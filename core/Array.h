@@ -33,7 +33,7 @@ public:
     // cppcheck-suppress duplInheritedMember ; each class has a code of its own by this name
     static const std::uint32_t typeCode;
 
-    T* data = nullptr;           // null while the array holds nothing
+    T* data = nullptr;           // null while there is no buffer
     ArrayShape shape;            // how the elements are laid out; `shape.elements` of them count
     std::uint32_t capacity = 0;  // elements that fit in `data`
     bool owned = true;           // false: `data` belongs to somebody else

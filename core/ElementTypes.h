@@ -53,7 +53,7 @@ ZMC_ELEMENT_TYPES(ZMC_X)
 }  // namespace PixelTypeCode
 
 // What is known of an element type at compile time: ElementTraits<float>::code is 4, its word is
-// "Single". Declared for the twelve types alone, so that any other fails to compile.
+// "Single". Defined for the twelve types alone, so that any other fails to compile.
 template <class T>
 struct ElementTraits;
 #define ZMC_X(type, name, typeCode)                     \

@@ -3,10 +3,10 @@
 //
 // A host derives its own class, hands an object of it to Open in a GeoRefPtr, and finds a clone in
 // the properties of the raster (RasterProps::geoRef), which it casts back. Each record of
-// properties has a clone of its own, made and destroyed on the thread that copies the record: the
-// module calls it from no thread of its own. Both operations may throw; the record that was to
-// change is then as it was, and what crosses the module's interface is an invalid record instead of
-// the exception.
+// properties has a clone of its own: the module calls it on the threads on which its host copies,
+// changes and drops records, and on none of its own. Both operations may throw; the record that was
+// to change is then as it was, and across the module's interface come the answers of failure:
+// false, an empty pointer, or a record that is not valid.
 #ifndef ZMC_CORE_GEOREF_H
 #define ZMC_CORE_GEOREF_H
 
@@ -21,8 +21,8 @@ public:
     virtual ~GeoRef() = default;
     // A new object that the caller owns, of the same place on earth. Never null.
     virtual GeoRef* Clone() const = 0;
-    // Tells the size of the raster, in samples and lines of level 0, whenever a record that holds
-    // this object takes another.
+    // Tells the size of the raster, in samples and lines of level 0: to a clone that a record
+    // takes, and when SetSamples or SetLines changes the record's.
     virtual void SetRasterSize(std::uint32_t samples, std::uint32_t lines) = 0;
 };
 

@@ -76,7 +76,7 @@ concept CanStandFor = !std::is_same_v<Derived, Base> && std::is_convertible_v<De
 template <class T>
 class Pointer {
 public:
-    ReferenceRecord* record = nullptr;  // null after Release, and where memory ran out
+    ReferenceRecord* record = nullptr;  // null after the last Release, and where memory ran out
 
     // Takes ownership of `object`, which was made by `new` and may be null.
     explicit Pointer(T* object = nullptr) { Bind(object); }

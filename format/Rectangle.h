@@ -1,7 +1,7 @@
 // Rectangle: columns [x, x + width) and lines [y, y + height) of a level, in pixels of that level.
 //
 // One without width or height is empty. Its far edges may lie behind the last 32-bit number: all
-// questions are answered in 64 bits. The one type for windows, tiles and parts of them; host and
+// questions are answered in 64 bits. Windows, tiles and parts of them are all told by it; host and
 // driver know it by the name Window. A plain value: nothing throws, and any number of threads may
 // use one.
 #ifndef ZMC_FORMAT_RECTANGLE_H

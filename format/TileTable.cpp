@@ -191,10 +191,9 @@ std::uint64_t TilePlaces::At(std::uint32_t band, std::uint32_t level, std::uint3
                              std::uint32_t tileY) const {
     if (level < table.levelMin || level >= endLevel) return 0;
     const Tile block{tileX << level, tileY << level};
-    const std::uint64_t later = band * bandBytes;
-    if (level == 0) return PlaceOfTile(block) + later;
     // Where 2^level is at most the side of a tile, a block in the grid of its level has pixels.
-    return PlaceOfBlock(block, level) + later;
+    const std::uint64_t first = level == 0 ? PlaceOfTile(block) : PlaceOfBlock(block, level);
+    return first + band * bandBytes;
 }
 
 // The last tile, on the curve too, of a square or of what the grid has of it.
@@ -287,15 +286,12 @@ std::uint64_t TilePlaces::PlaceOfBlock(Tile block, std::uint32_t level) const {
     };
     std::uint64_t place = PlaceOfTile(next);
     if (table.levelMin == 0) place += BlockBytes(next, 0);
-    for (std::uint32_t at = FirstReduced();; ++at) {
+    for (std::uint32_t at = FirstReduced(); at <= level; ++at) {
         if (previous && blockOf(*previous, at) != blockOf(next, at)) {
             if (at == level && blockOf(*previous, at) == block) break;
             place += BlockBytes(*previous, at);
         }
-        if (next == last) {
-            if (at == level) break;
-            place += BlockBytes(next, at);
-        }
+        if (next == last && at != level) place += BlockBytes(next, at);
     }
     return place;
 }

@@ -32,7 +32,8 @@ struct TileTable {
 };
 
 // TilePlaces: the entries of such a table one by one, without the table: a header of a few hundred
-// bytes can announce one of gigabytes. Each takes a descent of the curve, a few microseconds.
+// bytes can announce one of gigabytes. Each takes a descent of the curve, which bench/pyramid_bench
+// times (PlaceInLargestGrid).
 //
 // A grid of up to 65536 x 65536 tiles, with a tile size above 0. Nothing here changes; any number
 // of threads may look.
@@ -42,8 +43,10 @@ public:
     TilePlaces(const TileTable& described, std::uint64_t startOffset);
 
     // The entry of a tile of the level's own grid. 0 for levels that the table has no place for.
+    // Those of the bands lie BandBytes apart.
     std::uint64_t At(std::uint32_t band, std::uint32_t level, std::uint32_t tileX,
                      std::uint32_t tileY) const;
+    std::uint64_t BandBytes() const { return bandBytes; }
 
 private:
     struct Tile {  // of level 0

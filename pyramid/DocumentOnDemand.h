@@ -40,7 +40,7 @@ public:
     // The tree of that text takes the place of what was there, or a document without a tree if the
     // text is malformed.
     void Await(DocumentSource other);
-    // A tree has been asked for, or none is to be made.
+    // A tree has been made, or none is to be.
     bool IsMade() const { return !pending; }
 
 private:

@@ -34,7 +34,7 @@ protected:
     }
 
     std::uint64_t TableEntry(std::uint32_t band, std::uint32_t tileX, std::uint32_t tileY) const {
-        if (places) return places->At(band, request.level, tileX, tileY);
+        if (places) return PlaceOf(tileX, tileY) + band * places->BandBytes();
         const auto& table = dataset.TileOffsets;
         const std::uint64_t row = std::uint64_t{request.level} * dataset.BandCount + band;
         return table.data[row * table.shape.extents[2] +
@@ -62,6 +62,19 @@ protected:
     const TileRequest& request;
     files::ByteSource& file;
     std::optional<TilePlaces> places;  // in place of a table that is too large
+
+    // That of the first band, computed once for all bands of a tile.
+    std::uint64_t PlaceOf(std::uint32_t tileX, std::uint32_t tileY) const {
+        if (!known.any || known.tileX != tileX || known.tileY != tileY)
+            known = {true, tileX, tileY, places->At(0, request.level, tileX, tileY)};
+        return known.place;
+    }
+    struct Place {
+        bool any = false;
+        std::uint32_t tileX = 0, tileY = 0;
+        std::uint64_t place = 0;
+    };
+    mutable Place known;
 
     // At least `bytes`; null if memory ran out.
     unsigned char* WorkSpace(std::uint64_t bytes) const { return dataset.WorkSpace(bytes); }

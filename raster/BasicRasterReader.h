@@ -33,7 +33,7 @@ public:
     // Scale of level 0, and factor between levels (0 where there are none).
     virtual std::uint32_t GetBaseReduction() const = 0;
     virtual std::uint32_t GetLevelReduction() const = 0;
-    // The first and the last level that can be read, both inclusive.
+    // The first and the last level that the file announces, both inclusive.
     virtual std::int32_t GetMinLevel() const = 0;
     virtual std::int32_t GetMaxLevel() const = 0;
     // True when all levels of a pyramid are in the file.
@@ -61,10 +61,10 @@ public:
     virtual bool SupportsNoData() const = 0;
     // Takes the no-data values of `source` for this reader's bands; they live in this reader alone.
     virtual void SetNoDataValues(const RasterProps& source) = 0;
-    // The palette of a band: whether there is one with colours; the one that was stored last, a
-    // copy that the caller shares with nobody (for a band without one a pyramid gives a palette of
-    // no colours, a memory raster an empty pointer); and the store of another, which is true of
-    // every pyramid, whatever the disk did.
+    // The palette of a band: whether there is one with colours; the one that was stored last, which
+    // the reader holds too until it is asked for another (for a band without one a pyramid gives a
+    // palette of no colours, a memory raster an empty pointer); and the store of another, which is
+    // true of every pyramid, whatever the disk did.
     virtual bool HasPalette(std::uint32_t band) const = 0;
     virtual PalettePtr GetPalette(std::uint32_t band) const = 0;
     virtual bool SetPalette(std::uint32_t band, const Palette& palette) = 0;

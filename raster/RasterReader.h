@@ -40,8 +40,8 @@ public:
     // Borrowed as well; null for a reader without a connection.
     virtual RasterDataConnection* GetConnection() const = 0;
     // The record at position `band` of those that are stored, whatever band it names: whoever
-    // stores all bands once, in one call and in their order, gets each by its number. A default
-    // record, with no flag set, where there is none.
+    // stores all bands once, in one call and in their order, gets each by its number. A
+    // record with no flag set where there is none.
     virtual RasterBandStats<T> GetBandStats(std::uint32_t band) const = 0;
     // Stores records of any bands, in order. True of every pyramid, whatever the disk did; false of
     // a memory raster, which keeps none.

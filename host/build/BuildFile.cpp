@@ -20,15 +20,12 @@ BuildFile::BuildFile(const std::string& targetName, bool mayOverwrite)
     CheckTarget();
     SideFile::RemoveStale(target, kKind);
     path = SideFile::MakeTemporary(target, kKind, lock);
-    if (path.empty())
-        throw Error(given, "build a file in the folder " + platform::FolderOf(target),
-                    platform::LastErrorText());
     // What is to replace a file is nobody else's business until it has the rights of that one.
-    if (platform::StatusOf(target).exists && !platform::MakePrivate(path)) {
-        const std::string reason = platform::LastErrorText();
-        platform::RemoveEntry(path);
-        throw Error(given, "build a file in the folder " + platform::FolderOf(target), reason);
-    }
+    if (!path.empty() && (!platform::StatusOf(target).exists || platform::MakePrivate(path)))
+        return;
+    const std::string reason = platform::LastErrorText();
+    if (!path.empty()) platform::RemoveEntry(path);
+    throw Error(given, "build a file in the folder " + platform::FolderOf(target), reason);
 }
 
 BuildFile::~BuildFile() {

@@ -22,7 +22,6 @@ using zelm::files::OpenMode;
 
 constexpr char kSubject[] = "the metadata document ";
 constexpr std::uint64_t kPiece = std::uint64_t{1} << 20;
-constexpr char kTooLong[] = "is longer than 256 MiB";
 
 class RootReader : public zelm::FaultReader {
 public:
@@ -72,7 +71,9 @@ std::string JudgeMetadataParse(const std::string& fault, bool hasOurRoot) {
 }
 
 std::string JudgeMetadataSize(std::uint64_t bytes) {
-    if (bytes > zelm::kMaxDocumentBytes) return std::string(kSubject) + kTooLong;
+    if (bytes > zelm::kMaxDocumentBytes)
+        return kSubject +
+               ("is longer than " + std::to_string(zelm::kMaxDocumentBytes >> 20) + " MiB");
     return Limits::Judge("document", bytes, Limits::Current().document,
                          kSubject + ("has " + std::to_string(bytes) + " bytes"));
 }

@@ -19,6 +19,7 @@ class JudgingReader : public zelm::PyramidXMLReaderHandlers<T> {
 public:
     std::string fault;
     bool hasOurRoot = false;
+    std::uint64_t elements = 0;                                 // up to the fault, if there is one
     std::unordered_map<std::uint32_t, zelm::ColorList> colors;  // of finished palettes, by band
 
     void warning(const xercesc::SAXParseException&) override {}
@@ -29,6 +30,7 @@ public:
 
 protected:
     void Enter(std::int32_t state) override {
+        ++elements;
         if (this->stateStack.size() == 1)
             hasOurRoot = state == zelm::StateOf(zelm::ElementName::DATASET);
         zelm::PyramidXMLReaderHandlers<T>::Enter(state);
@@ -52,15 +54,6 @@ std::string JudgeSize(const zelm::files::ByteSource& source, std::uint64_t offse
 std::string JudgeAbsence(const zelm::files::ByteSource& source, std::uint64_t offset) {
     std::uint64_t size = 0;
     return source.TellSize(size) && size <= offset ? "" : "the metadata document cannot be read";
-}
-
-// Of start tags, or what looks like them.
-std::uint64_t CountElements(std::string_view text) {
-    std::uint64_t count = 0;
-    for (std::size_t at = text.find('<'); at != text.npos; at = text.find('<', at + 1))
-        if (at + 1 < text.size() && std::string_view("/!?").find(text[at + 1]) == text.npos)
-            ++count;
-    return count;
 }
 
 template <class Record>
@@ -96,11 +89,11 @@ void StoredRecords<T>::Parse(zelm::DocumentText text) {
     // The parse changes the bytes.
     const std::string_view bytes(reinterpret_cast<const char*>(text.bytes.get()), text.size);
     fault = JudgeMetadataBytes(bytes);
-    elements = CountElements(bytes);
     InitialiseXerces();
     auto reader = std::make_unique<JudgingReader<T>>();
     const std::string wrong =
         zelm::ParseDocumentBytes(text.bytes.get(), text.size, *reader, reader->fault);
+    elements = reader->elements;
     if (fault.empty()) fault = JudgeMetadataParse(wrong, reader->hasOurRoot);
     if (!wrong.empty()) return;
     colors = std::move(reader->colors);

@@ -10,6 +10,8 @@ namespace {
 
 constexpr std::string_view kMagic = "ZMCMETA1";
 constexpr std::size_t kNumber = 8;
+// Seven numbers stand in front of the texts.
+static_assert(JournalRecord::kHeadBytes == kMagic.size() + 7 * kNumber);
 
 void Append(std::string& bytes, std::uint64_t number) {
     for (unsigned i = 0; i < kNumber; ++i) bytes += static_cast<char>(number >> (8 * i));

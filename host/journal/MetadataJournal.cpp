@@ -29,13 +29,14 @@ const char* const kKeep = "keep a copy of its metadata document";
 // takes its name meanwhile.
 class Target {
 public:
-    Target(const std::string& name, OpenMode mode) : file(name) {
+    Target(std::string name, OpenMode mode) : file(std::move(name)) {
         int error = 0;
         source = FileSource::Open(WideFileName(file), mode, &error);
         if (!source) throw Error(file, "look at it", platform::ErrorText(error));
         header = PyramidHeader::Read(*source, file);
     }
 
+    const std::string& Name() const { return file; }
     const PyramidHeader& Header() const { return header; }
     FileSource& Source() const { return *source; }
     std::string Document() const { return ReadMetadataText(*source, file, header); }
@@ -76,8 +77,7 @@ bool RemoveCopy(const std::string& path) {
 // What a left-over copy says and what there is to do about it. The caller holds its lock.
 class LeftOver {
 public:
-    LeftOver(const std::string& rasterFile, const JournalRecord& kept)
-        : file(rasterFile), record(kept), now(rasterFile, OpenMode::Read) {}
+    LeftOver(const Target& raster, const JournalRecord& kept) : now(raster), record(kept) {}
 
     // Why the copy is not one of this file; empty if it is.
     std::string Mismatch() const {
@@ -90,8 +90,10 @@ public:
         return "";
     }
 
-    // Puts the old document back if that is called for, and removes the copy. Throws Error.
+    // Puts the old document back if that is called for, and removes the copy. Throws Error, one of
+    // another file being no copy of this one.
     Outcome Settle(const std::string& copy) {
+        if (const std::string why = Mismatch(); !why.empty()) Fail(why);
         const Outcome outcome = IsWhole() ? Outcome::Complete : Outcome::Restored;
         if (outcome == Outcome::Restored) PutBack();
         int error = 0;
@@ -117,7 +119,7 @@ private:
 
     // The order of steps is that of a store: mark, rest, first byte.
     void PutBack() const {
-        const Target target(file, OpenMode::Update);
+        const Target target(now.Name(), OpenMode::Update);
         if (!target.IsSameAs(now)) Fail("another file has taken its name");
         FileSource& source = target.Source();
         int error = 0;
@@ -152,12 +154,11 @@ private:
     }
 
     [[noreturn]] void Fail(const std::string& reason) const {
-        throw Error(file, "put its metadata document back", reason);
+        throw Error(now.Name(), "put its metadata document back", reason);
     }
 
-    const std::string& file;
+    const Target& now;
     const JournalRecord& record;
-    const Target now;
 };
 
 // A copy whose lock is held: its record, or why it is not used.
@@ -167,20 +168,19 @@ struct Copy {
 };
 
 // Nothing of it is read before it is known whose it is and how long it may be. Throws Error.
-Copy ReadCopy(const FileLock& lock, const std::string& file) {
+Copy ReadCopy(const FileLock& lock, const Target& target) {
     const platform::FileStatus status = lock.Status();
-    if (!Target(file, OpenMode::Read).Trusts(status))
-        return {{}, "it belongs to a user who does not own the file"};
+    if (!target.Trusts(status)) return {{}, "it belongs to a user who does not own the file"};
     if (status.size > JournalRecord::kMaxBytes) return {{}, "it is longer than any copy"};
     std::string bytes(JournalRecord::kHeadBytes, '\0');
     bytes.resize(lock.ReadAt(0, bytes.data(), bytes.size()));
     if (JournalRecord::SizeFrom(bytes) != status.size) return {{}, "it is torn"};
     bytes.resize(static_cast<std::size_t>(status.size));
     if (lock.ReadAt(0, bytes.data(), bytes.size()) != bytes.size())
-        throw Error(file, "read the copy", platform::LastErrorText());
+        throw Error(target.Name(), "read the copy", platform::LastErrorText());
     auto record = JournalRecord::Decode(std::move(bytes));
     if (!record) return {{}, "it is torn"};
-    std::string unused = LeftOver(file, *record).Mismatch();
+    std::string unused = LeftOver(target, *record).Mismatch();
     return {std::move(record), std::move(unused)};
 }
 
@@ -206,7 +206,7 @@ Recovery WithCopy(const std::string& file, FileLock::Kind kind, Settle&& settle)
             break;
     }
     try {
-        const std::string target = platform::ResolveLinks(file);
+        const Target target(platform::ResolveLinks(file), OpenMode::Read);
         const Copy found = ReadCopy(lock, target);
         if (!found.unused.empty())
             return {Outcome::Unusable, Subject(copy) + "is not used: " + found.unused};
@@ -226,18 +226,18 @@ std::string MetadataJournal::PathFor(const std::string& file) {
 }
 
 Recovery RecoverMetadata(const std::string& file) {
-    return WithCopy(file, FileLock::Kind::Alone,
-                    [](const std::string& target, const std::string& copy,
-                       const JournalRecord& record) -> Recovery {
-                        const Outcome outcome = LeftOver(target, record).Settle(copy);
-                        if (outcome == Outcome::Restored)
-                            return {outcome,
-                                    "a store into it did not end; its metadata document is again "
-                                    "the one of before"};
-                        return {outcome,
-                                "a store into it did not end in good order; its metadata document "
-                                "is whole"};
-                    });
+    return WithCopy(
+        file, FileLock::Kind::Alone,
+        [](const Target& target, const std::string& copy, const JournalRecord& record) -> Recovery {
+            const Outcome outcome = LeftOver(target, record).Settle(copy);
+            if (outcome == Outcome::Restored)
+                return {outcome,
+                        "a store into it did not end; its metadata document is again "
+                        "the one of before"};
+            return {outcome,
+                    "a store into it did not end in good order; its metadata document "
+                    "is whole"};
+        });
 }
 
 Recovery LookForCopy(const std::string& file) {
@@ -259,13 +259,14 @@ void DiscardMetadata(const std::string& file) {
     if (taken == FileLock::Result::Held) refuse("another process is storing into the file");
     if (taken == FileLock::Result::Failed) refuse(platform::LastErrorText());
     const bool hasCopy = taken == FileLock::Result::Taken;
-    if (hasCopy && ReadCopy(lock, name).unused.empty())
-        refuse("there is a copy of it, which can be put back");
     const Target target(name, OpenMode::Read);
+    if (hasCopy && ReadCopy(lock, target).unused.empty())
+        refuse("there is a copy of it, which can be put back");
     const bool damaged = !JudgeMetadata(target.Source(), name, target.Header()).empty();
     if (!damaged && !hasCopy) refuse("it is not damaged");
     if (damaged) {
         const Target changed(name, OpenMode::Update);
+        if (!changed.IsSameAs(target)) refuse("another file has taken its name");
         int error = 0;
         if (!changed.Source().Truncate(changed.Header().tileDataEnd, &error) ||
             !changed.Source().Sync(&error))
@@ -329,7 +330,7 @@ void MetadataJournal::Finish() {
 MetadataJournal::~MetadataJournal() {
     if (finished) return;
     try {
-        LeftOver(file, record).Settle(PathFor(file));
+        LeftOver(Target(file, OpenMode::Read), record).Settle(PathFor(file));
     } catch (...) {
         // The copy stays; the next to open the file meets it.
     }

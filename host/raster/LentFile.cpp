@@ -105,7 +105,7 @@ std::string LentFile::TakeFailure() const {
     if (!record.firstEnd) return "";
     const std::uint64_t size = recording->Size();
     const std::uint64_t end = record.firstEnd->offset + record.firstEnd->moved;
-    if (size != ByteSource::kUnknownSize && size < acceptedSize) return CutTo(acceptedSize, size);
+    if (WasCutTo(size)) return CutTo(acceptedSize, size);
     return end < size ? "less was read than is there (" + Describe(*record.firstEnd) + ")" : "";
 }
 
@@ -127,17 +127,19 @@ std::string LentFile::LossOfName() const {
                                        : "its name leads to no file any more";
 }
 
+bool LentFile::WasCutTo(std::uint64_t size) const {
+    return size != ByteSource::kUnknownSize && size < acceptedSize;
+}
+
 std::string LentFile::ContentChange() const {
     const std::uint64_t size = recording->Size();
-    if (size != ByteSource::kUnknownSize && size < acceptedSize) return CutTo(acceptedSize, size);
+    if (WasCutTo(size)) return CutTo(acceptedSize, size);
     const bool same = !accepted.known || recording->Identify().SameContent(accepted);
     return same ? "" : "others have written to it";
 }
 
 std::string LentFile::Change() const {
-    const std::uint64_t size = recording->Size();
-    const bool cut = size != ByteSource::kUnknownSize && size < acceptedSize;
-    std::string loss = cut ? "" : LossOfName();
+    std::string loss = WasCutTo(recording->Size()) ? "" : LossOfName();
     return loss.empty() ? ContentChange() : loss;
 }
 

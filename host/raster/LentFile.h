@@ -68,6 +68,8 @@ public:
     std::string LossOfName() const;
 
 private:
+    bool WasCutTo(std::uint64_t size) const;
+
     std::shared_ptr<zelm::files::FileSource> plain;  // null for a source of another kind
     std::shared_ptr<zelm::files::RecordingSource> recording;
     zelm::files::LentName lent;

@@ -460,8 +460,8 @@ std::shared_ptr<const StoredRecords<T>> Raster::Records() const {
     return std::static_pointer_cast<const StoredRecords<T>>(AnyRecords());
 }
 
-// What is not settled is looked at again, but not all of a long text for each of ten thousand
-// bands.
+// What is not settled is looked at again: a few times at once, and then, as a long text always is,
+// after a rest, so that ten thousand bands do not each take a look.
 std::shared_ptr<const DocumentRecords> Raster::AnyRecords() const {
     using Clock = std::chrono::steady_clock;
     if (records && !records->IsSettled() && Clock::now() >= recordsExpire) records.reset();
@@ -474,9 +474,11 @@ std::shared_ptr<const DocumentRecords> Raster::AnyRecords() const {
     CheckDisk("read its metadata document");
     constexpr int kRest = 20;  // times as long as the look has taken
     constexpr std::chrono::milliseconds kQuick(5);
+    constexpr std::uint32_t kLooksAtOnce = 16;
     const auto took = Clock::now() - begin;
     recordsExpire = Clock::now() + took * kRest;
-    if (read->IsSettled() || took > kQuick) records = read;
+    unsettledLooks = read->IsSettled() ? 0 : unsettledLooks + 1;
+    if (read->IsSettled() || took > kQuick || unsettledLooks > kLooksAtOnce) records = read;
     return read;
 }
 

@@ -231,6 +231,7 @@ private:
     mutable std::shared_ptr<const DocumentRecords> records;  // null: to be read
     // Until when records are kept that are not settled.
     mutable std::chrono::steady_clock::time_point recordsExpire;
+    mutable std::uint32_t unsettledLooks = 0;  // in a row
 };
 
 }  // namespace zmchost

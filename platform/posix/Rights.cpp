@@ -59,21 +59,29 @@ std::vector<std::string> AttributesOf(const std::string& path) {
     return names;
 }
 
-// An attribute that this process may not give, or the file system does not know, is left out.
-void CopyAttribute(const std::string& from, const std::string& name, int to) {
+// False for one that there is, and that this process may not give or the file system does not know.
+bool CopyAttribute(const std::string& from, const std::string& name, int to) {
     const ssize_t size = ::getxattr(from.c_str(), name.c_str(), nullptr, 0);
-    if (size < 0) return;
+    if (size < 0) return errno == ENODATA || errno == ENOTSUP;
     std::string value(static_cast<std::size_t>(size), '\0');
     const ssize_t got = ::getxattr(from.c_str(), name.c_str(), value.data(), value.size());
-    if (got >= 0) ::fsetxattr(to, name.c_str(), value.data(), static_cast<std::size_t>(got), 0);
+    return got >= 0 &&
+           ::fsetxattr(to, name.c_str(), value.data(), static_cast<std::size_t>(got), 0) == 0;
 }
 
-// An access list speaks of the group of the file, and goes where that is the same.
-void CopyAttributes(const std::string& from, int to, bool sameGroup) {
+// An attribute that cannot be given is left out.
+void CopyAttributes(const std::string& from, int to) {
+    for (const std::string& name : AttributesOf(from))
+        if (!IsVoucher(name) && name != kAccessList) CopyAttribute(from, name, to);
+}
+
+// An access list speaks of the group of the file, and goes where that is the same. False if the
+// mode may not give the group what it gives there: beside a list it tells the mask of the list in
+// place of the group's rights.
+bool CopyAccessList(const std::string& from, int to, bool sameGroup) {
     // What the folder gave to the new file.
     ::fremovexattr(to, kAccessList);
-    for (const std::string& name : AttributesOf(from))
-        if (!IsVoucher(name) && (sameGroup || name != kAccessList)) CopyAttribute(from, name, to);
+    return sameGroup && CopyAttribute(from, kAccessList, to);
 }
 
 // The mode of a file whose owner and group may have become others.
@@ -103,8 +111,9 @@ bool CopyRights(const std::string& from, const std::string& to) noexcept try {
     if (::fstat(file.descriptor, &now) != 0) return false;
     const bool sameOwner = now.st_uid == source.st_uid;
     const bool sameGroup = now.st_gid == source.st_gid;
-    CopyAttributes(from, file.descriptor, sameGroup);
-    return ::fchmod(file.descriptor, ModeFor(source, sameOwner, sameGroup)) == 0;
+    CopyAttributes(from, file.descriptor);
+    const bool groupKeepsRights = CopyAccessList(from, file.descriptor, sameGroup);
+    return ::fchmod(file.descriptor, ModeFor(source, sameOwner, groupKeepsRights)) == 0;
 } catch (...) {
     errno = ENOMEM;
     return false;

@@ -168,35 +168,17 @@ TEST_F(DriverMemory, OpeningFailsWithAnError) {
 }
 
 // For each call: nothing is thrown, what fails is told, and the dataset is as good as before.
-// The first allocations each, and some of the thousands behind them, which are much alike: those of
-// a document's tree. Answers how many were made to fail.
-template <class Attempt>
-std::size_t ForSomeAllocationsFailing(Attempt&& attempt) {
-    constexpr std::size_t kEach = 40, kStep = 97, kLast = 2000;
-    std::size_t points = 0;
-    for (const zmctest::FaultMode mode :
-         {zmctest::FaultMode::Once, zmctest::FaultMode::FromThenOn}) {
-        bool failed = true;
-        for (std::size_t n = 1; failed && n <= kLast; n += n < kEach ? 1 : kStep) {
-            SCOPED_TRACE(n);
-            AllocationFaults faults(n, mode);
-            attempt(faults);
-            faults.Disarm();
-            failed = faults.Failed() != 0;
-            if (failed) ++points;
-        }
-    }
-    return points;
-}
-
 TEST_F(DriverMemory, CallsFailWithAnError) {
     Make(name, GDT_Byte);
+    const std::string made = zmctest::ReadText(name);
     for (const Call& call : Calls()) {
         SCOPED_TRACE(call.name);
         const unsigned flags = call.updates ? unsigned{GDAL_OF_UPDATE} : 0u;
         EXPECT_TRUE(call.make(*Open(name, flags)));
-        const std::size_t points = ForSomeAllocationsFailing([&](AllocationFaults& faults) {
+        const std::size_t points = zmctest::ForEachAllocationFailing([&](AllocationFaults& faults) {
             faults.Disarm();
+            // Stores add to the document, and with it to the allocations of the next.
+            if (call.updates) zmctest::WriteText(name, made);
             const DatasetPtr dataset = Open(name, flags);
             // What GDAL makes itself for its first block, and its lock of a dataset that is
             // written.

@@ -390,6 +390,17 @@ TEST_F(MetadataJournalTest, NewFileUnderTheNameTakesItsCopyAway) {
     EXPECT_FALSE(std::filesystem::exists(copy));
 }
 
+// A store that has failed puts its old document into its own file, and into no other.
+TEST_F(MetadataJournalTest, FileThatTookTheNameDuringAStoreIsNotWrittenTo) {
+    const std::string other = before + std::string(1, '\x1A');
+    {
+        MetadataJournal journal(file);
+        zmctest::WriteText(file + ".new", other);
+        std::filesystem::rename(file + ".new", file);
+    }
+    EXPECT_TRUE(zmctest::ReadText(file) == other);
+}
+
 TEST_F(MetadataJournalTest, StoreUnderWayIsLeftAlone) {
     const std::string damaged = before.substr(0, front) + "\x1A";
     {

@@ -244,6 +244,24 @@ TEST_F(StoredRecordsTest, DocumentBeyondTheLimitIsAFault) {
     EXPECT_EQ(raster.DocumentFault(), JudgeMetadata(file, PyramidHeader::Read(file)));
 }
 
+// A store that never ended costs a file of very many bands no look for each of them, however quick
+// one is.
+TEST_F(StoredRecordsTest, UnfinishedDocumentIsNotReadForEveryQuestion) {
+    constexpr std::uint32_t kQuestions = 20000;
+    {
+        Raster made = Make(1);
+        Append(made, {Mean(0, 1)});
+    }
+    std::string bytes = zmctest::ReadText(file);
+    bytes[bytes.rfind("<?xml")] = '\x1A';
+    zmctest::WriteText(file, bytes);
+    const Raster raster = Raster::Open(TestModule(), file);
+    const std::size_t before = DocumentParses();
+    for (std::uint32_t i = 0; i < kQuestions; ++i) EXPECT_FALSE(raster.HasStatistics(0));
+    EXPECT_GE(DocumentParses() - before, 2u) << "it is looked at again";
+    EXPECT_LT(DocumentParses() - before, kQuestions / 10);
+}
+
 TEST_F(StoredRecordsTest, MalformedDocumentKeepsNothing) {
     {
         Raster raster = Make(1);
