@@ -117,6 +117,20 @@ class KnownFiles(AttackTest):
                     draft.records = [text]
                 self.assertHarmless(draft)
 
+    def test_palettes_within_palettes(self):
+        """Each has the colours of all inside it."""
+        colors = "<PALETTE_RGBA>1|2|3|4</PALETTE_RGBA>" * 100000
+        ends = (f"<PALETTE_BAND>{band}</PALETTE_BAND></PALETTE>" for band in range(60))
+        text = "<PALETTE>" * 60 + colors + "".join(ends)
+        for place in ("behind", "records"):
+            with self.subTest(place):
+                draft = plain(BANDS=60)
+                if place == "behind":
+                    draft.behind = text
+                else:
+                    draft.records = [text]
+                self.assertHarmless(draft)
+
     def test_a_document_that_is_a_hole(self):
         for start in (b"", b"<DATASET>"):
             with self.subTest(start):
