@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <cmath>
 
+#include "colour/ColorList.h"
 #include "core/ElementTypes.h"
 #include "gdal/ColorTables.h"
 #include "gdal/NearestValue.h"
@@ -12,7 +13,10 @@
 namespace zmcgdal {
 namespace {
 
-constexpr std::size_t kMaxColors = 65536;
+// Colours that pixels can have: GDAL keeps and writes a table for each band, at a hundred times
+// what a colour takes in the file. Bands that share theirs there would make a small file large.
+template <class T>
+inline constexpr std::size_t kMaxColors = sizeof(T) == 1 ? 256 : 65536;
 
 template <class T>
 double ToDouble(const T& value) {
@@ -73,10 +77,10 @@ GDALColorEntry EntryOf(zelm::ColorList::Rgba color) {
 }
 
 // The last one comes first, so that the table grows once.
-std::unique_ptr<GDALColorTable> TableOf(const zelm::ColorList& palette) {
+std::unique_ptr<GDALColorTable> TableOf(const zelm::ColorList& palette, std::size_t most) {
     auto table = std::make_unique<GDALColorTable>();
-    const auto& colors = palette.Colors();
-    for (std::size_t i = std::min(colors.size(), kMaxColors); i-- != 0;) {
+    const auto colors = palette.Colors();
+    for (std::size_t i = std::min(colors.size(), most); i-- != 0;) {
         const GDALColorEntry entry = EntryOf(colors[i]);
         table->SetColorEntry(static_cast<int>(i), &entry);
     }
@@ -156,9 +160,9 @@ GDALColorTable* Archive::ColorTable(std::uint32_t band) {
 
 void Archive::FetchColorTable(std::uint32_t band) {
     std::unique_ptr<GDALColorTable> table;
-    const bool known = LookAtRecords([&](const auto& records) {
+    const bool known = LookAtRecords([&]<class T>(const zmchost::StoredRecords<T>& records) {
         if (const zelm::ColorList* const palette = records.BandPalette(band))
-            table = TableOf(*palette);
+            table = TableOf(*palette, kMaxColors<T>);
     });
     if (known) colorTables.emplace(band, std::move(table));
 }
