@@ -117,6 +117,12 @@ class KnownFiles(AttackTest):
                     draft.records = [text]
                 self.assertHarmless(draft)
 
+    def test_attributes_that_an_encoding_hides(self):
+        text = "<a " + " ".join(f"b{i}+AD0'1'" for i in range(1000000)) + "/>"
+        draft = plain()
+        draft.document = '<?xml version="1.0" encoding="UTF-7"?>' + text
+        self.assertHarmless(draft)
+
     def test_palettes_within_palettes(self):
         """Each has the colours of all inside it."""
         colors = "<PALETTE_RGBA>1|2|3|4</PALETTE_RGBA>" * 100000
