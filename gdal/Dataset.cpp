@@ -46,8 +46,7 @@ zmchost::PyramidFileInfo CheckedInfo(const std::string& fileName,
 // to wait for its other end.
 bool HasPipesBeside(const std::string& base) {
     for (const char* const ending : {".aux.xml", ".msk", ".ovr"}) {
-        const platform::FileStatus status = platform::StatusOf(base + ending);
-        if (!status.exists || status.isRegular || status.isFolder) continue;
+        if (!platform::StatusOf(base + ending).IsSpecial()) continue;
         CPLError(CE_Warning, CPLE_AppDefined,
                  "%s%s is no regular file; what stands beside the raster is not looked at",
                  base.c_str(), ending);

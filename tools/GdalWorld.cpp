@@ -38,8 +38,7 @@ void TakeLoss(CPLErr kind) {
 void CPL_STDCALL TakeError(CPLErr kind, CPLErrorNum, const char* text) noexcept {
     const std::lock_guard lock(mutex);
     try {
-        if (kind == CE_Warning)
-            Warn(Visible(subject) + ": warning: " + WithoutPrefix(text, subject + ": "));
+        if (kind == CE_Warning) Warn(subject, WithoutPrefix(text, subject + ": "));
         if (kind >= CE_Failure && firstError.empty()) firstError = text;
     } catch (const std::bad_alloc&) {
         TakeLoss(kind);
@@ -76,9 +75,7 @@ std::string TakeGdalError(const std::string& file) {
 DatasetPtr OpenDataset(const std::string& name, const std::vector<std::string>& options) {
     CPLStringList list;
     for (const std::string& option : options) list.AddString(option.c_str());
-    if (const platform::FileStatus status = platform::StatusOf(name);
-        status.exists && !status.isRegular && !status.isFolder)
-        throw Failure(name, "it is not a regular file");
+    if (platform::StatusOf(name).IsSpecial()) throw Failure(name, "it is not a regular file");
     TakeGdalError(name);
     SetSubject(name);
     DatasetPtr dataset(GDALDataset::Open(name.c_str(), GDAL_OF_RASTER | GDAL_OF_VERBOSE_ERROR,

@@ -150,7 +150,7 @@ Json Describe(const std::string& file, std::size_t mostColors) {
         return document;
     const zmchost::Raster raster = OpenPyramid(file);
     if (const std::string wrong = raster.DocumentFault(); !wrong.empty()) {
-        Warn(file + ": warning: " + wrong + "; statistics, histograms and palettes are not shown");
+        Warn(file, wrong + "; statistics, histograms and palettes are not shown");
         return document;
     }
     zelm::VisitElementType(raster.PixelType(), [&]<class T>(std::type_identity<T>) {

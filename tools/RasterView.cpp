@@ -75,13 +75,7 @@ public:
             FailAsChanged(Name(), change);
     }
     std::uint32_t TileSide() const override { return raster.TileSide(); }
-    void CheckReadable() override {
-        if (!raster.IsComplete())
-            throw zmchost::Error(raster.Name(), "read its pixels",
-                                 "the file is incomplete, " +
-                                     std::to_string(raster.Header().BytesMissing()) +
-                                     " bytes are missing");
-    }
+    void CheckReadable() override { raster.CheckComplete("read its pixels"); }
 
 private:
     Identity before;
@@ -122,15 +116,16 @@ private:
 };
 
 void TellRecovery(const std::string& name, const std::string& text) {
-    if (!text.empty()) Warn(Visible(name) + ": warning: " + text);
+    if (!text.empty()) Warn(name, text);
 }
 
 }  // namespace
 
 void RasterView::CheckLevel(std::uint32_t level) const {
     if (level >= MinLevel() && level <= MaxLevel()) return;
-    throw UsageError("--level", "there is no level " + std::to_string(level) + ": " + Name() +
-                                    " has the levels " + std::to_string(MinLevel()) + " to " +
+    throw UsageError("--level", "there is no level " + std::to_string(level) + ": " +
+                                    Visible(Name()) + " has the levels " +
+                                    std::to_string(MinLevel()) + " to " +
                                     std::to_string(MaxLevel()));
 }
 
@@ -143,9 +138,7 @@ bool IsPyramidFile(const std::string& name) {
 }
 
 void CheckIsNoDevice(const std::string& name) {
-    const platform::FileStatus status = platform::StatusOf(name);
-    if (status.exists && !status.isRegular && !status.isFolder)
-        throw Failure(name, "it is not a regular file");
+    if (platform::StatusOf(name).IsSpecial()) throw Failure(name, "it is not a regular file");
 }
 
 void CheckIsFile(const std::string& name) {
@@ -153,6 +146,11 @@ void CheckIsFile(const std::string& name) {
     if (!status.exists) throw Failure(name, "there is no such file");
     if (status.isFolder) throw Failure(name, "it is a folder");
     CheckIsNoDevice(name);
+}
+
+void FailAsIncomplete(const std::string& name, const std::string& bytes) {
+    throw Failure(
+        name, "the pyramid is incomplete, " + bytes + " bytes of tiles are missing; build it anew");
 }
 
 zmchost::PyramidFileInfo ReadLayout(const std::string& name) {

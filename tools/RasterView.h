@@ -66,6 +66,9 @@ void CheckIsFile(const std::string& name);
 // Throws Failure if the name is that of something else than a file or a folder.
 void CheckIsNoDevice(const std::string& name);
 
+// Throws the Failure of a pyramid that lacks so many bytes.
+[[noreturn]] void FailAsIncomplete(const std::string& name, const std::string& bytes);
+
 // The layout of a pyramid file, with a warning of a store into it that was cut off. Throws Failure,
 // or what its reader throws.
 zmchost::PyramidFileInfo ReadLayout(const std::string& name);

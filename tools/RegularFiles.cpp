@@ -14,8 +14,7 @@ namespace {
 // 0, or the error by which a file does not open. GDAL calls from C, so that nothing is thrown.
 int Refusal(const char* name) noexcept {
     try {
-        const platform::FileStatus status = platform::StatusOf(name);
-        return status.exists && !status.isRegular && !status.isFolder ? EINVAL : 0;
+        return platform::StatusOf(name).IsSpecial() ? EINVAL : 0;
     } catch (const std::bad_alloc&) {
         return ENOMEM;
     }
