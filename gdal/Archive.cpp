@@ -185,9 +185,8 @@ bool Archive::Store(Setter&& setter) {
 
 void Archive::CheckElements() {
     if (!elements) elements = documentExists ? raster.Get().DocumentElements() : 0;
-    const std::string wrong =
-        zmchost::Limits::Judge("elements", *elements, zmchost::Limits::Current().elements,
-                               "it has " + std::to_string(*elements) + " elements");
+    const std::string wrong = zmchost::Limits::Judge(
+        &zmchost::Limits::elements, *elements, "it has " + std::to_string(*elements) + " elements");
     if (!wrong.empty())
         throw zmchost::Error(raster.Name(), "store into its metadata document", wrong);
 }

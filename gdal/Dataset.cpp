@@ -79,9 +79,8 @@ void OpenFile::CheckTile(std::uint32_t level, std::uint32_t bands, const char* o
     const std::uint64_t bytes = std::uint64_t{std::min(grid.tileSize, grid.samples)} *
                                 std::min(grid.tileSize, grid.lines) * bands *
                                 zelm::PixelSize(info.header.pixelType);
-    const std::string wrong =
-        zmchost::Limits::Judge("tile", bytes, zmchost::Limits::Current().tile,
-                               "its tiles have " + std::to_string(bytes) + " bytes");
+    const std::string wrong = zmchost::Limits::Judge(
+        &zmchost::Limits::tile, bytes, "its tiles have " + std::to_string(bytes) + " bytes");
     if (!wrong.empty()) throw zmchost::Error(raster.Name(), operation, wrong);
 }
 

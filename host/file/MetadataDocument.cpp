@@ -57,7 +57,7 @@ std::string JudgeSize(const std::string& subject, std::uint64_t bytes) {
     if (bytes > zelm::kMaxDocumentBytes)
         return subject + " is longer than " + std::to_string(zelm::kMaxDocumentBytes >> 20) +
                " MiB";
-    return Limits::Judge("document", bytes, Limits::Current().document,
+    return Limits::Judge(&Limits::document, bytes,
                          subject + " has " + std::to_string(bytes) + " bytes");
 }
 
