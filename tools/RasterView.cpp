@@ -8,6 +8,7 @@
 #include <utility>
 
 #include "core/PixelVocabulary.h"
+#include "files/FileSource.h"
 #include "format/PyramidHeaderRecord.h"
 #include "gdal/Dataset.h"
 #include "gdal/GdalRasterSource.h"
@@ -26,10 +27,7 @@ constexpr std::uint64_t kStripBudget = std::uint64_t{32} << 20;
 using zelm::files::Identity;
 
 Identity IdentityOf(const std::string& name) {
-    platform::FileIdentity found;
-    const zelm::String wide(name.c_str());
-    if (!wide.wide || !platform::TellIdentity(wide.wide, found)) return {};
-    return {true, found.device, found.number, found.size, found.modified, found.changed};
+    return zelm::files::FileSource::IdentifyName(zelm::String(name.c_str()));
 }
 
 // Two writes within a tick of the file system's clock look like one: a file that was written a
@@ -47,10 +45,6 @@ Identity IdentityAtRest(const std::string& name) {
         now = IdentityOf(name);
     }
     return now;
-}
-
-[[noreturn]] void FailAsChanged(const std::string& name, const std::string& change) {
-    throw Failure(name, "it changed while it was read: " + change);
 }
 
 class PyramidView final : public RasterView {
@@ -146,6 +140,10 @@ void CheckIsFile(const std::string& name) {
     if (!status.exists) throw Failure(name, "there is no such file");
     if (status.isFolder) throw Failure(name, "it is a folder");
     CheckIsNoDevice(name);
+}
+
+void FailAsChanged(const std::string& name, const std::string& change) {
+    throw Failure(name, "it changed while it was read: " + change);
 }
 
 void FailAsIncomplete(const std::string& name, const std::string& bytes) {

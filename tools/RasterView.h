@@ -66,6 +66,8 @@ void CheckIsFile(const std::string& name);
 // Throws Failure if the name is that of something else than a file or a folder.
 void CheckIsNoDevice(const std::string& name);
 
+// Throws the Failure of what did not stay as it was.
+[[noreturn]] void FailAsChanged(const std::string& name, const std::string& change);
 // Throws the Failure of a pyramid that lacks so many bytes.
 [[noreturn]] void FailAsIncomplete(const std::string& name, const std::string& bytes);
 
