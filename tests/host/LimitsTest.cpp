@@ -102,9 +102,17 @@ TEST_F(LimitsTest, WhatIsNotUnderstoodIsRefusedAndChangesNothing) {
 }
 
 TEST_F(LimitsTest, WhatIsBeyondALimitIsToldWithTheWayToRaiseIt) {
-    EXPECT_EQ(Limits::Judge("bands", 9, 9, "it has 9 bands"), "");
-    EXPECT_EQ(Limits::Judge("bands", 10, 9, "it has 10 bands"),
+    const Limits limits = After("bands=9");
+    EXPECT_EQ(limits.Judge(&Limits::bands, 9, "it has 9 bands"), "");
+    EXPECT_EQ(limits.Judge(&Limits::bands, 10, "it has 10 bands"),
               "it has 10 bands, beyond the limit of 9; ZMC_LIMITS=bands=10 raises it");
+    EXPECT_EQ(
+        Limits().Judge(&Limits::document, (1u << 28) + 1, "it has more"),
+        "it has more, beyond the limit of 268435456; ZMC_LIMITS=document=268435457 raises it");
+}
+
+TEST_F(LimitsTest, TellTheirNamesAndValues) {
+    EXPECT_EQ(Limits().Text(), "bands=65536, tile=16M, elements=131072, header=4M, document=256M");
 }
 
 // The environment is asked once in a process; each of these has one of its own.

@@ -145,6 +145,21 @@ class Names(ToolTest):
         self.assertTrue(self.check(self.run_tool("hash", name), 1)
                         .startswith(f"zmcraster: {self.SHOWN}: cannot read "))
 
+    def test_warnings_and_parts_of_messages_show_them_too(self):
+        self.pyramid()
+        os.rename(self.path("picture.pyr"), self.path(self.EVIL))
+        self.assertIn(": " + self.SHOWN + " has the levels",
+                      self.check(self.run_tool("export", self.EVIL, "x.tif", "--level", "9"), 2))
+        with open(self.path(self.EVIL), "ab") as file:
+            file.write(b"<")
+        self.assertTrue(self.run_tool("info", self.EVIL).stderr.startswith(
+            f"zmcraster: {self.SHOWN}: warning: the metadata document is malformed"))
+        geotiff(self.path("wide.tif"), samples("Int64", 20, 30, 1), "Int64")
+        done = self.run_tool("build", "wide.tif", self.EVIL, "--overwrite", "--nodata", str(2**62 + 1))
+        self.assertTrue(self.check(done, 0).endswith("\n"))
+        self.assertTrue(done.stderr.startswith(
+            f"zmcraster: {self.SHOWN}: warning: a pyramid does not keep the last digits"), done)
+
     def test_documents_have_them_exactly(self):
         self.pyramid()
         os.rename(self.path("picture.pyr"), self.path(self.EVIL))
