@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cmath>
+#include <span>
 
 #include "colour/ColorList.h"
 #include "core/ElementTypes.h"
@@ -31,8 +32,14 @@ inline constexpr bool kIsInteger = std::is_integral_v<T>;
 
 template <class T>
 StoredStatistics Convert(const zelm::RasterBandStats<T>& record) {
-    return {record.flags, ToDouble(record.minimum), ToDouble(record.maximum), record.mean,
-            record.standardDeviation};
+    return {record.flags, ToDouble(record.minimum),  ToDouble(record.maximum),
+            record.mean,  record.standardDeviation, 0};
+}
+
+// Of a record among those of its kind.
+template <class Record>
+std::uint32_t PlaceOf(const Record& record, std::span<const Record> all) {
+    return static_cast<std::uint32_t>(&record - all.data());
 }
 
 // Bins of integers divide [minimum, maximum + 1) as a rule. Where their width is a whole number it
@@ -131,7 +138,10 @@ auto* Archive::Recall(Map& known, const typename Map::key_type& key, Look&& look
 const StoredStatistics* Archive::Statistics(std::uint32_t band) {
     return Recall(statistics, band, [&](const auto& records) {
         const auto* const newest = records.NewestStatistics(band);
-        return newest ? std::optional(Convert(*newest)) : std::nullopt;
+        if (!newest) return std::optional<StoredStatistics>();
+        StoredStatistics found = Convert(*newest);
+        found.place = PlaceOf(*newest, records.Statistics());
+        return std::optional(found);
     });
 }
 
@@ -143,8 +153,30 @@ const StoredHistogram* Archive::Histogram(std::uint32_t band, std::uint32_t leve
             return each.band == band && each.level == level && each.binCount != 0 &&
                    each.counts.data && each.counts.shape.elements != 0;
         });
-        return newest != all.rend() ? std::optional(Convert(*newest)) : std::nullopt;
+        if (newest == all.rend()) return std::optional<StoredHistogram>();
+        StoredHistogram found = Convert(*newest);
+        found.place = PlaceOf(*newest, all);
+        return std::optional(std::move(found));
     });
+}
+
+void Archive::Forget() {
+    raster.Forget();
+    documentExists = true;
+    elements.reset();
+    statistics.clear();
+    histograms.clear();
+    colorTables.clear();
+}
+
+RecordCounts Archive::Counts() const {
+    RecordCounts counts;
+    if (documentExists)
+        LookAtRecords([&](const auto& records) {
+            counts = {static_cast<std::uint32_t>(records.Statistics().size()),
+                      static_cast<std::uint32_t>(records.Histograms().size())};
+        });
+    return counts;
 }
 
 GDALColorTable* Archive::ColorTable(std::uint32_t band) {

@@ -27,6 +27,7 @@ struct StoredStatistics {
     double maximum = 0;
     double mean = 0;
     double standardDeviation = 0;
+    std::uint32_t place = 0;
 
     // Minimum, maximum, mean and standard deviation are all there.
     bool IsFull() const;
@@ -40,6 +41,13 @@ struct StoredHistogram {
     double lower = 0;
     double upper = 0;
     std::vector<GUIntBig> counts;
+    std::uint32_t place = 0;
+};
+
+// Records that a document has, of all bands.
+struct RecordCounts {
+    std::uint32_t statistics = 0;
+    std::uint32_t histograms = 0;
 };
 
 class Archive {
@@ -52,6 +60,10 @@ public:
     const StoredStatistics* Statistics(std::uint32_t band);
     const StoredHistogram* Histogram(std::uint32_t band, std::uint32_t level);
     GDALColorTable* ColorTable(std::uint32_t band);
+    // The document is another one now.
+    void Forget();
+    // Those that there are now.
+    RecordCounts Counts() const;
     // Whether what Statistics gave last for that band will be given again.
     bool RemembersStatistics(std::uint32_t band) const;
 

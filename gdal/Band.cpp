@@ -15,19 +15,6 @@
 namespace zmcgdal {
 namespace {
 
-constexpr const char* kStructureDomain = "IMAGE_STRUCTURE";
-
-bool IsDefaultDomain(const char* domain) { return !domain || *domain == '\0'; }
-
-// The shortest text that reads back as the same number.
-std::string NumberText(double value) {
-    for (int digits = 15; digits < 17; ++digits) {
-        const std::string text = CPLSPrintf("%.*g", digits, value);
-        if (CPLAtof(text.c_str()) == value) return text;
-    }
-    return CPLSPrintf("%.17g", value);
-}
-
 // Signed bytes that GDAL holds as 16 bits, back to bytes, in place.
 void NarrowSamples(std::vector<unsigned char>& samples) {
     const std::size_t count = samples.size() / sizeof(std::int16_t);
@@ -62,11 +49,6 @@ Band::Band(Dataset& dataset, int number)
 Band::~Band() = default;
 
 Band* Band::MainBand() { return static_cast<Band*>(owner.Main().GetRasterBand(nBand)); }
-
-// Storing a document behind unfinished tiles would make the file look finished.
-bool Band::StoresInFile() const {
-    return eAccess == GA_Update && !owner.IsOverview() && owner.File().info.complete;
-}
 
 // --- pixels ---
 
@@ -171,17 +153,7 @@ std::vector<unsigned char> Band::GatherTile(int blockX, int blockY, const zelm::
 }
 
 // Its samples are in the file with those of its tile.
-void Band::WaitingBlock::Settle() const {
-    if (block->GetDirty()) band->DropSidecarStatistics();
-    block->MarkClean();
-}
-
-// Nobody takes them for the new pixels. A sidecar without any is not written for this.
-void Band::DropSidecarStatistics() {
-    if (owner.IsOverview()) return;
-    char** const items = GDALPamRasterBand::GetMetadata("");
-    if (HasStatistics(items)) GDALPamRasterBand::SetMetadata(WithoutStatistics(items).List(), "");
-}
+void Band::WaitingBlock::Settle() const { block->MarkClean(); }
 
 CPLErr Band::IWriteBlock(int blockX, int blockY, void* data) {
     TileReader& tiles = owner.File().tiles;
@@ -193,8 +165,10 @@ CPLErr Band::IWriteBlock(int blockX, int blockY, void* data) {
         const auto samples = GatherTile(blockX, blockY, tile, data, bands, waiting);
         // What a write that fails leaves in the tile is anything.
         tiles.Forget();
+        LetRecordsAge();
+        for (const WaitingBlock& other : waiting)
+            if (other.block->GetDirty()) other.band->LetRecordsAge();
         owner.File().raster.Get().Write(owner.Level(), tile, bands, samples.data());
-        DropSidecarStatistics();
         for (const WaitingBlock& other : waiting) other.Settle();
         for (const std::uint32_t band : bands)
             if (creation) creation->MarkWritten(BlockNumber(blockX, blockY), band);
@@ -341,6 +315,17 @@ GDALRasterBand* Band::GetOverview(int overview) {
 
 // --- colours ---
 
+// Of a file that has a table nobody would see another one beside it.
+CPLErr Band::KeepColorTable(GDALColorTable* table) {
+    if (!owner.IsOverview() && owner.File().archive.ColorTable(index)) {
+        ReportError(CE_Failure, CPLE_NoWriteAccess,
+                    "the color table is in the file: open it for update");
+        return CE_Failure;
+    }
+    const CPLErr kept = GDALPamRasterBand::SetColorTable(table);
+    return kept == CE_None ? owner.SaveSidecarNow() : kept;
+}
+
 GDALColorInterp Band::DefaultInterpretation() {
     const int bands = owner.GetRasterCount();
     const auto* const first = static_cast<Band*>(owner.GetRasterBand(1));
@@ -370,148 +355,9 @@ GDALColorTable* Band::GetColorTable() {
 
 CPLErr Band::SetColorTable(GDALColorTable* table) {
     return Reporting(CE_Failure, [&] {
-        if (!StoresInFile()) return GDALPamRasterBand::SetColorTable(table);
+        if (!StoresInFile() || owner.IsOverview()) return KeepColorTable(table);
         if (owner.File().archive.StoreColorTable(index, table)) return CE_None;
         ReportError(CE_Failure, CPLE_FileIO, "the color table was not stored");
-        return CE_Failure;
-    });
-}
-
-// --- statistics and metadata ---
-
-const StoredStatistics* Band::Stored() {
-    return owner.IsOverview() ? nullptr : owner.File().archive.Statistics(index);
-}
-
-const CPLStringList& Band::StatisticsItems() {
-    if (statisticsFetched) return statistics;
-    statistics.Clear();
-    const StoredStatistics* const stored = Stored();
-    statisticsFetched = owner.IsOverview() || owner.File().archive.RemembersStatistics(index);
-    if (!stored) return statistics;
-    const auto set = [&](std::uint32_t flag, const char* name, double value) {
-        if (stored->flags & flag) statistics.SetNameValue(name, NumberText(value).c_str());
-    };
-    set(zelm::StatsFlag::Minimum, "STATISTICS_MINIMUM", stored->minimum);
-    set(zelm::StatsFlag::Maximum, "STATISTICS_MAXIMUM", stored->maximum);
-    set(zelm::StatsFlag::Mean, "STATISTICS_MEAN", stored->mean);
-    set(zelm::StatsFlag::StandardDeviation, "STATISTICS_STDDEV", stored->standardDeviation);
-    return statistics;
-}
-
-char** Band::GetMetadataDomainList() {
-    return Reporting<char**>(nullptr, [&]() -> char** {
-        return BuildMetadataDomainList(GDALPamRasterBand::GetMetadataDomainList(), TRUE, "",
-                                       kStructureDomain, nullptr);
-    });
-}
-
-char** Band::GetMetadata(const char* domain) {
-    return Reporting<char**>(nullptr, [&]() -> char** {
-        if (domain && EQUAL(domain, kStructureDomain) && structure.Count() > 0)
-            return structure.List();
-        if (!IsDefaultDomain(domain) || StatisticsItems().Count() == 0)
-            return GDALPamRasterBand::GetMetadata(domain);
-        merged = CPLStringList(CSLDuplicate(GDALPamRasterBand::GetMetadata(domain)));
-        for (int i = 0; i < statistics.Count(); ++i) {
-            char* name = nullptr;
-            const char* const value = CPLParseNameValue(statistics[i], &name);
-            merged.SetNameValue(name, value);
-            CPLFree(name);
-        }
-        return merged.List();
-    });
-}
-
-const char* Band::GetMetadataItem(const char* name, const char* domain) {
-    return Reporting<const char*>(nullptr, [&]() -> const char* {
-        if (domain && EQUAL(domain, kStructureDomain) && structure.Count() > 0)
-            return structure.FetchNameValue(name);
-        if (IsDefaultDomain(domain) && STARTS_WITH_CI(name, "STATISTICS_"))
-            if (const char* const value = StatisticsItems().FetchNameValue(name)) return value;
-        return GDALPamRasterBand::GetMetadataItem(name, domain);
-    });
-}
-
-double Band::GetMinimum(int* success) {
-    ReportSuccess(success, false);
-    return Reporting<double>(0.0, [&]() -> double {
-        const StoredStatistics* const stored = Stored();
-        if (!stored || !(stored->flags & zelm::StatsFlag::Minimum))
-            return GDALPamRasterBand::GetMinimum(success);
-        ReportSuccess(success, true);
-        return stored->minimum;
-    });
-}
-
-double Band::GetMaximum(int* success) {
-    ReportSuccess(success, false);
-    return Reporting<double>(0.0, [&]() -> double {
-        const StoredStatistics* const stored = Stored();
-        if (!stored || !(stored->flags & zelm::StatsFlag::Maximum))
-            return GDALPamRasterBand::GetMaximum(success);
-        ReportSuccess(success, true);
-        return stored->maximum;
-    });
-}
-
-CPLErr Band::GetStatistics(int approximate, int force, double* minimum, double* maximum,
-                           double* mean, double* deviation) {
-    return Reporting(CE_Failure, [&] {
-        const StoredStatistics* const stored = Stored();
-        if (!stored || !stored->IsFull())
-            return GDALPamRasterBand::GetStatistics(approximate, force, minimum, maximum, mean,
-                                                    deviation);
-        if (minimum) *minimum = stored->minimum;
-        if (maximum) *maximum = stored->maximum;
-        if (mean) *mean = stored->mean;
-        if (deviation) *deviation = stored->standardDeviation;
-        return CE_None;
-    });
-}
-
-CPLErr Band::SetStatistics(double minimum, double maximum, double mean, double deviation) {
-    return Reporting(CE_Failure, [&] {
-        if (!StoresInFile())
-            return GDALPamRasterBand::SetStatistics(minimum, maximum, mean, deviation);
-        constexpr std::uint32_t kFlags = zelm::StatsFlag::Minimum | zelm::StatsFlag::Maximum |
-                                         zelm::StatsFlag::Mean | zelm::StatsFlag::StandardDeviation;
-        statisticsFetched = false;
-        if (owner.File().archive.StoreStatistics(index,
-                                                 {kFlags, minimum, maximum, mean, deviation}))
-            return CE_None;
-        ReportError(CE_Failure, CPLE_FileIO, "the statistics were not stored");
-        return CE_Failure;
-    });
-}
-
-CPLErr Band::GetDefaultHistogram(double* lower, double* upper, int* bucketCount, GUIntBig** counts,
-                                 int force, GDALProgressFunc progress, void* progressData) {
-    return Reporting(CE_Failure, [&] {
-        const StoredHistogram* const stored = owner.File().archive.Histogram(index, owner.Level());
-        if (!stored)
-            return GDALPamRasterBand::GetDefaultHistogram(lower, upper, bucketCount, counts, force,
-                                                          progress, progressData);
-        auto* const copy =
-            static_cast<GUIntBig*>(VSI_MALLOC2_VERBOSE(stored->counts.size(), sizeof(GUIntBig)));
-        if (!copy) return CE_Failure;
-        std::copy(stored->counts.begin(), stored->counts.end(), copy);
-        *lower = stored->lower;
-        *upper = stored->upper;
-        *bucketCount = static_cast<int>(stored->counts.size());
-        *counts = copy;
-        return CE_None;
-    });
-}
-
-CPLErr Band::SetDefaultHistogram(double lower, double upper, int bucketCount, GUIntBig* counts) {
-    return Reporting(CE_Failure, [&] {
-        if (!StoresInFile() || bucketCount <= 0)
-            return GDALPamRasterBand::SetDefaultHistogram(lower, upper, bucketCount, counts);
-        StoredHistogram histogram{index, owner.Level(), lower, upper, {}};
-        histogram.counts.assign(counts, counts + bucketCount);
-        if (owner.File().archive.StoreHistogram(histogram)) return CE_None;
-        ReportError(CE_Failure, CPLE_FileIO, "the histogram was not stored");
         return CE_Failure;
     });
 }

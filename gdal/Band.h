@@ -1,8 +1,10 @@
 // Band: one band of one level.
 //
 // Statistics, histograms and palettes come from the file, without a scan; where the file has none,
-// from the sidecar. In update mode they are stored in the file. When pixels change, statistics in
-// the sidecar go; those in the file stay until newer ones are stored.
+// from the sidecar. In update mode they are stored in the file. The file's records stay what they
+// are when pixels change, or when others are wanted than they are; the sidecar then tells how many
+// of them, from the first, no longer count, so that those stored later do. Pixels and colours are
+// in Band.cpp, the records in BandRecords.cpp.
 #ifndef ZMC_GDAL_BAND_H
 #define ZMC_GDAL_BAND_H
 
@@ -13,6 +15,7 @@
 #include <vector>
 
 #include "gdal/Dataset.h"
+#include "host/build/FullStatistics.h"
 
 namespace zmcgdal {
 
@@ -45,14 +48,39 @@ public:
     GDALColorTable* GetColorTable() override;
     CPLErr SetColorTable(GDALColorTable* table) override;
 
+    // Lets so many records of the file, and no others, count no longer.
+    void SetOldRecords(const RecordCounts& counts);
+    RecordCounts OldRecords();
+    // Those of the file that count; null where there are none.
+    const StoredStatistics* Stored();
+    const StoredHistogram* CurrentHistogram();
+    // Lets what the file and the sidecar have of statistics count no longer.
+    void ForgetStatistics() {
+        HideStatistics();
+        DropSidecarStatistics();
+    }
+    // These were just stored in the file whose archive that is: they count, and the sidecar keeps
+    // what digits the file does not; renewed ones take the place of all that the sidecar has. It
+    // is not written yet.
+    void KeepFull(const zmchost::FullStatistics& full, Archive& inFile);
+    void TakeRenewed(const zmchost::FullStatistics& full);
+    // Whether pixels were written since the dataset was opened.
+    bool IsEdited() const { return edited; }
+
     char** GetMetadataDomainList() override;
     char** GetMetadata(const char* domain = "") override;
     const char* GetMetadataItem(const char* name, const char* domain = "") override;
+
+    CPLErr SetMetadata(char** items, const char* domain = "") override;
+    CPLErr SetMetadataItem(const char* name, const char* value, const char* domain = "") override;
 
     double GetMinimum(int* success = nullptr) override;
     double GetMaximum(int* success = nullptr) override;
     CPLErr GetStatistics(int approximate, int force, double* minimum, double* maximum, double* mean,
                          double* deviation) override;
+    CPLErr ComputeStatistics(int approximate, double* minimum, double* maximum, double* mean,
+                             double* deviation, GDALProgressFunc progress,
+                             void* progressData) override;
     CPLErr SetStatistics(double minimum, double maximum, double mean, double deviation) override;
     CPLErr GetDefaultHistogram(double* lower, double* upper, int* bucketCount, GUIntBig** counts,
                                int force, GDALProgressFunc progress, void* progressData) override;
@@ -72,6 +100,8 @@ private:
     std::unique_ptr<GDALRasterBand> ownMask;
     CPLStringList statistics;  // as metadata; filled when first asked for
     bool statisticsFetched = false;
+    bool computing = false;  // statistics, which are stored on the way
+    bool edited = false;
     CPLStringList merged;  // statistics and the sidecar's metadata
     CPLStringList structure;
 
@@ -98,11 +128,24 @@ private:
                                           const void* data, std::vector<std::uint32_t>& bands,
                                           WaitingBlocks& waiting);
 
+    void LetRecordsAge();
     void DropSidecarStatistics();
+    std::uint32_t CountOfOld(const char* item);
+    void SetCountOfOld(const char* item, std::uint32_t count);
+    void HideStatistics(const Archive& inFile);
+    void HideStatistics() { HideStatistics(owner.File().archive); }
+    void HideHistograms();
+    void TakeStatisticsOver();
+    CPLErr KeepInMemory(const StoredStatistics& given);
+    void KeepInSidecar(const StoredStatistics& given, const Archive& inFile);
+    void ForgetInSidecar();
+    void KeepDigits(const StoredStatistics& given, Archive& inFile);
+    void DropSidecarHistograms();
+    CPLErr KeepHistogram(double lower, double upper, int bucketCount, GUIntBig* counts);
+    CPLErr KeepColorTable(GDALColorTable* table);
     Band* MainBand();
     bool StoresInFile() const;
     const CPLStringList& StatisticsItems();
-    const StoredStatistics* Stored();
     GDALColorInterp DefaultInterpretation();
     bool UsesOwnMask();
 };

@@ -59,10 +59,13 @@ GDALDataset* CopyTo(const std::string& target, GDALDataset& source, bool strict,
     GdalRasterSource pixels(source, options.signedByte);
     if (!AcceptLosses(pixels, strict)) return nullptr;
     UseProgress(options.build, progress, progressData);
+    std::vector<zmchost::FullStatistics> statistics;
+    options.build.takeStatistics = [&](const auto& stored) { statistics = stored; };
     zmchost::PyramidBuilder(SharedModule()).Build(pixels, target, options.build);
     Unfinished made(target);
     auto dataset = OpenForUpdate(target);
     if (CopySidecar(source, *dataset, strict) != CE_None) return nullptr;
+    KeepStatistics(statistics, *dataset, dataset->File().archive);
     SaveSidecar(*dataset, target);
     made.Keep();
     return dataset.release();
@@ -172,11 +175,13 @@ CPLErr Creation::ChooseLevels(Dataset& dataset, const char* resampling, int coun
 
 bool Creation::Finish(Dataset& dataset) {
     sealed = std::find(written.begin(), written.end(), false) == written.end();
+    std::vector<zmchost::FullStatistics> statistics;
     const bool built = Reported([&] {
         if (std::find(lost.begin(), lost.end(), true) != lost.end())
             throw zmchost::Error(target, "build it", "some of its blocks could not be written");
         GdalRasterSource source(dataset, options.signedByte);
         AcceptLosses(source, false);
+        options.build.takeStatistics = [&](const auto& stored) { statistics = stored; };
         zmchost::PyramidBuilder(SharedModule()).Build(source, target, options.build);
     });
     if (!built) return false;
@@ -184,6 +189,8 @@ bool Creation::Finish(Dataset& dataset) {
     Reported([&] {
         for (int number = 1; number <= dataset.GetRasterCount(); ++number)
             static_cast<Band*>(dataset.GetRasterBand(number))->DropSidecarColors();
+        OpenFile made(target, GA_ReadOnly, OpenOptions{});
+        KeepStatistics(statistics, dataset, made.archive);
     });
     return true;
 }

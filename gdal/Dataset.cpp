@@ -2,12 +2,15 @@
 
 #include <algorithm>
 #include <climits>
+#include <cstdlib>
+#include <string_view>
 #include <utility>
 
 #include "core/PixelVocabulary.h"
 #include "gdal/Band.h"
 #include "gdal/Create.h"
 #include "gdal/LevelRefresh.h"
+#include "gdal/RecordRenewal.h"
 #include "gdal/Reporting.h"
 #include "gdal/Sidecar.h"
 #include "gdal/SidecarStage.h"
@@ -19,7 +22,9 @@ namespace zmcgdal {
 namespace {
 
 constexpr const char* kStructureDomain = "IMAGE_STRUCTURE";
-constexpr const char* kOwnDomain = "ZMCPYRAMID";
+// The dataset's own item of the sidecar: how many records, of statistics and of histograms, there
+// were when pixels began to change.
+constexpr const char* kEditing = "EDITING";
 
 constexpr std::uint64_t kMaxTileBytes = INT_MAX;
 constexpr int kMostReadyBands = 1024;  // of a level
@@ -72,7 +77,8 @@ OpenFile::OpenFile(const std::string& fileName, GDALAccess access, const OpenOpt
       info(CheckedInfo(fileName, zmchost::PyramidHeader::Read(*source, fileName))),
       raster(fileName, source, info.header, options.keepCopies),
       tiles(raster, info, GdalTypeOf(info.header.pixelType, options.signedByteAs)),
-      archive(raster, info.HasMetadataDocument(), limits) {}
+      archive(raster, info.HasMetadataDocument(), limits),
+      renewsStatistics(options.statistics) {}
 
 void OpenFile::CheckTile(std::uint32_t level, std::uint32_t bands, const char* operation) const {
     const zelm::LevelGeometry grid = info.header.Geometry(level);
@@ -103,6 +109,8 @@ Dataset::Dataset(std::shared_ptr<OpenFile> openFile, std::uint32_t levelShown, G
 Dataset::~Dataset() {
     // NOLINTNEXTLINE(bugprone-parent-virtual-call): the pixels, and the sidecar not yet.
     const bool flushed = Reported([&] { GDALDataset::FlushCache(true); });
+    if (flushed && file->renewsStatistics) Reported([&] { RenewEdited(); });
+    Reported([&] { EndEditing(); });
     // Without a raster there is nothing that a sidecar could belong to.
     if (creation && !(flushed && creation->Finish(*this))) nPamFlags &= ~GPF_DIRTY;
     Reported([&] { GDALPamDataset::FlushCache(true); });
@@ -185,6 +193,105 @@ void Dataset::LoadSidecar(const char* fileName, char** siblings) {
     oOvManager.Initialize(this, base.c_str(), staged ? nullptr : siblings);
     // Without this GDAL looks for a mask beside the usual name, when it is asked for one.
     if (staged) oOvManager.HaveMaskFile(nullptr, base.c_str());
+    LoadNote();
+}
+
+// --- what the sidecar tells of records ---
+
+void Dataset::LoadNote() {
+    const char* const note = GDALPamDataset::GetMetadataItem(kEditing, kOwnDomain);
+    const CPLStringList counts(CSLTokenizeString(note ? note : ""));
+    const auto count = [&](int place) {
+        const char* const text = place < counts.Count() ? counts[place] : "0";
+        return static_cast<std::uint32_t>(std::strtoul(text, nullptr, 10));
+    };
+    inDoubt = {count(0), count(1)};
+}
+
+void Dataset::NoteEditing() {
+    if (editing) return;
+    editing = true;
+    const RecordCounts now = file->archive.Counts();
+    const std::string note = std::to_string(now.statistics) + " " + std::to_string(now.histograms);
+    GDALPamDataset::SetMetadataItem(kEditing, note.c_str(), kOwnDomain);
+    if (SaveSidecarNow(CE_Warning) != CE_None)
+        ReportError(CE_Warning, CPLE_FileIO,
+                    "its statistics cannot be marked as those of pixels that have changed");
+}
+
+void Dataset::RenewEdited() {
+    if (creation || main) return;
+    std::vector<std::uint32_t> bands;
+    for (int number = 1; number <= nBands; ++number)
+        if (static_cast<Band*>(GetRasterBand(number))->IsEdited())
+            bands.push_back(static_cast<std::uint32_t>(number - 1));
+    if (!bands.empty()) RenewRecords(*this, bands);
+}
+
+// The bands have marks of their own by now.
+void Dataset::EndEditing() {
+    if (!editing) return;
+    editing = false;
+    const bool left = inDoubt.statistics != 0 || inDoubt.histograms != 0;
+    const std::string note =
+        std::to_string(inDoubt.statistics) + " " + std::to_string(inDoubt.histograms);
+    GDALPamDataset::SetMetadataItem(kEditing, left ? note.c_str() : nullptr, kOwnDomain);
+}
+
+void Dataset::SettleRecords() {
+    inDoubt = {};
+    if (!editing) GDALPamDataset::SetMetadataItem(kEditing, nullptr, kOwnDomain);
+}
+
+CPLErr Dataset::SaveSidecarNow(CPLErr kind) {
+    if (creation || main) return CE_None;
+    if (!psPam) {
+        if (kind == CE_Failure)
+            ReportError(kind, CPLE_NoWriteAccess, "it has no sidecar to store this in");
+        return kind;
+    }
+    if ((nPamFlags & GPF_DIRTY) == 0) return CE_None;
+    failureKind = kind;
+    const CPLErr saved = TrySaveXML();
+    failureKind = CE_None;
+    return saved == CE_None ? CE_None : kind;
+}
+
+// GDAL looks neither at what closing a file answers nor at what is there then.
+bool Dataset::SidecarIsWhole() const {
+    constexpr std::string_view kEnd = "</PAMDataset>";
+    VSILFILE* const sidecar = VSIFOpenL(psPam->pszPamFilename, "rb");
+    if (!sidecar) return true;  // there was nothing to say
+    char end[32] = {};
+    VSIFSeekL(sidecar, 0, SEEK_END);
+    const vsi_l_offset size = VSIFTellL(sidecar);
+    VSIFSeekL(sidecar, size > sizeof end ? size - sizeof end : 0, SEEK_SET);
+    const std::size_t read = VSIFReadL(end, 1, sizeof end, sidecar);
+    VSIFCloseL(sidecar);
+    return std::string_view(end, read).find(kEnd) != std::string_view::npos;
+}
+
+// A warning to GDAL, which a program need not look at. Whoever opens for reading alone may have no
+// right to write there.
+CPLErr Dataset::TrySaveXML() {
+    return Reporting(CE_Failure, [&] {
+        const CPLErr saved = GDALPamDataset::TrySaveXML();
+        if (!psPam || !psPam->pszPamFilename || (nPamFlags & GPF_NOSAVE) != 0) return saved;
+        if (saved == CE_None && SidecarIsWhole()) return CE_None;
+        const CPLErr usual = eAccess == GA_Update ? CE_Failure : CE_Warning;
+        const CPLErr kind = failureKind != CE_None ? failureKind : usual;
+        ReportError(kind, CPLE_FileIO, "%s could not be written", psPam->pszPamFilename);
+        return kind;
+    });
+}
+
+void Dataset::ClearStatistics() {
+    Reported([&] {
+        if (creation || main) return GDALPamDataset::ClearStatistics();
+        for (int number = 1; number <= nBands; ++number)
+            static_cast<Band*>(GetRasterBand(number))->ForgetStatistics();
+        SaveSidecarNow();
+    });
 }
 
 bool Dataset::ReadsDirectly(int x, int y, int width, int height) const {
@@ -314,9 +421,12 @@ CPLErr Dataset::IBuildOverviews(const char* resampling, int overviewCount, const
 // The sidecar of a raster that there is not yet waits for it.
 Dataset::Flushed Dataset::FlushCache(bool atClosing) {
     return ReportingFlush([&] {
-        if (!creation) return GDALPamDataset::FlushCache(atClosing);
-        // NOLINTNEXTLINE(bugprone-parent-virtual-call): the pixels alone.
-        return GDALDataset::FlushCache(atClosing);
+        // NOLINTNEXTLINE(bugprone-parent-virtual-call): the pixels alone, and the sidecar then.
+        if (creation) return GDALDataset::FlushCache(atClosing);
+        // NOLINTNEXTLINE(bugprone-parent-virtual-call): likewise.
+        if (editing) GDALDataset::FlushCache(atClosing);
+        EndEditing();
+        return GDALPamDataset::FlushCache(atClosing);
     });
 }
 

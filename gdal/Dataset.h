@@ -26,6 +26,9 @@ namespace zmcgdal {
 
 class Creation;
 
+// Of metadata that describe the file; what the sidecar has in it is the driver's own.
+inline constexpr const char* kOwnDomain = "ZMCPYRAMID";
+
 // What all levels of an open file share.
 class OpenFile {
 public:
@@ -45,6 +48,7 @@ public:
     LazyRaster raster;
     TileReader tiles;
     Archive archive;
+    const bool renewsStatistics;  // OpenOptions::statistics
 };
 
 class Dataset final : public GDALPamDataset {
@@ -83,6 +87,20 @@ public:
     // the tiles that it touches, or these are very large; and no block waits to be written.
     bool ReadsDirectly(int x, int y, int width, int height) const;
 
+    // Tells whoever opens the file from now on that its records may be of other pixels than it
+    // has: on the disk before the first pixel is written, until FlushCache has written all. A
+    // warning, if that cannot be kept.
+    void NoteEditing();
+    // The records of all bands that an editing which was cut off has left in doubt.
+    RecordCounts OldRecords() const { return inDoubt; }
+    // No record is in doubt any more.
+    void SettleRecords();
+
+    // Writes what was set for the sidecar, if this raster has one; `kind` is reported and answered
+    // where that fails.
+    CPLErr SaveSidecarNow(CPLErr kind = CE_Failure);
+    void ClearStatistics() override;
+
     // Makes this dataset the place where pixels of a new file are gathered; see gdal/Create.h.
     void BeginCreation(std::unique_ptr<Creation> state);
     Creation* UnderCreation() { return creation.get(); }
@@ -105,6 +123,7 @@ public:
 
 protected:
     int CloseDependentDatasets() override;
+    CPLErr TrySaveXML() override;
 
 private:
     Dataset(std::shared_ptr<OpenFile> openFile, std::uint32_t levelShown, GDALAccess access,
@@ -113,6 +132,10 @@ private:
     void IgnoreCompanions();
     void AddOverviews();
     void DescribeFile();
+    void LoadNote();
+    void RenewEdited();
+    void EndEditing();
+    bool SidecarIsWhole() const;
     CPLStringList* OwnDomain(const char* domain);
     CPLErr ReadOrWrite(GDALRWFlag mode, int x, int y, int width, int height, void* data,
                        int bufferWidth, int bufferHeight, GDALDataType bufferType, int bandCount,
@@ -127,6 +150,10 @@ private:
     CPLStringList structure;    // domain IMAGE_STRUCTURE, when it was asked for
     CPLStringList description;  // domain ZMCPYRAMID, likewise
     std::unique_ptr<Creation> creation;
+    RecordCounts inDoubt;
+    bool editing = false;  // the sidecar says so
+    // As which a sidecar that cannot be written is reported; CE_None: by the dataset's access.
+    CPLErr failureKind = CE_None;
 };
 
 }  // namespace zmcgdal

@@ -49,6 +49,9 @@ public:
         return *raster;
     }
 
+    // What the module remembers of the file is no longer so: the next call opens it anew.
+    void Forget() { raster.reset(); }
+
     // Calls visit(zelm::RasterReader<T>&) with the module's reader. What is thrown goes to GDAL as
     // a failure, as does what the source told of the disk, and the answer is false.
     template <class Visitor>

@@ -17,6 +17,7 @@ const char* const kOpenOptionsXml = R"(<OpenOptionList>
     <Value>SIGNEDBYTE</Value>
   </Option>
   <Option name='KEEP_COPIES' type='boolean' default='NO' description='Whether stores of statistics, histograms and color tables keep what was stored before in FILE.zmcmeta until they have reached the disk'/>
+  <Option name='STATISTICS' type='boolean' default='NO' description='Whether closing renews the statistics and histograms of bands whose pixels were changed'/>
 </OpenOptionList>)";
 
 const char* const kCreationOptionsXml = R"(<CreationOptionList>
@@ -102,6 +103,7 @@ OpenOptions OpenOptionsFrom(CSLConstList options) {
     if (EQUAL(CSLFetchNameValueDef(options, "INT8_AS", "INT16"), "SIGNEDBYTE"))
         parsed.signedByteAs = SignedByteAs::FlaggedByte;
     parsed.keepCopies = CPLFetchBool(options, "KEEP_COPIES", false);
+    parsed.statistics = CPLFetchBool(options, "STATISTICS", false);
     return parsed;
 }
 

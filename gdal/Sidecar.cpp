@@ -5,6 +5,7 @@
 #include <algorithm>
 #include <string>
 
+#include "gdal/Band.h"
 #include "gdal/Dataset.h"
 #include "gdal/ErrorCatcher.h"
 #include "host/base/Error.h"
@@ -22,13 +23,27 @@ bool DescribesTheFile(const char* domain) {
 
 bool IsStatistic(const char* item) { return STARTS_WITH_CI(item, "STATISTICS_"); }
 
+void SetItems(GDALMajorObject& target, const CPLStringList& items) {
+    for (int i = 0; i < items.Count(); ++i) {
+        char* name = nullptr;
+        const char* const value = CPLParseNameValue(items[i], &name);
+        if (name) target.SetMetadataItem(name, value);
+        CPLFree(name);
+    }
+}
+
 void CopyMetadata(GDALMajorObject& source, GDALMajorObject& target) {
     CPLStringList domains(source.GetMetadataDomainList());
     if (domains.FindString("") < 0) domains.AddString("");
     for (int i = 0; i < domains.Count(); ++i) {
         if (DescribesTheFile(domains[i])) continue;
         CPLStringList items = WithoutStatistics(source.GetMetadata(domains[i]));
-        if (items.Count() > 0) target.SetMetadata(items.List(), domains[i]);
+        if (items.Count() == 0) continue;
+        // One by one, since a list without statistics removes them.
+        if (*domains[i] == '\0')
+            SetItems(target, items);
+        else
+            target.SetMetadata(items.List(), domains[i]);
     }
 }
 
@@ -78,6 +93,13 @@ CPLErr CopySidecar(GDALDataset& source, Dataset& target, bool strict) {
                           (maskFlags & (GMF_ALPHA | GMF_NODATA | GMF_ALL_VALID)) == 0;
     if (!maskFile) return CE_None;
     return GDALDriver::DefaultCopyMasks(&source, &target, strict ? TRUE : FALSE);
+}
+
+void KeepStatistics(const std::vector<zmchost::FullStatistics>& stored, Dataset& target,
+                    Archive& inFile) {
+    for (const zmchost::FullStatistics& each : stored)
+        static_cast<Band*>(target.GetRasterBand(static_cast<int>(each.band) + 1))
+            ->KeepFull(each, inFile);
 }
 
 void SaveSidecar(Dataset& dataset, const std::string& name) {

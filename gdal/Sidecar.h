@@ -6,9 +6,13 @@
 #include <gdal_priv.h>
 
 #include <string>
+#include <vector>
+
+#include "host/build/FullStatistics.h"
 
 namespace zmcgdal {
 
+class Archive;
 class Dataset;
 
 // What the names of companions of a raster end with, behind the raster's own name: GDAL's sidecar,
@@ -21,6 +25,11 @@ inline constexpr const char* kOverviewsEnding = ".ovr";
 // category names, attribute tables, colour interpretation, every metadata domain and a mask of the
 // whole dataset from `source`. Statistics are not taken: the file has its own.
 CPLErr CopySidecar(GDALDataset& source, Dataset& target, bool strict);
+
+// Has the sidecar of `target` keep the digits that a file does not of statistics that were stored
+// in it; `inFile` is that file's.
+void KeepStatistics(const std::vector<zmchost::FullStatistics>& stored, Dataset& target,
+                    Archive& inFile);
 
 // Writes what was set. Throws zmchost::Error, of the pyramid that the user calls `name`, where GDAL
 // could not save all of it; what there is of it by then is anything.

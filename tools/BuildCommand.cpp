@@ -51,6 +51,7 @@ private:
     zmchost::BuildReport Build(GDALDataset& dataset, zmcgdal::GdalRasterSource& pixels,
                                zmchost::BuildOptions options) const;
     void WriteSidecar(GDALDataset& dataset, const zmchost::BuildOptions& options,
+                      const std::vector<zmchost::FullStatistics>& statistics,
                       const std::string& built, const std::string& base) const;
     void Report(const zmchost::BuildReport& report, std::uint32_t pixelType) const;
 };
@@ -164,8 +165,10 @@ zmchost::BuildReport BuildCommand::Build(GDALDataset& dataset, zmcgdal::GdalRast
         return bar.Show(state.done, state.total);
     };
     zmcgdal::SidecarStage stage(target);
+    std::vector<zmchost::FullStatistics> statistics;
+    options.takeStatistics = [&](const auto& stored) { statistics = stored; };
     options.beforeNaming = [&](const std::string& built) {
-        WriteSidecar(dataset, options, built, stage.Begin(built));
+        WriteSidecar(dataset, options, statistics, built, stage.Begin(built));
         stage.Complete();
     };
     try {
@@ -194,6 +197,7 @@ std::vector<std::string> TranslateArguments(const zmchost::BuildOptions& options
 
 // A virtual raster selects the bands; only its metadata are looked at.
 void BuildCommand::WriteSidecar(GDALDataset& dataset, const zmchost::BuildOptions& options,
+                                const std::vector<zmchost::FullStatistics>& statistics,
                                 const std::string& built, const std::string& base) const {
     CPLStringList list;
     for (const std::string& word : TranslateArguments(options, noData))
@@ -206,7 +210,10 @@ void BuildCommand::WriteSidecar(GDALDataset& dataset, const zmchost::BuildOption
         std::make_shared<zmcgdal::OpenFile>(built, GA_Update, zmcgdal::OpenOptions{}), GA_Update);
     pyramid->LoadSidecar(base.c_str(), nullptr);
     bool kept = selected && zmcgdal::CopySidecar(*selected, *pyramid, true) == CE_None;
-    if (kept) zmcgdal::SaveSidecar(*pyramid, target);
+    if (kept) {
+        zmcgdal::KeepStatistics(statistics, *pyramid, pyramid->File().archive);
+        zmcgdal::SaveSidecar(*pyramid, target);
+    }
     pyramid.reset();
     const std::string reason = TakeGdalError(target);
     kept = kept && reason.empty();

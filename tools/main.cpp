@@ -73,6 +73,7 @@ Program::Program() {
     Add(MakeHashCommand());
     Add(MakeVerifyCommand());
     Add(MakeCompareCommand());
+    Add(MakeStatsCommand());
     Add(MakeRecoverCommand());
     app.footer(
         std::string("zmcraster COMMAND --help tells more, with examples. Bands count from 1, "

@@ -59,8 +59,9 @@ public:
                 histograms[Place(lane, band)].AddRow(row, mask, band, bands, width);
     }
 
-    void Store(Raster& target) {
-        if (!Active()) return;
+    std::vector<FullStatistics> Store(Raster& target) {
+        std::vector<FullStatistics> stored;
+        if (!Active()) return stored;
         if constexpr (!zelm::kIsComplex<T>) {
             MergeLanes(histograms);
             if constexpr (kCountsEveryValue<T>) MergeLanes(counters);
@@ -72,7 +73,9 @@ public:
             }
             target.SetStatistics(records);
             target.SetHistograms(counts);
+            for (const auto& record : records) stored.push_back(FullStatistics::Of(record));
         }
+        return stored;
     }
 
     std::uint64_t Memory() const {
@@ -217,7 +220,7 @@ public:
 
     std::string Failure() override { return target.TakeFailure(); }
 
-    void StoreStatistics() override { harvest.Store(target); }
+    std::vector<FullStatistics> StoreStatistics() override { return harvest.Store(target); }
     std::uint64_t StatisticsMemory() const override { return harvest.Memory(); }
 
 private:

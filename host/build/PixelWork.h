@@ -11,7 +11,9 @@
 #include <cstdint>
 #include <memory>
 #include <string>
+#include <vector>
 
+#include "host/build/FullStatistics.h"
 #include "host/raster/RasterSource.h"
 #include "host/reduce/Reduction.h"
 #include "raster/RasterProps.h"
@@ -56,8 +58,8 @@ public:
     virtual bool WriteTile(std::uint32_t level, const Window& tile, std::byte* pixels,
                            unsigned char* cleanMask) = 0;
 
-    // Hands statistics and histograms to the module.
-    virtual void StoreStatistics() = 0;
+    // Hands statistics and histograms to the module, and the former back; none if there are none.
+    virtual std::vector<FullStatistics> StoreStatistics() = 0;
     virtual std::uint64_t StatisticsMemory() const = 0;
 };
 

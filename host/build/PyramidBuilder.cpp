@@ -388,7 +388,8 @@ void BuildRun::CountLevel0() {
 }
 
 void BuildRun::StoreRecords() {
-    work->StoreStatistics();
+    const std::vector<FullStatistics> stored = work->StoreStatistics();
+    if (options.takeStatistics && !stored.empty()) options.takeStatistics(stored);
     for (std::uint32_t i = 0; i < bands.size(); ++i)
         if (colors[i] != 0)
             if (const zelm::PalettePtr palette = source.BandPalette(bands[i]))

@@ -23,6 +23,7 @@
 #include <vector>
 
 #include "host/base/Error.h"
+#include "host/build/FullStatistics.h"
 #include "host/raster/Module.h"
 #include "host/raster/RasterSource.h"
 #include "host/reduce/Reduction.h"
@@ -60,6 +61,8 @@ struct BuildOptions {
     bool overwrite = false;
     // Called now and then, one call at a time, on one of the build's threads; false cancels.
     std::function<bool(const BuildProgress&)> progress;
+    // Called once, before beforeNaming, with the statistics that were stored, of all bands.
+    std::function<void(const std::vector<FullStatistics>&)> takeStatistics;
     // Called once with the path of the finished file, before it gets its name: the last moment to
     // put beside the target what belongs to the new file. What it throws ends the build.
     std::function<void(const std::string& finished)> beforeNaming;
