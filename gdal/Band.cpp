@@ -202,7 +202,7 @@ CPLErr Band::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, voi
             const int band = static_cast<int>(index);
             const Target target{data, bufferType, pixelSpace, lineSpace, 0};
             if (owner.File().tiles.Read(owner.Level(), RectangleOf(x, y, width, height), &band, 1,
-                                        target))
+                                        target, extra))
                 return CE_None;
             return CE_Failure;
         }

@@ -123,8 +123,10 @@ GDALDataset* CreateNew(const char* target, int width, int height, int bands, GDA
         if (RefuseLent(target)) return nullptr;
         auto parsed = ParseCreationOptions(options);
         if (!parsed) return nullptr;
-        const zelm::RasterProps props =
-            PropsOf(target, width, height, bands, PixelTypeFor(type, parsed->signedByte));
+        // A file would open with another type than the one that was asked for.
+        const bool changes = type == GDT_CInt16 || type == GDT_CInt32;
+        const std::uint32_t pixelType = changes ? 0 : PixelTypeFor(type, parsed->signedByte);
+        const zelm::RasterProps props = PropsOf(target, width, height, bands, pixelType);
         auto spool = std::make_unique<zmchost::BuildFile>(target, true);
         const zmchost::Raster raster =
             zmchost::Raster::Create(SharedModule(), spool->Path(), props, 0);

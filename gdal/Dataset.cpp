@@ -245,7 +245,7 @@ void Dataset::SettleRecords() {
 
 CPLErr Dataset::SaveSidecarNow(CPLErr kind) {
     if (creation || main) return CE_None;
-    if (!psPam) {
+    if (!psPam || (nPamFlags & (GPF_DISABLED | GPF_NOSAVE)) != 0) {
         if (kind == CE_Failure)
             ReportError(kind, CPLE_NoWriteAccess, "it has no sidecar to store this in");
         return kind;
@@ -384,7 +384,7 @@ CPLErr Dataset::ReadOrWrite(GDALRWFlag mode, int x, int y, int width, int height
         for (int& band : bands) --band;
         const Target target{data, bufferType, pixelSpace, lineSpace, bandSpace};
         if (file->tiles.Read(level, RectangleOf(x, y, width, height), bands.data(), bandCount,
-                             target))
+                             target, extra))
             return CE_None;
         return CE_Failure;
     }

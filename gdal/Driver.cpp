@@ -87,8 +87,8 @@ void Describe(GDALDriver& driver) {
 #if GDAL_VERSION_NUM >= GDAL_COMPUTE_VERSION(3, 7, 0)
                            "Int8 "
 #endif
-                           "Byte Int16 UInt16 Int32 UInt32 Int64 UInt64 Float32 Float64 CInt16 "
-                           "CInt32 CFloat32 CFloat64");
+                           "Byte Int16 UInt16 Int32 UInt32 Int64 UInt64 Float32 Float64 "
+                           "CFloat32 CFloat64");
     driver.pfnIdentify = Identify;
     driver.pfnOpen = Open;
     driver.pfnCreateCopy = CreateCopy;

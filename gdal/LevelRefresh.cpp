@@ -1,6 +1,7 @@
 #include "gdal/LevelRefresh.h"
 
 #include <algorithm>
+#include <bit>
 #include <map>
 #include <optional>
 #include <set>
@@ -40,21 +41,38 @@ CPLErr Refuse(const char* why) {
     return CE_Failure;
 }
 
-// The levels that the factors mean; nothing if one of them is not in the file.
+std::optional<std::uint32_t> LevelOf(Dataset& dataset, int factor) {
+    for (const auto& overview : dataset.Overviews())
+        if (std::int64_t{factor} == std::int64_t{1} << (overview->Level() - dataset.Level()))
+            return overview->Level();
+    return std::nullopt;
+}
+
+// A factor that a level could have, if the file went on: users ask for a row of them at a time.
+bool IsBeyond(Dataset& dataset, int factor) {
+    const std::uint32_t last = dataset.Overviews().back()->Level() - dataset.Level();
+    return std::has_single_bit(static_cast<unsigned>(factor)) &&
+           std::int64_t{factor} > std::int64_t{1} << last;
+}
+
+// The levels that the factors mean, without those beyond the last if there are others; nothing if
+// one of them is not in the file.
 std::optional<std::set<std::uint32_t>> LevelsOf(Dataset& dataset, const std::vector<int>& factors) {
+    const bool anyFits = std::any_of(factors.begin(), factors.end(), [&](int factor) {
+        return LevelOf(dataset, factor).has_value();
+    });
     std::set<std::uint32_t> levels;
     for (const int factor : factors) {
-        const auto& all = dataset.Overviews();
-        const auto match = std::find_if(all.begin(), all.end(), [&](const auto& overview) {
-            return std::int64_t{factor} == std::int64_t{1} << (overview->Level() - dataset.Level());
-        });
-        if (match == all.end()) {
-            CPLError(CE_Failure, CPLE_NotSupported,
-                     "%s has no room for a level reduced by %d: a pyramid is laid out once",
-                     dataset.GetDescription(), factor);
-            return std::nullopt;
+        const auto level = LevelOf(dataset, factor);
+        if (level) {
+            levels.insert(*level);
+            continue;
         }
-        levels.insert((*match)->Level());
+        const bool passedOver = anyFits && IsBeyond(dataset, factor);
+        CPLError(passedOver ? CE_Warning : CE_Failure, CPLE_NotSupported,
+                 "%s has no room for a level reduced by %d: a pyramid is laid out once",
+                 dataset.GetDescription(), factor);
+        if (!passedOver) return std::nullopt;
     }
     return levels;
 }

@@ -100,6 +100,11 @@ CPLErr MaskBand::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height,
                                            static_cast<std::size_t>(lineSpace));
             if (result != CE_None) return result;
             done += lines;
+            if (extra && extra->pfnProgress &&
+                !extra->pfnProgress(static_cast<double>(done) / height, "", extra->pProgressData)) {
+                ReportError(CE_Failure, CPLE_UserInterrupt, "cancelled");
+                return CE_Failure;
+            }
         }
         return CE_None;
     });

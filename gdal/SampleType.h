@@ -44,8 +44,8 @@ constexpr GDALDataType GdalTypeOf() {
 // GDT_Unknown for a code that has no reader.
 GDALDataType GdalTypeOf(std::uint32_t pixelType, SignedByteAs signedByteAs);
 
-// Pixel type code that holds every value of `type`: the complex integers go to the complex float
-// of the next size up. 0 for a type that no pyramid holds.
+// Pixel type code that holds every value of `type`: the complex integers of a source go to the
+// complex float of the next size up. 0 for a type that no pyramid holds.
 std::uint32_t PixelTypeFor(GDALDataType type, bool signedByte);
 
 // Samples of this pixel type stand as Int16 in GDAL's buffers and as one byte in the file.

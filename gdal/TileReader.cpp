@@ -187,6 +187,25 @@ bool TileReader::Read(std::uint32_t level, const Rectangle& window, const int* b
     });
 }
 
+bool TileReader::Read(std::uint32_t level, const Rectangle& window, const int* bands, int bandCount,
+                      const Target& target, const GDALRasterIOExtraArg* extra) {
+    if (!extra || !extra->pfnProgress) return Read(level, window, bands, bandCount, target);
+    for (std::uint32_t done = 0; done < window.height;) {
+        const std::uint32_t y = window.y + done;
+        const std::uint32_t height = std::min(tileSize - y % tileSize, window.height - done);
+        Target part = target;
+        part.data = static_cast<unsigned char*>(target.data) + done * target.lineSpace;
+        if (!Read(level, {window.x, y, window.width, height}, bands, bandCount, part)) return false;
+        done += height;
+        if (extra->pfnProgress(static_cast<double>(done) / window.height, "",
+                               extra->pProgressData))
+            continue;
+        CPLError(CE_Failure, CPLE_UserInterrupt, "cancelled");
+        return false;
+    }
+    return true;
+}
+
 bool TileReader::CopyPart(std::uint32_t level, const Rectangle& tile, const Rectangle& window,
                           const int* bands, int bandCount, const Target& target) {
     if (IsPixelInterleaved() && !SplitsIntoPlanes(bandCount)) {

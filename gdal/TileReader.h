@@ -48,6 +48,11 @@ public:
     bool Read(std::uint32_t level, const zelm::Rectangle& window, const int* bands, int bandCount,
               const Target& target);
 
+    // The same row of tiles by row of tiles, with a word to the caller after each, if he wants one,
+    // who may end it: that is reported as his doing, and the answer is false.
+    bool Read(std::uint32_t level, const zelm::Rectangle& window, const int* bands, int bandCount,
+              const Target& target, const GDALRasterIOExtraArg* extra);
+
     // Must be called when the file has changed.
     void Forget() { held = heldApart = TileKey(); }
 

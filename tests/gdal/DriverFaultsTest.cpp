@@ -336,5 +336,62 @@ TEST_P(DriverStores, TellThatARealDiskIsFull) {
 INSTANTIATE_TEST_SUITE_P(All, DriverStores, testing::ValuesIn(kSetters),
                          [](const auto& each) { return each.param.name; });
 
+// GDAL does not look at what closing a sidecar answers, where a short text meets the full disk.
+TEST_F(DriverFaults, StoresIntoTheSidecarTellThatTheDiskIsFull) {
+    Make(1);
+    for (const Setter& setter : kSetters) {
+        const DatasetPtr dataset = Open();
+        ASSERT_TRUE(dataset);
+        const FileSizeLimit limit(10);
+        CPLErrorReset();
+        EXPECT_EQ(setter.store(*dataset->GetRasterBand(1)), CE_Failure) << setter.name;
+        EXPECT_EQ(CPLGetLastErrorType(), CE_Failure) << setter.name;
+    }
+    const DatasetPtr dataset = Open(GDAL_OF_UPDATE);
+    const FileSizeLimit limit(10);
+    CPLErrorReset();
+    dataset->ClearStatistics();
+    EXPECT_EQ(CPLGetLastErrorType(), CE_Failure);
+}
+
+TEST_F(DriverFaults, RenewalThatFailsLeavesTheDocumentAsItWas) {
+    GDALColorTable table;
+    const GDALColorEntry color{1, 2, 3, 255};
+    table.SetColorEntry(1, &color);
+    Make(1, &table);
+    const std::string whole = zmctest::ReadText(name);
+    const char* const options[] = {"STATISTICS=YES", nullptr};
+    for (const bool fromThenOn : {false, true}) {
+        std::size_t points = 0, hidden = 0;
+        for (bool met = true; met; ++points) {
+            zmctest::WriteText(name, whole);
+            std::filesystem::remove(name + ".aux.xml");
+            DatasetPtr dataset(GDALDataset::Open(
+                name.c_str(), GDAL_OF_RASTER | GDAL_OF_UPDATE, nullptr, options));
+            ASSERT_TRUE(dataset);
+            Fill(*dataset, 1, 9);
+            dataset->FlushCache(false);
+            FileFaults faults({folder.String(), zmctest::kWriteCall | zmctest::kResizeCall,
+                               points + 1, fromThenOn, FileFaultAction::Error, ENOSPC});
+            CPLErrorReset();
+            dataset.reset();
+            met = faults.Failed() != 0;
+            EXPECT_EQ(CPLGetLastErrorType() == CE_Failure, met) << points;
+            faults.Disarm();
+            dataset = Open(GDAL_OF_UPDATE);  // puts in order what the disk did not take back
+            ASSERT_TRUE(dataset) << points;
+            EXPECT_NE(dataset->GetRasterBand(1)->GetColorTable(), nullptr) << points;
+            EXPECT_TRUE(Holds(Read(*dataset, 1), 9)) << points;
+            double mean = 0;
+            const bool shown = dataset->GetRasterBand(1)->GetStatistics(
+                                   FALSE, FALSE, nullptr, nullptr, &mean, nullptr) == CE_None;
+            EXPECT_TRUE(!shown || mean == 9) << points;
+            hidden += shown ? 0 : 1;
+        }
+        EXPECT_GT(points, 5u);
+        EXPECT_GT(hidden, 3u);
+    }
+}
+
 }  // namespace
 }  // namespace zmcgdal

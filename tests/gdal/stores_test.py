@@ -328,5 +328,92 @@ class ReadOnly(StoreTest):
             level.SetDefaultHistogram(-0.5, 1.5, [2, 1])
 
 
+class Levels(StoreTest):
+    def test_those_beyond_the_last_are_passed_over_with_a_warning(self):
+        array = samples(gdal.GDT_Byte, 600, 700, 1)
+        name = self.copy(memory_dataset(array, gdal.GDT_Byte), "two.pyr")
+        self.edit(1, name)
+        done = subprocess.run(["gdaladdo", "-r", "nearest", name, "2", "4", "8", "16"],
+                              capture_output=True, text=True, check=False)
+        self.assertEqual(done.returncode, 0, done)
+        for factor in (8, 16):
+            self.assertIn(f"no room for a level reduced by {factor}", done.stderr)
+        dataset = gdal.Open(name)
+        whole = dataset.GetRasterBand(1).ReadAsArray()
+        for index in (0, 1):
+            np.testing.assert_array_equal(
+                dataset.GetRasterBand(1).GetOverview(index).ReadAsArray(),
+                whole[::2 << index, ::2 << index])
+        self.assertEqual(dataset.GetRasterBand(1).GetOverviewCount(), 2)
+
+    def test_others_are_refused_before_one_is_made(self):
+        array = samples(gdal.GDT_Byte, 600, 700, 1)
+        name = self.copy(memory_dataset(array, gdal.GDT_Byte), "two.pyr")
+        with open(name, "rb") as file:
+            before = file.read()
+        for factors in ([2, 3], [8, 16]):
+            dataset = self.update(name)
+            with self.assertRaisesRegex(RuntimeError, "no room"):
+                dataset.BuildOverviews("NEAREST", factors)
+            del dataset
+        with open(name, "rb") as file:
+            self.assertEqual(file.read(), before)
+
+
+class Types(FolderTest):
+    def test_complex_integers_are_no_types_of_new_files(self):
+        driver = gdal.GetDriverByName(DRIVER)
+        self.assertNotIn("CInt", driver.GetMetadataItem("DMD_CREATIONDATATYPES"))
+        for data_type in (gdal.GDT_CInt16, gdal.GDT_CInt32):
+            with self.assertRaisesRegex(RuntimeError, "no pyramid holds this data type"):
+                driver.Create(self.path("new.pyr"), 5, 5, 1, data_type)
+        self.assertEqual(self.files(), [])
+
+
+class Progress(FolderTest):
+    def calls(self, read, most=None):
+        """What a read tells of itself, ended after so many words."""
+        seen = []
+
+        def hear(share, *_):
+            seen.append(share)
+            return int(most is None or len(seen) < most)
+        return read(hear), seen
+
+    def test_of_reads(self):
+        for bands in (1, 3, 12):
+            array = samples(gdal.GDT_UInt16, 1000, 900, bands)
+            dataset = gdal.Open(self.copy(memory_dataset(array, gdal.GDT_UInt16)))
+            band = dataset.GetRasterBand(bands)
+            for read in (lambda hear: dataset.ReadRaster(10, 20, 880, 970, callback=hear),
+                         lambda hear: band.ReadRaster(10, 20, 880, 970, callback=hear),
+                         lambda hear: band.ReadRaster(0, 0, 900, 1000, 600, 700, callback=hear)):
+                pixels, seen = self.calls(read)
+                self.assertIsNotNone(pixels)
+                self.assertGreaterEqual(len(seen), 4)
+                self.assertEqual(seen, sorted(seen))
+                self.assertEqual(seen[-1], 1)
+            for read in (lambda hear: dataset.ReadRaster(10, 20, 880, 970, callback=hear),
+                         lambda hear: band.ReadRaster(10, 20, 880, 970, callback=hear)):
+                with self.assertRaisesRegex(RuntimeError, "cancelled"):
+                    self.calls(read, 2)
+
+    def test_what_is_read_with_it_is_what_is_read_without(self):
+        array = samples(gdal.GDT_Byte, 700, 600, 3)
+        dataset = gdal.Open(self.copy(memory_dataset(array, gdal.GDT_Byte)))
+        pixels, _ = self.calls(lambda hear: dataset.ReadRaster(3, 5, 590, 690, callback=hear))
+        np.testing.assert_array_equal(
+            np.frombuffer(pixels, np.uint8).reshape(3, 690, 590), array[:, 5:695, 3:593])
+
+    def test_of_masks(self):
+        array = samples(gdal.GDT_Float32, 700, 600, 1)
+        dataset = gdal.Open(self.copy(memory_dataset(array, gdal.GDT_Float32)))
+        mask = dataset.GetRasterBand(1).GetMaskBand()
+        _, seen = self.calls(lambda hear: mask.ReadRaster(callback=hear))
+        self.assertEqual((len(seen), seen[-1]), (3, 1))
+        with self.assertRaises(RuntimeError):
+            self.calls(lambda hear: mask.ReadRaster(callback=hear), 1)
+
+
 if __name__ == "__main__":
     unittest.main()
