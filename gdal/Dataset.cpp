@@ -14,6 +14,7 @@
 #include "gdal/Reporting.h"
 #include "gdal/Sidecar.h"
 #include "gdal/SidecarStage.h"
+#include "format/PyramidLayout.h"
 #include "gdal/VsiSource.h"
 #include "host/raster/LentFile.h"
 #include "platform/FileSystem.h"
@@ -76,7 +77,8 @@ OpenFile::OpenFile(const std::string& fileName, GDALAccess access, const OpenOpt
     : source(OpenByName(fileName, access == GA_Update)),
       info(CheckedInfo(fileName, zmchost::PyramidHeader::Read(*source, fileName))),
       raster(fileName, source, info.header, options.keepCopies),
-      tiles(raster, info, GdalTypeOf(info.header.pixelType, options.signedByteAs)),
+      tiles(raster, info, GdalTypeOf(info.header.pixelType, options.signedByteAs),
+            options.missingAsZeros),
       archive(raster, info.HasMetadataDocument(), limits),
       renewsStatistics(options.statistics) {}
 
@@ -141,12 +143,18 @@ const std::vector<std::unique_ptr<Dataset>>& Dataset::Overviews() {
     return overviews;
 }
 
-// What an incomplete file holds of its coarser levels is anyone's guess.
+// Of an incomplete file those that are there from end to end: whoever reads fewer pixels than there
+// are is given them unasked.
 void Dataset::AddOverviews() {
     std::vector<std::unique_ptr<Dataset>> made;
-    if (!main && file->info.complete)
+    const zmchost::PyramidHeader& header = file->info.header;
+    const zmchost::PresentTiles present(header);
+    const bool mayHave =
+        zelm::PyramidLayout::MayHaveLevels(header.versionMajor, header.versionMinor);
+    if (!main && !creation && mayHave)
         for (const zmchost::PyramidLevelInfo& coarser : file->info.levels)
-            if (coarser.level > level && coarser.width > 0 && coarser.height > 0)
+            if (coarser.level > level && coarser.width > 0 && coarser.height > 0 &&
+                present.HaveLevel(coarser.level, header.fileSize))
                 made.push_back(
                     std::unique_ptr<Dataset>(new Dataset(file, coarser.level, eAccess, this)));
     overviews = std::move(made);

@@ -34,12 +34,13 @@ int Identify(GDALOpenInfo* info) {
     });
 }
 
-void WarnIfIncomplete(const Dataset& dataset, const zmchost::PyramidFileInfo& info) {
+void WarnIfIncomplete(const Dataset& dataset, const zmchost::PyramidFileInfo& info, bool zeros) {
     if (info.complete) return;
     CPLError(CE_Warning, CPLE_AppDefined,
              "%s: the pyramid is incomplete, " CPL_FRMT_GUIB
-             " bytes are missing; only its finest level is shown",
-             dataset.GetDescription(), static_cast<GUIntBig>(info.bytesMissing));
+             " bytes are missing; %s",
+             dataset.GetDescription(), static_cast<GUIntBig>(info.bytesMissing),
+             zeros ? "they are read as zeros" : "what is there can be read");
 }
 
 // What a store that was cut off has left: statistics that GDAL stores into it now would be lost
@@ -58,14 +59,14 @@ void PutInOrder(const std::string& name, GDALAccess access) {
 
 std::unique_ptr<Dataset> OpenDataset(GDALOpenInfo* info) {
     if (!IsVirtualName(info->pszFilename)) PutInOrder(info->pszFilename, info->eAccess);
-    auto file = std::make_shared<OpenFile>(info->pszFilename, info->eAccess,
-                                           OpenOptionsFrom(info->papszOpenOptions));
+    const OpenOptions options = OpenOptionsFrom(info->papszOpenOptions);
+    auto file = std::make_shared<OpenFile>(info->pszFilename, info->eAccess, options);
     const zmchost::PyramidFileInfo layout = file->info;
     auto dataset = Dataset::FromFile(std::move(file), info->eAccess);
     // A look for each companion is cheaper than a list of the whole folder, unless that is there.
     char** const siblings = info->AreSiblingFilesLoaded() ? info->GetSiblingFiles() : nullptr;
     dataset->LoadSidecar(info->pszFilename, siblings);
-    WarnIfIncomplete(*dataset, layout);
+    WarnIfIncomplete(*dataset, layout, options.missingAsZeros);
     return dataset;
 }
 

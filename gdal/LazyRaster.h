@@ -35,6 +35,11 @@ public:
           keepsCopies(keepCopies) {}
 
     const std::string& Name() const { return name; }
+    // Of the file, now; 0 where that cannot be told.
+    std::uint64_t FileSize() const {
+        std::uint64_t size = 0;
+        return source->TellSize(size) ? size : 0;
+    }
 
     // Throws zmchost::Error, each time anew, if the module does not open the file, or as another
     // raster than the header told.

@@ -17,6 +17,10 @@ const char* const kOpenOptionsXml = R"(<OpenOptionList>
     <Value>SIGNEDBYTE</Value>
   </Option>
   <Option name='KEEP_COPIES' type='boolean' default='NO' description='Whether stores of statistics, histograms and color tables keep what was stored before in FILE.zmcmeta until they have reached the disk'/>
+  <Option name='MISSING' type='string-select' default='FAIL' description='What reading pixels does that an incomplete file does not have'>
+    <Value>FAIL</Value>
+    <Value>ZEROS</Value>
+  </Option>
   <Option name='STATISTICS' type='boolean' default='NO' description='Whether closing renews the statistics and histograms of bands whose pixels were changed'/>
 </OpenOptionList>)";
 
@@ -103,6 +107,7 @@ OpenOptions OpenOptionsFrom(CSLConstList options) {
     if (EQUAL(CSLFetchNameValueDef(options, "INT8_AS", "INT16"), "SIGNEDBYTE"))
         parsed.signedByteAs = SignedByteAs::FlaggedByte;
     parsed.keepCopies = CPLFetchBool(options, "KEEP_COPIES", false);
+    parsed.missingAsZeros = EQUAL(CSLFetchNameValueDef(options, "MISSING", "FAIL"), "ZEROS") != 0;
     parsed.statistics = CPLFetchBool(options, "STATISTICS", false);
     return parsed;
 }

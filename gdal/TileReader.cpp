@@ -30,7 +30,8 @@ void Widen(const unsigned char* bytes, std::size_t count, unsigned char* out) {
 
 }  // namespace
 
-TileReader::TileReader(LazyRaster& pyramid, const zmchost::PyramidFileInfo& info, GDALDataType type)
+TileReader::TileReader(LazyRaster& pyramid, const zmchost::PyramidFileInfo& info, GDALDataType type,
+                       bool missingAsZeros)
     : raster(pyramid),
       layout(info),
       sampleType(type),
@@ -38,7 +39,9 @@ TileReader::TileReader(LazyRaster& pyramid, const zmchost::PyramidFileInfo& info
       sampleSize(static_cast<std::size_t>(GDALGetDataTypeSizeBytes(type))),
       tileSize(info.header.tileSize),
       fileBands(static_cast<int>(info.header.bandCount)),
-      allBands(info.header.bandCount) {
+      allBands(info.header.bandCount),
+      readsMissing(missingAsZeros),
+      present(info.header) {
     std::iota(allBands.begin(), allBands.end(), 0);
 }
 
@@ -49,9 +52,21 @@ Rectangle TileReader::TileAt(std::uint32_t level, int tileX, int tileY) const {
                                               static_cast<std::uint32_t>(tileY));
 }
 
+bool TileReader::IsThere(std::uint32_t level, const Rectangle& tile, const int* bands,
+                         int bandCount) const {
+    if (layout.complete || readsMissing) return true;
+    const std::vector<std::uint32_t> list(bands, bands + bandCount);
+    if (present.Have(level, tile, list, raster.FileSize())) return true;
+    CPLError(CE_Failure, CPLE_FileIO,
+             "%s: the pyramid is incomplete: its file ends before the pixels at %u, %u of level %u",
+             raster.Name().c_str(), tile.x, tile.y, level);
+    return false;
+}
+
 bool TileReader::ReadRaw(std::uint32_t level, const Rectangle& tile, const int* bands,
                          int bandCount, std::span<unsigned char> buffer) {
     const std::size_t samples = tile.Pixels() * static_cast<std::size_t>(bandCount);
+    if (!IsThere(level, tile, bands, bandCount)) return false;
     // A short read leaves the buffer as it was.
     if (!layout.complete) std::fill(buffer.begin(), buffer.end(), 0);
     bool done = false;

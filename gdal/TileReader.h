@@ -15,6 +15,7 @@
 
 #include "format/Rectangle.h"
 #include "gdal/LazyRaster.h"
+#include "host/file/PresentTiles.h"
 #include "host/file/PyramidFileInfo.h"
 
 namespace zmcgdal {
@@ -36,15 +37,17 @@ struct Target {
 
 class TileReader {
 public:
-    // Both outlive this object. `type` is what the samples are shown as.
-    TileReader(LazyRaster& pyramid, const zmchost::PyramidFileInfo& info, GDALDataType type);
+    // Both outlive this object. `type` is what the samples are shown as. Tiles that the file does
+    // not have cannot be read, or are zeros.
+    TileReader(LazyRaster& pyramid, const zmchost::PyramidFileInfo& info, GDALDataType type,
+               bool missingAsZeros);
 
     GDALDataType Type() const { return sampleType; }
     // The samples of all bands of a pixel lie together in the file.
     bool IsPixelInterleaved() const;
 
     // Reads the bands (from 0) of a window inside a level; false, reported to GDAL, if the module
-    // refused it or the disk failed. What an incomplete file does not hold reads as zeros.
+    // refused it, the disk failed, or the file is incomplete and lacks some of it.
     bool Read(std::uint32_t level, const zelm::Rectangle& window, const int* bands, int bandCount,
               const Target& target);
 
@@ -71,6 +74,8 @@ private:
     std::uint32_t tileSize;
     int fileBands;
     std::vector<int> allBands;
+    bool readsMissing;  // as zeros
+    zmchost::PresentTiles present;
     std::vector<unsigned char> scratch;  // one tile as GDAL sees its samples
     std::vector<unsigned char> planes;   // the same, band after band
     std::vector<unsigned char> raw;      // one tile as the file holds it, where that differs
@@ -96,6 +101,8 @@ private:
     // writes, whatever the header has said of the samples.
     bool ReadRaw(std::uint32_t level, const zelm::Rectangle& tile, const int* bands, int bandCount,
                  std::span<unsigned char> buffer);
+    bool IsThere(std::uint32_t level, const zelm::Rectangle& tile, const int* bands,
+                 int bandCount) const;
     bool FitsTarget(const zelm::Rectangle& window, const int* bands, int bandCount,
                     const Target& target) const;
     bool LoadSamples(std::uint32_t level, const zelm::Rectangle& area, const int* bands,

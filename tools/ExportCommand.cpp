@@ -6,6 +6,7 @@
 
 #include "gdal/Sidecar.h"
 #include "platform/Interrupts.h"
+#include "host/file/PresentTiles.h"
 #include "tools/Arguments.h"
 #include "tools/Command.h"
 #include "tools/GdalWorld.h"
@@ -56,12 +57,15 @@ void ExportCommand::Describe(OptionTable& table) {
 
 DatasetPtr ExportCommand::OpenLevel(std::uint32_t wanted) const {
     const zmchost::PyramidFileInfo info = ReadLayout(file);
-    if (!info.complete) FailAsIncomplete(file, std::to_string(info.bytesMissing));
     const std::uint32_t base = info.header.levelMin;
     if (!info.FindLevel(wanted))
         throw UsageError("--level", "there is no level " + std::to_string(wanted) + ": " +
                                         Visible(file) + " has the levels " + std::to_string(base) +
                                         " to " + std::to_string(info.header.levelMax));
+    // Of a coarser level the driver shows all or nothing.
+    if (!zmchost::PresentTiles(info.header).HaveLevel(wanted, info.header.fileSize) &&
+        wanted != base)
+        FailAsIncomplete(file, std::to_string(info.bytesMissing));
     std::vector<std::string> options;
     if (wanted > base) options.push_back("OVERVIEW_LEVEL=" + std::to_string(wanted - base - 1));
     return OpenDataset(file, options);

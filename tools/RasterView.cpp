@@ -47,6 +47,10 @@ Identity IdentityAtRest(const std::string& name) {
     return now;
 }
 
+std::string IncompleteText(const std::string& bytes) {
+    return "the pyramid is incomplete, " + bytes + " bytes of tiles are missing";
+}
+
 class PyramidView final : public RasterView {
 public:
     explicit PyramidView(const std::string& name)
@@ -69,7 +73,11 @@ public:
             FailAsChanged(Name(), change);
     }
     std::uint32_t TileSide() const override { return raster.TileSide(); }
-    void CheckReadable() override { raster.CheckComplete("read its pixels"); }
+    void CheckReadable() override {
+        if (!raster.IsComplete())
+            Warn(Name(), IncompleteText(std::to_string(raster.Header().BytesMissing())) +
+                             "; what is there is read");
+    }
 
 private:
     Identity before;
@@ -147,8 +155,7 @@ void FailAsChanged(const std::string& name, const std::string& change) {
 }
 
 void FailAsIncomplete(const std::string& name, const std::string& bytes) {
-    throw Failure(
-        name, "the pyramid is incomplete, " + bytes + " bytes of tiles are missing; build it anew");
+    throw Failure(name, IncompleteText(bytes) + "; build it anew");
 }
 
 zmchost::PyramidFileInfo ReadLayout(const std::string& name) {

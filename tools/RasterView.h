@@ -50,7 +50,7 @@ public:
     virtual void CheckUnchanged() const = 0;
     // Side of the tiles that are moved at once.
     virtual std::uint32_t TileSide() const { return kUsualTile; }
-    // Throws where nothing can be read, before anything is made ready for it.
+    // Says what is missing, before anything is made ready for reading.
     virtual void CheckReadable() {}
 
     // Throws UsageError for a level that there is not.
@@ -100,8 +100,8 @@ struct Strips {
               const std::function<void(const zmchost::Window& strip)>& take) const;
 };
 
-// The same for a part of a view, of which some 32 MiB are held. Throws too where the view has
-// nothing to read.
+// The same for a part of a view, of which some 32 MiB are held. Throws too where the view lacks
+// some of it.
 void WalkStrips(RasterView& view, const Selection& selection, TerminalProgress& progress,
                 const std::function<void(const zmchost::Window& strip)>& take);
 

@@ -7,6 +7,7 @@
 #include "core/PixelVocabulary.h"
 #include "format/TileWalk.h"
 #include "host/base/Text.h"
+#include "host/file/PresentTiles.h"
 #include "host/file/StoredRecords.h"
 #include "host/journal/MetadataJournal.h"
 #include "host/raster/LentFile.h"
@@ -367,11 +368,20 @@ void Raster::CheckComplete(const std::string& operation) {
                         " bytes are missing");
 }
 
+// What is not in the file would come as whatever was in the buffer.
+void Raster::CheckThere(std::uint32_t level, const Window& window,
+                        std::span<const std::uint32_t> bands) {
+    if (IsComplete() || PresentTiles(*header).Have(level, window, bands, header->fileSize)) return;
+    throw Error(name, "read " + Describe(window) + " of level " + std::to_string(level),
+                "the file is incomplete, " + std::to_string(Header().BytesMissing()) +
+                    " bytes are missing, of these pixels too");
+}
+
 void Raster::Read(std::uint32_t level, const Window& window, std::span<const std::uint32_t> bands,
                   void* pixels, unsigned char* mask) {
     CheckWindow("read", level, window, bands);
     if (window.width == 0 || window.height == 0 || bands.empty()) return;
-    CheckComplete("read " + Describe(window));
+    CheckThere(level, window, bands);
     if (!header) {
         bool read = false;
         const zelm::Array<int> list = BandList(bands);

@@ -115,7 +115,8 @@ public:
     // type cannot hold marks nothing.
     void SetNoDataValues(const std::map<std::uint32_t, double>& values);
 
-    // Reads a window of a level. The window lies within the level, and the file is complete.
+    // Reads a window of a level. The window lies within the level, and the file has all of its
+    // tiles: an incomplete one is read as far as it goes.
     // `pixels` has room for all samples, `mask` too unless it is null.
     void Read(std::uint32_t level, const Window& window, std::span<const std::uint32_t> bands,
               void* pixels, unsigned char* mask = nullptr);
@@ -207,6 +208,8 @@ private:
     void CheckWindow(const char* operation, std::uint32_t level, const Window& window,
                      std::span<const std::uint32_t> bands) const;
     void CheckWritable(const char* operation) const;
+    void CheckThere(std::uint32_t level, const Window& window,
+                    std::span<const std::uint32_t> bands);
     void ReadTile(std::uint32_t level, const Window& window, std::span<const std::uint32_t> bands,
                   void* pixels) const;
     void WriteTile(std::uint32_t level, const Window& window, std::vector<unsigned char>& pixels);

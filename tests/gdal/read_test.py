@@ -193,7 +193,7 @@ class Reading(FolderTest):
         self.addCleanup(gdal.PopErrorHandler)
         self.assertIsNone(gdal.IdentifyDriverEx(name, allowed_drivers=others))
 
-    def test_incomplete_files_show_their_finest_level_and_say_so(self):
+    def test_incomplete_files_show_what_they_have_and_say_so(self):
         array = samples(gdal.GDT_Byte, 777, 1001, 1)
         name = self.copy(memory_dataset(array, gdal.GDT_Byte), options=["STATISTICS=NO"])
         whole = os.stat(name).st_size
@@ -211,8 +211,63 @@ class Reading(FolderTest):
         self.assertIn("1000 bytes are missing", warnings[0])
         self.assertEqual(dataset.GetMetadata("ZMCPYRAMID")["BYTES_MISSING"], "1000")
         self.assertEqual(dataset.GetMetadata("ZMCPYRAMID")["COMPLETE"], "NO")
-        self.assertEqual(dataset.GetRasterBand(1).GetOverviewCount(), 0)
-        np.testing.assert_array_equal(dataset.ReadAsArray()[:768], array[0, :768])
+        band = dataset.GetRasterBand(1)
+        np.testing.assert_array_equal(dataset.ReadAsArray(0, 0, 1001, 768), array[0, :768])
+        np.testing.assert_array_equal(band.ReadAsArray(0, 0, 512, 777), array[0, :, :512])
+        # The finest level is the last in the file.
+        self.assertEqual(band.GetOverviewCount(), 2)
+        np.testing.assert_array_equal(band.GetOverview(0).ReadAsArray(), halve(array)[0])
+        for read in (dataset.ReadAsArray, band.ReadAsArray, lambda: band.ReadBlock(3, 3)):
+            with self.assertRaisesRegex(RuntimeError, "its file ends before the pixels at 768, 768"):
+                read()
+        gdal.PushErrorHandler("CPLQuietErrorHandler")
+        dataset = gdal.OpenEx(name, open_options=["MISSING=ZEROS"])
+        gdal.PopErrorHandler()
+        zeros = dataset.ReadAsArray()
+        np.testing.assert_array_equal(zeros[:768], array[0, :768])
+        self.assertFalse(zeros[-1, -100:].any())
+
+    def test_levels_and_bands_that_an_incomplete_file_lacks(self):
+        for bands, ordering, most in ((3, "SCANLINE", 3), (3, "BLOCKED", 3), (11, "MORTON", 0)):
+            array = samples(gdal.GDT_Byte, 600, 1100, bands)
+            name = self.copy(memory_dataset(array, gdal.GDT_Byte), f"{ordering}.pyr",
+                             options=["STATISTICS=NO", "ORDERING=" + ordering])
+            whole = gdal.Open(name)
+            band = whole.GetRasterBand(1)
+            levels = [band.GetOverview(i).ReadAsArray() for i in range(band.GetOverviewCount())]
+            del band, whole
+            size = os.path.getsize(name)
+            for share in (0.9, 0.5, 0.25, 0.15, 0.05, 0.02):
+                os.truncate(name, int(size * share))
+                gdal.PushErrorHandler("CPLQuietErrorHandler")
+                dataset = gdal.Open(name)
+                band = dataset.GetRasterBand(1)
+                shown = [band.GetOverview(i) for i in range(band.GetOverviewCount())]
+                self.assertLessEqual(len(shown), most)
+                for level in shown:
+                    expected = next(each for each in levels if each.shape == (level.YSize,
+                                                                              level.XSize))
+                    np.testing.assert_array_equal(level.ReadAsArray(), expected)
+                held = 0
+                for number in range(bands):
+                    for y in range(0, 600, 256):
+                        for x in range(0, 1100, 256):
+                            try:
+                                read = dataset.GetRasterBand(number + 1).ReadAsArray(
+                                    x, y, min(256, 1100 - x), min(256, 600 - y))
+                            except RuntimeError:
+                                continue
+                            held += read.size
+                            np.testing.assert_array_equal(
+                                read, array[number, y:y + 256, x:x + 256])
+                gdal.PopErrorHandler()
+                # Nothing but what is not there is refused: the rest of one row of tiles at most.
+                levels_size = sum(each.size for each in levels) * bands
+                if ordering != "MORTON":
+                    least = int(size * share) - 1000 - levels_size - 256 * 256 * bands
+                    self.assertGreaterEqual(held, least)
+                elif share > 0.02:
+                    self.assertGreater(held, 0)
 
     def test_damaged_files_are_refused(self):
         name = self.copy(memory_dataset(samples(gdal.GDT_Byte, 30, 40, 1), gdal.GDT_Byte))
@@ -333,7 +388,7 @@ class Masks(FolderTest):
     def test_a_translated_float_raster_gets_no_mask_file(self):
         name = self.copy(memory_dataset(samples(gdal.GDT_Float32, 60, 60, 1), gdal.GDT_Float32))
         gdal.Translate(self.path("plain.tif"), name)
-        self.assertEqual(self.files(), ["plain.tif", "raster.pyr"])
+        self.assertEqual(self.files(), ["plain.tif", "raster.pyr", "raster.pyr.aux.xml"])
 
     def test_the_sidecar_carries_the_place(self):
         source = memory_dataset(samples(gdal.GDT_Byte, 9, 9, 1), gdal.GDT_Byte)

@@ -53,7 +53,7 @@ class Export(ToolTest):
         self.assertEqual(done.returncode, 1)
         for line in done.stderr.splitlines():
             self.assertTrue(line.startswith("zmcraster: back.tif: "), line)
-        self.assertEqual(self.files(), ["made.pyr", "source.tif"])
+        self.assertEqual(self.files(), ["made.pyr", "made.pyr.aux.xml", "source.tif"])
 
     def test_messages(self):
         self.pyramid()
@@ -69,5 +69,17 @@ class Export(ToolTest):
         self.assertEqual((done.returncode, done.stderr.count("\n")), (1, 1))
         with open(self.path("picture.pyr"), "r+b") as handle:
             handle.truncate(Pyramid(self.path("picture.pyr")).end - 10)
-        self.refused(1, "picture.pyr: the pyramid is incomplete, 10 bytes of tiles are missing; "
-                        "build it anew", "export", "picture.pyr", "x.tif")
+        done = self.run_tool("export", "picture.pyr", "x.tif", "--quiet")
+        self.assertEqual(done.returncode, 1)
+        self.assertIn("its file ends before the pixels at 512, 256 of level 0", done.stderr)
+        self.assertNotIn("x.tif", self.files())
+        for part in (("--window", "0,0,700,256"), ("--level", "1")):
+            done = self.run_tool("export", "picture.pyr", "x.tif", *part)
+            self.assertEqual(done.returncode, 0, done)
+            self.assertIn("warning: the pyramid is incomplete, 10 bytes are missing", done.stderr)
+        with open(self.path("picture.pyr"), "r+b") as handle:
+            handle.truncate(Pyramid(self.path("picture.pyr")).start + 10)
+        cut = Pyramid(self.path("picture.pyr"))
+        self.refused(1, f"picture.pyr: the pyramid is incomplete, {cut.end - len(cut.data)} bytes of "
+                     "tiles are missing; build it anew",
+                     "export", "picture.pyr", "x.tif", "--level", "1")
