@@ -32,7 +32,7 @@ inline constexpr bool kIsInteger = std::is_integral_v<T>;
 
 template <class T>
 StoredStatistics Convert(const zelm::RasterBandStats<T>& record) {
-    return {record.flags, ToDouble(record.minimum),  ToDouble(record.maximum),
+    return {record.flags, ToDouble(record.minimum), ToDouble(record.maximum),
             record.mean,  record.standardDeviation, 0};
 }
 

@@ -279,8 +279,28 @@ bool Band::UsesOwnMask() {
     return byValue || (nMaskFlags == GMF_ALL_VALID && mayBeNotFinite);
 }
 
+// A mask file is one of the finest level.
+bool Band::MaskIsBesideTheFile() {
+    if (!owner.IsOverview()) return false;
+    constexpr int kOthers = GMF_ALPHA | GMF_NODATA | GMF_ALL_VALID;
+    const int flags = MainBand()->GetMaskFlags();
+    return (flags & GMF_PER_DATASET) != 0 && (flags & kOthers) == 0;
+}
+
+CPLErr Band::CreateMaskBand(int flags) {
+    return Reporting(CE_Failure, [&] {
+        return owner.NamedAsSpool([&] { return GDALPamRasterBand::CreateMaskBand(flags); });
+    });
+}
+
 GDALRasterBand* Band::GetMaskBand() {
     return Reporting<GDALRasterBand*>(nullptr, [&]() -> GDALRasterBand* {
+        if (MaskIsBesideTheFile()) {
+            if (!levelMask)
+                levelMask = std::make_unique<LevelMask>(*this, *MainBand(),
+                                                        owner.Level() - owner.Main().Level());
+            return levelMask.get();
+        }
         if (!UsesOwnMask()) return GDALPamRasterBand::GetMaskBand();
         if (!ownMask) ownMask = std::make_unique<MaskBand>(*this);
         return ownMask.get();
@@ -291,6 +311,7 @@ GDALRasterBand* Band::GetMaskBand() {
 // as a mask of its own, it would be copied into a mask file with every translation.
 int Band::GetMaskFlags() {
     return Reporting<int>(GMF_ALL_VALID, [&]() -> int {
+        if (MaskIsBesideTheFile()) return MainBand()->GetMaskFlags();
         return UsesOwnMask() ? GMF_NODATA : GDALPamRasterBand::GetMaskFlags();
     });
 }

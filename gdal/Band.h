@@ -40,6 +40,7 @@ public:
 
     GDALRasterBand* GetMaskBand() override;
     int GetMaskFlags() override;
+    CPLErr CreateMaskBand(int flags) override;
 
     int GetOverviewCount() override;
     GDALRasterBand* GetOverview(int index) override;
@@ -98,6 +99,7 @@ private:
     Dataset& owner;
     std::uint32_t index;  // of the band, from 0
     std::unique_ptr<GDALRasterBand> ownMask;
+    std::unique_ptr<GDALRasterBand> levelMask;
     CPLStringList statistics;  // as metadata; filled when first asked for
     bool statisticsFetched = false;
     bool computing = false;  // statistics, which are stored on the way
@@ -148,6 +150,7 @@ private:
     const CPLStringList& StatisticsItems();
     GDALColorInterp DefaultInterpretation();
     bool UsesOwnMask();
+    bool MaskIsBesideTheFile();
 };
 
 }  // namespace zmcgdal

@@ -54,8 +54,8 @@ bool IsNear(double stored, double given) {
 
 // No sample lies beyond a range that was stored, so that it is kept to its last digit.
 bool HasDigitsOf(const StoredStatistics& stored, const StoredStatistics& given) {
-    return stored.IsFull() && stored.minimum == given.minimum &&
-           stored.maximum == given.maximum && IsNear(stored.mean, given.mean) &&
+    return stored.IsFull() && stored.minimum == given.minimum && stored.maximum == given.maximum &&
+           IsNear(stored.mean, given.mean) &&
            IsNear(stored.standardDeviation, given.standardDeviation);
 }
 

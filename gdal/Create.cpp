@@ -6,6 +6,7 @@
 #include "files/Lending.h"
 #include "gdal/Band.h"
 #include "gdal/Dataset.h"
+#include "gdal/ErrorCatcher.h"
 #include "gdal/GdalRasterSource.h"
 #include "gdal/Reporting.h"
 #include "gdal/Sidecar.h"
@@ -175,6 +176,24 @@ CPLErr Creation::ChooseLevels(Dataset& dataset, const char* resampling, int coun
     return CE_None;
 }
 
+// What there is of a mask by the end of a creation that failed.
+Creation::~Creation() { VSIUnlink((SpoolName() + kMaskEnding).c_str()); }
+
+// A target whose mask cannot be kept goes again.
+void Creation::KeepMask(Dataset& dataset) const {
+    Unfinished made(target);
+    const std::string mask = SpoolName() + kMaskEnding;
+    ErrorCatcher errors(CE_Failure);
+    dataset.CloseMask();
+    if (!errors.Text().empty())
+        throw zmchost::Error(target, "keep its mask in " + target + kMaskEnding, errors.Text());
+    VSIStatBufL status;
+    if (VSIStatL(mask.c_str(), &status) == 0 &&
+        VSIRename(mask.c_str(), (target + kMaskEnding).c_str()) != 0)
+        throw zmchost::Error(target, "keep its mask", "it cannot be moved to its place");
+    made.Keep();
+}
+
 bool Creation::Finish(Dataset& dataset) {
     sealed = std::find(written.begin(), written.end(), false) == written.end();
     std::vector<zmchost::FullStatistics> statistics;
@@ -186,7 +205,7 @@ bool Creation::Finish(Dataset& dataset) {
         options.build.takeStatistics = [&](const auto& stored) { statistics = stored; };
         zmchost::PyramidBuilder(SharedModule()).Build(source, target, options.build);
     });
-    if (!built) return false;
+    if (!built || !Reported([&] { KeepMask(dataset); })) return false;
     // The palettes are in the file now.
     Reported([&] {
         for (int number = 1; number <= dataset.GetRasterCount(); ++number)

@@ -45,6 +45,9 @@ public:
     void MarkLost(std::size_t block, std::size_t band) noexcept {
         lost[block * bands + band] = true;
     }
+    // The file that pixels are gathered in; a mask of the dataset stands beside it meanwhile.
+    const std::string& SpoolName() const { return spool->Path(); }
+    ~Creation();
     // Every block has been written, and none will be any more.
     bool IsSealed() const { return sealed; }
 
@@ -59,6 +62,8 @@ public:
     bool Finish(Dataset& dataset);
 
 private:
+    void KeepMask(Dataset& dataset) const;
+
     std::string target;
     CreationOptions options;
     std::unique_ptr<zmchost::BuildFile> spool;

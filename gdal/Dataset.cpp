@@ -7,6 +7,7 @@
 #include <utility>
 
 #include "core/PixelVocabulary.h"
+#include "format/PyramidLayout.h"
 #include "gdal/Band.h"
 #include "gdal/Create.h"
 #include "gdal/LevelRefresh.h"
@@ -14,7 +15,6 @@
 #include "gdal/Reporting.h"
 #include "gdal/Sidecar.h"
 #include "gdal/SidecarStage.h"
-#include "format/PyramidLayout.h"
 #include "gdal/VsiSource.h"
 #include "host/raster/LentFile.h"
 #include "platform/FileSystem.h"
@@ -180,7 +180,27 @@ void Dataset::DescribeFile() {
     structure.SetNameValue("INTERLEAVE", file->tiles.IsPixelInterleaved() ? "PIXEL" : "BAND");
 }
 
-void Dataset::BeginCreation(std::unique_ptr<Creation> state) { creation = std::move(state); }
+// A mask that another raster has left beside the target's name is none of this one's.
+void Dataset::BeginCreation(std::unique_ptr<Creation> state) {
+    creation = std::move(state);
+    oOvManager.Initialize(this, creation->SpoolName().c_str());
+    oOvManager.HaveMaskFile(nullptr, creation->SpoolName().c_str());
+}
+
+CPLErr Dataset::NamedAsSpool(const std::function<CPLErr()>& make) {
+    if (!creation) return make();
+    const std::string name = GetDescription();
+    SetDescription(creation->SpoolName().c_str());
+    const CPLErr made = make();
+    SetDescription(name.c_str());
+    return made;
+}
+
+CPLErr Dataset::CreateMaskBand(int flags) {
+    return Reporting(CE_Failure, [&] {
+        return NamedAsSpool([&] { return GDALPamDataset::CreateMaskBand(flags); });
+    });
+}
 
 // Nor is anything written there.
 void Dataset::IgnoreCompanions() { nPamFlags |= GPF_DISABLED; }

@@ -10,6 +10,7 @@
 #include <cpl_string.h>
 #include <gdal_pam.h>
 
+#include <functional>
 #include <memory>
 #include <string>
 #include <utility>
@@ -100,10 +101,16 @@ public:
     // where that fails.
     CPLErr SaveSidecarNow(CPLErr kind = CE_Failure);
     void ClearStatistics() override;
+    CPLErr CreateMaskBand(int flags) override;
 
     // Makes this dataset the place where pixels of a new file are gathered; see gdal/Create.h.
     void BeginCreation(std::unique_ptr<Creation> state);
     Creation* UnderCreation() { return creation.get(); }
+    // Runs `make`, which makes a mask of the whole dataset: beside the spool, as long as there is
+    // no target.
+    CPLErr NamedAsSpool(const std::function<CPLErr()>& make);
+    // Ends the use of the mask, so that its file can be moved.
+    void CloseMask() { oOvManager.CloseDependentDatasets(); }
 
     char** GetMetadataDomainList() override;
     char** GetMetadata(const char* domain = "") override;

@@ -37,8 +37,7 @@ int Identify(GDALOpenInfo* info) {
 void WarnIfIncomplete(const Dataset& dataset, const zmchost::PyramidFileInfo& info, bool zeros) {
     if (info.complete) return;
     CPLError(CE_Warning, CPLE_AppDefined,
-             "%s: the pyramid is incomplete, " CPL_FRMT_GUIB
-             " bytes are missing; %s",
+             "%s: the pyramid is incomplete, " CPL_FRMT_GUIB " bytes are missing; %s",
              dataset.GetDescription(), static_cast<GUIntBig>(info.bytesMissing),
              zeros ? "they are read as zeros" : "what is there can be read");
 }

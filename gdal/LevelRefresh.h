@@ -16,10 +16,10 @@
 namespace zmcgdal {
 
 // `factors` are those of GDAL: 2 is the level after the finest. Powers of two beyond the last level
-// are passed over with a warning, if another factor means a level. Reports to GDAL and fails, having
-// changed no level, for a method or a factor that the file has no room for, for a dataset that is
-// not open for update, and where pixels that wait to be written cannot be; a cancelled or failed
-// run leaves some levels renewed.
+// are passed over with a warning, if another factor means a level. Reports to GDAL and fails,
+// having changed no level, for a method or a factor that the file has no room for, for a dataset
+// that is not open for update, and where pixels that wait to be written cannot be; a cancelled or
+// failed run leaves some levels renewed.
 CPLErr RefreshLevels(Dataset& dataset, const char* resampling, const std::vector<int>& factors,
                      GDALProgressFunc progress, void* progressData);
 

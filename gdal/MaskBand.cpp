@@ -110,4 +110,35 @@ CPLErr MaskBand::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height,
     });
 }
 
+LevelMask::LevelMask(Band& levelBand, GDALRasterBand& mainBand, std::uint32_t reduction)
+    : main(mainBand), step(1 << reduction) {
+    poDS = levelBand.GetDataset();
+    nBand = 0;
+    nRasterXSize = levelBand.GetXSize();
+    nRasterYSize = levelBand.GetYSize();
+    eDataType = GDT_Byte;
+    levelBand.GetBlockSize(&nBlockXSize, &nBlockYSize);
+}
+
+// Line by line, so that a block of a coarse level takes the memory of a line of the finest.
+CPLErr LevelMask::IReadBlock(int blockX, int blockY, void* data) {
+    return Reporting(CE_Failure, [&] {
+        int width = 0, height = 0;
+        GetActualBlockSize(blockX, blockY, &width, &height);
+        std::vector<unsigned char> line(static_cast<std::size_t>(width) *
+                                        static_cast<std::size_t>(step));
+        auto* out = static_cast<unsigned char*>(data);
+        for (int row = 0; row < height; ++row, out += nBlockXSize) {
+            const CPLErr read = main.GetMaskBand()->RasterIO(
+                GF_Read, blockX * nBlockXSize * step, (blockY * nBlockYSize + row) * step,
+                width * step, 1, line.data(), width * step, 1, GDT_Byte, 0, 0, nullptr);
+            if (read != CE_None) return read;
+            for (int column = 0; column < width; ++column)
+                out[column] =
+                    line[static_cast<std::size_t>(column) * static_cast<std::size_t>(step)];
+        }
+        return CE_None;
+    });
+}
+
 }  // namespace zmcgdal

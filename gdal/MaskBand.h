@@ -41,6 +41,26 @@ private:
     CPLErr ReadMask(int x, int y, int width, int height, unsigned char* out, std::size_t stride);
 };
 
+// LevelMask: the mask of a level where a file beside the pyramid has one of the whole dataset: of
+// the pixels that a pixel of the level stands for, that of the first.
+class LevelMask final : public GDALRasterBand {
+public:
+    // The main band, which has the level's as an overview, outlives this object.
+    LevelMask(Band& levelBand, GDALRasterBand& mainBand, std::uint32_t reduction);
+
+    bool IsMaskBand() const override { return true; }
+    GDALMaskValueRange GetMaskValueRange() const override { return GMVR_0_AND_255_ONLY; }
+    GDALRasterBand* GetMaskBand() override { return this; }
+    int GetMaskFlags() override { return GMF_ALL_VALID; }
+
+protected:
+    CPLErr IReadBlock(int blockX, int blockY, void* data) override;
+
+private:
+    GDALRasterBand& main;
+    int step;  // pixels of the main band
+};
+
 }  // namespace zmcgdal
 
 #endif

@@ -18,9 +18,9 @@ extern const char* const kCreationOptionsXml;
 
 struct OpenOptions {
     SignedByteAs signedByteAs = SignedByteAs::Int16;
-    bool keepCopies = false;  // zmchost::Raster::KeepCopies
+    bool keepCopies = false;      // zmchost::Raster::KeepCopies
     bool missingAsZeros = false;  // pixels that an incomplete file does not have
-    bool statistics = false;  // are renewed when a dataset whose pixels were edited is closed
+    bool statistics = false;      // are renewed when a dataset whose pixels were edited is closed
 };
 
 OpenOptions OpenOptionsFrom(CSLConstList options);

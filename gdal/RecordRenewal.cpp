@@ -46,8 +46,9 @@ void RenewRecords(Dataset& dataset, const std::vector<std::uint32_t>& bands,
     file.archive.Forget();
     const RecordCounts now = file.archive.Counts();
     for (std::uint32_t i = 0; i < hidden.size(); ++i)
-        BandAt(dataset, i).SetOldRecords({hidden[i].statistics ? now.statistics : 0,
-                                          hidden[i].histograms ? now.histograms : 0});
+        BandAt(dataset, i)
+            .SetOldRecords({hidden[i].statistics ? now.statistics : 0,
+                            hidden[i].histograms ? now.histograms : 0});
     dataset.SettleRecords();
     for (const zmchost::FullStatistics& each : full) BandAt(dataset, each.band).TakeRenewed(each);
 }

@@ -212,8 +212,7 @@ bool TileReader::Read(std::uint32_t level, const Rectangle& window, const int* b
         part.data = static_cast<unsigned char*>(target.data) + done * target.lineSpace;
         if (!Read(level, {window.x, y, window.width, height}, bands, bandCount, part)) return false;
         done += height;
-        if (extra->pfnProgress(static_cast<double>(done) / window.height, "",
-                               extra->pProgressData))
+        if (extra->pfnProgress(static_cast<double>(done) / window.height, "", extra->pProgressData))
             continue;
         CPLError(CE_Failure, CPLE_UserInterrupt, "cancelled");
         return false;

@@ -5,8 +5,8 @@
 #include <filesystem>
 
 #include "gdal/Sidecar.h"
-#include "platform/Interrupts.h"
 #include "host/file/PresentTiles.h"
+#include "platform/Interrupts.h"
 #include "tools/Arguments.h"
 #include "tools/Command.h"
 #include "tools/GdalWorld.h"

@@ -78,8 +78,8 @@ void StatsCommand::Report(const std::vector<std::uint32_t>& renewed) const {
         for (const std::uint32_t band : renewed) numbers.push_back(band + 1);
         PrintDocument({{"schema", kSchema}, {"file", file}, {"bands", numbers}});
     } else if (!quiet) {
-        std::printf("%s: statistics and histograms of %zu band%s renewed\n",
-                    Visible(file).c_str(), renewed.size(), renewed.size() == 1 ? "" : "s");
+        std::printf("%s: statistics and histograms of %zu band%s renewed\n", Visible(file).c_str(),
+                    renewed.size(), renewed.size() == 1 ? "" : "s");
     }
 }
 

@@ -22,7 +22,8 @@ struct FullStatistics {
     template <class T>
     static FullStatistics Of(const zelm::RasterBandStats<T>& record) {
         constexpr std::uint32_t kNeeded = zelm::StatsFlag::Minimum | zelm::StatsFlag::Maximum |
-                                          zelm::StatsFlag::Mean | zelm::StatsFlag::StandardDeviation;
+                                          zelm::StatsFlag::Mean |
+                                          zelm::StatsFlag::StandardDeviation;
         return {record.band,
                 (record.flags & kNeeded) == kNeeded,
                 static_cast<double>(record.minimum),

@@ -158,11 +158,11 @@ private:
 
     // A tile in runs of rows, or of parts of a row, of no more bytes than are held.
     static std::vector<Window> PiecesOf(const Window& tile, std::uint32_t count) {
-        const std::uint64_t most = std::max<std::uint64_t>(
-            kPieceBytes / (std::uint64_t{count} * (sizeof(T) + 1)), 1);
+        const std::uint64_t most =
+            std::max<std::uint64_t>(kPieceBytes / (std::uint64_t{count} * (sizeof(T) + 1)), 1);
         const auto width = static_cast<std::uint32_t>(std::min<std::uint64_t>(tile.width, most));
-        const auto height = static_cast<std::uint32_t>(
-            std::clamp<std::uint64_t>(most / width, 1, tile.height));
+        const auto height =
+            static_cast<std::uint32_t>(std::clamp<std::uint64_t>(most / width, 1, tile.height));
         std::vector<Window> pieces;
         for (std::uint32_t y = 0; y < tile.height; y += height)
             for (std::uint32_t x = 0; x < tile.width; x += width)
@@ -232,8 +232,8 @@ bool IsRecord(std::string_view name) { return name == "BANDSTATISTICS" || name =
 
 // The order of steps is that of every store: a mark that no parser takes for a document, the rest,
 // and the first byte.
-void ReplaceDocument(zelm::files::ByteSource& source, const std::string& name,
-                     std::uint64_t offset, std::string_view text) {
+void ReplaceDocument(zelm::files::ByteSource& source, const std::string& name, std::uint64_t offset,
+                     std::string_view text) {
     int error = 0;
     const auto write = [&](std::uint64_t at, std::string_view bytes) {
         if (source.WriteAt(at, bytes.data(), bytes.size(), &error) != bytes.size())
@@ -255,7 +255,8 @@ void Strip(zelm::files::ByteSource& source, const std::string& name, const Pyram
     // A byte order mark of UTF-8 may come first, and no other.
     constexpr std::string_view kFirst = "< \t\r\n\xEF";
     if (kFirst.find(text.front()) == kFirst.npos)
-        throw Error(name, kRenew, "its metadata document is in an encoding that is not taken apart");
+        throw Error(name, kRenew,
+                    "its metadata document is in an encoding that is not taken apart");
     const std::string stripped = WithoutRecords(text);
     if (!stripped.empty())
         if (const std::string wrong = JudgeMetadataText(stripped); !wrong.empty())

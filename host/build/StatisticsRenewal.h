@@ -1,5 +1,5 @@
-// RenewStatistics: statistics and histograms of level 0, computed anew and put in the place of those
-// that a pyramid file keeps.
+// RenewStatistics: statistics and histograms of level 0, computed anew and put in the place of
+// those that a pyramid file keeps.
 //
 // The module never removes a record, and answers with the oldest; so the document is cut down to
 // what else it holds, and the records of all bands are stored behind that, in order: the new ones,
@@ -36,8 +36,7 @@ struct RenewalRequest {
 // with the statistics of the bands asked for, in their order.
 std::vector<FullStatistics> RenewStatistics(const ModulePtr& module,
                                             const std::shared_ptr<zelm::files::ByteSource>& source,
-                                            const std::string& name,
-                                            const RenewalRequest& request);
+                                            const std::string& name, const RenewalRequest& request);
 
 // A document without its statistics and histograms, all else as it stands; empty if nothing is
 // left but the root. `text` is well-formed, in an encoding that has ASCII as single bytes.

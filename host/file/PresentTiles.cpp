@@ -8,10 +8,9 @@ namespace zmchost {
 
 PresentTiles::PresentTiles(const PyramidHeader& described) : header(described) {
     if (header.IsPlanar())
-        places.emplace(
-            zelm::TileTable{header.Geometry(0), header.levelMin, header.levelMax, header.bandCount,
-                            zelm::PixelSize(header.pixelType)},
-            header.tileDataStart);
+        places.emplace(zelm::TileTable{header.Geometry(0), header.levelMin, header.levelMax,
+                                       header.bandCount, zelm::PixelSize(header.pixelType)},
+                       header.tileDataStart);
 }
 
 std::uint64_t PresentTiles::EndOf(std::uint32_t level, std::uint32_t tileX, std::uint32_t tileY,
@@ -44,8 +43,9 @@ bool PresentTiles::Have(std::uint32_t level, const zelm::Rectangle& window,
 
 bool PresentTiles::HaveLevel(std::uint32_t level, std::uint64_t fileSize) const {
     if (fileSize >= header.tileDataEnd) return true;
-    const std::uint64_t bytes = zelm::LevelGeometry::LevelPixels(header.width, header.height, level) *
-                                zelm::PixelSize(header.pixelType) * header.bandCount;
+    const std::uint64_t bytes =
+        zelm::LevelGeometry::LevelPixels(header.width, header.height, level) *
+        zelm::PixelSize(header.pixelType) * header.bandCount;
     return !places && header.LevelOffset(level) + bytes <= fileSize;
 }
 

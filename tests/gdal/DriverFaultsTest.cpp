@@ -366,8 +366,8 @@ TEST_F(DriverFaults, RenewalThatFailsLeavesTheDocumentAsItWas) {
         for (bool met = true; met; ++points) {
             zmctest::WriteText(name, whole);
             std::filesystem::remove(name + ".aux.xml");
-            DatasetPtr dataset(GDALDataset::Open(
-                name.c_str(), GDAL_OF_RASTER | GDAL_OF_UPDATE, nullptr, options));
+            DatasetPtr dataset(
+                GDALDataset::Open(name.c_str(), GDAL_OF_RASTER | GDAL_OF_UPDATE, nullptr, options));
             ASSERT_TRUE(dataset);
             Fill(*dataset, 1, 9);
             dataset->FlushCache(false);

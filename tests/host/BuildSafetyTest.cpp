@@ -268,7 +268,7 @@ public:
         return answer;
     }
     std::string Failure() override { return failure; }
-    void StoreStatistics() override {}
+    std::vector<FullStatistics> StoreStatistics() override { return {}; }
     std::uint64_t StatisticsMemory() const override { return 0; }
 
     bool answer = true;

@@ -1,4 +1,5 @@
 """Exports, read back through GDAL."""
+import os
 import numpy as np
 from osgeo import gdal
 
@@ -39,6 +40,25 @@ class Export(ToolTest):
         self.pyramid()
         self.good("export", "picture.pyr", "picture.dat", "--format", "GTiff", "--co=TILED=YES")
         self.assertEqual(gdal.Open(self.path("picture.dat")).GetDriver().ShortName, "GTiff")
+
+    def test_masks_are_kept(self):
+        self.picture()
+        source = gdal.Open(self.path("picture.tif"))
+        source.CreateMaskBand(gdal.GMF_PER_DATASET)
+        mask = samples("Byte", 300, 700, 1, 5)[:, :, 0] // 128 * 255
+        source.GetRasterBand(1).GetMaskBand().WriteArray(mask)
+        del source
+        self.good("build", "picture.tif", "picture.pyr")
+        for level, options in ((0, ()), (1, ()), (0, ("--window", "7,8,100,90"))):
+            self.good("export", "picture.pyr", "back.tif", "--level", level, *options)
+            back = gdal.Open(self.path("back.tif"))
+            self.assertEqual(back.GetRasterBand(1).GetMaskFlags(), gdal.GMF_PER_DATASET)
+            expected = mask[8:98, 7:107] if options else mask[::1 << level, ::1 << level]
+            np.testing.assert_array_equal(back.GetRasterBand(1).GetMaskBand().ReadAsArray(),
+                                          expected)
+            del back
+            for name in ("back.tif", "back.tif.msk"):
+                os.remove(self.path(name))
 
     def test_an_old_target_is_replaced(self):
         self.pyramid()
