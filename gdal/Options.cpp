@@ -6,6 +6,7 @@
 #include <cctype>
 #include <cstdint>
 #include <cstdlib>
+#include <string>
 
 namespace zmcgdal {
 
@@ -17,19 +18,24 @@ const char* const kOpenOptionsXml = R"(<OpenOptionList>
   <Option name='KEEP_COPIES' type='boolean' default='NO' description='Whether stores of statistics, histograms and color tables keep what was stored before in FILE.zmcmeta until they have reached the disk'/>
 </OpenOptionList>)";
 
-const char* const kCreationOptionsXml = R"(<CreationOptionList>
+namespace {
+
+// The methods as values of an option: one list for all who name them.
+std::string MethodValues() {
+    std::string values;
+    for (std::uint32_t method = 0; method < zmchost::kResamplings; ++method) {
+        std::string name = zmchost::ResamplingName(static_cast<zmchost::Resampling>(method));
+        for (char& c : name) c = static_cast<char>(std::toupper(static_cast<unsigned char>(c)));
+        values += "    <Value>" + name + "</Value>\n";
+    }
+    return values;
+}
+
+const std::string kCreationOptions =
+    R"(<CreationOptionList>
   <Option name='RESAMPLING' type='string-select' description='How levels are reduced; MODE by default for a raster with a color table, else AVERAGE'>
-    <Value>NEAREST</Value>
-    <Value>AVERAGE</Value>
-    <Value>RMS</Value>
-    <Value>MODE</Value>
-    <Value>MINIMUM</Value>
-    <Value>MAXIMUM</Value>
-    <Value>MEDIAN</Value>
-    <Value>BILINEAR</Value>
-    <Value>CUBIC</Value>
-    <Value>LANCZOS</Value>
-  </Option>
+)" + MethodValues() +
+    R"(  </Option>
   <Option name='LEVELS' type='string' default='AUTO' description='Number of the coarsest level, 0 for no reduced level; AUTO goes on until a level fits one tile'/>
   <Option name='ORDERING' type='string-select' default='AUTO' description='Order of the tiles in the file; MORTON for more than eight bands, and only then'>
     <Value>AUTO</Value>
@@ -46,6 +52,10 @@ const char* const kCreationOptionsXml = R"(<CreationOptionList>
     <Value>SIGNEDBYTE</Value>
   </Option>
 </CreationOptionList>)";
+
+}  // namespace
+
+const char* const kCreationOptionsXml = kCreationOptions.c_str();
 
 namespace {
 

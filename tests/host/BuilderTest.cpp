@@ -26,10 +26,10 @@ using zmctest::MemorySource;
 using zmctest::ScratchDirectory;
 using zmctest::TestModule;
 
-constexpr Resampling kMethods[] = {Resampling::Nearest, Resampling::Average,  Resampling::Rms,
-                                   Resampling::Mode,    Resampling::Minimum,  Resampling::Maximum,
-                                   Resampling::Median,  Resampling::Bilinear, Resampling::Cubic,
-                                   Resampling::Lanczos};
+constexpr Resampling kMethods[] = {
+    Resampling::Nearest, Resampling::Average, Resampling::Rms,    Resampling::Mode,
+    Resampling::Minimum, Resampling::Maximum, Resampling::Median, Resampling::Bilinear,
+    Resampling::Cubic,   Resampling::Lanczos, Resampling::Gauss,  Resampling::CubicSpline};
 static_assert(std::size(kMethods) == kResamplings);
 
 template <class T>
