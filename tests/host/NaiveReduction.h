@@ -29,6 +29,7 @@ struct Picture {
     std::uint32_t halo = 0;
     std::vector<std::vector<T>> rows;  // an empty one is outside the level
     std::vector<std::vector<unsigned char>> masks;
+    bool hides = false;  // bit 1 of a mask hides a sample
 
     bool Valid(int row, std::int64_t column, std::uint32_t band) const {
         if (row < 0 || row >= static_cast<int>(rows.size()) || column < 0 || column >= width)
@@ -36,6 +37,10 @@ struct Picture {
         const auto r = static_cast<std::size_t>(row);
         if (rows[r].empty()) return false;
         return masks.empty() || masks[r].empty() || (masks[r][Index(column, band)] & 1) == 0;
+    }
+    bool Hidden(int row, std::int64_t column, std::uint32_t band) const {
+        const auto r = static_cast<std::size_t>(row);
+        return hides && !masks.empty() && !masks[r].empty() && (masks[r][Index(column, band)] & 2) != 0;
     }
     T At(int row, std::int64_t column, std::uint32_t band) const {
         return rows[static_cast<std::size_t>(row)][Index(column, band)];
