@@ -44,6 +44,10 @@ const std::string kCreationOptions =
     <Value>MORTON</Value>
   </Option>
   <Option name='STATISTICS' type='boolean' default='YES' description='Whether to store statistics and histograms'/>
+  <Option name='WEIGHTS' type='string-select' default='AUTO' description='Whether an alpha band and masks weigh the pixels that levels are reduced from; NONE: all count alike'>
+    <Value>AUTO</Value>
+    <Value>NONE</Value>
+  </Option>
   <Option name='BINS' type='int' default='256' description='Bins of a histogram'/>
   <Option name='NUM_THREADS' type='string' default='ALL_CPUS' description='Threads to build with: a number or ALL_CPUS'/>
   <Option name='MEMORY' type='string' default='256M' description='Memory for pixels, in bytes or with K, M or G'/>
@@ -142,6 +146,10 @@ std::optional<CreationOptions> ParseCreationOptions(CSLConstList options) {
         if (!size && !Report("MEMORY", memory)) return std::nullopt;
         parsed.build.memory = *size;
     }
+    const char* const weights = CSLFetchNameValueDef(options, "WEIGHTS", "AUTO");
+    parsed.build.weights = EQUAL(weights, "AUTO");
+    if (!parsed.build.weights && !EQUAL(weights, "NONE") && !Report("WEIGHTS", weights))
+        return std::nullopt;
     parsed.build.statistics = CPLFetchBool(options, "STATISTICS", true);
     parsed.signedByte =
         EQUAL(CSLFetchNameValueDef(options, "PIXELTYPE", "DEFAULT"), "SIGNEDBYTE") != 0;
