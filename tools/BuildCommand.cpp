@@ -74,7 +74,7 @@ void BuildCommand::Describe(OptionTable& table) {
             "--weights", weights,
             "Whether an alpha band and masks weigh the pixels that levels are reduced from; none: "
             "all count alike (default auto)")
-        .Named("auto|none")
+        .Named("WEIGHTS")
         .OneOf({"auto", "none"});
     table
         .Text("--ordering", ordering,

@@ -47,7 +47,7 @@ void VerifyCommand::Describe(OptionTable& table) {
             "--weights", weights,
             "Whether an alpha band and masks weighed the pixels that levels were made of (default "
             "auto)")
-        .Named("auto|none")
+        .Named("WEIGHTS")
         .OneOf({"auto", "none"});
     table.Text("--against", source, "Raster that level 0 must be equal to").Named("SOURCE");
     table

@@ -1,5 +1,11 @@
 // Reduction of raster rows to the next coarser level: two rows and two columns become one.
 //
+// A level has half the columns and rows of the one before, rounded down: the pixel (x, y) stands
+// for just the cell of (2x, 2y) to (2x + 1, 2y + 1), so that pixels are twice as large from level
+// to level and never move. The last column or row of an odd size belongs to no cell; methods on a
+// window tap it like any other sample inside the level. What counts beside validity tells
+// Weighing.h.
+//
 // Pure functions on rows of one level, pixel-interleaved; no files, no threads, no state. Every
 // method works in the raster's own type, takes valid samples only, and gives a cell without any
 // the band's no-data value. Any number of threads may reduce different rows at the same time.

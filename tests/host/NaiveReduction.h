@@ -40,7 +40,8 @@ struct Picture {
     }
     bool Hidden(int row, std::int64_t column, std::uint32_t band) const {
         const auto r = static_cast<std::size_t>(row);
-        return hides && !masks.empty() && !masks[r].empty() && (masks[r][Index(column, band)] & 2) != 0;
+        return hides && !masks.empty() && !masks[r].empty() &&
+               (masks[r][Index(column, band)] & 2) != 0;
     }
     T At(int row, std::int64_t column, std::uint32_t band) const {
         return rows[static_cast<std::size_t>(row)][Index(column, band)];

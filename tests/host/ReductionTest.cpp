@@ -415,6 +415,9 @@ TEST(Reduction, OddLastColumnBelongsToNoCellButIsTapped) {
     // Weights 3 3 1 along the row.
     EXPECT_THAT(Reduce<unsigned char>(Resampling::Bilinear, tapped, {}).out,
                 ::testing::ElementsAre(10));
+    // 1 2 1.
+    EXPECT_THAT(Reduce<unsigned char>(Resampling::Gauss, tapped, {}).out,
+                ::testing::ElementsAre(18));
 }
 
 TEST(Reduction, NarrowLevelsGiveNothing) {
