@@ -361,7 +361,7 @@ TEST_P(WeighingModel, EveryMethodAgreesWithThePlainDefinition) {
             const auto method = static_cast<Resampling>(code);
             if (!zmchost::SupportsElementType(method, zelm::ElementTraits<T>::code)) continue;
             Random random(code);
-            for (int round = 0; round < 24 && !::testing::Test::HasFailure(); ++round) {
+            for (int round = 0; round < 16 && !::testing::Test::HasFailure(); ++round) {
                 const Scene<T> scene(random, method, round);
                 const auto reduced = Reduce(method, scene.picture, scene.rules, scene.weighing);
                 CheckRow<T>({method, scene.picture, scene.rules, scene.weighing, nullptr, reduced});
@@ -390,7 +390,7 @@ TEST_P(WeighingModel, PalettesAgreeWithThePlainDefinition) {
                 const auto method = static_cast<Resampling>(code);
                 if (!zmchost::Computes(method)) continue;
                 Random random(code);
-                for (int round = 0; round < 20 && !::testing::Test::HasFailure(); ++round) {
+                for (int round = 0; round < 15 && !::testing::Test::HasFailure(); ++round) {
                     Scene<T> scene(random, method, round);
                     const Colors colors = AnyColors(random, round);
                     const auto palette = zmctest::PaletteOf(colors);
