@@ -57,13 +57,11 @@ Weighing WeighingOf(const BandWeights& weights, Resampling method,
         if (zelm::kIsComplex<T> || !Computes(method) || band >= weights.palettes.size()) continue;
         const zelm::PalettePtr& palette = weights.palettes[band];
         if (!palette || palette->nextIndex == 0) continue;
-        const zelm::NoDataRule<T>& rule = rules[band];
-        one.colors = std::make_shared<ColorIndex>(*palette, [&rule](std::uint32_t index) {
-            if constexpr (zelm::kIsComplex<T>)
-                return false;
-            else
+        [[maybe_unused]] const zelm::NoDataRule<T>& rule = rules[band];
+        if constexpr (!zelm::kIsComplex<T>)
+            one.colors = std::make_shared<ColorIndex>(*palette, [&rule](std::uint32_t index) {
                 return HoldsIndex<T>(index) && !rule.Marks(static_cast<T>(index));
-        });
+            });
     }
     return weighing;
 }
