@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <climits>
+#include <cmath>
 #include <utility>
 
 #include "core/PixelVocabulary.h"
@@ -230,6 +231,22 @@ const char* Dataset::GetMetadataItem(const char* name, const char* domain) {
         if (CPLStringList* const own = OwnDomain(domain)) return own->FetchNameValue(name);
         return GDALPamDataset::GetMetadataItem(name, domain);
     });
+}
+
+CPLErr Dataset::GetGeoTransform(double* transform) {
+    return Reporting(CE_Failure, [&] {
+        if (!main) return GDALPamDataset::GetGeoTransform(transform);
+        const CPLErr result = main->GetGeoTransform(transform);
+        const double factor = std::ldexp(1.0, static_cast<int>(level - main->Level()));
+        for (const int i : {1, 2, 4, 5})
+            if (result == CE_None) transform[i] *= factor;
+        return result;
+    });
+}
+
+const OGRSpatialReference* Dataset::GetSpatialRef() const {
+    return Reporting<const OGRSpatialReference*>(
+        nullptr, [&] { return main ? main->GetSpatialRef() : GDALPamDataset::GetSpatialRef(); });
 }
 
 CPLErr Dataset::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, void* data,

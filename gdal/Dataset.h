@@ -95,6 +95,11 @@ public:
     using Flushed = decltype(std::declval<GDALPamDataset&>().FlushCache(false));
     Flushed FlushCache(bool atClosing) override;
 
+    // Of a coarser level, those of the finest with pixels 2, 4, 8 ... times as large: each covers
+    // just so many, and what is over at the right and at the bottom belongs to none.
+    CPLErr GetGeoTransform(double* transform) override;
+    const OGRSpatialReference* GetSpatialRef() const override;
+
     CPLErr IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, void* data,
                      int bufferWidth, int bufferHeight, GDALDataType bufferType, int bandCount,
                      int* bandMap, GSpacing pixelSpace, GSpacing lineSpace, GSpacing bandSpace,

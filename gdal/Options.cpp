@@ -6,6 +6,7 @@
 #include <cctype>
 #include <cstdint>
 #include <cstdlib>
+#include <string>
 
 #include "host/base/ScaledNumber.h"
 
@@ -19,19 +20,24 @@ const char* const kOpenOptionsXml = R"(<OpenOptionList>
   <Option name='KEEP_COPIES' type='boolean' default='NO' description='Whether stores of statistics, histograms and color tables keep what was stored before in FILE.zmcmeta until they have reached the disk'/>
 </OpenOptionList>)";
 
-const char* const kCreationOptionsXml = R"(<CreationOptionList>
+namespace {
+
+// The methods as values of an option: one list for all who name them.
+std::string MethodValues() {
+    std::string values;
+    for (std::uint32_t method = 0; method < zmchost::kResamplings; ++method) {
+        std::string name = zmchost::ResamplingName(static_cast<zmchost::Resampling>(method));
+        for (char& c : name) c = static_cast<char>(std::toupper(static_cast<unsigned char>(c)));
+        values += "    <Value>" + name + "</Value>\n";
+    }
+    return values;
+}
+
+const std::string kCreationOptions =
+    R"(<CreationOptionList>
   <Option name='RESAMPLING' type='string-select' description='How levels are reduced; MODE by default for a raster with a color table, else AVERAGE'>
-    <Value>NEAREST</Value>
-    <Value>AVERAGE</Value>
-    <Value>RMS</Value>
-    <Value>MODE</Value>
-    <Value>MINIMUM</Value>
-    <Value>MAXIMUM</Value>
-    <Value>MEDIAN</Value>
-    <Value>BILINEAR</Value>
-    <Value>CUBIC</Value>
-    <Value>LANCZOS</Value>
-  </Option>
+)" + MethodValues() +
+    R"(  </Option>
   <Option name='LEVELS' type='string' default='AUTO' description='Number of the coarsest level, 0 for no reduced level; AUTO goes on until a level fits one tile'/>
   <Option name='ORDERING' type='string-select' default='AUTO' description='Order of the tiles in the file; MORTON for more than eight bands, and only then'>
     <Value>AUTO</Value>
@@ -40,6 +46,10 @@ const char* const kCreationOptionsXml = R"(<CreationOptionList>
     <Value>MORTON</Value>
   </Option>
   <Option name='STATISTICS' type='boolean' default='YES' description='Whether to store statistics and histograms'/>
+  <Option name='WEIGHTS' type='string-select' default='AUTO' description='Whether an alpha band and masks weigh the pixels that levels are reduced from; NONE: all count alike'>
+    <Value>AUTO</Value>
+    <Value>NONE</Value>
+  </Option>
   <Option name='BINS' type='int' default='256' description='Bins of a histogram'/>
   <Option name='NUM_THREADS' type='string' default='ALL_CPUS' description='Threads to build with: a number or ALL_CPUS'/>
   <Option name='MEMORY' type='string' default='256M' description='Memory for pixels, in bytes or with K, M or G'/>
@@ -48,6 +58,10 @@ const char* const kCreationOptionsXml = R"(<CreationOptionList>
     <Value>SIGNEDBYTE</Value>
   </Option>
 </CreationOptionList>)";
+
+}  // namespace
+
+const char* const kCreationOptionsXml = kCreationOptions.c_str();
 
 namespace {
 
@@ -128,6 +142,10 @@ std::optional<CreationOptions> ParseCreationOptions(CSLConstList options) {
         if (!size && !Report("MEMORY", memory)) return std::nullopt;
         parsed.build.memory = *size;
     }
+    const char* const weights = CSLFetchNameValueDef(options, "WEIGHTS", "AUTO");
+    parsed.build.weights = EQUAL(weights, "AUTO");
+    if (!parsed.build.weights && !EQUAL(weights, "NONE") && !Report("WEIGHTS", weights))
+        return std::nullopt;
     parsed.build.statistics = CPLFetchBool(options, "STATISTICS", true);
     parsed.signedByte =
         EQUAL(CSLFetchNameValueDef(options, "PIXELTYPE", "DEFAULT"), "SIGNEDBYTE") != 0;

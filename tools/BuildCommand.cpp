@@ -37,6 +37,7 @@ private:
     std::string target;
     std::string levels = "auto";
     std::string resampling;
+    std::string weights = "auto";
     std::string ordering = "auto";
     std::string noData;
     std::string bands;
@@ -69,6 +70,13 @@ void BuildCommand::Describe(OptionTable& table) {
               "How levels are reduced (default average, and mode for rasters with a palette)")
         .Named("METHOD")
         .OneOf(MethodNames());
+    table
+        .Text(
+            "--weights", weights,
+            "Whether an alpha band and masks weigh the pixels that levels are reduced from; none: "
+            "all count alike (default auto)")
+        .Named("WEIGHTS")
+        .OneOf({"auto", "none"});
     table
         .Text("--ordering", ordering,
               "Order of the tiles in the file; more than eight bands are always in the Morton "
@@ -115,6 +123,7 @@ zmchost::BuildOptions BuildCommand::Options(const zelm::RasterProps& props) cons
     if (levels != "auto")
         options.levels = static_cast<std::uint32_t>(ParseCount("--levels", levels, 31));
     if (!resampling.empty()) options.resampling = zmchost::ParseResampling(resampling);
+    options.weights = weights == "auto";
     if (ordering == "scanline") options.ordering = zmchost::Ordering::Scanline;
     if (ordering == "blocked") options.ordering = zmchost::Ordering::Blocked;
     if (noData == "none") options.noData = zmchost::BuildOptions::NoData{};

@@ -150,6 +150,7 @@ TEST_F(DriverTest, CreationOptionsDoWhatTheirDescriptionTells) {
         EXPECT_EQ(parsed->build.levels, none->build.levels) << name;
         EXPECT_EQ(parsed->build.statistics, none->build.statistics) << name;
         EXPECT_EQ(parsed->build.ordering, none->build.ordering) << name;
+        EXPECT_EQ(parsed->build.weights, none->build.weights) << name;
         EXPECT_EQ(parsed->signedByte, none->signedByte) << name;
         std::size_t values = 0;
         for (const CPLXMLNode* value = option->psChild; value; value = value->psNext) {
@@ -163,7 +164,7 @@ TEST_F(DriverTest, CreationOptionsDoWhatTheirDescriptionTells) {
         EXPECT_EQ(methods ? values : 0, methods ? zmchost::kResamplings : 0) << name;
     }
     EXPECT_EQ(names, (std::set<std::string>{"BINS", "LEVELS", "MEMORY", "NUM_THREADS", "ORDERING",
-                                            "PIXELTYPE", "RESAMPLING", "STATISTICS"}));
+                                            "PIXELTYPE", "RESAMPLING", "STATISTICS", "WEIGHTS"}));
 }
 
 TEST_F(DriverTest, CopiesOfEveryTypeHoldTheSamePixels) {

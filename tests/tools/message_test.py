@@ -66,7 +66,7 @@ class Usage(ToolTest):
     def test_options_of_build(self):
         self.picture()
         tail = "; see zmcraster build --help"
-        methods = "nearest,average,rms,mode,minimum,maximum,median,bilinear,cubic,lanczos"
+        methods = "nearest,average,rms,mode,minimum,maximum,median,bilinear,cubic,lanczos,gauss,cubicspline"
         for option, value, message in (
                 ("--levels", "z", '--levels: "z" is no whole number'),
                 ("--levels", "32", "--levels: 32 is more than 31"),
