@@ -91,14 +91,8 @@ bool StoredStatistics::IsFull() const {
     return (flags & kNeeded) == kNeeded;
 }
 
-Archive::Archive(LazyRaster& pyramid, bool hasDocument)
-    : raster(pyramid), documentExists(hasDocument) {}
-
-const StoredStatistics* Archive::Statistics(std::uint32_t band) {
-    if (!RemembersStatistics(band)) FetchStatistics(band);
-    const auto found = statistics.find(band);
-    return found != statistics.end() && found->second ? &*found->second : nullptr;
-}
+Archive::Archive(LazyRaster& pyramid, bool hasDocument, std::uint64_t elementLimit)
+    : raster(pyramid), documentExists(hasDocument), mostElements(elementLimit) {}
 
 bool Archive::RemembersStatistics(std::uint32_t band) const {
     return !documentExists || statistics.count(band) != 0;
@@ -119,48 +113,41 @@ bool Archive::LookAtRecords(Look&& look) const {
     return told && settled;
 }
 
-void Archive::FetchStatistics(std::uint32_t band) {
-    std::optional<StoredStatistics> newest;
-    const bool known = LookAtRecords([&](const auto& records) {
-        if (const auto* const record = records.NewestStatistics(band)) newest = Convert(*record);
+template <class Map, class Look>
+auto* Archive::Recall(Map& known, const typename Map::key_type& key, Look&& look) {
+    if (documentExists && known.count(key) == 0) {
+        typename Map::mapped_type found;
+        if (LookAtRecords([&](const auto& records) { found = look(records); }))
+            known.emplace(key, std::move(found));
+    }
+    const auto place = known.find(key);
+    return place != known.end() && place->second ? &*place->second : nullptr;
+}
+
+const StoredStatistics* Archive::Statistics(std::uint32_t band) {
+    return Recall(statistics, band, [&](const auto& records) {
+        const auto* const newest = records.NewestStatistics(band);
+        return newest ? std::optional(Convert(*newest)) : std::nullopt;
     });
-    if (known) statistics.emplace(band, newest);
 }
 
 // The newest of those that have counts.
-void Archive::FetchHistogram(std::uint32_t band, std::uint32_t level) {
-    std::optional<StoredHistogram> found;
-    const bool known = LookAtRecords([&](const auto& records) {
+const StoredHistogram* Archive::Histogram(std::uint32_t band, std::uint32_t level) {
+    return Recall(histograms, {band, level}, [&](const auto& records) {
         const auto all = records.Histograms();
         const auto newest = std::find_if(all.rbegin(), all.rend(), [&](const auto& each) {
             return each.band == band && each.level == level && each.binCount != 0 &&
                    each.counts.data && each.counts.shape.elements != 0;
         });
-        if (newest != all.rend()) found = Convert(*newest);
+        return newest != all.rend() ? std::optional(Convert(*newest)) : std::nullopt;
     });
-    if (known) histograms.emplace(std::pair(band, level), std::move(found));
-}
-
-const StoredHistogram* Archive::Histogram(std::uint32_t band, std::uint32_t level) {
-    const std::pair key(band, level);
-    if (documentExists && histograms.count(key) == 0) FetchHistogram(band, level);
-    const auto found = histograms.find(key);
-    return found != histograms.end() && found->second ? &*found->second : nullptr;
 }
 
 GDALColorTable* Archive::ColorTable(std::uint32_t band) {
-    if (documentExists && colorTables.count(band) == 0) FetchColorTable(band);
-    const auto found = colorTables.find(band);
-    return found == colorTables.end() ? nullptr : found->second.get();
-}
-
-void Archive::FetchColorTable(std::uint32_t band) {
-    std::unique_ptr<GDALColorTable> table;
-    const bool known = LookAtRecords([&](const auto& records) {
-        if (const zelm::ColorList* const palette = records.BandPalette(band))
-            table = TableOf(*palette);
+    return Recall(colorTables, band, [&](const auto& records) {
+        const zelm::ColorList* const palette = records.BandPalette(band);
+        return palette ? TableOf(*palette) : nullptr;
     });
-    if (known) colorTables.emplace(band, std::move(table));
 }
 
 // The module's setters answer true for a file that they cannot write. A store that fails may have
@@ -181,9 +168,8 @@ bool Archive::Store(Setter&& setter) {
 
 void Archive::CheckElements() {
     if (!elements) elements = documentExists ? raster.Get().DocumentElements() : 0;
-    const std::string wrong =
-        zmchost::Limits::Judge("elements", *elements, zmchost::Limits::Current().elements,
-                               "it has " + std::to_string(*elements) + " elements");
+    const std::string wrong = zmchost::Limits::Judge(
+        "elements", *elements, mostElements, "it has " + std::to_string(*elements) + " elements");
     if (!wrong.empty())
         throw zmchost::Error(raster.Name(), "store into its metadata document", wrong);
 }

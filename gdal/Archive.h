@@ -43,8 +43,9 @@ struct StoredHistogram {
 
 class Archive {
 public:
-    // `pyramid` outlives this object. Without a document in the file nothing is fetched.
-    Archive(LazyRaster& pyramid, bool hasDocument);
+    // `pyramid` outlives this object. Without a document in the file nothing is fetched; one of
+    // more than `elementLimit` elements is not stored into.
+    Archive(LazyRaster& pyramid, bool hasDocument, std::uint64_t elementLimit);
 
     // Null where the file has none.
     const StoredStatistics* Statistics(std::uint32_t band);
@@ -55,6 +56,8 @@ public:
 
     // Appends a record to the file; false if the module did not take it. A store makes a tree of
     // all that the document has, so that one with more elements than are taken on is left alone.
+    // They are counted before the first store: what others put there is judged, and not what is
+    // stored here, which has the format's own limit.
     bool StoreStatistics(std::uint32_t band, const StoredStatistics& statistics);
     bool StoreHistogram(const StoredHistogram& histogram);
     // A null table hides the one that is there.
@@ -63,7 +66,8 @@ public:
 private:
     LazyRaster& raster;
     bool documentExists;
-    std::optional<std::uint64_t> elements;  // of the document, once somebody stores into it
+    std::uint64_t mostElements;
+    std::optional<std::uint64_t> elements;  // of the document, before the first store into it
     std::map<std::uint32_t, std::optional<StoredStatistics>> statistics;
     std::map<std::pair<std::uint32_t, std::uint32_t>, std::optional<StoredHistogram>> histograms;
     std::map<std::uint32_t, std::unique_ptr<GDALColorTable>> colorTables;
@@ -75,10 +79,11 @@ private:
     // after a warning, if what was seen, or was not, may be something else the next time.
     template <class Look>
     bool LookAtRecords(Look&& look) const;
-    void FetchStatistics(std::uint32_t band);
-    void FetchHistogram(std::uint32_t band, std::uint32_t level);
+    // What is remembered under a key; at first what look(zmchost::StoredRecords<T>) finds, which is
+    // remembered where it will be the same the next time. Null where there is none.
+    template <class Map, class Look>
+    auto* Recall(Map& known, const typename Map::key_type& key, Look&& look);
     void CheckElements();
-    void FetchColorTable(std::uint32_t band);
 };
 
 }  // namespace zmcgdal

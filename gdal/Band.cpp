@@ -71,7 +71,7 @@ bool Band::StoresInFile() const {
 // --- pixels ---
 
 CPLErr Band::IReadBlock(int blockX, int blockY, void* data) {
-    return Reporting<CPLErr>(CE_Failure, [&]() -> CPLErr {
+    return Reporting(CE_Failure, [&] {
         const Creation* const creation = owner.UnderCreation();
         if (creation && !creation->IsWritten(BlockNumber(blockX, blockY), index)) {
             FillUnwritten(
@@ -103,20 +103,11 @@ std::size_t Band::BlockNumber(int blockX, int blockY) const {
 
 // Blocks that nobody wrote hold the no-data value, to its last digit, or zeros.
 void Band::FillUnwritten(void* samples, std::size_t stride, std::size_t count) {
-    const auto fill = [&](auto value, GDALDataType type) {
-        GDALCopyWords64(&value, type, 0, samples, eDataType, static_cast<int>(stride),
+    VisitNoData(*this, [&](auto noData, GDALDataType form) {
+        const auto value = noData.value_or(0);
+        GDALCopyWords64(&value, form, 0, samples, eDataType, static_cast<int>(stride),
                         static_cast<GPtrDiff_t>(count));
-    };
-    int has = FALSE;
-    if (eDataType == GDT_Int64) {
-        const std::int64_t value = GetNoDataValueAsInt64(&has);
-        fill(has ? value : 0, GDT_Int64);
-    } else if (eDataType == GDT_UInt64) {
-        const std::uint64_t value = GetNoDataValueAsUInt64(&has);
-        fill(has ? value : 0, GDT_UInt64);
-    } else {
-        fill(NoDataAsDouble(*this).value_or(0.0), GDT_Float64);
-    }
+    });
 }
 
 // Copies the part of a padded block that lies in the tile, at `stride` bytes per pixel.
@@ -190,8 +181,7 @@ void Band::WaitingBlock::Settle() const {
 void Band::DropSidecarStatistics() {
     if (owner.IsOverview()) return;
     char** const items = GDALPamRasterBand::GetMetadata("");
-    CPLStringList kept = WithoutStatistics(items);
-    if (kept.Count() != CSLCount(items)) GDALPamRasterBand::SetMetadata(kept.List(), "");
+    if (HasStatistics(items)) GDALPamRasterBand::SetMetadata(WithoutStatistics(items).List(), "");
 }
 
 CPLErr Band::IWriteBlock(int blockX, int blockY, void* data) {
@@ -218,8 +208,15 @@ CPLErr Band::IWriteBlock(int blockX, int blockY, void* data) {
 CPLErr Band::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, void* data,
                        int bufferWidth, int bufferHeight, GDALDataType bufferType,
                        GSpacing pixelSpace, GSpacing lineSpace, GDALRasterIOExtraArg* extra) {
-    return Reporting<CPLErr>(CE_Failure, [&]() -> CPLErr {
-        if (mode == GF_Read && bufferWidth < width && bufferHeight < height) {
+    return Reporting(CE_Failure, [&] {
+        const bool reduced = mode == GF_Read && bufferWidth < width && bufferHeight < height;
+        if (reduced && !owner.Overviews().empty()) {
+            Dataset::Shown shown(x, y, width, height, *extra);
+            if (Dataset* const coarser = owner.CoarserFor(shown, bufferWidth, bufferHeight))
+                return coarser->BandOf(nBand)->RasterIO(
+                    mode, shown.x, shown.y, shown.width, shown.height, data, bufferWidth,
+                    bufferHeight, bufferType, pixelSpace, lineSpace, &shown.extra);
+        } else if (reduced) {
             int tried = FALSE;
             const CPLErr result =
                 TryOverviewRasterIO(mode, x, y, width, height, data, bufferWidth, bufferHeight,
@@ -267,7 +264,7 @@ std::uint64_t Band::GetNoDataValueAsUInt64(int* success) {
 }
 
 CPLErr Band::SetNoDataValue(double value) {
-    return Reporting<CPLErr>(CE_Failure, [&]() -> CPLErr {
+    return Reporting(CE_Failure, [&] {
         if (owner.IsOverview()) return MainBand()->SetNoDataValue(value);
         InvalidateMaskBand();
         return GDALPamRasterBand::SetNoDataValue(value);
@@ -275,7 +272,7 @@ CPLErr Band::SetNoDataValue(double value) {
 }
 
 CPLErr Band::SetNoDataValueAsInt64(std::int64_t value) {
-    return Reporting<CPLErr>(CE_Failure, [&]() -> CPLErr {
+    return Reporting(CE_Failure, [&] {
         if (owner.IsOverview()) return MainBand()->SetNoDataValueAsInt64(value);
         InvalidateMaskBand();
         return GDALPamRasterBand::SetNoDataValueAsInt64(value);
@@ -283,7 +280,7 @@ CPLErr Band::SetNoDataValueAsInt64(std::int64_t value) {
 }
 
 CPLErr Band::SetNoDataValueAsUInt64(std::uint64_t value) {
-    return Reporting<CPLErr>(CE_Failure, [&]() -> CPLErr {
+    return Reporting(CE_Failure, [&] {
         if (owner.IsOverview()) return MainBand()->SetNoDataValueAsUInt64(value);
         InvalidateMaskBand();
         return GDALPamRasterBand::SetNoDataValueAsUInt64(value);
@@ -291,7 +288,7 @@ CPLErr Band::SetNoDataValueAsUInt64(std::uint64_t value) {
 }
 
 CPLErr Band::DeleteNoDataValue() {
-    return Reporting<CPLErr>(CE_Failure, [&]() -> CPLErr {
+    return Reporting(CE_Failure, [&] {
         if (owner.IsOverview()) return MainBand()->DeleteNoDataValue();
         InvalidateMaskBand();
         return GDALPamRasterBand::DeleteNoDataValue();
@@ -372,7 +369,7 @@ GDALColorTable* Band::GetColorTable() {
 }
 
 CPLErr Band::SetColorTable(GDALColorTable* table) {
-    return Reporting<CPLErr>(CE_Failure, [&]() -> CPLErr {
+    return Reporting(CE_Failure, [&] {
         if (!StoresInFile()) return GDALPamRasterBand::SetColorTable(table);
         if (owner.File().archive.StoreColorTable(index, table)) return CE_None;
         ReportError(CE_Failure, CPLE_FileIO, "the color table was not stored");
@@ -460,7 +457,7 @@ double Band::GetMaximum(int* success) {
 
 CPLErr Band::GetStatistics(int approximate, int force, double* minimum, double* maximum,
                            double* mean, double* deviation) {
-    return Reporting<CPLErr>(CE_Failure, [&]() -> CPLErr {
+    return Reporting(CE_Failure, [&] {
         const StoredStatistics* const stored = Stored();
         if (!stored || !stored->IsFull())
             return GDALPamRasterBand::GetStatistics(approximate, force, minimum, maximum, mean,
@@ -474,7 +471,7 @@ CPLErr Band::GetStatistics(int approximate, int force, double* minimum, double* 
 }
 
 CPLErr Band::SetStatistics(double minimum, double maximum, double mean, double deviation) {
-    return Reporting<CPLErr>(CE_Failure, [&]() -> CPLErr {
+    return Reporting(CE_Failure, [&] {
         if (!StoresInFile())
             return GDALPamRasterBand::SetStatistics(minimum, maximum, mean, deviation);
         constexpr std::uint32_t kFlags = zelm::StatsFlag::Minimum | zelm::StatsFlag::Maximum |
@@ -490,7 +487,7 @@ CPLErr Band::SetStatistics(double minimum, double maximum, double mean, double d
 
 CPLErr Band::GetDefaultHistogram(double* lower, double* upper, int* bucketCount, GUIntBig** counts,
                                  int force, GDALProgressFunc progress, void* progressData) {
-    return Reporting<CPLErr>(CE_Failure, [&]() -> CPLErr {
+    return Reporting(CE_Failure, [&] {
         const StoredHistogram* const stored = owner.File().archive.Histogram(index, owner.Level());
         if (!stored)
             return GDALPamRasterBand::GetDefaultHistogram(lower, upper, bucketCount, counts, force,
@@ -508,7 +505,7 @@ CPLErr Band::GetDefaultHistogram(double* lower, double* upper, int* bucketCount,
 }
 
 CPLErr Band::SetDefaultHistogram(double lower, double upper, int bucketCount, GUIntBig* counts) {
-    return Reporting<CPLErr>(CE_Failure, [&]() -> CPLErr {
+    return Reporting(CE_Failure, [&] {
         if (!StoresInFile() || bucketCount <= 0)
             return GDALPamRasterBand::SetDefaultHistogram(lower, upper, bucketCount, counts);
         StoredHistogram histogram{index, owner.Level(), lower, upper, {}};

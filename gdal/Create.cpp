@@ -1,7 +1,6 @@
 #include "gdal/Create.h"
 
 #include <algorithm>
-#include <new>
 
 #include "core/PixelVocabulary.h"
 #include "files/Lending.h"
@@ -36,7 +35,7 @@ class Unfinished {
 public:
     explicit Unfinished(const std::string& target) : name(target) {}
     ~Unfinished() {
-        for (const char* const ending : {"", ".aux.xml", ".msk"})
+        for (const char* const ending : {"", kSidecarEnding, kMaskEnding})
             if (!kept) VSIUnlink((name + ending).c_str());
     }
     Unfinished(const Unfinished&) = delete;
@@ -64,7 +63,7 @@ GDALDataset* CopyTo(const std::string& target, GDALDataset& source, bool strict,
     Unfinished made(target);
     auto dataset = OpenForUpdate(target);
     if (CopySidecar(source, *dataset, strict) != CE_None) return nullptr;
-    dataset->FlushCache(false);
+    SaveSidecar(*dataset, target);
     made.Keep();
     return dataset.release();
 }
@@ -137,15 +136,8 @@ Creation::Creation(std::string targetName, CreationOptions creationOptions,
       options(std::move(creationOptions)),
       spool(std::move(spoolFile)),
       bands(bandCount),
-      written(blockCount * bandCount) {}
-
-void Creation::MarkLost(std::size_t block, std::size_t band) noexcept {
-    try {
-        lost.insert(block * bands + band);
-    } catch (const std::bad_alloc&) {
-        lostCount = true;
-    }
-}
+      written(blockCount * bandCount),
+      lost(written.size()) {}
 
 void Creation::Check(Dataset& dataset, const zmchost::BuildOptions& build) const {
     GdalRasterSource source(dataset, options.signedByte);
@@ -181,7 +173,7 @@ CPLErr Creation::ChooseLevels(Dataset& dataset, const char* resampling, int coun
 bool Creation::Finish(Dataset& dataset) {
     sealed = std::find(written.begin(), written.end(), false) == written.end();
     const bool built = Reported([&] {
-        if (!lost.empty() || lostCount)
+        if (std::find(lost.begin(), lost.end(), true) != lost.end())
             throw zmchost::Error(target, "build it", "some of its blocks could not be written");
         GdalRasterSource source(dataset, options.signedByte);
         AcceptLosses(source, false);

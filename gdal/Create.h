@@ -11,7 +11,6 @@
 #include <gdal_priv.h>
 
 #include <memory>
-#include <set>
 #include <string>
 #include <vector>
 
@@ -40,10 +39,12 @@ public:
     }
     void MarkWritten(std::size_t block, std::size_t band) {
         written[block * bands + band] = true;
-        lost.erase(block * bands + band);
+        lost[block * bands + band] = false;
     }
     // The spool did not take a block: without it there will be no target.
-    void MarkLost(std::size_t block, std::size_t band) noexcept;
+    void MarkLost(std::size_t block, std::size_t band) noexcept {
+        lost[block * bands + band] = true;
+    }
     // Every block has been written, and none will be any more.
     bool IsSealed() const { return sealed; }
 
@@ -62,9 +63,8 @@ private:
     CreationOptions options;
     std::unique_ptr<zmchost::BuildFile> spool;
     std::size_t bands;
-    std::vector<bool> written;   // by block and band
-    std::set<std::size_t> lost;  // likewise
-    bool lostCount = false;      // more of them than could be noted
+    std::vector<bool> written;  // by block and band
+    std::vector<bool> lost;     // likewise
     bool sealed = false;
 };
 

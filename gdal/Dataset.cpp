@@ -9,9 +9,9 @@
 #include "gdal/Create.h"
 #include "gdal/LevelRefresh.h"
 #include "gdal/Reporting.h"
+#include "gdal/Sidecar.h"
 #include "gdal/SidecarStage.h"
 #include "gdal/VsiSource.h"
-#include "host/file/Limits.h"
 #include "host/raster/LentFile.h"
 #include "platform/FileSystem.h"
 
@@ -45,7 +45,7 @@ zmchost::PyramidFileInfo CheckedInfo(const std::string& fileName,
 // What is neither a file nor a folder where GDAL looks for companions of a file: to open a pipe is
 // to wait for its other end.
 bool HasPipesBeside(const std::string& base) {
-    for (const char* const ending : {".aux.xml", ".msk", ".ovr"}) {
+    for (const char* const ending : {kSidecarEnding, kMaskEnding, kOverviewsEnding}) {
         const platform::FileStatus status = platform::StatusOf(base + ending);
         if (!status.exists || status.isRegular || status.isFolder) continue;
         CPLError(CE_Warning, CPLE_AppDefined,
@@ -73,16 +73,15 @@ OpenFile::OpenFile(const std::string& fileName, GDALAccess access, const OpenOpt
       info(CheckedInfo(fileName, zmchost::PyramidHeader::Read(*source, fileName))),
       raster(fileName, source, info.header, options.keepCopies),
       tiles(raster, info, GdalTypeOf(info.header.pixelType, options.signedByteAs)),
-      archive(raster, info.HasMetadataDocument()) {}
+      archive(raster, info.HasMetadataDocument(), limits.elements) {}
 
 void OpenFile::CheckTile(std::uint32_t level, std::uint32_t bands, const char* operation) const {
     const zelm::LevelGeometry grid = info.header.Geometry(level);
     const std::uint64_t bytes = std::uint64_t{std::min(grid.tileSize, grid.samples)} *
                                 std::min(grid.tileSize, grid.lines) * bands *
                                 zelm::PixelSize(info.header.pixelType);
-    const std::string wrong =
-        zmchost::Limits::Judge("tile", bytes, zmchost::Limits::Current().tile,
-                               "its tiles have " + std::to_string(bytes) + " bytes");
+    const std::string wrong = zmchost::Limits::Judge(
+        "tile", bytes, limits.tile, "its tiles have " + std::to_string(bytes) + " bytes");
     if (!wrong.empty()) throw zmchost::Error(raster.Name(), operation, wrong);
 }
 
@@ -171,10 +170,12 @@ void Dataset::LoadSidecar(const char* fileName, char** siblings) {
     SetDescription(fileName);
     std::string base = fileName;
     if (!IsVirtualName(base)) {
-        if (eAccess == GA_Update) SettleSidecar(base, *file->source, file->info.header);
-        base = SidecarBase(base, *file->source, file->info.header);
+        if (eAccess == GA_Update)
+            SettleSidecar(base, *file->source, file->info.header);
+        else
+            base = SidecarBase(base, *file->source, file->info.header);
+        if (HasPipesBeside(base)) return IgnoreCompanions();
     }
-    if (HasPipesBeside(base)) return IgnoreCompanions();
     const bool staged = base != fileName;
     if (staged) SetPhysicalFilename(base.c_str());
     TryLoadXML(staged ? nullptr : siblings);
@@ -238,15 +239,29 @@ CPLErr Dataset::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, 
     });
 }
 
+// GDAL chooses by what a band says of its levels, and the last band is there in all of them.
+Dataset* Dataset::CoarserFor(Shown& shown, int bufferWidth, int bufferHeight) {
+    const int chosen = GDALBandGetBestOverviewLevel2(GetRasterBand(GetRasterCount()), shown.x,
+                                                     shown.y, shown.width, shown.height,
+                                                     bufferWidth, bufferHeight, &shown.extra);
+    return chosen < 0 ? nullptr : Overviews()[static_cast<std::size_t>(chosen)].get();
+}
+
 CPLErr Dataset::ReadOrWrite(GDALRWFlag mode, int x, int y, int width, int height, void* data,
                             int bufferWidth, int bufferHeight, GDALDataType bufferType,
                             int bandCount, int* bandMap, GSpacing pixelSpace, GSpacing lineSpace,
                             GSpacing bandSpace, GDALRasterIOExtraArg* extra) {
-    if (mode == GF_Read && bufferWidth < width && bufferHeight < height) {
+    const bool reduced = mode == GF_Read && bufferWidth < width && bufferHeight < height;
+    if (reduced && !Overviews().empty()) {
+        Shown shown(x, y, width, height, *extra);
+        if (Dataset* const coarser = CoarserFor(shown, bufferWidth, bufferHeight)) {
+            for (int i = 0; i < bandCount; ++i) coarser->BandOf(bandMap[i]);
+            return coarser->RasterIO(mode, shown.x, shown.y, shown.width, shown.height, data,
+                                     bufferWidth, bufferHeight, bufferType, bandCount, bandMap,
+                                     pixelSpace, lineSpace, bandSpace, &shown.extra);
+        }
+    } else if (reduced) {
         int tried = FALSE;
-        // GDAL takes the bands from the level as a dataset of its own.
-        for (const auto& overview : Overviews())
-            for (int i = 0; i < bandCount; ++i) overview->BandOf(bandMap[i]);
         const CPLErr result = TryOverviewRasterIO(mode, x, y, width, height, data, bufferWidth,
                                                   bufferHeight, bufferType, bandCount, bandMap,
                                                   pixelSpace, lineSpace, bandSpace, extra, &tried);

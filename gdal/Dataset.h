@@ -19,6 +19,7 @@
 #include "gdal/LazyRaster.h"
 #include "gdal/Options.h"
 #include "gdal/TileReader.h"
+#include "host/file/Limits.h"
 #include "host/file/PyramidFileInfo.h"
 
 namespace zmcgdal {
@@ -38,6 +39,7 @@ public:
 
     const std::shared_ptr<zelm::files::ByteSource> source;
     const zmchost::PyramidFileInfo info;
+    const zmchost::Limits limits = zmchost::Limits::Current();
     LazyRaster raster;
     TileReader tiles;
     Archive archive;
@@ -57,6 +59,19 @@ public:
     const std::vector<std::unique_ptr<Dataset>>& Overviews();
     // A band that the raster has, counted from 1.
     GDALRasterBand* BandOf(int number);
+
+    // A window, and how it is to be read, as GDAL is asked for it.
+    struct Shown {
+        Shown(int left, int top, int columns, int lines, GDALRasterIOExtraArg& how)
+            : x(left), y(top), width(columns), height(lines) {
+            GDALCopyRasterIOExtraArg(&extra, &how);
+        }
+        int x, y, width, height;
+        GDALRasterIOExtraArg extra{};
+    };
+    // The level of ours that GDAL would read such a window from into a buffer of that size, and
+    // `shown` is the window in that level then. Null for this one. No band is made for this.
+    Dataset* CoarserFor(Shown& shown, int bufferWidth, int bufferHeight);
 
     // Reads the sidecar, and looks for other companions, of a file of that name. Those that are
     // staged for it (SidecarStage.h) are given their names first if it is open for update.

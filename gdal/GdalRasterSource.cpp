@@ -4,6 +4,7 @@
 
 #include "core/PixelVocabulary.h"
 #include "gdal/ColorTables.h"
+#include "gdal/ErrorCatcher.h"
 #include "gdal/NoDataValues.h"
 #include "gdal/SampleType.h"
 #include "host/base/Error.h"
@@ -12,31 +13,6 @@ namespace zmcgdal {
 namespace {
 
 constexpr const char* kSource = "read the source";
-
-// Catches what GDAL reports on this thread, since it would reach nobody from a builder's thread.
-class ErrorCatcher {
-public:
-    ErrorCatcher() {
-        CPLErrorReset();
-        CPLPushErrorHandlerEx(&ErrorCatcher::Take, this);
-    }
-    ~ErrorCatcher() { CPLPopErrorHandler(); }
-    ErrorCatcher(const ErrorCatcher&) = delete;
-    ErrorCatcher& operator=(const ErrorCatcher&) = delete;
-
-    std::string text;
-
-private:
-    static void CPL_STDCALL Take(CPLErr kind, CPLErrorNum, const char* message) {
-        auto* const self = static_cast<ErrorCatcher*>(CPLGetErrorHandlerUserData());
-        if (kind < CE_Failure || !self->text.empty()) return;
-        try {
-            self->text = message;
-        } catch (const std::bad_alloc&) {
-            self->text = "out of memory";  // without any: so short a text lies in the string itself
-        }
-    }
-};
 
 bool FitsBytes(const GDALColorEntry& entry) {
     const auto fits = [](short component) { return component >= 0 && component <= 255; };
@@ -130,15 +106,16 @@ void GdalRasterSource::Read(const zmchost::Window& window, std::span<const std::
     const int height = static_cast<int>(window.height);
     GDALRasterIOExtraArg extra;
     INIT_RASTERIO_EXTRA_ARG(extra);
-    ErrorCatcher errors;
+    CPLErrorReset();
+    const ErrorCatcher errors(CE_Failure);
     const CPLErr result = dataset.RasterIO(GF_Read, static_cast<int>(window.x),
                                            static_cast<int>(window.y), width, height, pixels, width,
                                            height, bufferType, static_cast<int>(numbers.size()),
                                            numbers.data(), pixel, pixel * width, size, &extra);
     // Some drivers report a failure and answer that all went well.
-    if (result == CE_None && errors.text.empty()) return;
+    if (result == CE_None && errors.Text().empty()) return;
     throw zmchost::Error(Name(), "read lines from " + std::to_string(window.y),
-                         errors.text.empty() ? "GDAL gives no reason" : errors.text);
+                         errors.Text().empty() ? "GDAL gives no reason" : errors.Text());
 }
 
 }  // namespace zmcgdal

@@ -46,8 +46,7 @@ std::optional<std::set<std::uint32_t>> LevelsOf(Dataset& dataset, const std::vec
     for (const int factor : factors) {
         const auto& all = dataset.Overviews();
         const auto match = std::find_if(all.begin(), all.end(), [&](const auto& overview) {
-            return factor > 0 &&
-                   std::int64_t{factor} == std::int64_t{1} << (overview->Level() - dataset.Level());
+            return std::int64_t{factor} == std::int64_t{1} << (overview->Level() - dataset.Level());
         });
         if (match == all.end()) {
             CPLError(CE_Failure, CPLE_NotSupported,

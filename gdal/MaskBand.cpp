@@ -73,39 +73,36 @@ CPLErr MaskBand::ReadMask(int x, int y, int width, int height, unsigned char* ou
     return CE_None;
 }
 
-CPLErr MaskBand::ReportedMask(int x, int y, int width, int height, unsigned char* out,
-                              std::size_t stride) {
-    return Reporting(CE_Failure, [&] { return ReadMask(x, y, width, height, out, stride); });
-}
-
 CPLErr MaskBand::IReadBlock(int blockX, int blockY, void* data) {
-    int width = 0, height = 0;
-    GetActualBlockSize(blockX, blockY, &width, &height);
-    return ReportedMask(blockX * nBlockXSize, blockY * nBlockYSize, width, height,
+    return Reporting(CE_Failure, [&] {
+        int width = 0, height = 0;
+        GetActualBlockSize(blockX, blockY, &width, &height);
+        return ReadMask(blockX * nBlockXSize, blockY * nBlockYSize, width, height,
                         static_cast<unsigned char*>(data), static_cast<std::size_t>(nBlockXSize));
+    });
 }
 
 CPLErr MaskBand::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, void* data,
                            int bufferWidth, int bufferHeight, GDALDataType bufferType,
                            GSpacing pixelSpace, GSpacing lineSpace, GDALRasterIOExtraArg* extra) {
-    const bool plain = mode == GF_Read && bufferWidth == width && bufferHeight == height &&
-                       bufferType == GDT_Byte && pixelSpace == 1 && lineSpace >= 0;
-    if (!plain || !band.Owner().ReadsDirectly(x, y, width, height))
-        return Reporting(CE_Failure, [&] {
+    return Reporting(CE_Failure, [&] {
+        const bool plain = mode == GF_Read && bufferWidth == width && bufferHeight == height &&
+                           bufferType == GDT_Byte && pixelSpace == 1 && lineSpace >= 0;
+        if (!plain || !band.Owner().ReadsDirectly(x, y, width, height))
             return GDALRasterBand::IRasterIO(mode, x, y, width, height, data, bufferWidth,
                                              bufferHeight, bufferType, pixelSpace, lineSpace,
                                              extra);
-        });
-    // In strips as high as a block, so that a large window needs no large copy of its pixels.
-    for (int done = 0; done < height;) {
-        const int lines = std::min(height - done, nBlockYSize - (y + done) % nBlockYSize);
-        const CPLErr result = ReportedMask(x, y + done, width, lines,
+        // In strips as high as a block, so that a large window needs no large copy of its pixels.
+        for (int done = 0; done < height;) {
+            const int lines = std::min(height - done, nBlockYSize - (y + done) % nBlockYSize);
+            const CPLErr result = ReadMask(x, y + done, width, lines,
                                            static_cast<unsigned char*>(data) + done * lineSpace,
                                            static_cast<std::size_t>(lineSpace));
-        if (result != CE_None) return result;
-        done += lines;
-    }
-    return CE_None;
+            if (result != CE_None) return result;
+            done += lines;
+        }
+        return CE_None;
+    });
 }
 
 }  // namespace zmcgdal

@@ -39,9 +39,6 @@ private:
 
     // Reads a window of the band and judges it; `stride` bytes lie between the lines of `out`.
     CPLErr ReadMask(int x, int y, int width, int height, unsigned char* out, std::size_t stride);
-    // The same with what is thrown told to GDAL.
-    CPLErr ReportedMask(int x, int y, int width, int height, unsigned char* out,
-                        std::size_t stride);
 };
 
 }  // namespace zmcgdal

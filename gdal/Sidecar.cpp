@@ -6,6 +6,8 @@
 #include <string>
 
 #include "gdal/Dataset.h"
+#include "gdal/ErrorCatcher.h"
+#include "host/base/Error.h"
 
 namespace zmcgdal {
 namespace {
@@ -17,6 +19,8 @@ bool DescribesTheFile(const char* domain) {
     return std::any_of(std::begin(names), std::end(names),
                        [&](const char* name) { return EQUAL(domain, name); });
 }
+
+bool IsStatistic(const char* item) { return STARTS_WITH_CI(item, "STATISTICS_"); }
 
 void CopyMetadata(GDALMajorObject& source, GDALMajorObject& target) {
     CPLStringList domains(source.GetMetadataDomainList());
@@ -39,12 +43,25 @@ void CopyInterpretation(GDALDataset& source, Dataset& target) {
     }
 }
 
+// To GDAL a sidecar that was cut off is worth a warning, and its flush answers nothing before 3.7.
+void Save(GDALDataset& dataset, const std::string& name, const std::string& operation) {
+    const ErrorCatcher errors(CE_Warning);
+    dataset.FlushCache(false);
+    if (!errors.Text().empty()) throw zmchost::Error(name, operation, errors.Text());
+}
+
 }  // namespace
+
+bool HasStatistics(CSLConstList items) {
+    for (; items && *items; ++items)
+        if (IsStatistic(*items)) return true;
+    return false;
+}
 
 CPLStringList WithoutStatistics(CSLConstList items) {
     CPLStringList kept;
     for (; items && *items; ++items)
-        if (!STARTS_WITH_CI(*items, "STATISTICS_")) kept.AddString(*items);
+        if (!IsStatistic(*items)) kept.AddString(*items);
     return kept;
 }
 
@@ -61,6 +78,14 @@ CPLErr CopySidecar(GDALDataset& source, Dataset& target, bool strict) {
                           (maskFlags & (GMF_ALPHA | GMF_NODATA | GMF_ALL_VALID)) == 0;
     if (!maskFile) return CE_None;
     return GDALDriver::DefaultCopyMasks(&source, &target, strict ? TRUE : FALSE);
+}
+
+void SaveSidecar(Dataset& dataset, const std::string& name) {
+    Save(dataset, name, "keep its metadata in " + name + kSidecarEnding);
+    GDALRasterBand& first = *dataset.GetRasterBand(1);
+    if ((first.GetMaskFlags() & GMF_PER_DATASET) == 0) return;
+    if (GDALDataset* const mask = first.GetMaskBand()->GetDataset())
+        Save(*mask, name, "keep its mask in " + name + kMaskEnding);
 }
 
 }  // namespace zmcgdal

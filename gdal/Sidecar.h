@@ -1,20 +1,33 @@
-// CopySidecar: what a pyramid file has no place for and its sidecar keeps.
+// CopySidecar, SaveSidecar: what a pyramid file has no place for and what stands beside it keeps.
 #ifndef ZMC_GDAL_SIDECAR_H
 #define ZMC_GDAL_SIDECAR_H
 
 #include <cpl_string.h>
 #include <gdal_priv.h>
 
+#include <string>
+
 namespace zmcgdal {
 
 class Dataset;
+
+// What the names of companions of a raster end with, behind the raster's own name: GDAL's sidecar,
+// mask of the whole dataset, and levels that stand in no file of ours.
+inline constexpr const char* kSidecarEnding = ".aux.xml";
+inline constexpr const char* kMaskEnding = ".msk";
+inline constexpr const char* kOverviewsEnding = ".ovr";
 
 // Takes georeference, control points, no-data values, descriptions, units, scale and offset,
 // category names, attribute tables, colour interpretation, every metadata domain and a mask of the
 // whole dataset from `source`. Statistics are not taken: the file has its own.
 CPLErr CopySidecar(GDALDataset& source, Dataset& target, bool strict);
 
-// The items of a metadata domain that are no statistics.
+// Writes what was set. Throws zmchost::Error, of the pyramid that the user calls `name`, where GDAL
+// could not save all of it; what there is of it by then is anything.
+void SaveSidecar(Dataset& dataset, const std::string& name);
+
+// Whether a metadata domain has statistics, and its items that are none.
+bool HasStatistics(CSLConstList items);
 CPLStringList WithoutStatistics(CSLConstList items);
 
 }  // namespace zmcgdal

@@ -11,7 +11,12 @@
 // those under the usual names: so the old file is seen with the old ones and the new file with the
 // new ones, wherever the process that builds is ended. Settling gives them their usual names; the
 // sidecar comes last, since by it they are known. A pyramid without a sidecar has one that is empty
-// staged.
+// staged. Beside them lies
+//
+//     .NAME.zmcside-NUMBER-END.lock
+//
+// which is locked for as long as they are wanted, from before the first of them is there: what
+// nobody holds, and belongs to no file of that name, is left over.
 //
 // Names are those that the user gave, links not resolved, as GDAL has it. What is here throws
 // zmchost::Error, but where it says so.
@@ -45,7 +50,8 @@ public:
     SidecarStage(const SidecarStage&) = delete;
     SidecarStage& operator=(const SidecarStage&) = delete;
 
-    // Where they are to be written: the base of their names, for the finished file of that path.
+    // Where they are to be written: the base of their names, for the finished file of that path. No
+    // other stage removes what is written there.
     std::string Begin(const std::string& finished);
     // Must be called when they have been written, and before the file gets its name.
     void Complete();
@@ -56,7 +62,9 @@ private:
     std::string target;
     std::string base;  // empty until Begin
     std::uint64_t number = 0;
-    platform::FileLock lock;  // of the staged sidecar: it is not a left-over
+    platform::FileLock lock;
+
+    void Lock();
 };
 
 }  // namespace zmcgdal

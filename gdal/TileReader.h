@@ -51,10 +51,10 @@ public:
     // Must be called when the file has changed.
     void Forget() { held = heldApart = TileKey(); }
 
-    // The tile of the grid of `level`, clipped to the level.
     // Whether a tile that was read is kept for whoever reads its next part. Of one that is not,
     // what is asked for alone is read.
     bool IsHeld(const zelm::Rectangle& tile) const;
+    // The tile of the grid of `level`, clipped to the level.
     zelm::Rectangle TileAt(std::uint32_t level, int tileX, int tileY) const;
 
 private:

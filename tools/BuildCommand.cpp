@@ -206,12 +206,14 @@ void BuildCommand::WriteSidecar(GDALDataset& dataset, const zmchost::BuildOption
         std::make_shared<zmcgdal::OpenFile>(built, GA_Update, zmcgdal::OpenOptions{}), GA_Update);
     pyramid->LoadSidecar(base.c_str(), nullptr);
     bool kept = selected && zmcgdal::CopySidecar(*selected, *pyramid, true) == CE_None;
+    if (kept) zmcgdal::SaveSidecar(*pyramid, target);
     pyramid.reset();
     const std::string reason = TakeGdalError(target);
     kept = kept && reason.empty();
     if (!kept)
         throw Failure(target, "its metadata cannot be kept in " + Visible(target) +
-                                  ".aux.xml: " + (reason.empty() ? "no reason given" : reason));
+                                  zmcgdal::kSidecarEnding + ": " +
+                                  (reason.empty() ? "no reason given" : reason));
 }
 
 void BuildCommand::Report(const zmchost::BuildReport& report, std::uint32_t pixelType) const {

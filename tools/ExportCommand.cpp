@@ -4,6 +4,7 @@
 #include <cstdio>
 #include <filesystem>
 
+#include "gdal/Sidecar.h"
 #include "platform/Interrupts.h"
 #include "tools/Arguments.h"
 #include "tools/Command.h"
@@ -106,7 +107,7 @@ fs::file_time_type StampOf(const std::string& name) {
 // What was written of a raster that did not come to its end.
 void RemoveFiles(const std::string& target) {
     std::error_code ignored;
-    for (const char* const ending : {"", ".aux.xml", ".msk"})
+    for (const char* const ending : {"", zmcgdal::kSidecarEnding, zmcgdal::kMaskEnding})
         if (fs::is_regular_file(target + ending, ignored)) fs::remove(target + ending, ignored);
 }
 

@@ -5,8 +5,9 @@
 // the module serves all of it; what follows from it for memory and time is refused here, in words
 // that name the limit, unless whoever starts the process raises it.
 //
-// Limits are those of the process. Any thread may ask for them and set them; what is open already
-// keeps to those that it was opened by.
+// Limits are those of the process. Any thread may ask for them and set them. A dataset of the
+// driver keeps to those that it was opened by, but for the one of bytes of its metadata document,
+// which counts each time that the document is read.
 #ifndef ZMC_HOST_FILE_LIMITS_H
 #define ZMC_HOST_FILE_LIMITS_H
 

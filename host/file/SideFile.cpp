@@ -13,10 +13,6 @@ constexpr std::string_view kSuffix = ".tmp";
 // Names of files have 255 bytes at most; process and random number take up to 40 of them.
 constexpr std::size_t kMaxStem = 200;
 
-std::string Prefix(const std::string& file, const std::string& kind) {
-    return '.' + SideFile::Stem(file) + '.' + kind + '-';
-}
-
 std::size_t Digits(std::string_view text) {
     return std::min(text.find_first_not_of("0123456789"), text.size());
 }
@@ -41,6 +37,10 @@ std::string SideFile::Stem(const std::string& file) {
     while (!name.empty() && (name.back() & 0xC0) == 0x80) name.pop_back();
     if (!name.empty()) name.pop_back();
     return name + number;
+}
+
+std::string SideFile::Prefix(const std::string& file, const std::string& kind) {
+    return '.' + Stem(file) + '.' + kind + '-';
 }
 
 std::string SideFile::TemporaryPath(const std::string& file, const std::string& kind) {

@@ -19,6 +19,9 @@ public:
     // number of the whole name behind it.
     static std::string Stem(const std::string& file);
 
+    // What the names of files of that kind begin with: ".NAME.KIND-", NAME cut.
+    static std::string Prefix(const std::string& file, const std::string& kind);
+
     // A new name for a temporary file of that kind.
     static std::string TemporaryPath(const std::string& file, const std::string& kind);
     // Makes an empty temporary file of that kind and takes its lock, which has no file where the

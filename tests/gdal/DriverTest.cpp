@@ -21,7 +21,9 @@
 
 #include "gdal/Options.h"
 #include "gdal/SampleType.h"
+#include "gdal/SidecarStage.h"
 #include "gdal/VsiSource.h"
+#include "host/file/Limits.h"
 #include "host/file/PyramidHeader.h"
 #include "host/journal/MetadataJournal.h"
 #include "tests/support/LenientHeaders.h"
@@ -388,6 +390,140 @@ TEST_F(DriverTest, StagedSidecarOfThisFileIsSeenAndGetsItsNameForUpdate) {
     EXPECT_EQ(unitOf(GDAL_OF_READONLY), "");
     EXPECT_EQ(unitOf(GDAL_OF_UPDATE), "");
     EXPECT_FALSE(fs::exists(usual));
+}
+
+std::set<std::string> NamesIn(const fs::path& folder) {
+    std::set<std::string> names;
+    for (const auto& entry : fs::directory_iterator(folder)) names.insert(entry.path().filename());
+    return names;
+}
+
+// To copy a mask takes minutes, and nothing tells of them but a lock.
+TEST_F(DriverTest, CompanionsThatAreBeingWrittenAreNotLeftOver) {
+    const std::string finished = MakeCopy(*Memory(20, 10, 1, GDT_Byte), "finished.pyr");
+    const std::string target = Path("made.pyr");
+    SidecarStage first(target);
+    const std::string base = first.Begin(finished);
+    for (const char* const ending : {".msk", ".aux.xml"}) {
+        zmctest::WriteText(base + ending, ending);
+        const SidecarStage second(target);
+        EXPECT_EQ(zmctest::ReadText(base + ending), ending);
+    }
+    EXPECT_EQ(zmctest::ReadText(base + ".msk"), ".msk");
+    first.Complete();
+    fs::rename(finished, target);
+    first.Settle();
+    EXPECT_EQ(NamesIn(folder),
+              (std::set<std::string>{"made.pyr", "made.pyr.aux.xml", "made.pyr.msk"}));
+    EXPECT_EQ(zmctest::ReadText(target + ".aux.xml"), ".aux.xml");
+    EXPECT_EQ(zmctest::ReadText(target + ".msk"), ".msk");
+}
+
+TEST_F(DriverTest, CompanionsOfABuildThatFailedGo) {
+    const std::string finished = MakeCopy(*Memory(20, 10, 1, GDT_Byte), "finished.pyr");
+    {
+        SidecarStage stage(Path("made.pyr"));
+        const std::string base = stage.Begin(finished);
+        for (const char* const ending : {".msk", ".aux.xml"})
+            zmctest::WriteText(base + ending, ending);
+    }
+    EXPECT_EQ(NamesIn(folder), std::set<std::string>{"finished.pyr"});
+}
+
+TEST_F(DriverTest, CompanionsOfABuildThatWasEndedGoWithTheNextOne) {
+    const std::string finished = MakeCopy(*Memory(20, 10, 1, GDT_Byte), "finished.pyr");
+    const pid_t child = fork();
+    if (child == 0) {
+        SidecarStage stage(Path("made.pyr"));
+        const std::string base = stage.Begin(finished);
+        for (const char* const ending : {".msk", ".aux.xml"})
+            zmctest::WriteText(base + ending, ending);
+        _exit(0);
+    }
+    waitpid(child, nullptr, 0);
+    EXPECT_GT(NamesIn(folder).size(), 2u);
+    const SidecarStage next(Path("made.pyr"));
+    EXPECT_EQ(NamesIn(folder), std::set<std::string>{"finished.pyr"});
+}
+
+// Changes a limit until the end of a test.
+class LimitsChanged {
+public:
+    explicit LimitsChanged(const char* text) { zmchost::Limits::Change(text); }
+    ~LimitsChanged() {
+        zmchost::Limits::Change("tile=" + std::to_string(before.tile) +
+                                ",elements=" + std::to_string(before.elements));
+    }
+    LimitsChanged(const LimitsChanged&) = delete;
+    LimitsChanged& operator=(const LimitsChanged&) = delete;
+
+private:
+    const zmchost::Limits before = zmchost::Limits::Current();
+};
+
+// Writes a block and stores statistics; how many of the two came to be.
+int Updates(GDALDataset& dataset) {
+    GDALRasterBand& band = *dataset.GetRasterBand(1);
+    std::vector<unsigned char> block(256 * 256);
+    CPLPushErrorHandler(CPLQuietErrorHandler);
+    const bool written = band.WriteBlock(0, 0, block.data()) == CE_None;
+    const bool stored = band.SetStatistics(0, 0, 0, 0) == CE_None;
+    CPLPopErrorHandler();
+    return written + stored;
+}
+
+TEST_F(DriverTest, WhatIsOpenKeepsToTheLimitsThatItWasOpenedBy) {
+    const std::string name = MakeCopy(*Memory(256, 256, 1, GDT_Byte));
+    const unsigned update = GDAL_OF_RASTER | GDAL_OF_UPDATE;
+    const DatasetPtr before = Open(name, update);
+    {
+        const LimitsChanged lowered("tile=1000,elements=1");
+        EXPECT_EQ(Updates(*before), 2);
+        const DatasetPtr under = Open(name, update);
+        EXPECT_EQ(Updates(*under), 0);
+        const LimitsChanged raised("tile=100000,elements=1000");
+        EXPECT_EQ(Updates(*under), 0);
+    }
+    EXPECT_EQ(Updates(*before), 2);
+}
+
+// The numbers of the bands that a level has made.
+std::set<int> BandsMade(GDALDataset& level) {
+    std::set<int> made;
+    for (int number = 1; number <= level.GetRasterCount(); ++number)
+        if (level.GetRasterBand(number)) made.insert(number);
+    return made;
+}
+
+TEST_F(DriverTest, ReducedWindowsMakeTheirBandsInTheLevelAloneThatTheyAreReadFrom) {
+    constexpr int kBands = 1025;
+    const char* const options[] = {"LEVELS=3", "STATISTICS=NO", nullptr};
+    const std::string name = Path("a.pyr");
+    ASSERT_TRUE(
+        DatasetPtr(Driver().CreateCopy(name.c_str(), Memory(64, 32, kBands, GDT_Byte).get(), FALSE,
+                                       const_cast<char**>(options), nullptr, nullptr)));
+    const DatasetPtr dataset = Open(name);
+    ASSERT_TRUE(dataset);
+    int bands[] = {3, 700, 20};
+    std::vector<unsigned char> together(16 * 8 * 3), apart(16 * 8 * 3);
+    const auto read = [](auto& from, unsigned char* out, auto... rest) {
+        return from.RasterIO(GF_Read, 0, 0, 64, 32, out, 16, 8, GDT_Byte, rest..., nullptr);
+    };
+    EXPECT_EQ(read(*dataset, together.data(), 3, bands, 0, 0, 0), CE_None);
+    GDALRasterBand& last = *dataset->GetRasterBand(kBands);
+    ASSERT_EQ(last.GetOverviewCount(), 3);
+    const auto made = [&](int level) { return BandsMade(*last.GetOverview(level)->GetDataset()); };
+    EXPECT_EQ(made(0), (std::set<int>{kBands}));
+    EXPECT_EQ(made(1), (std::set<int>{3, 20, 700, kBands}));
+    EXPECT_EQ(made(2), (std::set<int>{kBands}));
+    bands[1] = 800;
+    for (int i = 0; i < 3; ++i)
+        EXPECT_EQ(read(*dataset->GetRasterBand(bands[i]), apart.data() + i * 16 * 8, 0, 0),
+                  CE_None);
+    EXPECT_EQ(made(0), (std::set<int>{kBands}));
+    EXPECT_EQ(made(1), (std::set<int>{3, 20, 700, 800, kBands}));
+    EXPECT_EQ(read(*dataset, together.data(), 3, bands, 0, 0, 0), CE_None);
+    EXPECT_EQ(together, apart);
 }
 
 // Opening a pipe would wait for its other end.

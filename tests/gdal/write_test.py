@@ -1,5 +1,7 @@
 """Writing pyramids through GDAL: copies, block by block, and in update mode."""
+import contextlib
 import os
+import resource
 import subprocess
 import unittest
 
@@ -15,6 +17,17 @@ def quiet(call):
         return call()
     finally:
         gdal.PopErrorHandler()
+
+
+@contextlib.contextmanager
+def file_sizes_up_to(size):
+    """A limit of this process, which ignores the signal that comes with it, as Python does."""
+    before = resource.getrlimit(resource.RLIMIT_FSIZE)
+    resource.setrlimit(resource.RLIMIT_FSIZE, (size, before[1]))
+    try:
+        yield
+    finally:
+        resource.setrlimit(resource.RLIMIT_FSIZE, before)
 
 
 class Copies(FolderTest):
@@ -166,6 +179,29 @@ class Copies(FolderTest):
         with self.assertRaises(RuntimeError):
             self.copy(source)
         self.assertEqual(self.files(), ["raster.pyr.msk"])
+
+    def test_a_sidecar_that_is_cut_off_leaves_nothing_behind(self):
+        source = memory_dataset(samples(gdal.GDT_Byte, 30, 40, 1), gdal.GDT_Byte)
+        source.SetMetadata({"LONG": "x" * 1500000})
+        with file_sizes_up_to(1024000), self.assertRaisesRegex(
+                RuntimeError, r"cannot keep its metadata in .*raster\.pyr\.aux\.xml: Unable to save"):
+            quiet(lambda: self.copy(source))
+        self.assertEqual(self.files(), [])
+
+    def test_a_mask_that_is_cut_off_leaves_nothing_behind(self):
+        noise = samples(gdal.GDT_Byte, 3000, 3000, 1)
+        source = memory_dataset(noise, gdal.GDT_Byte)
+        source.CreateMaskBand(gdal.GMF_PER_DATASET)
+        source.GetRasterBand(1).GetMaskBand().WriteArray(noise[0])
+        flat = ["LEVELS=0", "STATISTICS=NO"]
+        # Noise that GDAL compresses becomes larger than the pyramid.
+        with file_sizes_up_to(noise.size + 4000):
+            with self.assertRaisesRegex(RuntimeError, r"keep its mask in .*raster\.pyr\.msk: "):
+                quiet(lambda: self.copy(source, options=flat))
+        self.assertEqual(self.files(), [])
+        self.copy(source, options=flat)
+        self.assertEqual(self.files(), ["raster.pyr", "raster.pyr.msk"])
+        self.assertGreater(os.path.getsize(self.path("raster.pyr.msk")), noise.size + 4000)
 
     def test_strict_copies_refuse_what_is_lost_and_others_name_it(self):
         source = memory_dataset(samples(gdal.GDT_Byte, 9, 9, 1), gdal.GDT_Byte)

@@ -1,4 +1,7 @@
 """Building: every type, every option, and what is kept beside the pixels."""
+import resource
+import signal
+
 import numpy as np
 from osgeo import gdal, osr
 
@@ -158,6 +161,13 @@ class Options(ToolTest):
 
 
 class Beside(ToolTest):
+    def contents(self):
+        found = {}
+        for name in self.files():
+            with open(self.path(name), "rb") as handle:
+                found[name] = handle.read()
+        return found
+
     def test_palettes_are_kept_and_levels_made_by_mode(self):
         colors = [(0, 0, 0, 255), (255, 0, 0, 255), (0, 128, 0, 200)]
         pixels = samples("Byte", 64, 64, 1) % 3
@@ -195,6 +205,27 @@ class Beside(ToolTest):
         self.assertIn("made.pyr.aux.xml", self.files())
         self.good("build", "without.tif", "made.pyr", "--overwrite")
         self.assertNotIn("made.pyr.aux.xml", self.files())
+
+    def test_a_sidecar_that_is_cut_off_leaves_what_was_there(self):
+        def limit():
+            signal.signal(signal.SIGXFSZ, signal.SIG_IGN)
+            resource.setrlimit(resource.RLIMIT_FSIZE, (1024000, 1024000))
+
+        self.picture("source.tif", 20, 20, 1)
+        dataset = gdal.Open(self.path("source.tif"), gdal.GA_Update)
+        dataset.SetMetadata({"LONG": "x" * 1500000})
+        dataset = None
+        geotiff(self.path("before.tif"), samples("Byte", 20, 20, 1), nodata=7)
+        for options in ((), ("--overwrite",)):
+            with self.subTest(options):
+                if options:
+                    self.good("build", "before.tif", "made.pyr", *options)
+                before = self.contents()
+                done = self.run_tool("build", "source.tif", "made.pyr", *options, preexec_fn=limit)
+                self.assertEqual((done.returncode, done.stdout), (1, ""), done)
+                self.assertRegex(done.stderr, r"^zmcraster: made\.pyr: [^\n]*made\.pyr\.aux\.xml"
+                                 r"[^\n]*Unable to save auxiliary information[^\n]*\n$")
+                self.assertEqual(self.contents(), before)
 
     def test_an_incomplete_pyramid_is_no_source(self):
         self.pyramid()

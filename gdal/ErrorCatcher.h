@@ -1,0 +1,45 @@
+// ErrorCatcher: what GDAL reports on this thread, for as long as the object lives.
+//
+// Some of GDAL's failures are told by nothing else, and on a builder's thread they would reach
+// nobody. Catchers are ended in the opposite order of their beginning.
+#ifndef ZMC_GDAL_ERRORCATCHER_H
+#define ZMC_GDAL_ERRORCATCHER_H
+
+#include <cpl_error.h>
+
+#include <new>
+#include <string>
+
+namespace zmcgdal {
+
+class ErrorCatcher {
+public:
+    // Reports below `leastKind` are passed over.
+    explicit ErrorCatcher(CPLErr leastKind) : least(leastKind) {
+        CPLPushErrorHandlerEx(&ErrorCatcher::Take, this);
+    }
+    ~ErrorCatcher() { CPLPopErrorHandler(); }
+    ErrorCatcher(const ErrorCatcher&) = delete;
+    ErrorCatcher& operator=(const ErrorCatcher&) = delete;
+
+    // The first one that was caught; empty if there was none.
+    const std::string& Text() const { return text; }
+
+private:
+    const CPLErr least;
+    std::string text;
+
+    static void CPL_STDCALL Take(CPLErr kind, CPLErrorNum, const char* message) {
+        auto* const self = static_cast<ErrorCatcher*>(CPLGetErrorHandlerUserData());
+        if (kind < self->least || !self->text.empty()) return;
+        try {
+            self->text = message;
+        } catch (const std::bad_alloc&) {
+            self->text = "out of memory";  // without any: so short a text lies in the string itself
+        }
+    }
+};
+
+}  // namespace zmcgdal
+
+#endif
