@@ -23,6 +23,7 @@
 #include "host/file/MetadataDocument.h"
 #include "host/file/PyramidFileInfo.h"
 #include "host/raster/Raster.h"
+#include "tests/support/ScratchDirectory.h"
 
 namespace {
 
@@ -59,10 +60,6 @@ GDALColorTable& Table() {
 // goes with the program.
 struct Files {
     Files() {
-        if (!mkdtemp(folder.data())) std::abort();
-        plain = folder + "/plain.pyr";
-        colored = folder + "/colored.pyr";
-        target = folder + "/target.pyr";
         module = zmchost::Module::Load();
         GDALRegister_ZMCPyramid();
         GDALAllRegister();
@@ -76,15 +73,16 @@ struct Files {
         fs::copy_file(plain, colored);
         zmchost::Raster::Open(module, colored).SetBandPalette(0, Colors());
     }
-    ~Files() { fs::remove_all(folder); }
 
     const std::string& FreshTarget(const std::string& model) const {
         fs::copy_file(model, target, fs::copy_options::overwrite_existing);
         return target;
     }
 
-    std::string folder = "/tmp/zmcpaletteXXXXXX";
-    std::string plain, colored, target;
+    const zmctest::ScratchDirectory folder;
+    const std::string plain = folder / "plain.pyr";
+    const std::string colored = folder / "colored.pyr";
+    const std::string target = folder / "target.pyr";
     zmchost::ModulePtr module;
 };
 

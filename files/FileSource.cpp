@@ -52,9 +52,11 @@ FileSource::~FileSource() = default;
 
 const WideChar* FileSource::Name() const noexcept { return fileName.wide; }
 
-Identity FileSource::IdentifyName() const noexcept {
+Identity FileSource::IdentifyName() const noexcept { return IdentifyName(fileName); }
+
+Identity FileSource::IdentifyName(const String& name) noexcept {
     platform::FileIdentity identity;
-    return platform::TellIdentity(fileName.wide, identity) ? Known(identity) : Identity{};
+    return name.wide && platform::TellIdentity(name.wide, identity) ? Known(identity) : Identity{};
 }
 
 bool FileSource::NameStillMeansThis() const noexcept {

@@ -38,6 +38,8 @@ public:
     // What the name leads to now, through links; unknown if to nothing. A relative name is looked
     // up from the folder that is current at the call.
     Identity IdentifyName() const noexcept;
+    // The same of any name.
+    static Identity IdentifyName(const String& name) noexcept;
     // Whether the name still leads to the file that is open here. False as well if neither can be
     // told. It may be otherwise a moment later.
     bool NameStillMeansThis() const noexcept;

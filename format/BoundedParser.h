@@ -16,6 +16,7 @@
 #include <xercesc/parsers/SAXParser.hpp>
 #include <xercesc/util/XMLUni.hpp>
 
+#include "format/DocumentEncoding.h"
 #include "format/DocumentLimits.h"
 
 namespace zelm {
@@ -34,6 +35,14 @@ public:
         Parser::setLoadExternalDTD(false);
         Parser::setDisableDefaultEntityResolution(true);
         Scanner().setDisallowDTD(true);
+    }
+
+    // GuardText leaves no other: it would not have seen what such a text may hide.
+    void XMLDecl(const XMLCh* const version, const XMLCh* const encoding,
+                 const XMLCh* const standalone, const XMLCh* const actual) override {
+        if (encoding && *encoding != 0 && !IsPlainEncoding(encoding))
+            Demand("its encoding is declared in a way that is not read");
+        Parser::XMLDecl(version, encoding, standalone, actual);
     }
 
     void startDocument() override {

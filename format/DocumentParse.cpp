@@ -62,7 +62,11 @@ unsigned char* FindNul(unsigned char* text, const unsigned char* behind) {
 // Guards a text, and parses it with the kept parser.
 bool ParseWithKept(unsigned char* bytes, std::size_t size, xercesc::HandlerBase& handlers,
                    const std::function<void(const xercesc::XMLException&)>& report) {
-    GuardText(bytes, size);
+    const Utf8Document other = GuardText(bytes, size);
+    if (other.bytes) {
+        bytes = other.bytes.get();
+        size = other.size;
+    }
     std::unique_ptr<xercesc::SAXParser> parser = TakeParser();
     ParseEnd end;
     try {
@@ -76,27 +80,17 @@ bool ParseWithKept(unsigned char* bytes, std::size_t size, xercesc::HandlerBase&
     return end.kind == ParseEnd::Kind::Parsed;
 }
 
-// The signs of mark-up in the families of encodings that parsers find out by themselves. The two of
-// EBCDIC differ in their brackets.
-struct Signs {
-    unsigned char open, close, equals, quote, apostrophe, bang, question, dash, bracket, endBracket;
-};
-constexpr Signs kAscii = {'<', '>', '=', '"', '\'', '!', '?', '-', '[', ']'};
-constexpr Signs kEbcdic037 = {0x4C, 0x6E, 0x7E, 0x7F, 0x7D, 0x5A, 0x6F, 0x60, 0xBA, 0xBB};
-constexpr Signs kEbcdic1047 = {0x4C, 0x6E, 0x7E, 0x7F, 0x7D, 0x5A, 0x6F, 0x60, 0xAD, 0xBD};
-
 // A look through a text for elements with too many attributes. Where it is malformed the look may
 // go astray: a parser does not come behind that place.
 class AttributeGuard {
 public:
-    AttributeGuard(unsigned char* text, unsigned char* behind, const Signs& family)
-        : at(text), end(behind), signs(family) {}
+    AttributeGuard(unsigned char* text, unsigned char* behind) : at(text), end(behind) {}
 
     void Run() {
-        while ((at = Find(at, signs.open)) != end && ++at != end)
-            if (*at == signs.question)
-                Skip(1, signs.question, 1);
-            else if (*at == signs.bang)
+        while ((at = Find(at, '<')) != end && ++at != end)
+            if (*at == '?')
+                Skip(1, '?', 1);
+            else if (*at == '!')
                 SkipMarkup();
             else
                 Look();
@@ -112,8 +106,8 @@ private:
     // Comments and CDATA sections. Nothing is read behind a document type.
     void SkipMarkup() {
         const unsigned char kind = end - at > 1 ? at[1] : 0;
-        if (kind == signs.dash) return Skip(3, signs.dash, 2);           // !--
-        if (kind == signs.bracket) return Skip(8, signs.endBracket, 2);  // ![CDATA[
+        if (kind == '-') return Skip(3, '-', 2);  // !--
+        if (kind == '[') return Skip(8, ']', 2);  // ![CDATA[
         at = end;
     }
 
@@ -125,7 +119,7 @@ private:
             return;
         }
         unsigned char* const content = at + start;
-        for (at = content; (at = Find(at, signs.close)) != end; ++at)
+        for (at = content; (at = Find(at, '>')) != end; ++at)
             if (at - content >= times &&
                 std::all_of(at - times, at, [sign](unsigned char each) { return each == sign; }))
                 return;
@@ -134,13 +128,13 @@ private:
     // Goes through one start tag.
     void Look() {
         std::uint32_t attributes = 0;
-        for (; at != end && *at != signs.close && *at != signs.open; ++at) {
-            if (*at == signs.equals) ++attributes;
-            if (*at != signs.quote && *at != signs.apostrophe) continue;
+        for (; at != end && *at != '>' && *at != '<'; ++at) {
+            if (*at == '=') ++attributes;
+            if (*at != '"' && *at != '\'') continue;
             at = Find(at + 1, *at);
             if (at == end) return;
             if (attributes > kMaxAttributes && at + 1 != end) {
-                at[1] = signs.close;
+                at[1] = '>';
                 at = end;
                 return;
             }
@@ -149,14 +143,7 @@ private:
 
     unsigned char* at;
     unsigned char* end;
-    const Signs& signs;
 };
-
-void GuardAttributes(unsigned char* text, std::size_t size) {
-    const bool ebcdic = size != 0 && *text == kEbcdic037.open;
-    AttributeGuard(text, text + size, ebcdic ? kEbcdic037 : kAscii).Run();
-    if (ebcdic) AttributeGuard(text, text + size, kEbcdic1047).Run();
-}
 
 }  // namespace
 
@@ -168,13 +155,18 @@ std::unique_ptr<xercesc::SAXParser> MakeDocumentParser() {
     }
 }
 
-void GuardText(unsigned char* text, std::size_t size) {
+Utf8Document GuardText(unsigned char* text, std::size_t size) {
     // No parser accepts this character anywhere, and no document ends with one outside ASCII.
     constexpr unsigned char refused = 1;
     unsigned char* const behind = text + size;
     for (unsigned char* at = text; (at = FindNul(at, behind)) != nullptr; ++at) *at = refused;
-    GuardAttributes(text, size);
     for (std::size_t end = size; end != 0 && text[end - 1] >= 0x80; --end) text[end - 1] = refused;
+    Utf8Document other = ToUtf8(text, size);
+    if (other.bytes)
+        AttributeGuard(other.bytes.get(), other.bytes.get() + other.size).Run();
+    else
+        AttributeGuard(text, behind).Run();
+    return other;
 }
 
 ParseEnd RunParser(xercesc::SAXParser& parser, xercesc::HandlerBase* handlers,

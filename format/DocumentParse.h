@@ -11,6 +11,7 @@
 #include <memory>
 #include <string>
 
+#include "format/DocumentEncoding.h"
 #include "format/ElementReader.h"
 
 namespace XERCES_CPP_NAMESPACE {
@@ -29,8 +30,10 @@ std::unique_ptr<xercesc::SAXParser> MakeDocumentParser();
 // their number. It takes a NUL behind the root element for the end of the text, and so it takes a
 // character that lacks its last bytes, and would believe the front part of a torn document. It
 // stores all attributes of an element before anybody is asked about it, in time and memory beyond
-// all measure: behind the first that is one too many, the element ends.
-void GuardText(unsigned char* text, std::size_t size);
+// all measure: behind the first that is one too many, the element ends. What is answered, if it has
+// bytes, is to be parsed in place of the text: the same in an encoding that can be looked through.
+// May throw std::bad_alloc.
+[[nodiscard]] Utf8Document GuardText(unsigned char* text, std::size_t size);
 
 struct ParseEnd {
     enum class Kind { Parsed, Refused, OutOfMemory };

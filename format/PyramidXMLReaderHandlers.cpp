@@ -59,8 +59,7 @@ T ToPixel(double value) {
         return FromDouble<T>(value);
 }
 
-// Copies of arrays and colours that find no memory are empty and say nothing, so arrays are handed
-// over, and colours are looked at.
+// Copies of arrays that find no memory are empty and say nothing, so arrays are handed over.
 template <class T>
 void Move(RasterBandStats<T>& from, RasterBandStats<T>& to) {
     to = from;  // its arrays are empty
@@ -72,11 +71,6 @@ void Move(RasterBandHistogram<T>& from, RasterBandHistogram<T>& to) {
     Hand(from.counts, counts);
     to = from;
     Hand(counts, to.counts);
-}
-
-bool IsWhole(const Palette& palette) {
-    return std::all_of(palette.colors.begin(), palette.colors.end(),
-                       [](const auto& entry) { return static_cast<bool>(entry.second); });
 }
 
 // Array::Append grows by one element, which takes time in the square of their number.
@@ -141,7 +135,7 @@ void PyramidXMLReaderCore::Enter(std::int32_t state) {
     } else if (state == StateOf(HISTOGRAMS)) {
         BeginHistogram();
     } else if (state == StateOf(PALETTE)) {
-        BeginPalette();
+        currentPalette.Clear();
     }
 }
 
@@ -151,25 +145,9 @@ void PyramidXMLReaderCore::Leave(std::int32_t state) {
     } else if (state == StateOf(HISTOGRAMS)) {
         EndHistogram();
     } else if (state == StateOf(PALETTE)) {
-        if (!IsWhole(currentPalette)) throw std::bad_alloc();
-        KeepPalette();
+        palettes[paletteBand] = currentPalette;
     }
 }
-
-void PyramidXMLReaderCore::BeginPalette() { currentPalette.Clear(); }
-
-void PyramidXMLReaderCore::AddColor(ColorList::Rgba rgba) {
-    color.red = ColorList::Channel(rgba, 0);
-    color.green = ColorList::Channel(rgba, 1);
-    color.blue = ColorList::Channel(rgba, 2);
-    color.alpha = ColorList::Channel(rgba, 3);
-    currentPalette.AddColor(color);
-}
-
-// Sets no length: the colours are counted. The lookup leaves a null colour behind.
-void PyramidXMLReaderCore::LookUpColor(std::uint32_t index) { currentPalette.GetColor(index); }
-
-void PyramidXMLReaderCore::KeepPalette() { currentPalette.CopyTo(palettes[paletteBand]); }
 
 void PyramidXMLReaderCore::TakeText(ElementName name, std::string_view text) {
     if (name < HIST_LEVEL)
@@ -186,7 +164,8 @@ void PyramidXMLReaderCore::TakePaletteText(ElementName name, std::string_view te
     if (name == PALETTE_BAND) {
         paletteBand = ReadInteger(text);
     } else if (name == PALETTE_COUNT) {
-        LookUpColor(ReadInteger(text));
+        // Sets no length: the colours are counted. The lookup leaves a null colour behind.
+        currentPalette.LookUp(ReadInteger(text));
     } else {
         // PALETTE_RGBA, the last of all names.
         ColorList::Rgba rgba = 0;
@@ -197,7 +176,7 @@ void PyramidXMLReaderCore::TakePaletteText(ElementName name, std::string_view te
             const std::int64_t channel = TruncateToSigned<std::int64_t>(ReadReal(token));
             rgba |= static_cast<ColorList::Rgba>(channel & 0xFF) << (8 * i);
         }
-        AddColor(rgba);
+        currentPalette.Add(rgba);
     }
 }
 
@@ -314,20 +293,7 @@ void PyramidXMLReaderHandlers<T>::TakeHistogramText(ElementName name, std::strin
     }
 }
 
-template <class T>
-void PyramidRecordReader<T>::KeepPalette() {
-    const auto& open = this->stateStack;
-    if (std::find(open.begin(), open.end(), StateOf(PALETTE)) != open.end())
-        return PyramidXMLReaderHandlers<T>::KeepPalette();
-    Palette& kept = this->palettes[this->paletteBand];
-    kept.Clear();
-    kept.colors.swap(this->currentPalette.colors);
-    std::swap(kept.nextIndex, this->currentPalette.nextIndex);
-}
-
-#define ZMC_X(type, name, code)                    \
-    template class PyramidXMLReaderHandlers<type>; \
-    template class PyramidRecordReader<type>;
+#define ZMC_X(type, name, code) template class PyramidXMLReaderHandlers<type>;
 ZMC_ELEMENT_TYPES(ZMC_X)
 #undef ZMC_X
 

@@ -6,6 +6,8 @@
 // Each piece of a text is taken for a whole value (ElementReader.h): in a list each piece starts
 // again from the first entry.
 //
+// Palettes are kept as numbers, and share the colours that belong to several of them: what is kept
+// is in proportion to the text.
 // Nothing here allocates by a number from the file: see CountList.
 #ifndef ZMC_FORMAT_PYRAMIDXMLREADERHANDLERS_H
 #define ZMC_FORMAT_PYRAMIDXMLREADERHANDLERS_H
@@ -17,9 +19,7 @@
 #include <string_view>
 #include <utility>
 
-#include "colour/Color.h"
 #include "colour/ColorList.h"
-#include "colour/Palette.h"
 #include "core/Array.h"
 #include "format/ElementReader.h"
 #include "format/PyramidHeaderRecord.h"
@@ -70,9 +70,11 @@ public:
     static constexpr std::int32_t initialBand = 0;  // band of a record that names none
 
     PyramidHeaderRecord header;
-    Palette currentPalette;
-    std::map<std::uint32_t, Palette> palettes;  // finished palettes, by band
-    std::uint32_t paletteBand = 0;              // the last one told, in whatever element
+    // The palette in hand. Colours without a palette around them, and those of one around it, are
+    // added to it too: it stays until the next begins.
+    ColorList currentPalette;
+    std::map<std::uint32_t, ColorList> palettes;  // finished palettes, by band
+    std::uint32_t paletteBand = 0;                // the last one told, in whatever element
 
     // Each prints a message to the standard error stream; none throws.
     void warning(const xercesc::SAXParseException& exception) override;
@@ -83,14 +85,6 @@ protected:
     void Enter(std::int32_t state) override;
     void Leave(std::int32_t state) override;
     void TakeText(ElementName name, std::string_view text) override;
-
-    // The palette in hand begins, gets a colour, has one looked up, or has come to its end and is
-    // kept as that of the band told last. Colours without a palette around them, and those of one
-    // around it, are added to the one in hand: it stays.
-    virtual void BeginPalette();
-    virtual void AddColor(ColorList::Rgba rgba);
-    virtual void LookUpColor(std::uint32_t index);
-    virtual void KeepPalette();
 
     virtual void BeginStats() = 0;
     virtual void EndStats() = 0;
@@ -104,9 +98,6 @@ protected:
 
 private:
     void TakePaletteText(ElementName name, std::string_view text);
-
-    // The colour in hand: its name, the same of all, is made once.
-    RGBAColor color{Array<unsigned char>()};
 };
 
 template <class T>
@@ -124,14 +115,6 @@ protected:
     void EndHistogram() override;
     void TakeStatsText(ElementName name, std::string_view text) override;
     void TakeHistogramText(ElementName name, std::string_view text) override;
-};
-
-// The same for those who look at the finished records alone: a palette that is not inside another
-// is handed over to them rather than copied, and leaves none in hand.
-template <class T>
-class PyramidRecordReader : public PyramidXMLReaderHandlers<T> {
-protected:
-    void KeepPalette() override;
 };
 
 }  // namespace zelm

@@ -12,9 +12,9 @@
 
 #include "files/Lending.h"
 #include "fuzz/support/Expect.h"
+#include "fuzz/support/Gdal.h"
 #include "fuzz/support/Host.h"
 #include "fuzz/support/HostileFile.h"
-#include "gdal/Driver.h"
 #include "gdal/SampleType.h"
 #include "host/file/PyramidFileInfo.h"
 #include "host/file/StoredRecords.h"
@@ -28,16 +28,6 @@ using zmchost::Window;
 
 const char* const kName = "/vsimem/d.pyr";
 constexpr std::uint32_t kMostSide = 200;
-
-void StartOnce() {
-    static const bool started = [] {
-        zmcfuzz::TellModulePath();
-        CPLSetErrorHandler(CPLQuietErrorHandler);
-        GDALRegister_ZMCPyramid();
-        return true;
-    }();
-    static_cast<void>(started);
-}
 
 // Equal, or neither of them a number.
 template <class T>
@@ -215,7 +205,7 @@ void ExpectSameLayout(const zmchost::PyramidHeader& header, Raster& raster,
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
-    StartOnce();
+    zmcfuzz::StartGdal();
     zmcfuzz::FileAndScript input = zmcfuzz::FileAndScript::Take(data, size);
     const zmchost::ModulePtr& module = zmcfuzz::TheModule();
     const auto header = zmcfuzz::HeaderIn(input.file);

@@ -12,9 +12,8 @@
 #include <vector>
 
 #include "fuzz/support/Expect.h"
-#include "fuzz/support/Host.h"
+#include "fuzz/support/Gdal.h"
 #include "fuzz/support/HostileFile.h"
-#include "gdal/Driver.h"
 
 namespace {
 
@@ -29,19 +28,6 @@ constexpr std::uint64_t kMostFile = 16 << 20;
 void Drop(CPLErr) {}
 
 constexpr std::int64_t kMostPixels = 1 << 18;  // that a whole band is gone through for
-
-// GDAL with no other driver: what a sidecar names is opened by this one, or not at all.
-void StartOnce() {
-    static const bool started = [] {
-        zmcfuzz::TellModulePath();
-        CPLSetErrorHandler(CPLQuietErrorHandler);
-        CPLSetConfigOption("GDAL_HTTP_TIMEOUT", "1");
-        GDALSetCacheMax64(16 << 20);
-        GDALRegister_ZMCPyramid();
-        return true;
-    }();
-    static_cast<void>(started);
-}
 
 void Put(const char* name, const std::string& bytes) {
     VSIUnlink(name);
@@ -241,7 +227,7 @@ private:
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
-    StartOnce();
+    zmcfuzz::StartGdal();
     zmcfuzz::FileAndScript input = zmcfuzz::FileAndScript::Take(data, size);
     const std::string sidecar = input.TakeSecond();
     const auto header = zmcfuzz::HeaderIn(input.file);

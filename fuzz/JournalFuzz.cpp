@@ -5,8 +5,6 @@
 // script it is taken as it is, or made one that fits the file but for what the script says.
 #include <algorithm>
 #include <cstdint>
-#include <filesystem>
-#include <fstream>
 #include <string>
 
 #include "fuzz/support/Expect.h"
@@ -16,23 +14,15 @@
 #include "host/base/Checksum.h"
 #include "host/journal/MetadataJournal.h"
 #include "platform/FileSystem.h"
+#include "tests/support/ScratchDirectory.h"
 
 namespace {
 
 using zmcfuzz::InputBytes;
 using zmchost::JournalRecord;
+using zmctest::ReadText;
+using zmctest::WriteText;
 using Outcome = zmchost::Recovery::Outcome;
-
-void Write(const std::string& name, const std::string& bytes) {
-    std::ofstream(name, std::ios::binary | std::ios::trunc) << bytes;
-}
-
-std::string Read(const std::string& name) {
-    std::string bytes(static_cast<std::size_t>(std::filesystem::file_size(name)), '\0');
-    std::ifstream file(name, std::ios::binary);
-    file.read(bytes.data(), static_cast<std::streamsize>(bytes.size()));
-    return bytes;
-}
 
 // What a store into the file would have kept, with some of its numbers changed.
 JournalRecord RecordOf(const std::string& file, const std::string& bytes, const std::string& text,
@@ -74,16 +64,16 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     zmcfuzz::FileAndScript input = zmcfuzz::FileAndScript::Take(data, size);
     std::string journal = input.TakeSecond();
     if (const auto read = JournalRecord::Decode(journal)) ZMC_EXPECT(read->Encode() == journal);
-    Write(name, input.file);
+    WriteText(name, input.file);
     if (input.script.Flag()) {
         const JournalRecord record = RecordOf(name, input.file, journal, input.script);
         journal = record.Encode();
         const auto read = JournalRecord::Decode(journal);
         ZMC_EXPECT(read && read->text == record.text && read->offset == record.offset);
     }
-    Write(copy, journal);
+    WriteText(copy, journal);
     const zmchost::Recovery recovery = zmchost::RecoverMetadata(name);
-    const std::string after = Read(name);
+    const std::string after = ReadText(name);
     ExpectTilesKept(input.file, after);
     const bool settled =
         recovery.outcome == Outcome::Complete || recovery.outcome == Outcome::Restored;
@@ -93,6 +83,6 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
         zmchost::DiscardMetadata(name);
     } catch (const zmchost::Error&) {
     }
-    ExpectTilesKept(input.file, Read(name));
+    ExpectTilesKept(input.file, ReadText(name));
     return 0;
 }

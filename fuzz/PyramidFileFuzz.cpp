@@ -2,8 +2,7 @@
 // statistics, histograms and palettes, stored to, written to, refreshed, laid out anew, opened
 // again.
 //
-// The last byte of an input is the length of its script, the bytes in front of it are the script,
-// and what comes before is the file. So every file is an input.
+// How a file and its script lie in an input tells fuzz/support/FileAndScript.h.
 //
 // Files small enough are held against a naive model of the format: every sample that is read, and
 // every byte of the file after a write.
@@ -19,6 +18,7 @@
 
 #include "connection/RasterDataConnectionFactory.h"
 #include "fuzz/support/Expect.h"
+#include "fuzz/support/FileAndScript.h"
 #include "fuzz/support/Host.h"
 #include "fuzz/support/InputBytes.h"
 #include "fuzz/support/MemoryFile.h"
@@ -566,17 +566,15 @@ private:
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
     if (size == 0) return 0;
-    const std::size_t scriptSize = std::min<std::size_t>(data[size - 1], size - 1);
-    const std::size_t fileSize = size - 1 - scriptSize;
-    InputBytes script(data + fileSize, scriptSize);
-    const std::string_view bytes(reinterpret_cast<const char*>(data), fileSize);
+    const zmcfuzz::FileAndScriptBytes input(data, size);
+    InputBytes script = input.Script();
     if (script.UpTo(15) == 15) {
-        MemoryFile file(bytes);
+        MemoryFile file(input.file);
         file.Seal();
         Session(file, true).Run(script);
     } else {
         static MemoryFile file;
-        file.Assign(bytes);
+        file.Assign(input.file);
         Session(file, false).Run(script);
     }
     return 0;

@@ -10,6 +10,7 @@
 #include <string_view>
 
 #include "format/PyramidFront.h"
+#include "fuzz/support/FileAndScript.h"
 
 extern "C" std::size_t LLVMFuzzerMutate(std::uint8_t* data, std::size_t size, std::size_t maxSize);
 
@@ -57,11 +58,9 @@ struct Parts {
     std::string script;
 
     Parts(const std::uint8_t* data, std::size_t size) {
-        std::string_view all(reinterpret_cast<const char*>(data), size);
-        const std::size_t scriptSize =
-            size == 0 ? 0 : std::min<std::size_t>(data[size - 1], size - 1);
-        if (size != 0) script = all.substr(size - 1 - scriptSize, scriptSize);
-        std::string_view file = all.substr(0, size == 0 ? 0 : size - 1 - scriptSize);
+        const zmcfuzz::FileAndScriptBytes input(data, size);
+        script = input.script;
+        std::string_view file = input.file;
         front = file.substr(0, kFront);
         file.remove_prefix(front.size());
         const std::string_view end = "</DATASET>";

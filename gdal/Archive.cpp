@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <cmath>
 
+#include "colour/ColorList.h"
 #include "core/ElementTypes.h"
 #include "gdal/ColorTables.h"
 #include "gdal/NearestValue.h"
@@ -12,7 +13,10 @@
 namespace zmcgdal {
 namespace {
 
-constexpr std::size_t kMaxColors = 65536;
+// Colours that pixels can have: GDAL keeps and writes a table for each band, at a hundred times
+// what a colour takes in the file. Bands that share theirs there would make a small file large.
+template <class T>
+inline constexpr std::size_t kMaxColors = sizeof(T) == 1 ? 256 : 65536;
 
 template <class T>
 double ToDouble(const T& value) {
@@ -73,10 +77,10 @@ GDALColorEntry EntryOf(zelm::ColorList::Rgba color) {
 }
 
 // The last one comes first, so that the table grows once.
-std::unique_ptr<GDALColorTable> TableOf(const zelm::ColorList& palette) {
+std::unique_ptr<GDALColorTable> TableOf(const zelm::ColorList& palette, std::size_t most) {
     auto table = std::make_unique<GDALColorTable>();
-    const auto& colors = palette.Colors();
-    for (std::size_t i = std::min(colors.size(), kMaxColors); i-- != 0;) {
+    const auto colors = palette.Colors();
+    for (std::size_t i = std::min(colors.size(), most); i-- != 0;) {
         const GDALColorEntry entry = EntryOf(colors[i]);
         table->SetColorEntry(static_cast<int>(i), &entry);
     }
@@ -91,8 +95,8 @@ bool StoredStatistics::IsFull() const {
     return (flags & kNeeded) == kNeeded;
 }
 
-Archive::Archive(LazyRaster& pyramid, bool hasDocument, std::uint64_t elementLimit)
-    : raster(pyramid), documentExists(hasDocument), mostElements(elementLimit) {}
+Archive::Archive(LazyRaster& pyramid, bool hasDocument, const zmchost::Limits& openedBy)
+    : raster(pyramid), documentExists(hasDocument), limits(openedBy) {}
 
 bool Archive::RemembersStatistics(std::uint32_t band) const {
     return !documentExists || statistics.count(band) != 0;
@@ -144,9 +148,9 @@ const StoredHistogram* Archive::Histogram(std::uint32_t band, std::uint32_t leve
 }
 
 GDALColorTable* Archive::ColorTable(std::uint32_t band) {
-    return Recall(colorTables, band, [&](const auto& records) {
+    return Recall(colorTables, band, [&]<class T>(const zmchost::StoredRecords<T>& records) {
         const zelm::ColorList* const palette = records.BandPalette(band);
-        return palette ? TableOf(*palette) : nullptr;
+        return palette ? TableOf(*palette, kMaxColors<T>) : nullptr;
     });
 }
 
@@ -168,8 +172,8 @@ bool Archive::Store(Setter&& setter) {
 
 void Archive::CheckElements() {
     if (!elements) elements = documentExists ? raster.Get().DocumentElements() : 0;
-    const std::string wrong = zmchost::Limits::Judge(
-        "elements", *elements, mostElements, "it has " + std::to_string(*elements) + " elements");
+    const std::string wrong = limits.Judge(&zmchost::Limits::elements, *elements,
+                                           "it has " + std::to_string(*elements) + " elements");
     if (!wrong.empty())
         throw zmchost::Error(raster.Name(), "store into its metadata document", wrong);
 }

@@ -17,6 +17,7 @@
 #include <vector>
 
 #include "gdal/LazyRaster.h"
+#include "host/file/Limits.h"
 
 namespace zmcgdal {
 
@@ -44,8 +45,8 @@ struct StoredHistogram {
 class Archive {
 public:
     // `pyramid` outlives this object. Without a document in the file nothing is fetched; one of
-    // more than `elementLimit` elements is not stored into.
-    Archive(LazyRaster& pyramid, bool hasDocument, std::uint64_t elementLimit);
+    // more elements than these limits take on is not stored into.
+    Archive(LazyRaster& pyramid, bool hasDocument, const zmchost::Limits& openedBy);
 
     // Null where the file has none.
     const StoredStatistics* Statistics(std::uint32_t band);
@@ -66,7 +67,7 @@ public:
 private:
     LazyRaster& raster;
     bool documentExists;
-    std::uint64_t mostElements;
+    zmchost::Limits limits;
     std::optional<std::uint64_t> elements;  // of the document, before the first store into it
     std::map<std::uint32_t, std::optional<StoredStatistics>> statistics;
     std::map<std::pair<std::uint32_t, std::uint32_t>, std::optional<StoredHistogram>> histograms;

@@ -153,8 +153,7 @@ std::vector<unsigned char> Band::GatherTile(int blockX, int blockY, const zelm::
         bands = raster.AllBands();
     else
         bands = {index};
-    owner.File().CheckTile(owner.Level(), static_cast<std::uint32_t>(bands.size()),
-                           "write a block");
+    owner.File().CheckBlock(owner.Level());
     const auto size = static_cast<std::size_t>(GDALGetDataTypeSizeBytes(eDataType));
     const std::size_t stride = size * bands.size();
     std::vector<unsigned char> samples(tile.Pixels() * stride);
@@ -209,6 +208,7 @@ CPLErr Band::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, voi
                        int bufferWidth, int bufferHeight, GDALDataType bufferType,
                        GSpacing pixelSpace, GSpacing lineSpace, GDALRasterIOExtraArg* extra) {
     return Reporting(CE_Failure, [&] {
+        if (mode == GF_Write) owner.File().CheckBlock(owner.Level());
         const bool reduced = mode == GF_Read && bufferWidth < width && bufferHeight < height;
         if (reduced && !owner.Overviews().empty()) {
             Dataset::Shown shown(x, y, width, height, *extra);

@@ -46,8 +46,7 @@ zmchost::PyramidFileInfo CheckedInfo(const std::string& fileName,
 // to wait for its other end.
 bool HasPipesBeside(const std::string& base) {
     for (const char* const ending : {kSidecarEnding, kMaskEnding, kOverviewsEnding}) {
-        const platform::FileStatus status = platform::StatusOf(base + ending);
-        if (!status.exists || status.isRegular || status.isFolder) continue;
+        if (!platform::StatusOf(base + ending).IsSpecial()) continue;
         CPLError(CE_Warning, CPLE_AppDefined,
                  "%s%s is no regular file; what stands beside the raster is not looked at",
                  base.c_str(), ending);
@@ -73,16 +72,20 @@ OpenFile::OpenFile(const std::string& fileName, GDALAccess access, const OpenOpt
       info(CheckedInfo(fileName, zmchost::PyramidHeader::Read(*source, fileName))),
       raster(fileName, source, info.header, options.keepCopies),
       tiles(raster, info, GdalTypeOf(info.header.pixelType, options.signedByteAs)),
-      archive(raster, info.HasMetadataDocument(), limits.elements) {}
+      archive(raster, info.HasMetadataDocument(), limits) {}
 
 void OpenFile::CheckTile(std::uint32_t level, std::uint32_t bands, const char* operation) const {
     const zelm::LevelGeometry grid = info.header.Geometry(level);
     const std::uint64_t bytes = std::uint64_t{std::min(grid.tileSize, grid.samples)} *
                                 std::min(grid.tileSize, grid.lines) * bands *
                                 zelm::PixelSize(info.header.pixelType);
-    const std::string wrong = zmchost::Limits::Judge(
-        "tile", bytes, limits.tile, "its tiles have " + std::to_string(bytes) + " bytes");
+    const std::string wrong = limits.Judge(&zmchost::Limits::tile, bytes,
+                                           "its tiles have " + std::to_string(bytes) + " bytes");
     if (!wrong.empty()) throw zmchost::Error(raster.Name(), operation, wrong);
+}
+
+void OpenFile::CheckBlock(std::uint32_t level) const {
+    CheckTile(level, tiles.IsPixelInterleaved() ? info.header.bandCount : 1, "write a block");
 }
 
 Dataset::Dataset(std::shared_ptr<OpenFile> openFile, std::uint32_t levelShown, GDALAccess access,
@@ -251,6 +254,7 @@ CPLErr Dataset::ReadOrWrite(GDALRWFlag mode, int x, int y, int width, int height
                             int bufferWidth, int bufferHeight, GDALDataType bufferType,
                             int bandCount, int* bandMap, GSpacing pixelSpace, GSpacing lineSpace,
                             GSpacing bandSpace, GDALRasterIOExtraArg* extra) {
+    if (mode == GF_Write) file->CheckBlock(level);
     const bool reduced = mode == GF_Read && bufferWidth < width && bufferHeight < height;
     if (reduced && !Overviews().empty()) {
         Shown shown(x, y, width, height, *extra);

@@ -36,6 +36,8 @@ public:
     // Throws zmchost::Error where a tile of that level, with so many bands, is beyond the limit of
     // those that are held as a whole. `operation` stands behind "cannot".
     void CheckTile(std::uint32_t level, std::uint32_t bands, const char* operation) const;
+    // The same of what is read and written as one where some of it changes.
+    void CheckBlock(std::uint32_t level) const;
 
     const std::shared_ptr<zelm::files::ByteSource> source;
     const zmchost::PyramidFileInfo info;

@@ -7,6 +7,8 @@
 #include <cstdint>
 #include <cstdlib>
 
+#include "host/base/ScaledNumber.h"
+
 namespace zmcgdal {
 
 const char* const kOpenOptionsXml = R"(<OpenOptionList>
@@ -49,29 +51,23 @@ const char* const kCreationOptionsXml = R"(<CreationOptionList>
 
 namespace {
 
+constexpr std::size_t kMaxDigits = 18;
+
 std::optional<std::uint64_t> ParseCount(const std::string& text) {
     if (text.empty() ||
         !std::all_of(text.begin(), text.end(),
                      [](unsigned char c) { return std::isdigit(c) != 0; }) ||
-        text.size() > 18)
+        text.size() > kMaxDigits)
         return std::nullopt;
     return std::strtoull(text.c_str(), nullptr, 10);
 }
 
 std::optional<std::uint64_t> ParseSize(std::string text) {
-    unsigned shift = 0;
     if (!text.empty() && (text.back() == 'B' || text.back() == 'b')) text.pop_back();
-    if (!text.empty()) {
-        const auto unit = std::string("KMG").find(
-            static_cast<char>(std::toupper(static_cast<unsigned char>(text.back()))));
-        if (unit != std::string::npos) {
-            shift = 10 * (static_cast<unsigned>(unit) + 1);
-            text.pop_back();
-        }
-    }
-    const auto count = ParseCount(text);
-    if (!count || *count > (UINT64_MAX >> shift)) return std::nullopt;
-    return *count << shift;
+    const auto digits = std::count_if(text.begin(), text.end(),
+                                      [](unsigned char c) { return std::isdigit(c) != 0; });
+    if (static_cast<std::size_t>(digits) > kMaxDigits) return std::nullopt;
+    return zmchost::ParseScaled(text, "KMGkmg");
 }
 
 std::optional<zmchost::Ordering> ParseOrdering(const char* word) {

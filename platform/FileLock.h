@@ -4,7 +4,7 @@
 // It goes when the object does, and when its process ends in whatever way, and it stays with the
 // file when that is renamed. Only regular files are locked, and no link is followed to one: what
 // stands under a name that others may give away is a pipe, a device or somebody else's file as
-// easily. Paths are narrow UTF-8. Nothing throws. Of file systems without locks every asker fails;
+// easily. Paths are narrow UTF-8. Nothing throws. On file systems without locks nobody has one;
 // whether processes on several machines see each other's locks is the file system's affair.
 #ifndef ZMC_PLATFORM_FILELOCK_H
 #define ZMC_PLATFORM_FILELOCK_H
@@ -23,6 +23,7 @@ public:
         Taken,
         Held,     // somebody has it
         Missing,  // there is no such file, or was none by the time that the lock was had
+        NoLocks,  // the file system knows none; LastErrorText tells so
         Failed,   // LastErrorText tells why
     };
     enum class Kind {

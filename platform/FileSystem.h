@@ -25,6 +25,9 @@ struct FileStatus {
     // What tells the file from all others of its file system while it exists, whatever its name.
     std::uint64_t number = 0;
     std::uint64_t owner = 0;  // the number of the user to whom it belongs; 0 is the superuser
+
+    // A pipe, a device or the like: to open it may wait for somebody, or do anything.
+    bool IsSpecial() const { return exists && !isRegular && !isFolder; }
 };
 
 std::string LastErrorText();

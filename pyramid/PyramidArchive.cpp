@@ -17,7 +17,7 @@ template <class T, class Take>
 bool ParseMeta(PyramidDataset& dataset, bool withoutText, Take take) {
     if (!dataset.MetaLoaded && !dataset.LoadMetaDocument()) return withoutText;
     try {
-        PyramidRecordReader<T> handlers;
+        PyramidXMLReaderHandlers<T> handlers;
         const int result = dataset.ParseDocument(&handlers, dataset.MetaSource, dataset.MetaLoaded);
         if (result != PyramidDataset::kParsed) return false;
         take(handlers);
@@ -75,10 +75,11 @@ bool PyramidDataset::LoadHistograms(Array<RasterBandHistogram<T>>& out) {
 template <class T>
 bool PyramidDataset::LoadPalette(std::uint32_t band, Palette& out) {
     return ParseMeta<T>(*this, true, [&](auto& handlers) {
-        // Without copying, which could end halfway.
-        Palette& found = handlers.palettes[band];
-        out.colors.swap(found.colors);
-        out.nextIndex = found.nextIndex;
+        // Aside, since it may end halfway.
+        Palette made;
+        handlers.palettes[band].CopyTo(made);
+        out.colors.swap(made.colors);
+        out.nextIndex = made.nextIndex;
     });
 }
 

@@ -20,8 +20,11 @@ constexpr std::uint64_t kHeaderOffset = PyramidFront::kHeaderOffset;
 
 // A source over a text, or null if memory ran out.
 DocumentSource MakeSource(std::unique_ptr<XMLByte[]> text, std::size_t size, const char* name) {
-    GuardText(text.get(), size);
     try {
+        if (Utf8Document other = GuardText(text.get(), size); other.bytes) {
+            text = std::move(other.bytes);
+            size = other.size;
+        }
         auto source = std::make_unique<xercesc::MemBufInputSource>(text.get(), size, name, true);
         text.release();
         return source;

@@ -249,6 +249,11 @@ void PyramidXMLDocument::ForgetChildText(const xercesc::DOMElement& record) {
     childTexts.erase(record.getFirstChild());
 }
 
+void PyramidXMLDocument::Abandon(xercesc::DOMElement& record) {
+    ForgetChildText(record);
+    record.release();
+}
+
 std::uint64_t PyramidXMLDocument::ElementsOf(const xercesc::DOMElement& record) const {
     const auto children = childTexts.find(record.getFirstChild());
     return 1 + (children != childTexts.end() ? children->second.count
@@ -262,16 +267,20 @@ bool PyramidXMLDocument::AppendRecord(ElementName name, Build build) {
     return Attempt("", [&] {
         xercesc::DOMElement* record =
             document->createElement(kElementNames[static_cast<int>(name)].data());
-        build(*record);
-        const std::uint64_t count = ElementsOf(*record);
-        if (elementCount + count > kMaxDocumentNodes) {
-            ForgetChildText(*record);
-            record->release();
-            return false;
+        try {
+            build(*record);
+            const std::uint64_t count = ElementsOf(*record);
+            if (elementCount + count <= kMaxDocumentNodes) {
+                document->getDocumentElement()->appendChild(record);
+                elementCount += count;
+                return true;
+            }
+        } catch (...) {
+            Abandon(*record);
+            throw;
         }
-        document->getDocumentElement()->appendChild(record);
-        elementCount += count;
-        return true;
+        Abandon(*record);
+        return false;
     });
 }
 

@@ -99,6 +99,8 @@ private:
     bool AppendRecord(ElementName name, Build build);
     void AppendChildText(xercesc::DOMElement& record, ChildText children);
     void ForgetChildText(const xercesc::DOMElement& record);
+    // Gives up a record that is not appended.
+    void Abandon(xercesc::DOMElement& record);
     // A record and its children, which have none of their own.
     std::uint64_t ElementsOf(const xercesc::DOMElement& record) const;
 

@@ -178,20 +178,22 @@ void CopyPixelLines(TileBands bands, Loops loops, std::size_t size, typename Way
         loops.line.count = 1;
     }
     for (std::size_t line = 0; line < loops.line.count; ++line) {
+        // No pointer goes on behind the last line: the step of a raster of one line, which nothing
+        // bounds, may lead anywhere.
+        const auto from = raster + line * loops.line.inRaster;
+        const auto to = tile + line * loops.line.inTile;
         for (std::uint32_t k = 0; k < bands.count;) {
             const std::uint32_t together = NeighbouringBands(bands, k);
             const bool isBlock = together * size >= kBlockBytes;
             const std::uint32_t count = isBlock ? together : std::min(bands.count - k, kPassBands);
             if (isBlock)
                 CopyBox<Way>({1, 0, 0}, loops.sample, {together, size, size},
-                             raster + static_cast<std::size_t>(bands.numbers[k]) * size,
-                             tile + k * size);
+                             from + static_cast<std::size_t>(bands.numbers[k]) * size,
+                             to + k * size);
             else
-                passes[count - 1](loops.sample, bands.numbers + k, raster, tile + k * size);
+                passes[count - 1](loops.sample, bands.numbers + k, from, to + k * size);
             k += count;
         }
-        raster += loops.line.inRaster;
-        tile += loops.line.inTile;
     }
 }
 

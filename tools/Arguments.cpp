@@ -6,7 +6,9 @@
 #include <cmath>
 #include <cstdlib>
 #include <sstream>
+#include <string_view>
 
+#include "host/base/ScaledNumber.h"
 #include "tools/Message.h"
 
 namespace zmctools {
@@ -54,20 +56,14 @@ double ParseNumber(const std::string& option, const std::string& text) {
 
 std::uint64_t ParseSize(const std::string& option, const std::string& text) {
     std::string digits = text;
-    unsigned shift = 0;
     if (!digits.empty() && (digits.back() == 'B' || digits.back() == 'b')) digits.pop_back();
     const bool binary = digits.size() > 1 && digits.back() == 'i';
     if (binary) digits.pop_back();
-    const std::string units = "KMGkmg";
-    const auto unit = digits.empty() ? units.npos : units.find(digits.back());
-    if (unit != units.npos) {
-        shift = static_cast<unsigned>(unit % 3 + 1) * 10;
-        digits.pop_back();
-    }
-    const auto value = WholeNumber(digits);
-    if (!value || *value > (UINT64_MAX >> shift) || (binary && shift == 0))
+    constexpr std::string_view kUnits = "KMGkmg";
+    const auto value = zmchost::ParseScaled(digits, kUnits);
+    if (!value || (binary && kUnits.find(digits.back()) == kUnits.npos))
         throw UsageError(option, "\"" + text + "\" is no size: give bytes, or 512K, 256M, 2G");
-    return *value << shift;
+    return *value;
 }
 
 std::vector<std::uint32_t> ParseBands(const std::string& text, std::uint32_t bands) {

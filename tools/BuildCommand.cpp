@@ -17,6 +17,7 @@
 #include "tools/GdalWorld.h"
 #include "tools/Interrupt.h"
 #include "tools/Methods.h"
+#include "tools/RasterView.h"
 #include "tools/TerminalProgress.h"
 
 namespace zmctools {
@@ -131,9 +132,8 @@ zmchost::BuildOptions BuildCommand::Options(const zelm::RasterProps& props) cons
         // A long real holds all integers of 64 bits.
         if (std::strtold(noData.c_str(), nullptr) != static_cast<long double>(value) &&
             IsInteger(props.pixelType))
-            Warn(target +
-                 ": warning: a pyramid does not keep the last digits of the no-data value " +
-                 noData + " while levels are reduced");
+            Warn(target, "a pyramid does not keep the last digits of the no-data value " + noData +
+                             " while levels are reduced");
     }
     options.bands = ParseBands(bands, props.bands);
     options.bins = static_cast<std::uint32_t>(ParseCount("--bins", bins, 1 << 24));
@@ -246,8 +246,7 @@ void BuildCommand::Report(const zmchost::BuildReport& report, std::uint32_t pixe
 // What is missing reads as zeros, and a few bytes of header can claim terabytes of them.
 void CheckComplete(GDALDataset& dataset, const std::string& source) {
     if (const char* const missing = dataset.GetMetadataItem("BYTES_MISSING", "ZMCPYRAMID"))
-        throw Failure(source, std::string("the pyramid is incomplete, ") + missing +
-                                  " bytes of tiles are missing; build it anew");
+        FailAsIncomplete(source, missing);
 }
 
 ExitStatus BuildCommand::Run() {
@@ -258,8 +257,7 @@ ExitStatus BuildCommand::Run() {
     const zmchost::BuildOptions options = Options(props);
     CheckTarget();
     CheckInterrupt(target);
-    for (const std::string& loss : pixels.Losses())
-        Warn(Visible(source) + ": warning: a pyramid does not keep " + loss);
+    for (const std::string& loss : pixels.Losses()) Warn(source, "a pyramid does not keep " + loss);
     const zmchost::BuildReport report = Build(*dataset, pixels, options);
     Report(report, props.pixelType);
     return ExitStatus::Done;

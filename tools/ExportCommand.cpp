@@ -56,14 +56,12 @@ void ExportCommand::Describe(OptionTable& table) {
 
 DatasetPtr ExportCommand::OpenLevel(std::uint32_t wanted) const {
     const zmchost::PyramidFileInfo info = ReadLayout(file);
-    if (!info.complete)
-        throw Failure(file, "the pyramid is incomplete, " + std::to_string(info.bytesMissing) +
-                                " bytes of tiles are missing; build it anew");
+    if (!info.complete) FailAsIncomplete(file, std::to_string(info.bytesMissing));
     const std::uint32_t base = info.header.levelMin;
     if (!info.FindLevel(wanted))
-        throw UsageError("--level", "there is no level " + std::to_string(wanted) + ": " + file +
-                                        " has the levels " + std::to_string(base) + " to " +
-                                        std::to_string(info.header.levelMax));
+        throw UsageError("--level", "there is no level " + std::to_string(wanted) + ": " +
+                                        Visible(file) + " has the levels " + std::to_string(base) +
+                                        " to " + std::to_string(info.header.levelMax));
     std::vector<std::string> options;
     if (wanted > base) options.push_back("OVERVIEW_LEVEL=" + std::to_string(wanted - base - 1));
     return OpenDataset(file, options);

@@ -5,6 +5,7 @@
 #include <cpl_string.h>
 
 #include <mutex>
+#include <new>
 
 #include "gdal/Driver.h"
 #include "host/base/Xerces.h"
@@ -26,13 +27,22 @@ std::string WithoutPrefix(const std::string& text, const std::string& prefix) {
     return text.compare(0, prefix.size(), prefix) == 0 ? text.substr(prefix.size()) : text;
 }
 
-// GDAL works on threads of its own too, so there is one place for all of them.
-void CPL_STDCALL TakeError(CPLErr kind, CPLErrorNum, const char* text) {
+// The lock is held. So short a text takes no memory.
+void TakeLoss(CPLErr kind) {
+    if (kind == CE_Warning) WarnOfLoss();
+    if (kind >= CE_Failure && firstError.empty()) firstError = "out of memory";
+}
+
+// GDAL works on threads of its own too, so there is one place for all of them. It is called from C
+// and from the ends of exceptions, and must throw none.
+void CPL_STDCALL TakeError(CPLErr kind, CPLErrorNum, const char* text) noexcept {
     const std::lock_guard lock(mutex);
-    if (kind == CE_Warning)
-        Warn(Visible(subject) + ": warning: " + WithoutPrefix(text, subject + ": "));
-    if (kind < CE_Failure) return;
-    if (firstError.empty()) firstError = text;
+    try {
+        if (kind == CE_Warning) Warn(subject, WithoutPrefix(text, subject + ": "));
+        if (kind >= CE_Failure && firstError.empty()) firstError = text;
+    } catch (const std::bad_alloc&) {
+        TakeLoss(kind);
+    }
 }
 
 }  // namespace
@@ -65,9 +75,7 @@ std::string TakeGdalError(const std::string& file) {
 DatasetPtr OpenDataset(const std::string& name, const std::vector<std::string>& options) {
     CPLStringList list;
     for (const std::string& option : options) list.AddString(option.c_str());
-    if (const platform::FileStatus status = platform::StatusOf(name);
-        status.exists && !status.isRegular && !status.isFolder)
-        throw Failure(name, "it is not a regular file");
+    if (platform::StatusOf(name).IsSpecial()) throw Failure(name, "it is not a regular file");
     TakeGdalError(name);
     SetSubject(name);
     DatasetPtr dataset(GDALDataset::Open(name.c_str(), GDAL_OF_RASTER | GDAL_OF_VERBOSE_ERROR,

@@ -123,34 +123,39 @@ Json PalettesOf(const zmchost::Raster& raster, std::size_t most) {
     return list;
 }
 
+Json DescribeLayout(const std::string& file, const zmchost::PyramidFileInfo& info) {
+    const zmchost::PyramidHeader& header = info.header;
+    return {{"schema", kSchema},
+            {"file", file},
+            {"width", header.width},
+            {"height", header.height},
+            {"bands", header.bandCount},
+            {"pixelType", zelm::PixelTypeName(header.pixelType)},
+            {"interleave", zelm::InterleaveName(header.interleave)},
+            {"tileOrdering", zelm::TileOrderName(header.tileOrdering)},
+            {"tileSize", header.tileSize},
+            {"version",
+             std::to_string(header.versionMajor) + '.' + std::to_string(header.versionMinor)},
+            {"levelMin", header.levelMin},
+            {"levelMax", header.levelMax},
+            {"complete", info.complete},
+            {"bytesMissing", JsonNumber(info.bytesMissing)},
+            {"levels", LevelsOf(info)},
+            {"statistics", Json::array()},
+            {"histograms", Json::array()},
+            {"palettes", Json::array()}};
+}
+
 Json Describe(const std::string& file, std::size_t mostColors) {
     const zmchost::PyramidFileInfo info = ReadLayout(file);
-    const zmchost::PyramidHeader& header = info.header;
-    Json document = {{"schema", kSchema},
-                     {"file", file},
-                     {"width", header.width},
-                     {"height", header.height},
-                     {"bands", header.bandCount},
-                     {"pixelType", zelm::PixelTypeName(header.pixelType)},
-                     {"interleave", zelm::InterleaveName(header.interleave)},
-                     {"tileOrdering", zelm::TileOrderName(header.tileOrdering)},
-                     {"tileSize", header.tileSize},
-                     {"version", std::to_string(header.versionMajor) + '.' +
-                                     std::to_string(header.versionMinor)},
-                     {"levelMin", header.levelMin},
-                     {"levelMax", header.levelMax},
-                     {"complete", info.complete},
-                     {"bytesMissing", JsonNumber(info.bytesMissing)},
-                     {"levels", LevelsOf(info)},
-                     {"statistics", Json::array()},
-                     {"histograms", Json::array()},
-                     {"palettes", Json::array()}};
     // Of a type without a reader the header is all that can be told.
-    if (zelm::CheckedPixelType(header.pixelType) == 0 || !info.HasMetadataDocument())
-        return document;
+    if (zelm::CheckedPixelType(info.header.pixelType) == 0 || !info.HasMetadataDocument())
+        return DescribeLayout(file, info);
     const zmchost::Raster raster = OpenPyramid(file);
+    // Of the file that is open now, should another have taken the name.
+    Json document = DescribeLayout(file, zmchost::DescribePyramidFile(raster.Header()));
     if (const std::string wrong = raster.DocumentFault(); !wrong.empty()) {
-        Warn(file + ": warning: " + wrong + "; statistics, histograms and palettes are not shown");
+        Warn(file, wrong + "; statistics, histograms and palettes are not shown");
         return document;
     }
     zelm::VisitElementType(raster.PixelType(), [&]<class T>(std::type_identity<T>) {

@@ -14,6 +14,8 @@ namespace {
 
 // Bytes of samples and masks of the finer part of a block.
 constexpr std::uint64_t kBlockBytes = std::uint64_t{64} << 20;
+// The same where a tile has so many that to read it once takes more.
+constexpr std::uint64_t kMostBlockBytes = 4 * kBlockBytes;
 
 template <class T>
 class LevelsChecker {
@@ -21,13 +23,15 @@ public:
     LevelsChecker(zmchost::Raster& pyramid, zmchost::Resampling method)
         : raster(pyramid), reduction(pyramid, method), bands(pyramid.Bands()) {}
 
-    // A multiple of the tile's side: whole tiles are read once but for the margins.
+    // A multiple of the tile's side: whole tiles are read once but for the margins. A part of a
+    // tile where that is beyond what may be held.
     std::uint32_t BlockSide() const {
         std::uint32_t side = raster.TileSide();
         const std::uint64_t most = BytesAtOnce(kBlockBytes, side);
         const auto bytes = [&](std::uint64_t next) {
             return next * next * 4 * bands * (sizeof(T) + 1);
         };
+        while (side > 1 && bytes(side) > kMostBlockBytes) side /= 2;
         while (side < 4096 && bytes(std::uint64_t{side} * 2) <= most) side *= 2;
         return side;
     }

@@ -14,7 +14,8 @@ std::atomic<bool> isQuiet{false};
 
 }  // namespace
 
-// Libraries tell some things on several lines; names are visible already where we made the text.
+// Libraries tell some things on several lines. Names are visible already: what throws, and Warn,
+// show them so.
 void Say(const std::string& text) {
     std::string line = "zmcraster: ";
     for (const char c : text)
@@ -27,12 +28,19 @@ void Say(const std::string& text) {
 }
 
 // What several readers of one file find is said once.
-void Warn(const std::string& text) {
+void Warn(const std::string& file, const std::string& what) {
     static std::mutex mutex;
     static std::set<std::string> said;
     if (isQuiet) return;
+    const std::string text = Visible(file) + ": warning: " + what;
     const std::lock_guard lock(mutex);
     if (said.insert(text).second) Say(text);
+}
+
+void WarnOfLoss() {
+    if (!isQuiet)
+        platform::WriteAtOnce(platform::StandardStream::Errors,
+                              "zmcraster: warning: out of memory, and what it was about is lost\n");
 }
 
 void SetQuiet(bool quiet) { isQuiet = quiet; }

@@ -39,9 +39,11 @@ public:
 // Writes a message, on one line and with nothing that steers a terminal, whatever `text` holds.
 void Say(const std::string& text);
 
-// The same for what does not keep a command from going on, each text once; silent after
+// Says of a file what does not keep a command from going on, each text once; silent after
 // SetQuiet(true). Any thread may call.
-void Warn(const std::string& text);
+void Warn(const std::string& file, const std::string& what);
+// Tells that a warning was lost for want of memory; takes none itself.
+void WarnOfLoss();
 void SetQuiet(bool quiet);
 
 }  // namespace zmctools

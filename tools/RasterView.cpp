@@ -8,6 +8,7 @@
 #include <utility>
 
 #include "core/PixelVocabulary.h"
+#include "files/FileSource.h"
 #include "format/PyramidHeaderRecord.h"
 #include "gdal/Dataset.h"
 #include "gdal/GdalRasterSource.h"
@@ -22,16 +23,11 @@ namespace zmctools {
 namespace {
 
 constexpr std::uint64_t kStripBudget = std::uint64_t{32} << 20;
-// Of the files that builds write; those of others are read as well, if slower.
-constexpr std::uint32_t kTileRows = zelm::kWrittenTileSize;
 
 using zelm::files::Identity;
 
 Identity IdentityOf(const std::string& name) {
-    platform::FileIdentity found;
-    const zelm::String wide(name.c_str());
-    if (!wide.wide || !platform::TellIdentity(wide.wide, found)) return {};
-    return {true, found.device, found.number, found.size, found.modified, found.changed};
+    return zelm::files::FileSource::IdentifyName(zelm::String(name.c_str()));
 }
 
 // Two writes within a tick of the file system's clock look like one: a file that was written a
@@ -49,10 +45,6 @@ Identity IdentityAtRest(const std::string& name) {
         now = IdentityOf(name);
     }
     return now;
-}
-
-[[noreturn]] void FailAsChanged(const std::string& name, const std::string& change) {
-    throw Failure(name, "it changed while it was read: " + change);
 }
 
 class PyramidView final : public RasterView {
@@ -77,13 +69,7 @@ public:
             FailAsChanged(Name(), change);
     }
     std::uint32_t TileSide() const override { return raster.TileSide(); }
-    void CheckReadable() override {
-        if (!raster.IsComplete())
-            throw zmchost::Error(raster.Name(), "read its pixels",
-                                 "the file is incomplete, " +
-                                     std::to_string(raster.Header().BytesMissing()) +
-                                     " bytes are missing");
-    }
+    void CheckReadable() override { raster.CheckComplete("read its pixels"); }
 
 private:
     Identity before;
@@ -124,20 +110,16 @@ private:
 };
 
 void TellRecovery(const std::string& name, const std::string& text) {
-    if (!text.empty()) Warn(Visible(name) + ": warning: " + text);
-}
-
-std::uint64_t LineBytes(const RasterView& view, const Selection& selection) {
-    return std::uint64_t{selection.window.width} * selection.bands.size() *
-           zelm::PixelSize(view.PixelType());
+    if (!text.empty()) Warn(name, text);
 }
 
 }  // namespace
 
 void RasterView::CheckLevel(std::uint32_t level) const {
     if (level >= MinLevel() && level <= MaxLevel()) return;
-    throw UsageError("--level", "there is no level " + std::to_string(level) + ": " + Name() +
-                                    " has the levels " + std::to_string(MinLevel()) + " to " +
+    throw UsageError("--level", "there is no level " + std::to_string(level) + ": " +
+                                    Visible(Name()) + " has the levels " +
+                                    std::to_string(MinLevel()) + " to " +
                                     std::to_string(MaxLevel()));
 }
 
@@ -150,9 +132,7 @@ bool IsPyramidFile(const std::string& name) {
 }
 
 void CheckIsNoDevice(const std::string& name) {
-    const platform::FileStatus status = platform::StatusOf(name);
-    if (status.exists && !status.isRegular && !status.isFolder)
-        throw Failure(name, "it is not a regular file");
+    if (platform::StatusOf(name).IsSpecial()) throw Failure(name, "it is not a regular file");
 }
 
 void CheckIsFile(const std::string& name) {
@@ -160,6 +140,15 @@ void CheckIsFile(const std::string& name) {
     if (!status.exists) throw Failure(name, "there is no such file");
     if (status.isFolder) throw Failure(name, "it is a folder");
     CheckIsNoDevice(name);
+}
+
+void FailAsChanged(const std::string& name, const std::string& change) {
+    throw Failure(name, "it changed while it was read: " + change);
+}
+
+void FailAsIncomplete(const std::string& name, const std::string& bytes) {
+    throw Failure(
+        name, "the pyramid is incomplete, " + bytes + " bytes of tiles are missing; build it anew");
 }
 
 zmchost::PyramidFileInfo ReadLayout(const std::string& name) {
@@ -188,21 +177,19 @@ std::size_t StripBytes(const RasterView& view, const Selection& selection,
                                     selection.bands.size() * zelm::PixelSize(view.PixelType()));
 }
 
-void WalkStrips(RasterView& view, const Selection& selection, TerminalProgress& progress,
-                const std::function<void(const zmchost::Window& strip)>& take) {
-    view.CheckReadable();
-    const zmchost::Window& window = selection.window;
-    const std::uint64_t lineBytes = std::max<std::uint64_t>(LineBytes(view, selection), 1);
-    const std::uint64_t budget = BytesAtOnce(kStripBudget, view.TileSide());
-    const std::uint64_t lines = std::max<std::uint64_t>(budget / lineBytes, 1);
+void Strips::Walk(const std::string& name, TerminalProgress& progress,
+                  const std::function<void(const zmchost::Window& strip)>& take) const {
+    const auto atLeastOne = [](std::uint64_t count) { return std::max<std::uint64_t>(count, 1); };
+    const std::uint64_t pixels = BytesAtOnce(bytes, tileSide) / atLeastOne(pixelBytes);
+    const std::uint64_t lines = atLeastOne(pixels / atLeastOne(window.width));
     // Of a line that is longer.
-    const auto columns = static_cast<std::uint32_t>(std::clamp<std::uint64_t>(
-        std::uint64_t{window.width} * budget / lineBytes, 1, std::max(window.width, 1u)));
+    const auto columns =
+        static_cast<std::uint32_t>(std::clamp<std::uint64_t>(pixels, 1, atLeastOne(window.width)));
     const std::uint64_t total = std::uint64_t{window.width} * window.height;
     for (std::uint32_t done = 0; done < window.height;) {
         // Up to the end of a row of tiles, so that the next strip begins with one.
         std::uint64_t end = std::uint64_t{window.y} + done + lines;
-        const std::uint64_t aligned = end / kTileRows * kTileRows;
+        const std::uint64_t aligned = end / tileSide * tileSide;
         if (aligned > window.y + done) end = aligned;
         end = std::min<std::uint64_t>(end, std::uint64_t{window.y} + window.height);
         const auto height = static_cast<std::uint32_t>(end - window.y - done);
@@ -212,10 +199,18 @@ void WalkStrips(RasterView& view, const Selection& selection, TerminalProgress& 
             x += width;
             if (!progress.Show(std::uint64_t{done} * window.width + std::uint64_t{x} * height,
                                total))
-                throw Interruption(view.Name());
+                throw Interruption(name);
         }
         done += height;
     }
+}
+
+void WalkStrips(RasterView& view, const Selection& selection, TerminalProgress& progress,
+                const std::function<void(const zmchost::Window& strip)>& take) {
+    view.CheckReadable();
+    Strips{selection.window, selection.bands.size() * zelm::PixelSize(view.PixelType()),
+           kStripBudget, view.TileSide()}
+        .Walk(view.Name(), progress, take);
 }
 
 }  // namespace zmctools

@@ -66,6 +66,11 @@ void CheckIsFile(const std::string& name);
 // Throws Failure if the name is that of something else than a file or a folder.
 void CheckIsNoDevice(const std::string& name);
 
+// Throws the Failure of what did not stay as it was.
+[[noreturn]] void FailAsChanged(const std::string& name, const std::string& change);
+// Throws the Failure of a pyramid that lacks so many bytes.
+[[noreturn]] void FailAsIncomplete(const std::string& name, const std::string& bytes);
+
 // The layout of a pyramid file, with a warning of a store into it that was cut off. Throws Failure,
 // or what its reader throws.
 zmchost::PyramidFileInfo ReadLayout(const std::string& name);
@@ -81,9 +86,22 @@ struct Selection {
     std::vector<std::uint32_t> bands;
 };
 
-// Calls take(strip) for strips of the window from the top to the bottom. A strip is whole rows of
-// tiles as long as these fit some 32 MiB for each view; else lines, or parts of a line from the
-// left to the right. Throws Interruption, and where the view has nothing to read.
+// A window that is gone through in strips from the top to the bottom. A strip is whole rows of
+// tiles as long as these fit what is held at once; else lines, or parts of a line from the left to
+// the right, of a pixel at least.
+struct Strips {
+    zmchost::Window window;
+    std::uint64_t pixelBytes = 1;  // that are held for each pixel
+    std::uint64_t bytes = 0;       // to hold at once where tiles are of the usual size, less else
+    std::uint32_t tileSide = kUsualTile;
+
+    // Calls take(strip) for each. Throws Interruption, of work on the file `name`.
+    void Walk(const std::string& name, TerminalProgress& progress,
+              const std::function<void(const zmchost::Window& strip)>& take) const;
+};
+
+// The same for a part of a view, of which some 32 MiB are held. Throws too where the view has
+// nothing to read.
 void WalkStrips(RasterView& view, const Selection& selection, TerminalProgress& progress,
                 const std::function<void(const zmchost::Window& strip)>& take);
 

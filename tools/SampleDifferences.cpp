@@ -1,5 +1,6 @@
 #include "tools/SampleDifferences.h"
 
+#include <algorithm>
 #include <cmath>
 #include <cstring>
 #include <limits>
@@ -10,6 +11,9 @@
 
 namespace zmctools {
 namespace {
+
+// Each sample takes some dozen times its bytes then.
+constexpr std::size_t kWidenedAtOnce = 65536;
 
 long double Part(long double a, long double b) {
     if (std::isnan(a) && std::isnan(b)) return 0;
@@ -44,20 +48,26 @@ void SampleDifferences::Take(const zmchost::Window& window, const void* first, c
 void SampleDifferences::TakeLine(std::uint32_t x, std::uint32_t y, std::size_t samples,
                                  const unsigned char* first, const unsigned char* second) {
     if (types[0] == types[1] && std::memcmp(first, second, samples * sizes[0]) == 0) return;
-    values[0].resize(samples);
-    values[1].resize(samples);
-    Widen(types[0], first, values[0]);
-    Widen(types[1], second, values[1]);
-    for (std::size_t i = 0; i < samples; ++i) {
-        const long double distance = Distance(values[0][i], values[1][i]);
-        if (distance == 0) continue;
-        BandDifference& band = bands[i % bands.size()];
-        band.greatest = std::max(band.greatest, distance);
-        if (distance <= static_cast<long double>(tolerance)) continue;
-        if (band.samples++ == 0) {
-            band.x = x + static_cast<std::uint32_t>(i / bands.size());
-            band.y = y;
-        }
+    for (std::size_t start = 0; start < samples; start += kWidenedAtOnce) {
+        const std::size_t count = std::min(kWidenedAtOnce, samples - start);
+        values[0].resize(count);
+        values[1].resize(count);
+        Widen(types[0], first + start * sizes[0], values[0]);
+        Widen(types[1], second + start * sizes[1], values[1]);
+        for (std::size_t i = 0; i < count; ++i)
+            TakeSample(x, y, start + i, Distance(values[0][i], values[1][i]));
+    }
+}
+
+void SampleDifferences::TakeSample(std::uint32_t x, std::uint32_t y, std::size_t sample,
+                                   long double distance) {
+    if (distance == 0) return;
+    BandDifference& band = bands[sample % bands.size()];
+    band.greatest = std::max(band.greatest, distance);
+    if (distance <= static_cast<long double>(tolerance)) return;
+    if (band.samples++ == 0) {
+        band.x = x + static_cast<std::uint32_t>(sample / bands.size());
+        band.y = y;
     }
 }
 

@@ -6,6 +6,7 @@
 #ifndef ZMC_TOOLS_SAMPLEDIFFERENCES_H
 #define ZMC_TOOLS_SAMPLEDIFFERENCES_H
 
+#include <cstddef>
 #include <cstdint>
 #include <vector>
 
@@ -34,6 +35,8 @@ public:
 private:
     void TakeLine(std::uint32_t x, std::uint32_t y, std::size_t samples, const unsigned char* first,
                   const unsigned char* second);
+    // A sample of a line, counted over all its bands.
+    void TakeSample(std::uint32_t x, std::uint32_t y, std::size_t sample, long double distance);
 
     struct Value {
         long double re = 0;

@@ -1,7 +1,10 @@
 #include <algorithm>
 #include <cmath>
 #include <limits>
+#include <set>
 #include <span>
+#include <utility>
+#include <vector>
 
 #include "host/statistics/BandStatistics.h"
 #include "host/statistics/Histogram.h"
@@ -30,31 +33,28 @@ bool Near(double stored, double computed, double error) {
                std::numeric_limits<double>::denorm_min();
 }
 
-// Calls take(row, mask) for every line of level 0, with those bands.
+// Samples and masks that are held at once.
+constexpr std::uint64_t kStripBytes = std::uint64_t{48} << 20;
+
+// Calls take(row, mask, width) for every line of level 0, or the parts of each, with those bands.
 template <class T, class Take>
 void WalkLines(zmchost::Raster& raster, std::span<const std::uint32_t> bands, const char* label,
                bool quiet, Take&& take) {
-    const std::uint64_t lineBytes = std::uint64_t{raster.Width()} * bands.size() * (sizeof(T) + 1);
-    std::uint64_t lines = std::max<std::uint64_t>(
-        BytesAtOnce(std::uint64_t{48} << 20, raster.TileSide()) / lineBytes, 1);
-    if (lines >= raster.TileSide()) lines -= lines % raster.TileSide();
+    const Strips strips{{0, 0, raster.Width(), raster.Height()},
+                        bands.size() * (sizeof(T) + 1),
+                        kStripBytes,
+                        raster.TileSide()};
     TerminalProgress bar(label, !quiet);
     std::vector<T> pixels;
     std::vector<unsigned char> mask;
-    const std::size_t stride = std::size_t{raster.Width()} * bands.size();
-    for (std::uint32_t line = 0; line < raster.Height();) {
-        const auto height =
-            static_cast<std::uint32_t>(std::min<std::uint64_t>(lines, raster.Height() - line));
-        pixels.resize(stride * height);
-        mask.assign(stride * height, 0);
-        raster.Read(0, {0, line, raster.Width(), height}, bands, pixels.data(), mask.data());
-        for (std::uint32_t row = 0; row < height; ++row)
-            take(pixels.data() + row * stride, mask.data() + row * stride);
-        line += height;
-        if (!bar.Show(std::uint64_t{line} * raster.Width(),
-                      std::uint64_t{raster.Height()} * raster.Width()))
-            throw Interruption(raster.Name());
-    }
+    strips.Walk(raster.Name(), bar, [&](const zmchost::Window& strip) {
+        const std::size_t stride = std::size_t{strip.width} * bands.size();
+        pixels.resize(stride * strip.height);
+        mask.assign(stride * strip.height, 0);
+        raster.Read(0, strip, bands, pixels.data(), mask.data());
+        for (std::uint32_t row = 0; row < strip.height; ++row)
+            take(pixels.data() + row * stride, mask.data() + row * stride, strip.width);
+    });
 }
 
 template <class T>
@@ -84,22 +84,26 @@ private:
     // Exact sums of reals take up to 200 kB for each band.
     static constexpr std::size_t kBandsAtOnce = 128;
 
+    template <class Check>
+    static void InGroups(std::span<const std::uint32_t> bands, Check&& check) {
+        for (std::size_t done = 0; done < bands.size(); done += kBandsAtOnce)
+            check(bands.subspan(done, std::min(kBandsAtOnce, bands.size() - done)));
+    }
+
     void CheckRecords() {
         std::vector<std::uint32_t> bands;
         for (std::uint32_t band = 0; band < raster.Bands(); ++band)
             if (raster.HasStatistics(band)) bands.push_back(band);
-        const std::span<const std::uint32_t> all = bands;
-        for (std::size_t done = 0; done < all.size(); done += kBandsAtOnce)
-            CheckRecords(all.subspan(done, std::min(kBandsAtOnce, all.size() - done)));
+        InGroups(bands, [this](std::span<const std::uint32_t> group) { CheckRecords(group); });
     }
 
     void CheckRecords(std::span<const std::uint32_t> bands) {
         const auto count = static_cast<std::uint32_t>(bands.size());
         std::vector<zmchost::BandAccumulator<T>> sums(count);
         WalkLines<T>(raster, bands, "statistics", quiet,
-                     [&](const T* row, const unsigned char* mask) {
+                     [&](const T* row, const unsigned char* mask, std::uint32_t width) {
                          for (std::uint32_t i = 0; i < count; ++i)
-                             sums[i].AddRow(row, mask, i, count, raster.Width());
+                             sums[i].AddRow(row, mask, i, count, width);
                      });
         for (std::uint32_t i = 0; i < count; ++i)
             Compare(raster.Statistics<T>(bands[i]), sums[i].Stats(bands[i]));
@@ -143,34 +147,57 @@ private:
     // whose values a file keeps exactly are counted anew.
     static constexpr bool kExactEnds = std::is_integral_v<T> && sizeof(T) <= 4;
 
+    struct Histogram {
+        const zelm::RasterBandHistogram<T>* stored;
+        zmchost::HistogramAccumulator<T> computed;
+    };
+
     void CheckHistograms(const std::vector<zelm::RasterBandHistogram<T>>& stored) {
         if constexpr (kExactEnds) {
-            std::vector<const zelm::RasterBandHistogram<T>*> records;
-            std::vector<zmchost::HistogramAccumulator<T>> counters;
-            for (const auto& record : stored) {
-                const zmchost::HistogramBins<T> bins(record.minimum, record.maximum,
-                                                     record.binCount);
-                // A number of bins takes memory only where the file has as many counts.
-                const bool usual = record.counts.shape.elements == record.binCount &&
-                                   record.level == 0 && record.band < raster.Bands() &&
-                                   record.minimum <= record.maximum && record.binCount > 0 &&
-                                   Near(bins.Size(), record.binSize, kRealError);
-                if (!usual) continue;
-                records.push_back(&record);
-                counters.emplace_back(bins);
-            }
-            if (records.empty()) return;
-            const auto bands = raster.AllBands();
-            WalkLines<T>(raster, bands, "histograms", quiet,
-                         [&](const T* row, const unsigned char* mask) {
-                             for (std::size_t i = 0; i < records.size(); ++i)
-                                 counters[i].AddRow(row, mask, records[i]->band, raster.Bands(),
-                                                    raster.Width());
-                         });
-            for (std::size_t i = 0; i < records.size(); ++i) Compare(*records[i], counters[i]);
+            std::vector<Histogram> histograms;
+            for (const auto& record : stored)
+                if (IsUsual(record))
+                    histograms.push_back({&record, zmchost::HistogramAccumulator<T>(Bins(record))});
+            const std::vector<std::uint32_t> bands = BandsOf(histograms);
+            InGroups(bands,
+                     [&](std::span<const std::uint32_t> group) { Count(histograms, group); });
+            for (const Histogram& each : histograms) Compare(*each.stored, each.computed);
         } else {
             static_cast<void>(stored);
         }
+    }
+
+    // A number of bins takes memory only where the file has as many counts.
+    bool IsUsual(const zelm::RasterBandHistogram<T>& record) const {
+        return record.counts.shape.elements == record.binCount && record.level == 0 &&
+               record.band < raster.Bands() && record.minimum <= record.maximum &&
+               record.binCount > 0 && Near(Bins(record).Size(), record.binSize, kRealError);
+    }
+
+    static zmchost::HistogramBins<T> Bins(const zelm::RasterBandHistogram<T>& record) {
+        return {record.minimum, record.maximum, record.binCount};
+    }
+
+    static std::vector<std::uint32_t> BandsOf(const std::vector<Histogram>& histograms) {
+        std::set<std::uint32_t> bands;
+        for (const Histogram& each : histograms) bands.insert(each.stored->band);
+        return {bands.begin(), bands.end()};
+    }
+
+    // Counts those of these bands, which are in order.
+    void Count(std::vector<Histogram>& histograms, std::span<const std::uint32_t> bands) {
+        std::vector<std::pair<Histogram*, std::uint32_t>> counted;
+        for (Histogram& each : histograms) {
+            const auto found = std::lower_bound(bands.begin(), bands.end(), each.stored->band);
+            if (found != bands.end() && *found == each.stored->band)
+                counted.emplace_back(&each, static_cast<std::uint32_t>(found - bands.begin()));
+        }
+        const auto count = static_cast<std::uint32_t>(bands.size());
+        WalkLines<T>(raster, bands, "histograms", quiet,
+                     [&](const T* row, const unsigned char* mask, std::uint32_t width) {
+                         for (const auto& [histogram, place] : counted)
+                             histogram->computed.AddRow(row, mask, place, count, width);
+                     });
     }
 
     void Compare(const zelm::RasterBandHistogram<T>& stored,

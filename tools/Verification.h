@@ -2,7 +2,8 @@
 //
 // Every check reads what it needs anew and changes nothing. A problem is a text for people, with
 // the band (from 1), the level (from 0) and the place of the first difference. A file whose
-// contents cannot be read at all throws. Memory stays some 100 MiB whatever the raster's size.
+// contents cannot be read at all throws. Memory stays some 100 MiB whatever the raster's size, and
+// some 350 MiB where a tile, or a pixel, has many bands.
 #ifndef ZMC_TOOLS_VERIFICATION_H
 #define ZMC_TOOLS_VERIFICATION_H
 

@@ -111,11 +111,13 @@ ExitStatus VerifyCommand::Report() const {
 }
 
 ExitStatus VerifyCommand::Run() {
-    const zmchost::PyramidFileInfo info = ReadLayout(file);
+    zmchost::PyramidFileInfo info = ReadLayout(file);
     if (zelm::CheckedPixelType(info.header.pixelType) == 0)
         throw Failure(file, std::string("no pixels of type ") +
                                 zelm::PixelTypeName(info.header.pixelType) + " can be read");
     zmchost::Raster raster = OpenPyramid(file);
+    // Of the file that is open now, should another have taken the name.
+    info = zmchost::DescribePyramidFile(raster.Header());
     results.push_back(CheckStructure(info, raster));
     results.push_back(CheckCompleteness(info));
     results.push_back(CheckDocuments(info, raster));
@@ -126,7 +128,7 @@ ExitStatus VerifyCommand::Run() {
         for (const char* const check : {"statistics", "levels"})
             results.push_back({check, "the file is not complete", {}});
     if (const std::string change = raster.ContentChange(); !change.empty())
-        throw Failure(file, "it changed while it was read: " + change);
+        FailAsChanged(file, change);
     return Report();
 }
 

@@ -62,12 +62,10 @@ Program::Program() {
                          "Print the versions of this program, of the file "
                          "format and of the libraries");
     app.set_help_flag("--help,-h", "Print this help");
-    OptionTable(app)
-        .Texts("--limit", limits,
-               "What a file may claim: bands=65536, tile=16M, elements=131072, header=4M, "
-               "document=256M are the usual "
-               "limits, and one that names another changes it; stands before COMMAND")
-        .Named("NAME=N");
+    const std::string claims = "What a file may claim: " + zmchost::Limits().Text() +
+                               " are the usual limits, and one that names another changes it; "
+                               "stands before COMMAND";
+    OptionTable(app).Texts("--limit", limits, claims.c_str()).Named("NAME=N");
     app.require_subcommand(1);
     Add(MakeBuildCommand());
     Add(MakeInfoCommand());

@@ -1,5 +1,5 @@
-// What targets share that meet a whole file beside the module: the file and the script behind it
-// (PyramidFileFuzz.cpp tells how they lie), and whether a run has the memory for what it claims.
+// What targets share that meet a whole file beside the module: the file as a source, its header,
+// and whether a run has the memory for what it claims.
 #ifndef ZMC_FUZZ_SUPPORT_HOSTILEFILE_H
 #define ZMC_FUZZ_SUPPORT_HOSTILEFILE_H
 
@@ -13,38 +13,12 @@
 
 #include "files/MemorySource.h"
 #include "format/PyramidLimits.h"
-#include "fuzz/support/InputBytes.h"
+#include "fuzz/support/FileAndScript.h"
 #include "host/base/Error.h"
 #include "host/file/PyramidFileInfo.h"
 #include "host/raster/Module.h"
 
 namespace zmcfuzz {
-
-struct FileAndScript {
-    std::string file;
-    InputBytes script;
-
-    static FileAndScript Take(const std::uint8_t* data, std::size_t size) {
-        const std::size_t scriptSize =
-            size == 0 ? 0 : std::min<std::size_t>(data[size - 1], size - 1);
-        const std::size_t fileSize = size == 0 ? 0 : size - 1 - scriptSize;
-        return {std::string(reinterpret_cast<const char*>(data), fileSize),
-                InputBytes(data + fileSize, scriptSize)};
-    }
-
-    // Takes a second file off the end of the first: its length is in the last two bytes.
-    std::string TakeSecond() {
-        if (file.size() < 2) return {};
-        const auto byte = [&](std::size_t back) {
-            return static_cast<unsigned char>(file[file.size() - back]);
-        };
-        const std::size_t told = byte(2) + std::size_t{byte(1)} * 256;
-        file.resize(file.size() - 2);
-        std::string second = file.substr(file.size() - std::min(told, file.size()));
-        file.resize(file.size() - second.size());
-        return second;
-    }
-};
 
 // It grows no further than a run has memory for, as a disk that is full.
 inline std::shared_ptr<zelm::files::MemorySource> SourceOf(const std::string& bytes) {

@@ -102,7 +102,7 @@ struct Records {
         if (!readable) return;
         stats = handlers.bandStats;
         histograms = handlers.histograms;
-        handlers.palettes.swap(palettes);
+        for (const auto& [band, colors] : handlers.palettes) colors.CopyTo(palettes[band]);
     }
     bool HasStats(std::uint32_t band) const {
         for (std::uint32_t i = 0; i < stats.shape.elements; ++i)

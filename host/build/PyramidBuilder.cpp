@@ -8,6 +8,7 @@
 #include <optional>
 
 #include "core/PixelVocabulary.h"
+#include "format/DocumentLimits.h"
 #include "host/base/Lanes.h"
 #include "host/base/Threads.h"
 #include "host/build/BuildFile.h"
@@ -43,6 +44,7 @@ private:
     };
 
     void SettleBands();
+    void CountColors();
     void SettleNoData();
     void SettleLevels();
     void SettleOrdering();
@@ -74,7 +76,7 @@ private:
 
     zelm::RasterProps props;  // of the target
     std::vector<std::uint32_t> bands;
-    std::vector<zelm::PalettePtr> palettes;
+    std::vector<std::uint32_t> colors;  // of the palette of each band
     std::uint32_t maxLevel = 0;
     Resampling resampling = Resampling::Average;
     std::uint32_t pixelBytes = 0;
@@ -108,6 +110,7 @@ BuildRun::BuildRun(ModulePtr loadedModule, RasterSource& rasterSource, std::stri
     if (zelm::CheckedPixelType(given.pixelType) == 0)
         throw Error(source.Name(), "build a pyramid of it", "its pixel type has no reader");
     SettleBands();
+    CountColors();
     SettleNoData();
     SettleOrdering();
     SettleLevels();
@@ -126,11 +129,25 @@ void BuildRun::SettleBands() {
                         "take band " + std::to_string(bands[i]) + ", counted from 0,",
                         "it has " + std::to_string(props.bands));
         if (props.HasNoDataValue(bands[i])) noData[i] = props.GetNoDataValue(bands[i]);
-        palettes.push_back(source.BandPalette(bands[i]));
     }
     props.bands = static_cast<std::uint32_t>(bands.size());
     props.noDataValues = noData;
     props.interleave = zelm::Interleave::BIP;
+}
+
+// Palettes are asked for again when they are stored: those of all bands together may take much more
+// memory than the file that they come from.
+void BuildRun::CountColors() {
+    std::uint64_t all = 0;
+    for (const std::uint32_t band : bands) {
+        const zelm::PalettePtr palette = source.BandPalette(band);
+        colors.push_back(palette ? palette->nextIndex : 0);
+        all += colors.back();
+        if (all > zelm::kMaxDocumentNodes)
+            throw Error(source.Name(), "take its palettes",
+                        "they have more colours than a pyramid file may, " +
+                            std::to_string(zelm::kMaxDocumentNodes));
+    }
 }
 
 void BuildRun::SettleNoData() {
@@ -161,9 +178,8 @@ void BuildRun::SettleLevels() {
 }
 
 void BuildRun::SettleResampling() {
-    const bool anyPalette = std::any_of(palettes.begin(), palettes.end(), [](const auto& palette) {
-        return palette && palette->nextIndex != 0;
-    });
+    const bool anyPalette =
+        std::any_of(colors.begin(), colors.end(), [](auto n) { return n != 0; });
     resampling = options.resampling.value_or(anyPalette ? Resampling::Mode : Resampling::Average);
     // A palette of complex values makes no sense, but is no reason to fail by default.
     if (!options.resampling && !SupportsElementType(resampling, props.pixelType))
@@ -222,8 +238,7 @@ BuildReport BuildRun::Run() {
 std::uint64_t BuildRun::MetadataBound() const {
     std::uint64_t bound = 65536;
     bound += props.bands * (4096 + 21 * std::uint64_t{std::max(options.bins, 256u)});
-    for (const zelm::PalettePtr& palette : palettes)
-        if (palette) bound += 64 * std::uint64_t{palette->nextIndex};
+    for (const std::uint32_t count : colors) bound += 64 * std::uint64_t{count};
     return bound;
 }
 
@@ -374,9 +389,10 @@ void BuildRun::CountLevel0() {
 
 void BuildRun::StoreRecords() {
     work->StoreStatistics();
-    for (std::uint32_t band = 0; band < palettes.size(); ++band)
-        if (palettes[band] && palettes[band]->nextIndex != 0)
-            raster->SetBandPalette(band, *palettes[band]);
+    for (std::uint32_t i = 0; i < bands.size(); ++i)
+        if (colors[i] != 0)
+            if (const zelm::PalettePtr palette = source.BandPalette(bands[i]))
+                raster->SetBandPalette(i, *palette);
 }
 
 // Looks at the file as the next user will: from the disk, through a new connection.

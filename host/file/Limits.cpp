@@ -1,12 +1,14 @@
 #include "host/file/Limits.h"
 
-#include <charconv>
+#include <algorithm>
+#include <iterator>
 #include <mutex>
 #include <optional>
 #include <string_view>
 
 #include "format/DocumentLimits.h"
 #include "host/base/Error.h"
+#include "host/base/ScaledNumber.h"
 #include "platform/Program.h"
 
 namespace zmchost {
@@ -34,28 +36,10 @@ std::optional<Limits> current;  // once somebody has asked
                 "it is no list such as bands=100000,tile=1G,document=64M");
 }
 
-std::optional<std::uint64_t> ParseNumber(std::string_view text) {
-    constexpr std::string_view kUnits = "KMG";
-    unsigned shift = 0;
-    if (!text.empty()) {
-        const std::size_t unit = kUnits.find(text.back());
-        if (unit != kUnits.npos) {
-            shift = 10 * (static_cast<unsigned>(unit) + 1);
-            text.remove_suffix(1);
-        }
-    }
-    std::uint64_t value = 0;
-    const auto parsed = std::from_chars(text.data(), text.data() + text.size(), value);
-    if (parsed.ec != std::errc() || parsed.ptr != text.data() + text.size() ||
-        value > (UINT64_MAX >> shift))
-        return std::nullopt;
-    return value << shift;
-}
-
 void Take(Limits& limits, std::string_view entry, const std::string& text) {
     const std::size_t equals = entry.find('=');
     if (equals == entry.npos) Refuse(text);
-    const auto value = ParseNumber(entry.substr(equals + 1));
+    const auto value = ParseScaled(entry.substr(equals + 1), "KMG");
     for (const Entry& known : kKnown)
         if (value && known.name == entry.substr(0, equals)) {
             limits.*known.value = *value;
@@ -92,11 +76,27 @@ void Limits::Change(const std::string& text) {
     current = Changed(Ours(), text);
 }
 
-std::string Limits::Judge(const char* name, std::uint64_t claimed, std::uint64_t limit,
-                          const std::string& what) {
+std::string Limits::Text() const {
+    constexpr std::uint64_t kMega = std::uint64_t{1} << 20;
+    std::string text;
+    for (const Entry& known : kKnown) {
+        const std::uint64_t value = this->*known.value;
+        const bool isLarge = value >= kMega && value % kMega == 0;
+        if (!text.empty()) text += ", ";
+        text.append(known.name).append("=");
+        text += isLarge ? std::to_string(value / kMega) + 'M' : std::to_string(value);
+    }
+    return text;
+}
+
+std::string Limits::Judge(std::uint64_t Limits::*which, std::uint64_t claimed,
+                          const std::string& what) const {
+    const std::uint64_t limit = this->*which;
     if (claimed <= limit) return "";
-    return what + ", beyond the limit of " + std::to_string(limit) + "; " + kVariable + "=" + name +
-           "=" + std::to_string(claimed) + " raises it";
+    const auto* const known = std::find_if(std::begin(kKnown), std::end(kKnown),
+                                           [&](const Entry& each) { return each.value == which; });
+    return what + ", beyond the limit of " + std::to_string(limit) + "; " + kVariable + "=" +
+           std::string(known->name) + "=" + std::to_string(claimed) + " raises it";
 }
 
 }  // namespace zmchost

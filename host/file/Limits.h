@@ -36,10 +36,14 @@ struct Limits {
     // bytes, or with K, M or G. Throws Error, and changes nothing, if it is not understood.
     static void Change(const std::string& text);
 
-    // What there is to say where a file claims more than a limit, and how to raise it; empty where
-    // it does not. `what` is what the file has: "it has 70000 bands".
-    static std::string Judge(const char* name, std::uint64_t claimed, std::uint64_t limit,
-                             const std::string& what);
+    // Each with its name, as Change reads them but for the blanks: "bands=65536, tile=16M".
+    std::string Text() const;
+
+    // What there is to say where a file claims more than that one of these limits (&Limits::bands),
+    // and how to raise it; empty where it does not. `what` is what the file has: "it has 70000
+    // bands".
+    std::string Judge(std::uint64_t Limits::*which, std::uint64_t claimed,
+                      const std::string& what) const;
 };
 
 }  // namespace zmchost

@@ -20,7 +20,7 @@ using zelm::files::ByteSource;
 using zelm::files::FileSource;
 using zelm::files::OpenMode;
 
-constexpr char kSubject[] = "the metadata document ";
+const std::string kSubject = "the metadata document";
 constexpr std::uint64_t kPiece = std::uint64_t{1} << 20;
 
 class RootReader : public zelm::FaultReader {
@@ -53,10 +53,18 @@ std::uint64_t DocumentSize(ByteSource& source, const std::string& name,
     return size > header.tileDataEnd ? size - header.tileDataEnd : 0;
 }
 
+std::string JudgeSize(const std::string& subject, std::uint64_t bytes) {
+    if (bytes > zelm::kMaxDocumentBytes)
+        return subject + " is longer than " + std::to_string(zelm::kMaxDocumentBytes >> 20) +
+               " MiB";
+    return Limits::Current().Judge(&Limits::document, bytes,
+                                   subject + " has " + std::to_string(bytes) + " bytes");
+}
+
 }  // namespace
 
 std::string JudgeMetadataBytes(std::string_view text) {
-    const std::string subject = kSubject;
+    const std::string subject = kSubject + " ";
     if (text.find_first_not_of(" \t\r\n") == text.npos) return subject + "is empty";
     if (static_cast<unsigned char>(text.front()) == zelm::kUnfinishedDocument)
         return subject + "is damaged: a store did not end";
@@ -66,17 +74,11 @@ std::string JudgeMetadataBytes(std::string_view text) {
 }
 
 std::string JudgeMetadataParse(const std::string& fault, bool hasOurRoot) {
-    if (!fault.empty()) return kSubject + ("is malformed: " + fault);
-    return hasOurRoot ? "" : std::string(kSubject) + "has no root DATASET";
+    if (!fault.empty()) return kSubject + " is malformed: " + fault;
+    return hasOurRoot ? "" : kSubject + " has no root DATASET";
 }
 
-std::string JudgeMetadataSize(std::uint64_t bytes) {
-    if (bytes > zelm::kMaxDocumentBytes)
-        return kSubject +
-               ("is longer than " + std::to_string(zelm::kMaxDocumentBytes >> 20) + " MiB");
-    return Limits::Judge("document", bytes, Limits::Current().document,
-                         kSubject + ("has " + std::to_string(bytes) + " bytes"));
-}
+std::string JudgeMetadataSize(std::uint64_t bytes) { return JudgeSize(kSubject, bytes); }
 
 std::string JudgeMetadataText(std::string text) {
     if (std::string wrong = JudgeMetadataBytes(text); !wrong.empty()) return wrong;
@@ -89,8 +91,7 @@ std::string JudgeMetadataText(std::string text) {
 std::string ReadMetadataText(ByteSource& source, const std::string& name,
                              const PyramidHeader& header) {
     const std::uint64_t size = DocumentSize(source, name, header);
-    if (const std::string wrong = JudgeMetadataSize(size); !wrong.empty())
-        Fail(name, "it" + wrong.substr(sizeof kSubject - 2));
+    if (const std::string wrong = JudgeSize("it", size); !wrong.empty()) Fail(name, wrong);
     std::string text;
     // What has a NUL is no document, and the rest of it, which may be a hole, is not read.
     for (bool hasNul = false; !hasNul && text.size() < size;) {

@@ -27,9 +27,9 @@ constexpr std::uint64_t kUsualStart = 1024;  // holds the header of every file t
     throw Error(name, "read the header", reason);
 }
 
-void Demand(const std::string& name, const char* limit, std::uint64_t claimed, std::uint64_t most,
+void Demand(const std::string& name, std::uint64_t Limits::*limit, std::uint64_t claimed,
             const std::string& what) {
-    if (const std::string wrong = Limits::Judge(limit, claimed, most, what); !wrong.empty())
+    if (const std::string wrong = Limits::Current().Judge(limit, claimed, what); !wrong.empty())
         Refuse(name, wrong);
 }
 
@@ -41,7 +41,7 @@ std::uint64_t TileDataStart(const std::string& name, std::string_view start,
     if (fault == zelm::FrontFault::NoPyramid) Refuse(name, "it is no pyramid file");
     if (fault == zelm::FrontFault::NoHeader || front.HeaderBytes() > zelm::kMaxDocumentBytes)
         Refuse(name, "its header is damaged or was never finished");
-    Demand(name, "header", front.HeaderBytes(), Limits::Current().header,
+    Demand(name, &Limits::header, front.HeaderBytes(),
            "its header has " + std::to_string(front.HeaderBytes()) + " bytes");
     return front.tileDataStart;
 }
@@ -64,7 +64,7 @@ void Check(const std::string& name, const PyramidHeader& header) {
                          std::to_string(header.levelMax));
     if (zelm::CheckedPixelType(header.pixelType) == 0) Refuse(name, "its pixel type is not known");
     if (!Allow(header)) Refuse(name, "its sizes are too large");
-    Demand(name, "bands", header.bandCount, Limits::Current().bands,
+    Demand(name, &Limits::bands, header.bandCount,
            "it has " + std::to_string(header.bandCount) + " bands");
 }
 

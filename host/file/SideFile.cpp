@@ -1,6 +1,7 @@
 #include "host/file/SideFile.h"
 
 #include <algorithm>
+#include <cerrno>
 #include <string_view>
 
 #include "host/base/Checksum.h"
@@ -58,9 +59,12 @@ std::string SideFile::MakeTemporary(const std::string& file, const std::string& 
         std::string path = TemporaryPath(file, kind);
         if (!platform::CreateNewFile(path)) return "";
         const Result taken = lock.Take(path);
-        if (taken == Result::Taken || taken == Result::Failed) return path;
-        // Somebody who clears up met it before it was locked.
+        if (taken == Result::Taken || taken == Result::NoLocks) return path;
+        // Else somebody who clears up met it before it was locked.
+        const int error = errno;
         platform::RemoveEntry(path);
+        errno = error;
+        if (taken == Result::Failed) return "";
     }
     return "";
 }

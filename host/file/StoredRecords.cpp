@@ -19,8 +19,7 @@ class JudgingReader : public zelm::PyramidXMLReaderHandlers<T> {
 public:
     std::string fault;
     bool hasOurRoot = false;
-    std::uint64_t elements = 0;                                 // up to the fault, if there is one
-    std::unordered_map<std::uint32_t, zelm::ColorList> colors;  // of finished palettes, by band
+    std::uint64_t elements = 0;  // up to the fault, if there is one
 
     void warning(const xercesc::SAXParseException&) override {}
     void error(const xercesc::SAXParseException& exception) override {
@@ -35,13 +34,6 @@ protected:
             hasOurRoot = state == zelm::StateOf(zelm::ElementName::DATASET);
         zelm::PyramidXMLReaderHandlers<T>::Enter(state);
     }
-    void BeginPalette() override { current.Clear(); }
-    void AddColor(zelm::ColorList::Rgba rgba) override { current.Add(rgba); }
-    void LookUpColor(std::uint32_t index) override { current.LookUp(index); }
-    void KeepPalette() override { colors[this->paletteBand] = current; }
-
-private:
-    zelm::ColorList current;  // the palette in hand
 };
 
 // Whether the text behind `offset` is beyond what is read.
@@ -96,7 +88,6 @@ void StoredRecords<T>::Parse(zelm::DocumentText text) {
     elements = reader->elements;
     if (fault.empty()) fault = JudgeMetadataParse(wrong, reader->hasOurRoot);
     if (!wrong.empty()) return;
-    colors = std::move(reader->colors);
     kept = std::move(reader);
     MapPlaces();
 }
@@ -142,8 +133,10 @@ const zelm::RasterBandStats<T>* StoredRecords<T>::NewestStatistics(std::uint32_t
 
 template <class T>
 const zelm::ColorList* StoredRecords<T>::BandPalette(std::uint32_t band) const {
-    const auto found = colors.find(band);
-    return found != colors.end() && !found->second.Colors().empty() ? &found->second : nullptr;
+    if (!kept) return nullptr;
+    const auto found = kept->palettes.find(band);
+    return found != kept->palettes.end() && !found->second.Colors().empty() ? &found->second
+                                                                            : nullptr;
 }
 
 #define ZMC_X(type, word, code) template class StoredRecords<type>;

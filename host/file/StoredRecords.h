@@ -78,9 +78,8 @@ private:
     void MapPlaces();
     const zelm::RasterBandStats<T>* At(const Places& places, std::uint32_t band) const;
 
-    std::unique_ptr<zelm::PyramidXMLReaderHandlers<T>> kept;    // null if nothing is
-    Places first, newest;                                       // in Statistics(), by band
-    std::unordered_map<std::uint32_t, zelm::ColorList> colors;  // of palettes, by band
+    std::unique_ptr<zelm::PyramidXMLReaderHandlers<T>> kept;  // null if nothing is
+    Places first, newest;                                     // in Statistics(), by band
     std::string fault;
     std::uint64_t elements = 0;
     bool settled = false;

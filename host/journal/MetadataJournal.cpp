@@ -1,8 +1,10 @@
 #include "host/journal/MetadataJournal.h"
 
 #include <algorithm>
+#include <chrono>
 #include <memory>
 #include <string_view>
+#include <thread>
 
 #include "files/FileSource.h"
 #include "format/DocumentLimits.h"
@@ -188,17 +190,33 @@ std::string Subject(const std::string& copy) {
     return "the copy of its metadata document, " + copy + ", ";
 }
 
+// Who stores keeps the lock of a copy, and who looks has it for a moment. Does not wait for those
+// who store.
+FileLock::Result TakeCopy(FileLock& lock, const std::string& copy, FileLock::Kind kind) {
+    constexpr int kTries = 100;
+    constexpr std::chrono::milliseconds kMoment(10);
+    FileLock::Result taken = lock.Take(copy, kind);
+    for (int i = 0; taken == FileLock::Result::Held && i < kTries; ++i) {
+        if (lock.Take(copy, FileLock::Kind::Shared) == FileLock::Result::Held) break;
+        lock.Release();
+        std::this_thread::sleep_for(kMoment);
+        taken = lock.Take(copy, kind);
+    }
+    return taken;
+}
+
 // Takes the lock of a file's copy, and lets `settle(target, copy, record)` answer for one that is
 // of use.
 template <class Settle>
 Recovery WithCopy(const std::string& file, FileLock::Kind kind, Settle&& settle) {
     const std::string copy = MetadataJournal::PathFor(file);
     FileLock lock;
-    switch (lock.Take(copy, kind)) {
+    switch (TakeCopy(lock, copy, kind)) {
         case FileLock::Result::Missing:
             return {};
         case FileLock::Result::Held:
             return {Outcome::UnderWay, ""};
+        case FileLock::Result::NoLocks:
         case FileLock::Result::Failed:
             return {Outcome::Failed,
                     Subject(copy) + "cannot be opened: " + platform::LastErrorText()};
@@ -255,9 +273,10 @@ void DiscardMetadata(const std::string& file) {
     const std::string name = platform::ResolveLinks(file);
     const std::string copy = MetadataJournal::PathFor(file);
     FileLock lock;
-    const FileLock::Result taken = lock.Take(copy);
+    const FileLock::Result taken = TakeCopy(lock, copy, FileLock::Kind::Alone);
     if (taken == FileLock::Result::Held) refuse("another process is storing into the file");
-    if (taken == FileLock::Result::Failed) refuse(platform::LastErrorText());
+    if (taken == FileLock::Result::NoLocks || taken == FileLock::Result::Failed)
+        refuse(platform::LastErrorText());
     const bool hasCopy = taken == FileLock::Result::Taken;
     const Target target(name, OpenMode::Read);
     if (hasCopy && ReadCopy(lock, target).unused.empty())

@@ -360,14 +360,18 @@ void Raster::ReadTiles(std::uint32_t level, const Window& window,
     });
 }
 
+void Raster::CheckComplete(const std::string& operation) {
+    if (!IsComplete())
+        throw Error(name, operation,
+                    "the file is incomplete, " + std::to_string(Header().BytesMissing()) +
+                        " bytes are missing");
+}
+
 void Raster::Read(std::uint32_t level, const Window& window, std::span<const std::uint32_t> bands,
                   void* pixels, unsigned char* mask) {
     CheckWindow("read", level, window, bands);
     if (window.width == 0 || window.height == 0 || bands.empty()) return;
-    if (!IsComplete())
-        throw Error(name, "read " + Describe(window),
-                    "the file is incomplete, " + std::to_string(Header().BytesMissing()) +
-                        " bytes are missing");
+    CheckComplete("read " + Describe(window));
     if (!header) {
         bool read = false;
         const zelm::Array<int> list = BandList(bands);

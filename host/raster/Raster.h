@@ -95,6 +95,8 @@ public:
 
     // Whether all levels are in the file, looked at anew. A memory raster is always complete.
     bool IsComplete();
+    // Throws Error where it is not: the raster cannot be used for `operation`.
+    void CheckComplete(const std::string& operation);
     // Whether the file could be opened for writing. A memory raster always is.
     bool IsWritable() const;
     // What others have done to the file since it was opened, or last written to by this object, for

@@ -27,6 +27,12 @@ int LockNow(int descriptor, FileLock::Kind kind) {
     return Uninterrupted([&] { return ::flock(descriptor, wanted | LOCK_NB); });
 }
 
+FileLock::Result ResultOf(int error) {
+    if (error == EWOULDBLOCK) return FileLock::Result::Held;
+    const bool unknown = error == ENOLCK || error == EOPNOTSUPP || error == ENOTSUP;
+    return unknown ? FileLock::Result::NoLocks : FileLock::Result::Failed;
+}
+
 // For writing where that is allowed, since some file systems lock nothing else for one alone.
 int OpenToLock(const char* path, FileLock::Kind kind) {
     constexpr int kFlags = O_NONBLOCK | O_NOCTTY | O_NOFOLLOW;
@@ -48,7 +54,7 @@ FileLock::Result FileLock::Take(const std::string& path, Kind kind) {
         errno = status.isFolder ? EISDIR : EINVAL;
         result = Result::Failed;
     } else if (LockNow(descriptor, kind) != 0) {
-        result = errno == EWOULDBLOCK ? Result::Held : Result::Failed;
+        result = ResultOf(errno);
     } else if (!StillBears(descriptor, path)) {
         result = Result::Missing;
     }

@@ -2,6 +2,8 @@
 
 #include <gtest/gtest.h>
 
+#include <vector>
+
 namespace zelm {
 namespace {
 
@@ -43,6 +45,31 @@ TEST(ColorList, MakesThePaletteThatTheSameStepsMake) {
         EXPECT_EQ(other.alpha, color->alpha);
         EXPECT_EQ(other.isNull, color->isNull);
     }
+}
+
+TEST(ColorList, CopiesShareWhatTheyHoldAndGoTheirOwnWay) {
+    ColorList list;
+    list.Add(1);
+    list.LookUp(9);
+    const ColorList early = list;
+    EXPECT_EQ(early.Colors().data(), list.Colors().data());
+    ColorList other = list;
+    list.Add(2);
+    list.LookUp(7);
+    EXPECT_EQ(early.Colors().data(), list.Colors().data());
+    other.Add(3);
+    other.LookUp(5);
+    const auto show = [](const ColorList& each) {
+        Palette made;
+        each.CopyTo(made);
+        std::vector<std::uint32_t> entries(each.Colors().begin(), each.Colors().end());
+        for (const auto& [index, color] : made.colors)
+            if (color->isNull) entries.push_back(index);
+        return entries;
+    };
+    EXPECT_EQ(show(early), (std::vector<std::uint32_t>{1, 9}));
+    EXPECT_EQ(show(list), (std::vector<std::uint32_t>{1, 2, 7, 9}));
+    EXPECT_EQ(show(other), (std::vector<std::uint32_t>{1, 3, 5, 9}));
 }
 
 TEST(ColorList, ClearLeavesNothing) {

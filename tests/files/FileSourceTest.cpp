@@ -86,6 +86,8 @@ TEST_F(FileSourceTest, StaysTheFileThatWasOpenedWhenAnotherTakesItsName) {
     EXPECT_EQ(TextOf(*source), "first");
     EXPECT_FALSE(source->NameStillMeansThis());
     EXPECT_TRUE(source->IdentifyName().known);
+    EXPECT_TRUE(FileSource::IdentifyName(String(source->Name())) == source->IdentifyName());
+    EXPECT_FALSE(FileSource::IdentifyName(String("")).known);
     EXPECT_TRUE(source->Identify().SameContent(before)) << "the open one is as it was";
     EXPECT_EQ(TextOf(*Open()), "second and longer");
 }

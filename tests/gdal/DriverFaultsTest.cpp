@@ -6,39 +6,26 @@
 #include <algorithm>
 #include <cerrno>
 #include <csignal>
-#include <cstdlib>
 #include <filesystem>
 #include <functional>
 #include <optional>
 #include <vector>
 
-#include "gdal/Driver.h"
+#include "tests/gdal/GdalTest.h"
 #include "tests/support/FileFaults.h"
-#include "tests/support/ScratchDirectory.h"
 
 namespace zmcgdal {
 namespace {
 
-using DatasetPtr = std::unique_ptr<GDALDataset>;
 using Samples = std::vector<unsigned char>;
+using zmctest::DatasetPtr;
 using zmctest::FileFaultAction;
 using zmctest::FileFaults;
 
 constexpr int kSide = 200;
 
-class DriverFaults : public testing::Test {
+class DriverFaults : public zmctest::GdalTest {
 protected:
-    static void SetUpTestSuite() {
-        setenv("ZMCRASTER_MODULE", ZMC_MODULE_PATH, 1);
-        GDALRegister_ZMCPyramid();
-        GDALAllRegister();
-    }
-    void SetUp() override { CPLPushErrorHandler(CPLQuietErrorHandler); }
-    void TearDown() override { CPLPopErrorHandler(); }
-
-    static GDALDriver& Driver(const char* driver) {
-        return *GetGDALDriverManager()->GetDriverByName(driver);
-    }
     // Its bands hold their numbers.
     static DatasetPtr Memory(int bands, int side) {
         DatasetPtr dataset(Driver("MEM").Create("", side, side, bands, GDT_Byte, nullptr));
@@ -53,9 +40,7 @@ protected:
             Driver("ZMCPyramid")
                 .CreateCopy(name.c_str(), source.get(), FALSE, nullptr, nullptr, nullptr)));
     }
-    DatasetPtr Open(unsigned flags = 0) const {
-        return DatasetPtr(GDALDataset::Open(name.c_str(), GDAL_OF_RASTER | flags));
-    }
+    DatasetPtr Open(unsigned flags = 0) const { return GdalTest::Open(name, flags); }
     // As large a part of a band as is read below.
     static CPLErr Fill(GDALDataset& dataset, int band, int value, int x = 0, int y = 0) {
         Samples samples(std::size_t{kSide} * kSide, static_cast<unsigned char>(value));
@@ -74,7 +59,6 @@ protected:
                            [value](unsigned char each) { return each == value; });
     }
 
-    zmctest::ScratchDirectory folder;
     const std::string name = folder / "a.pyr";
 };
 

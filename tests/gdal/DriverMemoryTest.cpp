@@ -3,28 +3,25 @@
 #include <gdal_priv.h>
 #include <gtest/gtest.h>
 
-#include <cstdlib>
 #include <vector>
 
 #include "gdal/Band.h"
-#include "gdal/Driver.h"
+#include "tests/gdal/GdalTest.h"
 #include "tests/support/AllocationFaults.h"
 #include "tests/support/ScratchDirectory.h"
 
 namespace zmcgdal {
 namespace {
 
-using DatasetPtr = std::unique_ptr<GDALDataset>;
 using zmctest::AllocationFaults;
+using zmctest::DatasetPtr;
 
 constexpr int kSide = 300;
 
-class DriverMemory : public testing::Test {
+class DriverMemory : public zmctest::GdalTest {
 protected:
     static void SetUpTestSuite() {
-        setenv("ZMCRASTER_MODULE", ZMC_MODULE_PATH, 1);
-        GDALRegister_ZMCPyramid();
-        GDALAllRegister();
+        GdalTest::SetUpTestSuite();
         // What a process makes once, GDAL's own included, is not what is looked at.
         zmctest::ScratchDirectory folder;
         Make(folder / "warm.pyr", GDT_Byte);
@@ -32,12 +29,7 @@ protected:
         ASSERT_TRUE(dataset);
         for (const Call& call : Calls()) call.make(*dataset);
     }
-    void SetUp() override { CPLPushErrorHandler(CPLQuietErrorHandler); }
-    void TearDown() override { CPLPopErrorHandler(); }
 
-    static GDALDriver& Driver(const char* driver) {
-        return *GetGDALDriverManager()->GetDriverByName(driver);
-    }
     static DatasetPtr Memory(GDALDataType type) {
         DatasetPtr dataset(Driver("MEM").Create("", kSide, kSide, 2, type, nullptr));
         for (int band = 1; band <= 2; ++band) dataset->GetRasterBand(band)->Fill(band);
@@ -67,7 +59,6 @@ protected:
     };
     static const std::vector<Call>& Calls();
 
-    zmctest::ScratchDirectory folder;
     const std::string name = folder / "a.pyr";
 };
 

@@ -9,7 +9,6 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include <cstdlib>
 #include <cstring>
 #include <filesystem>
 #include <fstream>
@@ -26,6 +25,7 @@
 #include "host/file/Limits.h"
 #include "host/file/PyramidHeader.h"
 #include "host/journal/MetadataJournal.h"
+#include "tests/gdal/GdalTest.h"
 #include "tests/support/LenientHeaders.h"
 #include "tests/support/ParseCounter.h"
 #include "tests/support/ScratchDirectory.h"
@@ -34,33 +34,11 @@ namespace zmcgdal {
 namespace {
 
 namespace fs = std::filesystem;
-using DatasetPtr = std::unique_ptr<GDALDataset>;
+using zmctest::DatasetPtr;
 
-class DriverTest : public testing::Test {
+class DriverTest : public zmctest::GdalTest {
 protected:
-    fs::path folder;
-
-    static void SetUpTestSuite() {
-        setenv("ZMCRASTER_MODULE", ZMC_MODULE_PATH, 1);
-        GDALRegister_ZMCPyramid();
-        GDALAllRegister();
-    }
-    void SetUp() override {
-        folder =
-            fs::path(testing::TempDir()) / ("zmcgdal" + std::to_string(std::random_device()()));
-        fs::create_directories(folder);
-    }
-    void TearDown() override { fs::remove_all(folder); }
-
-    std::string Path(const char* name) const { return folder / name; }
-
-    static GDALDriver& Driver(const char* name = "ZMCPyramid") {
-        return *GetGDALDriverManager()->GetDriverByName(name);
-    }
-
-    static DatasetPtr Open(const std::string& name, unsigned flags = GDAL_OF_RASTER) {
-        return DatasetPtr(GDALDataset::Open(name.c_str(), flags));
-    }
+    std::string Path(const char* file) const { return folder / file; }
 
     // Random bytes in memory; floating types get what the bytes happen to mean.
     static DatasetPtr Memory(int width, int height, int bands, GDALDataType type) {
@@ -318,7 +296,7 @@ TEST_F(DriverTest, CancelledCopiesLeaveNothing) {
         const DatasetPtr made(Driver().CreateCopy(Path("gone.pyr").c_str(), source.get(), TRUE,
                                                   nullptr, progress, &limit));
         EXPECT_FALSE(made);
-        EXPECT_TRUE(fs::is_empty(folder));
+        EXPECT_TRUE(fs::is_empty(folder.String()));
     }
     CPLPopErrorHandler();
 }
@@ -392,9 +370,10 @@ TEST_F(DriverTest, StagedSidecarOfThisFileIsSeenAndGetsItsNameForUpdate) {
     EXPECT_FALSE(fs::exists(usual));
 }
 
-std::set<std::string> NamesIn(const fs::path& folder) {
+std::set<std::string> NamesIn(const zmctest::ScratchDirectory& folder) {
     std::set<std::string> names;
-    for (const auto& entry : fs::directory_iterator(folder)) names.insert(entry.path().filename());
+    for (const auto& entry : fs::directory_iterator(folder.String()))
+        names.insert(entry.path().filename());
     return names;
 }
 
@@ -485,6 +464,21 @@ TEST_F(DriverTest, WhatIsOpenKeepsToTheLimitsThatItWasOpenedBy) {
         EXPECT_EQ(Updates(*under), 0);
     }
     EXPECT_EQ(Updates(*before), 2);
+}
+
+// Else the whole of its tile would be read before it is refused.
+TEST_F(DriverTest, PixelOfATileBeyondTheLimitIsRefusedAtOnce) {
+    const std::string name = MakeCopy(*Memory(256, 256, 2, GDT_Byte));
+    const LimitsChanged lowered("tile=1000");
+    const DatasetPtr dataset = Open(name, GDAL_OF_RASTER | GDAL_OF_UPDATE);
+    unsigned char pixel[2] = {1, 2};
+    EXPECT_EQ(dataset->GetRasterBand(1)->RasterIO(GF_Write, 0, 0, 1, 1, pixel, 1, 1, GDT_Byte, 0, 0,
+                                                  nullptr),
+              CE_Failure);
+    EXPECT_EQ(dataset->RasterIO(GF_Write, 0, 0, 1, 1, pixel, 1, 1, GDT_Byte, 2, nullptr, 0, 0, 0,
+                                nullptr),
+              CE_Failure);
+    EXPECT_FALSE(dataset->GetRasterBand(1)->TryGetLockedBlockRef(0, 0)) << "its tile was read";
 }
 
 // The numbers of the bands that a level has made.

@@ -7,7 +7,6 @@
 
 #include <algorithm>
 #include <climits>
-#include <cstdlib>
 #include <cstring>
 #include <filesystem>
 #include <fstream>
@@ -15,17 +14,17 @@
 #include <string>
 #include <vector>
 
-#include "gdal/Driver.h"
 #include "gdal/LazyRaster.h"
 #include "gdal/SampleType.h"
 #include "host/base/Error.h"
+#include "tests/gdal/GdalTest.h"
 #include "tests/support/PyramidFiles.h"
 #include "tests/support/ScratchDirectory.h"
 
 namespace zmcgdal {
 namespace {
 
-using DatasetPtr = std::unique_ptr<GDALDataset>;
+using zmctest::DatasetPtr;
 
 // The bytes that a file in the middle of a change has instead of its own: "/vsimoments/NAME" is
 // read by GDAL as NAME was put here, until so many reads have been made, and as something else from
@@ -74,23 +73,14 @@ void InstallMoments() {
     VSIFreeFilesystemPluginCallbacksStruct(calls);
 }
 
-class HostileFiles : public testing::Test {
+class HostileFiles : public zmctest::GdalTest {
 protected:
     static void SetUpTestSuite() {
-        setenv("ZMCRASTER_MODULE", ZMC_MODULE_PATH, 1);
-        GDALRegister_ZMCPyramid();
-        GDALAllRegister();
+        GdalTest::SetUpTestSuite();
         static const bool installed = (InstallMoments(), true);
         ASSERT_TRUE(installed);
     }
-    void SetUp() override { CPLPushErrorHandler(CPLQuietErrorHandler); }
-    void TearDown() override { CPLPopErrorHandler(); }
 
-    static DatasetPtr Open(const std::string& name, unsigned flags = 0) {
-        return DatasetPtr(GDALDataset::Open(name.c_str(), GDAL_OF_RASTER | flags));
-    }
-
-    zmctest::ScratchDirectory folder;
     const std::string name = folder / "a.pyr";
 };
 

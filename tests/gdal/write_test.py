@@ -367,6 +367,18 @@ class BlockByBlock(FolderTest):
         made = gdal.Open(self.path("new.pyr"))
         self.assertEqual(made.GetRasterBand(1).GetColorTable().GetColorEntry(0), (9, 8, 7, 255))
 
+    def test_color_tables_have_the_colors_of_pixels(self):
+        for data_type, shown in ((gdal.GDT_Byte, 256), (gdal.GDT_UInt16, 300)):
+            dataset = self.create(30, 30, 1, data_type)
+            table = gdal.ColorTable()
+            table.SetColorEntry(299, (9, 8, 7, 255))
+            dataset.GetRasterBand(1).SetColorTable(table)
+            del dataset
+            made = gdal.Open(self.path("new.pyr"))
+            self.assertEqual(made.GetRasterBand(1).GetColorTable().GetCount(), shown)
+            del made
+            os.remove(self.path("new.pyr"))
+
     def test_signed_bytes(self):
         dataset = self.create(300, 10, 2, gdal.GDT_Byte, ["PIXELTYPE=SIGNEDBYTE"])
         array = samples(gdal.GDT_Byte, 10, 300, 2)

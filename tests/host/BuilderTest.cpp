@@ -16,6 +16,7 @@
 #include "host/statistics/BandStatistics.h"
 #include "host/statistics/HistogramBins.h"
 #include "tests/host/NaivePyramid.h"
+#include "tests/support/FailureOf.h"
 #include "tests/support/MemorySource.h"
 #include "tests/support/ScratchDirectory.h"
 
@@ -310,6 +311,21 @@ TEST(PyramidBuilder, StoresPalettesAndThenReducesByMode) {
     const zelm::PalettePtr stored = Raster::Open(TestModule(), folder / "a.zmc").BandPalette(0);
     ASSERT_TRUE(stored);
     EXPECT_EQ(stored->GetColor(0)->green, 20);
+}
+
+// Bands may share their colours where they come from, and do not in a pyramid.
+TEST(PyramidBuilder, MoreColoursThanAFileMayHaveAreRefusedAtOnce) {
+    const ScratchDirectory folder;
+    MemorySource<unsigned char> source(40, 30, 17);
+    const zelm::PalettePtr palette(new zelm::Palette);
+    for (int i = 0; i < 65536; ++i) palette->AddColor(zelm::Color());
+    for (std::uint32_t band = 0; band < 17; ++band) source.palettes.emplace(band, palette);
+    EXPECT_EQ(
+        zmctest::FailureOf([&] { PyramidBuilder(TestModule()).Build(source, folder / "a.zmc"); }),
+        "memory: cannot take its palettes: they have more colours than a pyramid file may, "
+        "1048576");
+    EXPECT_EQ(source.read, 0u);
+    EXPECT_TRUE(std::filesystem::is_empty(folder.String()));
 }
 
 TEST(PyramidBuilder, TakesBandsInTheOrderAskedFor) {

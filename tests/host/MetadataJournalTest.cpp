@@ -7,11 +7,14 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <chrono>
 #include <filesystem>
+#include <thread>
 
 #include "host/file/MetadataDocument.h"
 #include "host/raster/Raster.h"
 #include "platform/File.h"
+#include "platform/FileLock.h"
 #include "platform/FileSystem.h"
 #include "tests/support/FailureOf.h"
 #include "tests/support/FileFaults.h"
@@ -245,6 +248,24 @@ TEST_F(MetadataJournalTest, DamagedDocumentIsPutBack) {
     }
 }
 
+TEST_F(MetadataJournalTest, WhoOpensForReadingLeavesACopyAndTheDamageAsTheyAre) {
+    LeaveCopy();
+    const std::string damaged = before.substr(0, front) + "\x1A" + std::string(500, 'x');
+    zmctest::WriteText(file, damaged);
+    const std::string left = zmctest::ReadText(copy);
+    {
+        Raster raster = Raster::Open(TestModule(), file, Access::Read);
+        EXPECT_NE(raster.RecoveryNote(), "");
+        EXPECT_EQ(raster.Read<Pixel>(0, {0, 0, 20, 10}), std::vector<Pixel>(200, 7));
+        EXPECT_NE(FailureOf([&] { Store(std::move(raster), true); }), "no failure");
+    }
+    EXPECT_EQ(zmctest::ReadText(file), damaged);
+    EXPECT_EQ(zmctest::ReadText(copy), left);
+    EXPECT_THAT(Names(), testing::ElementsAre("a.pyr", "a.pyr.zmcmeta"));
+    Open();
+    EXPECT_EQ(zmctest::ReadText(file), before) << "who opens for writing puts it in order";
+}
+
 TEST_F(MetadataJournalTest, RecoveryThatIsKilledIsRepeated) {
     for (const auto how : {FileFaultAction::Kill, FileFaultAction::KillPartway})
         for (std::size_t n = 1;; ++n) {
@@ -416,6 +437,30 @@ TEST_F(MetadataJournalTest, StoreUnderWayIsLeftAlone) {
     }
     EXPECT_EQ(zmctest::ReadText(file), before) << "it never finished";
     EXPECT_THAT(Names(), testing::ElementsAre("a.pyr"));
+}
+
+// Who looks has the lock of a copy for a moment, and nobody is to be told of a store for that.
+TEST_F(MetadataJournalTest, RecoveryWaitsForThoseWhoLook) {
+    LeaveCopy();
+    platform::FileLock looker;
+    ASSERT_EQ(looker.Take(copy, platform::FileLock::Kind::Shared),
+              platform::FileLock::Result::Taken);
+    std::thread leaving([&] {
+        std::this_thread::sleep_for(std::chrono::milliseconds(50));
+        looker.Release();
+    });
+    const Outcome outcome = RecoverMetadata(file).outcome;
+    leaving.join();
+    EXPECT_EQ(outcome, Outcome::Complete);
+    EXPECT_THAT(Names(), testing::ElementsAre("a.pyr"));
+}
+
+TEST_F(MetadataJournalTest, RecoveryDoesNotWaitForEver) {
+    LeaveCopy();
+    platform::FileLock looker;
+    ASSERT_EQ(looker.Take(copy, platform::FileLock::Kind::Shared),
+              platform::FileLock::Result::Taken);
+    EXPECT_EQ(RecoverMetadata(file).outcome, Outcome::UnderWay);
 }
 
 TEST_F(MetadataJournalTest, DamagedDocumentIsNotCopied) {

@@ -1,5 +1,6 @@
 // The file of a raster: which one it is, whatever happens to its name, and what the raster tells of
 // a disk that fails under it.
+#include <fcntl.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <sys/stat.h>
@@ -8,6 +9,7 @@
 #include <filesystem>
 #include <memory>
 #include <numeric>
+#include <set>
 
 #include "files/FileSource.h"
 #include "files/Lending.h"
@@ -33,6 +35,18 @@ using zmctest::FileFaults;
 using zmctest::SourceFault;
 using zmctest::TestModule;
 using Pixel = unsigned char;
+
+// Of all descriptors that this process has of a file.
+std::set<int> AccessModes(const std::string& file) {
+    std::set<int> modes;
+    for (const auto& entry : std::filesystem::directory_iterator("/proc/self/fd")) {
+        std::error_code gone;
+        if (std::filesystem::read_symlink(entry.path(), gone) != std::filesystem::canonical(file))
+            continue;
+        modes.insert(fcntl(std::stoi(entry.path().filename()), F_GETFL) & O_ACCMODE);
+    }
+    return modes;
+}
 
 class RasterFileTest : public testing::Test {
 protected:
@@ -106,6 +120,33 @@ TEST_F(RasterFileTest, WritesNothingOnceAnotherFileHasItsName) {
     EXPECT_THAT(FailureOf([&] { raster.Store([] { FAIL(); }); }), refusal);
     EXPECT_EQ(zmctest::ReadText(file), other);
     EXPECT_EQ(SumOf(raster, {0, 0, 20, 20}), 400u);
+}
+
+TEST_F(RasterFileTest, OpenedForReadingItIsNeverWrittenTo) {
+    Make(file, 20, 1);
+    const std::string content = zmctest::ReadText(file);
+    const auto written = std::filesystem::last_write_time(file);
+    {
+        Raster raster = Raster::Open(TestModule(), file, Access::Read);
+        EXPECT_EQ(AccessModes(file), std::set<int>{O_RDONLY});
+        EXPECT_FALSE(raster.IsWritable());
+        raster.KeepCopies(true);
+        const auto refusal = HasSubstr("the file is read-only");
+        EXPECT_THAT(FailureOf([&] { raster.Write<Pixel>(0, {0, 0, 1, 1}, {9}); }), refusal);
+        EXPECT_THAT(FailureOf([&] { raster.SetStatistics<Pixel>({Mean(1)}); }), refusal);
+        EXPECT_THAT(FailureOf([&] { raster.SetHistograms<Pixel>({{}}); }), refusal);
+        EXPECT_THAT(FailureOf([&] { raster.SetBandPalette(0, zelm::Palette()); }), refusal);
+        EXPECT_THAT(FailureOf([&] { raster.Store([] { FAIL(); }); }), refusal);
+        // The module says of its stores that they went well, and has nothing to write with.
+        raster.Visit([&](auto& reader) { EXPECT_TRUE(reader.SetPalette(0, zelm::Palette())); });
+        EXPECT_EQ(SumOf(raster, {0, 0, 20, 20}), 400u);
+        EXPECT_EQ(raster.Change(), "");
+    }
+    EXPECT_EQ(zmctest::ReadText(file), content);
+    EXPECT_EQ(std::filesystem::last_write_time(file), written);
+    EXPECT_EQ(std::distance(std::filesystem::directory_iterator(folder.String()), {}), 1);
+    const Raster raster = Raster::Open(TestModule(), file);
+    EXPECT_TRUE(AccessModes(file).contains(O_RDWR)) << "the usual access is for writing";
 }
 
 TEST_F(RasterFileTest, ReadingAFileThatWasCutFails) {

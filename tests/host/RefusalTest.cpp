@@ -5,10 +5,13 @@
 #include <sys/stat.h>
 
 #include <cerrno>
+#include <filesystem>
 
 #include "core/PixelVocabulary.h"
 #include "host/build/PyramidBuilder.h"
+#include "host/file/SideFile.h"
 #include "host/raster/Raster.h"
+#include "platform/FileSystem.h"
 #include "tests/support/FailureOf.h"
 #include "tests/support/FileFaults.h"
 #include "tests/support/MemorySource.h"
@@ -251,6 +254,31 @@ TEST_F(HostRefusal, PalettesOfComplexPixels) {
     EXPECT_EQ(PyramidBuilder(TestModule()).Build(source, file, options).resampling,
               Resampling::Average);
     EXPECT_FALSE(Raster::Open(TestModule(), file).BandPalette(0));
+}
+
+// What nobody can lock nobody takes for stale. Whatever else hinders a lock does not hinder others.
+TEST_F(HostRefusal, TemporaryFilesDoWithoutALockWhereThereIsNone) {
+    const auto make = [&](unsigned calls, std::size_t n, int error) {
+        FileFault fault;
+        fault.folder = folder.String();
+        fault.calls = calls;
+        fault.n = n;
+        fault.error = error;
+        FileFaults faults(fault);
+        platform::FileLock lock;
+        const std::string path = SideFile::MakeTemporary(file, "kind", lock);
+        const std::string reason = platform::LastErrorText();
+        faults.Disarm();
+        EXPECT_EQ(faults.Failed(), 1U);
+        EXPECT_EQ(platform::RemoveEntry(path), !path.empty());
+        EXPECT_TRUE(std::filesystem::is_empty(folder.String()));
+        return path.empty() ? reason : "made";
+    };
+    for (const int error : {ENOLCK, EOPNOTSUPP, ENOTSUP})
+        EXPECT_EQ(make(zmctest::kLockCall, 1, error), "made");
+    for (const int error : {EIO, EINVAL, ENOMEM})
+        EXPECT_EQ(make(zmctest::kLockCall, 1, error), platform::ErrorText(error));
+    EXPECT_EQ(make(zmctest::kOpenCall, 2, EMFILE), platform::ErrorText(EMFILE));
 }
 
 TEST_F(HostRefusal, DisksThatFailABuild) {

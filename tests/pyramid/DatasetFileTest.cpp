@@ -2,9 +2,9 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <chrono>
 #include <fstream>
 
+#include "tests/support/ProcessorTime.h"
 #include "tests/support/PyramidFileTest.h"
 
 namespace zmctest {
@@ -333,7 +333,7 @@ TEST_F(DatasetFileTest, HostileHeadersAreAnsweredFast) {
         patch("<HEADER_LEVELMAX>0<", "<HEADER_LEVELMAX>" + std::to_string(c.levelMax) + "<");
         patch("Scanline", c.ordering == 2 ? "Morton" : "Blocked");
         model.Save(path);
-        const auto start = std::chrono::steady_clock::now();
+        const ProcessorTime time;
         const auto dataset = Open();
         EXPECT_EQ(dataset != nullptr, c.opens) << c.samples << " " << c.bands << " " << c.levelMax;
         if (dataset) {
@@ -342,8 +342,7 @@ TEST_F(DatasetFileTest, HostileHeadersAreAnsweredFast) {
             EXPECT_FALSE(ReadBytes(*dataset, c.samples, 0, 1, 1, BandList({0}), 0, buffer));
             EXPECT_EQ(buffer[0], 7);
         }
-        const std::chrono::duration<double> took = std::chrono::steady_clock::now() - start;
-        EXPECT_LT(took.count(), 0.5);
+        EXPECT_LT(time.Seconds(), 5);
     }
 }
 

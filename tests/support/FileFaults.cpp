@@ -7,6 +7,7 @@
 #include <dlfcn.h>
 #include <fcntl.h>
 #include <signal.h>
+#include <sys/file.h>
 #include <sys/stat.h>
 #include <sys/uio.h>
 #include <unistd.h>
@@ -318,6 +319,7 @@ ZMC_CALL(kRenameCall, renameat2, to,
 ZMC_CALL(kRenameCall, link, to, (const char* from, const char* to), (from, to), noexcept)
 ZMC_CALL(kRemoveCall, unlink, path, (const char* path), (path), noexcept)
 ZMC_CALL(kRemoveCall, remove, path, (const char* path), (path), noexcept)
+ZMC_CALL(kLockCall, flock, file, (int file, int operation), (file, operation), noexcept)
 ZMC_CALL(kStatusCall, fstat, file, (int file, struct stat* status), (file, status), noexcept)
 ZMC_CALL(kStatusCall, fstat64, file, (int file, struct stat64* status), (file, status), noexcept)
 

@@ -29,6 +29,7 @@ enum FileCall : unsigned {
     kRemoveCall = 128,
     kStatusCall = 256,  // fstat
     kAnyCall = 511,
+    kLockCall = 512,  // flock: where there are no locks no disk has failed
     kChangingCall = kWriteCall | kResizeCall | kRenameCall | kRemoveCall,
 };
 

@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include <limits>
+#include <vector>
 
 #include "core/ElementTypes.h"
 
@@ -48,6 +49,21 @@ TEST(SampleDifferences, TheLastBitOf64Counts) {
     SampleDifferences found(Code::UInt64, Code::UInt64, 1, 0);
     found.Take({0, 0, 1, 1}, a, b);
     EXPECT_EQ(found.Bands()[0].greatest, 1);
+}
+
+TEST(SampleDifferences, LongLinesAreTakenToTheirEnd) {
+    constexpr std::uint32_t kWidth = 100000;
+    const std::vector<unsigned char> a(std::size_t{kWidth} * 3);
+    std::vector<unsigned char> b = a;
+    for (const std::size_t sample : {65535u, 65536u, 200003u, 299998u, 299999u}) b[sample] = 9;
+    SampleDifferences found(Code::Byte, Code::Byte, 3, 0);
+    found.Take({7, 5, kWidth, 1}, a.data(), b.data());
+    EXPECT_EQ(found.Bands()[0].samples, 1u);
+    EXPECT_EQ(found.Bands()[0].x, 7u + 65535 / 3);
+    EXPECT_EQ(found.Bands()[1].samples, 2u);
+    EXPECT_EQ(found.Bands()[1].x, 7u + 65536 / 3);
+    EXPECT_EQ(found.Bands()[2].samples, 2u);
+    EXPECT_EQ(found.Bands()[2].x, 7u + 200003 / 3);
 }
 
 TEST(SampleDifferences, NotANumberAndInfinity) {

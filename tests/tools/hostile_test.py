@@ -1,11 +1,13 @@
 """Folders in which somebody else works at the same time, and who is not a friend."""
 import hashlib
+import json
 import os
 import resource
 import signal
 import socket
 import stat
 import subprocess
+import tempfile
 import threading
 import time
 import unittest
@@ -142,6 +144,21 @@ class Names(ToolTest):
         self.check(self.run_tool("verify", name), 3)
         self.assertTrue(self.check(self.run_tool("hash", name), 1)
                         .startswith(f"zmcraster: {self.SHOWN}: cannot read "))
+
+    def test_warnings_and_parts_of_messages_show_them_too(self):
+        self.pyramid()
+        os.rename(self.path("picture.pyr"), self.path(self.EVIL))
+        self.assertIn(": " + self.SHOWN + " has the levels",
+                      self.check(self.run_tool("export", self.EVIL, "x.tif", "--level", "9"), 2))
+        with open(self.path(self.EVIL), "ab") as file:
+            file.write(b"<")
+        self.assertTrue(self.run_tool("info", self.EVIL).stderr.startswith(
+            f"zmcraster: {self.SHOWN}: warning: the metadata document is malformed"))
+        geotiff(self.path("wide.tif"), samples("Int64", 20, 30, 1), "Int64")
+        done = self.run_tool("build", "wide.tif", self.EVIL, "--overwrite", "--nodata", str(2**62 + 1))
+        self.assertTrue(self.check(done, 0).endswith("\n"))
+        self.assertTrue(done.stderr.startswith(
+            f"zmcraster: {self.SHOWN}: warning: a pyramid does not keep the last digits"), done)
 
     def test_documents_have_them_exactly(self):
         self.pyramid()
@@ -312,92 +329,166 @@ class Rights(ToolTest):
 
 
 class Moments(ToolTest):
-    """A raster that changes while it is read."""
+    """A raster that changes while it is read: what is told of it is true of one of its two contents,
+    or the command fails in one line."""
 
     SIDE = 2000
+    # Between two changes, in times of what a command takes that reads the raster at rest: it meets
+    # a change in the short ones, and none in the long ones.
+    PAUSES = (0.3, 1.2, 0.6, 2.4)
+    RUNS = 60  # in which both outcomes come, where there are two
+    UNDISTURBED = 6  # runs of a command that meets no change
 
-    def setUp(self):
-        super().setUp()
-        self.digests = set()
+    @classmethod
+    def setUpClass(cls):
+        cls.rasters = tempfile.TemporaryDirectory(prefix="zmctools")
+        cls.addClassCleanup(cls.rasters.cleanup)
+        cls.digests = []
+        pixels = samples("Byte", cls.SIDE, cls.SIDE, 3)
         for number in (1, 2):
-            pixels = samples("Byte", self.SIDE, self.SIDE, 3, seed=number)
-            geotiff(self.path(f"{number}.tif"), pixels)
-            self.good("build", f"{number}.tif", f"{number}.pyr")
-            self.digests.add(hashlib.sha256(pixels.tobytes()).hexdigest())
+            pixels[::16, ::16] ^= number  # all over, and not so much that commands take longer
+            geotiff(cls.raster(number, "tif"), pixels)
+            subprocess.run([TOOL, "build", cls.raster(number, "tif"), cls.raster(number, "pyr")],
+                           check=True, capture_output=True)
+            cls.digests.append(hashlib.sha256(pixels.tobytes()).hexdigest())
+
+    @classmethod
+    def raster(cls, number, kind):
+        return os.path.join(cls.rasters.name, f"{number}.{kind}")
 
     def contents(self, kind):
         parts = []
         for number in (1, 2):
-            with open(self.path(f"{number}.{kind}"), "rb") as file:
+            with open(self.raster(number, kind), "rb") as file:
                 parts.append(file.read())
         return parts
 
-    def hash_while(self, name, change):
-        """Digests of a raster that `change` goes on changing; each is one of the two or a failure."""
+    def replace(self, name, part):
+        with open(self.path("next"), "wb") as file:
+            file.write(part)
+        os.rename(self.path("next"), self.path(name))
+
+    def rewrite(self, name, part):
+        with open(self.path(name), "r+b" if os.path.exists(self.path(name)) else "wb") as file:
+            for at in range(0, len(part), 1 << 20):
+                file.seek(at)
+                file.write(part[at:at + (1 << 20)])
+
+    def at_rest(self, words, name, parts):
+        """What a command answers to either content."""
+        answers = []
+        for part in parts:
+            self.replace(name, part)
+            done = self.run_tool(*words)
+            self.assertEqual(done.stderr, "", words)
+            self.assertIn(done.returncode, (0, 3), words)
+            answers.append((done.returncode, done.stdout))
+        return answers
+
+    def seconds(self, words):
+        begin = time.monotonic()
+        self.run_tool(*words)
+        return time.monotonic() - begin
+
+    def answers_while(self, change, words, kind, meets_changes=True, reading=None):
+        """The answers of a command to both contents, and one of them is what it says of the raster
+        while that changes, or that it has changed. `reading` is a command that takes as long as the
+        part of it that reads the raster."""
+        name, parts = "a." + kind, self.contents(kind)
+        answers = self.at_rest(words, name, parts)
+        unit = self.seconds(reading or words)
         stop = threading.Event()
 
         def work():
             turn = 0
             while not stop.is_set():
-                change(turn % 2)
+                change(name, parts[turn % 2])
+                stop.wait(unit * self.PAUSES[turn % len(self.PAUSES)])
                 turn += 1
         thread = threading.Thread(target=work)
         thread.start()
-        good = failed = 0
+        good = refused = 0
         try:
-            for _ in range(6):
-                done = self.run_tool("hash", name)
-                if done.returncode == 0:
+            for _ in range(self.RUNS):
+                done = self.run_tool(*words)
+                if done.stderr == "":
                     good += 1
-                    self.assertIn(done.stdout.split()[0], self.digests)
+                    self.assertIn((done.returncode, done.stdout), answers, words)
                 else:
-                    failed += 1
+                    refused += 1
                     self.assertEqual((done.returncode, done.stdout), (1, ""), done)
                     self.assertRegex(done.stderr, r"^(zmcraster: [^\n]+\n)+$")
+                    self.assertIn("it changed while it was read", done.stderr)
+                if good > 0 and refused > 0 if meets_changes else good == self.UNDISTURBED:
+                    break
         finally:
             stop.set()
             thread.join()
-        return good, failed
+        self.assertGreater(good, 0, (words, refused))
+        if meets_changes:
+            self.assertGreater(refused, 0, (words, good))
+        return answers
 
-    def replace(self, name, kind):
-        parts = self.contents(kind)
-
-        def change(turn):
-            with open(self.path("next"), "wb") as file:
-                file.write(parts[turn])
-            os.rename(self.path("next"), self.path(name))
-            time.sleep(0.1)
-        change(0)
-        return change
-
-    def rewrite(self, name, kind):
-        parts = self.contents(kind)
-
-        def change(turn):
-            with open(self.path(name), "r+b" if os.path.exists(self.path(name)) else "wb") as file:
-                for at in range(0, len(parts[turn]), 1 << 20):
-                    file.seek(at)
-                    file.write(parts[turn][at:at + (1 << 20)])
-        change(0)
-        return change
+    def check_hash(self, change, kind, meets_changes=True):
+        answers = self.answers_while(change, ["hash", "a." + kind], kind, meets_changes)
+        self.assertEqual(answers, [(0, f"{digest}  a.{kind}\n") for digest in self.digests])
 
     def test_a_pyramid_that_is_replaced_has_the_digest_of_one_file(self):
-        good, failed = self.hash_while("a.pyr", self.replace("a.pyr", "pyr"))
-        self.assertGreater(good, 0, failed)
+        self.check_hash(self.replace, "pyr", meets_changes=False)
 
     def test_a_pyramid_that_is_rewritten_has_the_digest_of_one_file_or_none(self):
-        self.hash_while("a.pyr", self.rewrite("a.pyr", "pyr"))
+        self.check_hash(self.rewrite, "pyr")
 
     def test_a_picture_that_is_replaced_has_the_digest_of_one_file_or_none(self):
-        self.hash_while("a.tif", self.replace("a.tif", "tif"))
+        self.check_hash(self.replace, "tif")
 
     def test_a_picture_that_is_rewritten_has_the_digest_of_one_file_or_none(self):
-        self.hash_while("a.tif", self.rewrite("a.tif", "tif"))
+        self.check_hash(self.rewrite, "tif")
+
+    def check_compare(self, change, kind, meets_changes=True):
+        words = ["compare", self.raster(1, "pyr"), "a." + kind, "--json"]
+        same, other = self.answers_while(change, words, kind, meets_changes)
+        self.assertEqual((same[0], other[0]), (0, 3))
+        self.assertTrue(json.loads(same[1])["equal"])
+
+    def test_a_pyramid_that_is_replaced_compares_as_one_file(self):
+        self.check_compare(self.replace, "pyr", meets_changes=False)
+
+    def test_a_pyramid_that_is_rewritten_compares_as_one_file_or_not(self):
+        self.check_compare(self.rewrite, "pyr")
+
+    def test_a_picture_that_is_replaced_compares_as_one_file_or_not(self):
+        self.check_compare(self.replace, "tif")
+
+    def test_a_picture_that_is_rewritten_compares_as_one_file_or_not(self):
+        self.check_compare(self.rewrite, "tif")
+
+    def check_verify(self, change, meets_changes=True):
+        answers = self.answers_while(change, ["verify", "a.pyr"], "pyr", meets_changes)
+        self.assertEqual([status for status, _ in answers], [0, 0])
+
+    def test_a_pyramid_that_is_replaced_verifies_as_one_file(self):
+        self.check_verify(self.replace, meets_changes=False)
+
+    def test_a_pyramid_that_is_rewritten_verifies_as_one_file_or_not(self):
+        self.check_verify(self.rewrite)
+
+    def check_verify_against(self, change):
+        pyramid = self.raster(1, "pyr")
+        answers = self.answers_while(change, ["verify", pyramid, "--against", "a.tif"], "tif",
+                                     reading=["compare", pyramid, "a.tif"])
+        self.assertEqual([status for status, _ in answers], [0, 3])
+
+    def test_a_pyramid_is_verified_against_one_picture_that_is_replaced_or_none(self):
+        self.check_verify_against(self.replace)
+
+    def test_a_pyramid_is_verified_against_one_picture_that_is_rewritten_or_none(self):
+        self.check_verify_against(self.rewrite)
 
     def test_a_pyramid_that_was_built_just_now_has_a_digest(self):
         for _ in range(3):
-            self.good("build", "1.tif", "new.pyr", "--overwrite", "--quiet")
-            self.assertIn(self.good("hash", "new.pyr").split()[0], self.digests)
+            self.good("build", self.raster(1, "tif"), "new.pyr", "--overwrite", "--quiet")
+            self.assertEqual(self.good("hash", "new.pyr").split()[0], self.digests[0])
 
 
 class ClosedStreams(ToolTest):
@@ -467,6 +558,7 @@ class ReadOnly(ToolTest):
             except OSError:
                 pass
         self.assertEqual(child.returncode, 0, words)
+        self.assertTrue(modes, f"{words} was never seen to have {path} open")
         return modes
 
     def test_commands_that_read_open_for_reading_only(self):
@@ -485,13 +577,14 @@ class Endings(ToolTest):
 
     RENAME, REMOVE, OPEN, SYNC = 64, 128, 1, 16
 
-    def raster(self, name, place, nodata, mask):
+    def raster(self, name, place, nodata, mask, referenced=True):
         geotiff(self.path(name), np.full((30, 40, 1), place, np.uint8), nodata=nodata)
         dataset = gdal.Open(self.path(name), gdal.GA_Update)
-        reference = osr.SpatialReference()
-        reference.ImportFromEPSG(32631)
-        dataset.SetSpatialRef(reference)
-        dataset.SetGeoTransform([place, 1, 0, place, 0, -1])
+        if referenced:
+            reference = osr.SpatialReference()
+            reference.ImportFromEPSG(32631)
+            dataset.SetSpatialRef(reference)
+            dataset.SetGeoTransform([place, 1, 0, place, 0, -1])
         if mask is not None:
             dataset.CreateMaskBand(gdal.GMF_PER_DATASET)
             dataset.GetRasterBand(1).GetMaskBand().WriteArray(np.full((30, 40), mask, np.uint8))
@@ -561,5 +654,6 @@ class Endings(ToolTest):
         self.every_ending((10, None, 0), (20, None, 255), step=3)
 
     def test_without_a_sidecar_afterwards(self):
-        self.raster("old.tif", 10, 3, None)
-        self.every_ending((10, 3, 0), (20, None, None), step=3)
+        self.every_ending((10, 3, 0), (20, None, None, False), step=3)
+        # The last build came to its end.
+        self.assertEqual([name for name in self.files() if name.startswith("made.")], ["made.pyr"])
