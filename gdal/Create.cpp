@@ -16,10 +16,11 @@ namespace {
 
 // Names what cannot be kept; false if that is not acceptable.
 bool AcceptLosses(const GdalRasterSource& source, bool strict) {
-    for (const std::string& loss : source.Losses())
+    const std::vector<std::string> losses = source.Losses();
+    for (const std::string& loss : losses)
         CPLError(strict ? CE_Failure : CE_Warning, CPLE_NotSupported, "a pyramid does not keep %s",
                  loss.c_str());
-    return source.Losses().empty() || !strict;
+    return losses.empty() || !strict;
 }
 
 void UseProgress(zmchost::BuildOptions& options, GDALProgressFunc progress, void* data) {

@@ -2,7 +2,10 @@
 
 #include <cpl_error.h>
 
+#include <new>
+
 #include "core/PixelVocabulary.h"
+#include "gdal/Band.h"
 #include "gdal/ColorTables.h"
 #include "gdal/ErrorCatcher.h"
 #include "gdal/NoDataValues.h"
@@ -41,6 +44,13 @@ bool IsMasked(GDALRasterBand& band) {
     return (flags & (GMF_ALL_VALID | GMF_ALPHA)) == 0 && flags != GMF_NODATA;
 }
 
+// Ours are alpha where their sidecar says so, and need not be looked through for palettes.
+bool IsAlpha(GDALRasterBand& band) {
+    auto* const own = dynamic_cast<Band*>(&band);
+    return (own ? own->GDALPamRasterBand::GetColorInterpretation()
+                : band.GetColorInterpretation()) == GCI_AlphaBand;
+}
+
 bool FitsMask(GDALRasterBand& band) {
     GDALRasterBand* const mask = band.GetMaskBand();
     return mask && mask->GetXSize() == band.GetXSize() && mask->GetYSize() == band.GetYSize();
@@ -57,7 +67,6 @@ GdalRasterSource::GdalRasterSource(GDALDataset& source, bool signedByte) : datas
     if (dataset.GetRasterCount() == 0) throw zmchost::Error(Name(), kSource, "it has no bands");
     ChooseType(signedByte);
     FindAlpha();
-    FindLosses();
 }
 
 GDALRasterBand& GdalRasterSource::BandOf(std::uint32_t band) const {
@@ -66,7 +75,7 @@ GDALRasterBand& GdalRasterSource::BandOf(std::uint32_t band) const {
 
 void GdalRasterSource::FindAlpha() {
     for (int number = 1; number <= dataset.GetRasterCount() && !alphaBand; ++number)
-        if (dataset.GetRasterBand(number)->GetColorInterpretation() == GCI_AlphaBand)
+        if (IsAlpha(*dataset.GetRasterBand(number)))
             alphaBand = static_cast<std::uint32_t>(number - 1);
 }
 
@@ -89,7 +98,8 @@ void GdalRasterSource::ChooseType(bool signedByte) {
     bufferType = GdalTypeOf(pixelType, SignedByteAs::FlaggedByte);
 }
 
-void GdalRasterSource::FindLosses() {
+std::vector<std::string> GdalRasterSource::Losses() const {
+    std::vector<std::string> losses;
     for (int number = 1; number <= dataset.GetRasterCount(); ++number) {
         GDALRasterBand& band = *dataset.GetRasterBand(number);
         const std::string which = "of band " + std::to_string(number);
@@ -102,6 +112,7 @@ void GdalRasterSource::FindLosses() {
         if (IsMasked(band) && !FitsMask(band))
             losses.push_back("the mask " + which + ", which is of another size");
     }
+    return losses;
 }
 
 std::string GdalRasterSource::Name() const { return dataset.GetDescription(); }
@@ -125,7 +136,8 @@ zelm::PalettePtr GdalRasterSource::BandPalette(std::uint32_t band) const {
         dataset.GetRasterBand(static_cast<int>(band) + 1)->GetColorTable();
     if (!table || !FitsPalette(*table)) return zelm::PalettePtr();
     zelm::PalettePtr palette(new zelm::Palette);
-    AddColors(*table, *palette);
+    if (!palette) throw std::bad_alloc();
+    ColorsOf(*table).CopyTo(*palette);
     return palette;
 }
 

@@ -35,21 +35,19 @@ public:
                   unsigned char* shown) override;
 
     // What of the source a pyramid cannot keep, in a few words each; empty as a rule.
-    const std::vector<std::string>& Losses() const { return losses; }
+    std::vector<std::string> Losses() const;
 
 private:
     GDALDataset& dataset;
     std::uint32_t pixelType = 0;
     GDALDataType bufferType = GDT_Unknown;
     std::optional<std::uint32_t> alphaBand;
-    std::vector<std::string> losses;
 
     GDALRasterBand& BandOf(std::uint32_t band) const;
     void FindAlpha();
     void ReadShown(GDALRasterBand& from, bool isMask, const zmchost::Window& window,
                    std::vector<unsigned char>& shown);
     void ChooseType(bool signedByte);
-    void FindLosses();
 };
 
 // True if the band's samples are declared as signed bytes by its IMAGE_STRUCTURE.
