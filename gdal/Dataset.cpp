@@ -188,6 +188,10 @@ void Dataset::LoadSidecar(const char* fileName, char** siblings) {
     if (staged) oOvManager.HaveMaskFile(nullptr, base.c_str());
 }
 
+bool Dataset::MayHaveMasks() {
+    return main || oOvManager.HaveMaskFile() || GDALPamDataset::GetMetadataItem("NODATA_VALUES");
+}
+
 bool Dataset::ReadsDirectly(int x, int y, int width, int height) const {
     // Blocks may wait in the cache to be written.
     const bool quiet = eAccess != GA_Update || (creation && creation->IsSealed());

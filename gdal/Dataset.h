@@ -74,6 +74,8 @@ public:
     // The level of ours that GDAL would read such a window from into a buffer of that size, and
     // `shown` is the window in that level then. Null for this one. No band is made for this.
     Dataset* CoarserFor(Shown& shown, int bufferWidth, int bufferHeight);
+    // False where a mask can only follow from alpha or from a band's own no-data value.
+    bool MayHaveMasks();
 
     // Reads the sidecar, and looks for other companions, of a file of that name. Those that are
     // staged for it (SidecarStage.h) are given their names first if it is open for update.

@@ -7,6 +7,7 @@
 #include "core/PixelVocabulary.h"
 #include "gdal/Band.h"
 #include "gdal/ColorTables.h"
+#include "gdal/Dataset.h"
 #include "gdal/ErrorCatcher.h"
 #include "gdal/NoDataValues.h"
 #include "gdal/SampleType.h"
@@ -40,6 +41,9 @@ bool FitsPalette(const GDALColorTable& table) {
 // Whether GDAL knows of a mask that follows neither from alpha nor from the band's own no-data
 // value.
 bool IsMasked(GDALRasterBand& band) {
+    // GDAL looks for alpha first, and so for palettes.
+    auto* const own = dynamic_cast<Band*>(&band);
+    if (own && !own->Owner().MayHaveMasks()) return false;
     const int flags = band.GetMaskFlags();
     return (flags & (GMF_ALL_VALID | GMF_ALPHA)) == 0 && flags != GMF_NODATA;
 }
