@@ -115,6 +115,22 @@ std::unique_ptr<Dataset> Dataset::FromFile(std::shared_ptr<OpenFile> file, GDALA
     return std::unique_ptr<Dataset>(new Dataset(std::move(file), base, access, nullptr));
 }
 
+std::unique_ptr<Dataset> Dataset::FromOverview(std::unique_ptr<Dataset> raster, int overview) {
+    const auto& all = raster->Overviews();
+    if (overview >= static_cast<int>(all.size()))
+        throw zmchost::Error(raster->GetDescription(), "show overview " + std::to_string(overview),
+                             "it has " + std::to_string(all.size()));
+    if (raster->eAccess == GA_Update)
+        throw zmchost::Error(raster->GetDescription(), "show an overview for update",
+                             "the raster alone can be changed");
+    const std::uint32_t level = all[static_cast<std::size_t>(overview)]->level;
+    std::unique_ptr<Dataset> shown(new Dataset(raster->file, level, GA_ReadOnly, raster.get()));
+    shown->kept = std::move(raster);
+    shown->SetDescription(shown->kept->GetDescription());
+    for (int number = 1; number <= shown->GetRasterCount(); ++number) shown->BandOf(number);
+    return shown;
+}
+
 // GDAL holds half a kilobyte and more for each band of each level, and of tens of thousands only
 // some are looked at: levels have them when they are asked for. The last one tells the number.
 void Dataset::AddBands() {
@@ -137,11 +153,11 @@ const std::vector<std::unique_ptr<Dataset>>& Dataset::Overviews() {
 // What an incomplete file holds of its coarser levels is anyone's guess.
 void Dataset::AddOverviews() {
     std::vector<std::unique_ptr<Dataset>> made;
-    if (!main && file->info.complete)
+    if ((!main || kept) && file->info.complete)
         for (const zmchost::PyramidLevelInfo& coarser : file->info.levels)
             if (coarser.level > level && coarser.width > 0 && coarser.height > 0)
                 made.push_back(
-                    std::unique_ptr<Dataset>(new Dataset(file, coarser.level, eAccess, this)));
+                    std::unique_ptr<Dataset>(new Dataset(file, coarser.level, eAccess, &Main())));
     overviews = std::move(made);
     overviewsMade = true;
 }
@@ -226,24 +242,44 @@ char** Dataset::GetMetadataDomainList() {
 char** Dataset::GetMetadata(const char* domain) {
     return Reporting<char**>(nullptr, [&] {
         if (CPLStringList* const own = OwnDomain(domain)) return own->List();
-        return GDALPamDataset::GetMetadata(domain);
+        return kept ? ScaledDomain(domain) : GDALPamDataset::GetMetadata(domain);
     });
 }
 
 const char* Dataset::GetMetadataItem(const char* name, const char* domain) {
     return Reporting<const char*>(nullptr, [&] {
         if (CPLStringList* const own = OwnDomain(domain)) return own->FetchNameValue(name);
+        if (kept) return CSLFetchNameValue(ScaledDomain(domain), name);
         return GDALPamDataset::GetMetadataItem(name, domain);
     });
+}
+
+double Dataset::Factor() const {
+    return std::ldexp(1.0, static_cast<int>(level - (main ? main->level : level)));
+}
+
+// What counts in pixels of the raster counts in those of the level.
+char** Dataset::ScaledDomain(const char* domain) {
+    constexpr const char* kDivided[] = {"LINE_OFF",   "SAMP_OFF",    "LINE_SCALE",
+                                        "SAMP_SCALE", "LINE_OFFSET", "PIXEL_OFFSET"};
+    constexpr const char* kMultiplied[] = {"LINE_STEP", "PIXEL_STEP"};
+    scaled = CPLStringList(CSLDuplicate(main->GetMetadata(domain)), TRUE);
+    if (!domain || !(EQUAL(domain, "RPC") || EQUAL(domain, "GEOLOCATION"))) return scaled.List();
+    const auto scale = [&](const char* name, double factor) {
+        if (const char* const value = scaled.FetchNameValue(name))
+            scaled.SetNameValue(name, CPLSPrintf("%.17g", CPLAtof(value) * factor));
+    };
+    for (const char* const name : kDivided) scale(name, 1 / Factor());
+    for (const char* const name : kMultiplied) scale(name, Factor());
+    return scaled.List();
 }
 
 CPLErr Dataset::GetGeoTransform(double* transform) {
     return Reporting(CE_Failure, [&] {
         if (!main) return GDALPamDataset::GetGeoTransform(transform);
         const CPLErr result = main->GetGeoTransform(transform);
-        const double factor = std::ldexp(1.0, static_cast<int>(level - main->Level()));
         for (const int i : {1, 2, 4, 5})
-            if (result == CE_None) transform[i] *= factor;
+            if (result == CE_None) transform[i] *= Factor();
         return result;
     });
 }
@@ -251,6 +287,35 @@ CPLErr Dataset::GetGeoTransform(double* transform) {
 const OGRSpatialReference* Dataset::GetSpatialRef() const {
     return Reporting<const OGRSpatialReference*>(
         nullptr, [&] { return main ? main->GetSpatialRef() : GDALPamDataset::GetSpatialRef(); });
+}
+
+int Dataset::GetGCPCount() {
+    return Reporting<int>(
+        0, [&] { return main ? main->GetGCPCount() : GDALPamDataset::GetGCPCount(); });
+}
+
+const GDAL_GCP* Dataset::GetGCPs() {
+    return Reporting<const GDAL_GCP*>(nullptr, [&]() -> const GDAL_GCP* {
+        if (!main) return GDALPamDataset::GetGCPs();
+        const GDAL_GCP* const given = main->GetGCPs();
+        points.assign(given, given + main->GetGCPCount());
+        for (GDAL_GCP& point : points) {
+            point.dfGCPPixel /= Factor();
+            point.dfGCPLine /= Factor();
+        }
+        return points.data();
+    });
+}
+
+const OGRSpatialReference* Dataset::GetGCPSpatialRef() const {
+    return Reporting<const OGRSpatialReference*>(nullptr, [&] {
+        return main ? main->GetGCPSpatialRef() : GDALPamDataset::GetGCPSpatialRef();
+    });
+}
+
+char** Dataset::GetFileList() {
+    return Reporting<char**>(
+        nullptr, [&] { return kept ? kept->GetFileList() : GDALPamDataset::GetFileList(); });
 }
 
 CPLErr Dataset::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, void* data,

@@ -50,7 +50,13 @@ public:
 class Dataset final : public GDALPamDataset {
 public:
     static std::unique_ptr<Dataset> FromFile(std::shared_ptr<OpenFile> file, GDALAccess access);
+    // An overview of a raster, counted from 0, as a raster of its own, which keeps that one and
+    // shows what it knows of all its pixels. Throws zmchost::Error if there is no such overview.
+    static std::unique_ptr<Dataset> FromOverview(std::unique_ptr<Dataset> raster, int overview);
     ~Dataset() override;
+
+    // Shows no overviews.
+    void StandAlone() { overviewsMade = true; }
 
     OpenFile& File() { return *file; }
     std::uint32_t Level() const { return level; }
@@ -101,6 +107,10 @@ public:
     // just so many, and what is over at the right and at the bottom belongs to none.
     CPLErr GetGeoTransform(double* transform) override;
     const OGRSpatialReference* GetSpatialRef() const override;
+    int GetGCPCount() override;
+    const GDAL_GCP* GetGCPs() override;
+    const OGRSpatialReference* GetGCPSpatialRef() const override;
+    char** GetFileList() override;
 
     CPLErr IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, void* data,
                      int bufferWidth, int bufferHeight, GDALDataType bufferType, int bandCount,
@@ -121,6 +131,9 @@ private:
     void AddOverviews();
     void DescribeFile();
     CPLStringList* OwnDomain(const char* domain);
+    // How many pixels of the finest level one of this covers along a side.
+    double Factor() const;
+    char** ScaledDomain(const char* domain);
     CPLErr ReadOrWrite(GDALRWFlag mode, int x, int y, int width, int height, void* data,
                        int bufferWidth, int bufferHeight, GDALDataType bufferType, int bandCount,
                        int* bandMap, GSpacing pixelSpace, GSpacing lineSpace, GSpacing bandSpace,
@@ -128,7 +141,10 @@ private:
 
     std::shared_ptr<OpenFile> file;
     std::uint32_t level;
-    Dataset* main;  // null in the main dataset
+    Dataset* main;                  // null in the main dataset
+    std::unique_ptr<Dataset> kept;  // `main`, where no other dataset has it
+    std::vector<GDAL_GCP> points;   // of a level: names and identifiers are those of `main`
+    CPLStringList scaled;           // the domain of a level that was asked for last
     std::vector<std::unique_ptr<Dataset>> overviews;
     bool overviewsMade = false;
     CPLStringList structure;    // domain IMAGE_STRUCTURE, when it was asked for

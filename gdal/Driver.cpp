@@ -58,14 +58,16 @@ void PutInOrder(const std::string& name, GDALAccess access) {
 
 std::unique_ptr<Dataset> OpenDataset(GDALOpenInfo* info) {
     if (!IsVirtualName(info->pszFilename)) PutInOrder(info->pszFilename, info->eAccess);
-    auto file = std::make_shared<OpenFile>(info->pszFilename, info->eAccess,
-                                           OpenOptionsFrom(info->papszOpenOptions));
+    const OpenOptions options = OpenOptionsFrom(info->papszOpenOptions);
+    auto file = std::make_shared<OpenFile>(info->pszFilename, info->eAccess, options);
     const zmchost::PyramidFileInfo layout = file->info;
     auto dataset = Dataset::FromFile(std::move(file), info->eAccess);
     // A look for each companion is cheaper than a list of the whole folder, unless that is there.
     char** const siblings = info->AreSiblingFilesLoaded() ? info->GetSiblingFiles() : nullptr;
     dataset->LoadSidecar(info->pszFilename, siblings);
     WarnIfIncomplete(*dataset, layout);
+    if (options.overview) dataset = Dataset::FromOverview(std::move(dataset), *options.overview);
+    if (options.alone) dataset->StandAlone();
     return dataset;
 }
 

@@ -4,6 +4,7 @@
 
 #include <algorithm>
 #include <cctype>
+#include <charconv>
 #include <cstdint>
 #include <cstdlib>
 #include <string>
@@ -18,6 +19,7 @@ const char* const kOpenOptionsXml = R"(<OpenOptionList>
     <Value>SIGNEDBYTE</Value>
   </Option>
   <Option name='KEEP_COPIES' type='boolean' default='NO' description='Whether stores of statistics, histograms and color tables keep what was stored before in FILE.zmcmeta until they have reached the disk'/>
+  <Option name='OVERVIEW_LEVEL' type='string' description='Number of the overview, from 0, to show in place of the raster; "2 only" without the coarser ones, NONE for the raster without any'/>
 </OpenOptionList>)";
 
 namespace {
@@ -109,6 +111,15 @@ bool TakeCount(CSLConstList options, const char* name, const char* automatic, Nu
     return true;
 }
 
+// Words of GDAL's own: "2", "2 only", "NONE" for the raster without overviews.
+void TakeOverview(const std::string& word, OpenOptions& parsed) {
+    int number = 0;
+    if (std::from_chars(word.data(), word.data() + word.size(), number).ec == std::errc() &&
+        number >= 0)
+        parsed.overview = number;
+    parsed.alone = EQUAL(word.c_str(), "NONE") || CPLString(word).ifind("only") != word.npos;
+}
+
 }  // namespace
 
 OpenOptions OpenOptionsFrom(CSLConstList options) {
@@ -116,6 +127,7 @@ OpenOptions OpenOptionsFrom(CSLConstList options) {
     if (EQUAL(CSLFetchNameValueDef(options, "INT8_AS", "INT16"), "SIGNEDBYTE"))
         parsed.signedByteAs = SignedByteAs::FlaggedByte;
     parsed.keepCopies = CPLFetchBool(options, "KEEP_COPIES", false);
+    TakeOverview(CSLFetchNameValueDef(options, "OVERVIEW_LEVEL", ""), parsed);
     return parsed;
 }
 

@@ -19,6 +19,9 @@ extern const char* const kCreationOptionsXml;
 struct OpenOptions {
     SignedByteAs signedByteAs = SignedByteAs::Int16;
     bool keepCopies = false;  // zmchost::Raster::KeepCopies
+    // The overview, counted from 0, that is shown in place of the raster; empty for the raster.
+    std::optional<int> overview;
+    bool alone = false;  // without coarser overviews
 };
 
 OpenOptions OpenOptionsFrom(CSLConstList options);

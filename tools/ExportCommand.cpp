@@ -1,7 +1,6 @@
 #include <cpl_string.h>
 #include <gdal_utils.h>
 
-#include <cmath>
 #include <cstdio>
 #include <filesystem>
 
@@ -33,9 +32,7 @@ private:
     std::string format;
     std::vector<std::string> creationOptions;
 
-    DatasetPtr OpenLevel(const zmchost::PyramidFileInfo& info, std::uint32_t wanted) const;
-    DatasetPtr Georeferenced(GDALDataset& shown, const zmchost::PyramidFileInfo& info,
-                             std::uint32_t wanted) const;
+    DatasetPtr OpenLevel(std::uint32_t wanted) const;
     std::vector<std::string> Arguments(GDALDataset& raster, zmchost::Window& area) const;
     void Translate(GDALDataset& dataset, const std::vector<std::string>& arguments) const;
 };
@@ -57,8 +54,8 @@ void ExportCommand::Describe(OptionTable& table) {
         "  zmcraster export scene.pyr band4.img --bands 4 --format HFA");
 }
 
-DatasetPtr ExportCommand::OpenLevel(const zmchost::PyramidFileInfo& info,
-                                    std::uint32_t wanted) const {
+DatasetPtr ExportCommand::OpenLevel(std::uint32_t wanted) const {
+    const zmchost::PyramidFileInfo info = ReadLayout(file);
     if (!info.complete) FailAsIncomplete(file, std::to_string(info.bytesMissing));
     const std::uint32_t base = info.header.levelMin;
     if (!info.FindLevel(wanted))
@@ -68,49 +65,6 @@ DatasetPtr ExportCommand::OpenLevel(const zmchost::PyramidFileInfo& info,
     std::vector<std::string> options;
     if (wanted > base) options.push_back("OVERVIEW_LEVEL=" + std::to_string(wanted - base - 1));
     return OpenDataset(file, options);
-}
-
-// A virtual raster around it; its pixels are read from it.
-DatasetPtr VirtualCopy(GDALDataset& dataset) {
-    CPLStringList list;
-    list.AddString("-of");
-    list.AddString("VRT");
-    const std::unique_ptr<GDALTranslateOptions, decltype(&GDALTranslateOptionsFree)> translate(
-        GDALTranslateOptionsNew(list.List(), nullptr), &GDALTranslateOptionsFree);
-    return DatasetPtr(GDALDataset::FromHandle(
-        GDALTranslate("", GDALDataset::ToHandle(&dataset), translate.get(), nullptr)));
-}
-
-void ScaleControlPoints(GDALDataset& finest, GDALDataset& target, double factor) {
-    std::vector<GDAL_GCP> points(finest.GetGCPs(), finest.GetGCPs() + finest.GetGCPCount());
-    for (GDAL_GCP& point : points) {
-        point.dfGCPPixel /= factor;
-        point.dfGCPLine /= factor;
-    }
-    if (!points.empty())
-        target.SetGCPs(static_cast<int>(points.size()), points.data(), finest.GetGCPSpatialRef());
-}
-
-// GDAL stretches the pixels of an overview over the whole raster. Those of a level cover 2, 4, 8
-// ... pixels of the finest each, and what is over at the edges is covered by none: where the sizes
-// do not divide, the level gets the georeference that its pixels have. Empty where nothing has to
-// change.
-DatasetPtr ExportCommand::Georeferenced(GDALDataset& shown, const zmchost::PyramidFileInfo& info,
-                                        std::uint32_t wanted) const {
-    const std::uint32_t above = wanted - info.header.levelMin;
-    const auto* const base = info.FindLevel(info.header.levelMin);
-    const std::uint32_t mask = (1u << above) - 1;
-    if (!base || ((base->width | base->height) & mask) == 0) return nullptr;
-    const DatasetPtr finest = OpenDataset(file);
-    DatasetPtr corrected = VirtualCopy(shown);
-    if (!corrected) throw Failure(file, TakeGdalError(file));
-    double transform[6];
-    if (finest->GetGeoTransform(transform) == CE_None) {
-        for (const int i : {1, 2, 4, 5}) transform[i] *= std::ldexp(1.0, static_cast<int>(above));
-        corrected->SetGeoTransform(transform);
-    }
-    ScaleControlPoints(*finest, *corrected, std::ldexp(1.0, static_cast<int>(above)));
-    return corrected;
 }
 
 std::vector<std::string> ExportCommand::Arguments(GDALDataset& raster,
@@ -185,8 +139,7 @@ void ExportCommand::Translate(GDALDataset& dataset,
 
 ExitStatus ExportCommand::Run() {
     const auto wanted = part.Level();
-    const zmchost::PyramidFileInfo info = ReadLayout(file);
-    const DatasetPtr dataset = OpenLevel(info, wanted);
+    const DatasetPtr dataset = OpenLevel(wanted);
     zmchost::Window area;
     const std::vector<std::string> arguments = Arguments(*dataset, area);
     std::error_code ignored;
@@ -195,8 +148,7 @@ ExitStatus ExportCommand::Run() {
     CheckIsNoDevice(target);
     if (fs::exists(target, ignored) && fs::equivalent(file, target, ignored))
         throw Failure(target, "it is the pyramid itself; name another file");
-    const DatasetPtr corrected = Georeferenced(*dataset, info, wanted);
-    Translate(corrected ? *corrected : *dataset, arguments);
+    Translate(*dataset, arguments);
     if (json)
         PrintDocument({{"schema", kSchema},
                        {"file", file},

@@ -99,8 +99,19 @@ class Reading(FolderTest):
                                                        size * -0.5, size * -299.9))
             self.assertEqual(level.GetProjection(), dataset.GetProjection())
         self.assertIn("32633", srs)
-        # GDAL's own view of a level stretches it over the whole raster, whatever the driver tells.
-        stretched = gdal.OpenEx(dataset.GetDescription(), open_options=["OVERVIEW_LEVEL=2"])
+        for index, width in enumerate((511, 255, 127)):
+            for word in ("%d", "%d only"):
+                level = gdal.OpenEx(dataset.GetDescription(),
+                                    open_options=["OVERVIEW_LEVEL=" + word % index])
+                self.assertEqual(level.RasterXSize, width)
+                np.testing.assert_allclose(
+                    level.GetGeoTransform(),
+                    dataset.GetRasterBand(1).GetOverview(index).GetDataset().GetGeoTransform(),
+                    rtol=1e-15)
+                np.testing.assert_array_equal(
+                    level.ReadAsArray(), dataset.GetRasterBand(1).GetOverview(index).ReadAsArray())
+        # That of a translation with -ovr is stretched over the whole raster, without a word to us.
+        stretched = gdal.Translate("", dataset, format="MEM", overviewLevel=2)
         self.assertEqual(stretched.GetGeoTransform()[1], 300.0379 * (1023 / 127))
 
     def test_levels_of_a_raster_without_georeference_have_none(self):
