@@ -7,6 +7,8 @@
 #include <cstdint>
 #include <cstdlib>
 
+#include "host/base/Error.h"
+
 namespace zmcgdal {
 
 const char* const kOpenOptionsXml = R"(<OpenOptionList>
@@ -15,6 +17,7 @@ const char* const kOpenOptionsXml = R"(<OpenOptionList>
     <Value>SIGNEDBYTE</Value>
   </Option>
   <Option name='KEEP_COPIES' type='boolean' default='NO' description='Whether stores of statistics, histograms and color tables keep what was stored before in FILE.zmcmeta until they have reached the disk'/>
+  <Option name='REMOTE_CACHE' type='string' default='64M' description='Bytes of a file behind a network that are kept, in bytes or with K, M or G'/>
 </OpenOptionList>)";
 
 const char* const kCreationOptionsXml = R"(<CreationOptionList>
@@ -106,6 +109,12 @@ OpenOptions OpenOptionsFrom(CSLConstList options) {
     if (EQUAL(CSLFetchNameValueDef(options, "INT8_AS", "INT16"), "SIGNEDBYTE"))
         parsed.signedByteAs = SignedByteAs::FlaggedByte;
     parsed.keepCopies = CPLFetchBool(options, "KEEP_COPIES", false);
+    if (const char* const cache = CSLFetchNameValue(options, "REMOTE_CACHE")) {
+        const auto size = ParseSize(cache);
+        if (!size)
+            throw zmchost::Error("REMOTE_CACHE", "take " + std::string(cache), "it is no size");
+        parsed.remoteBytes = *size;
+    }
     return parsed;
 }
 

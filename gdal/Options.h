@@ -4,10 +4,12 @@
 
 #include <cpl_string.h>
 
+#include <cstdint>
 #include <optional>
 #include <string>
 
 #include "gdal/SampleType.h"
+#include "gdal/VsiSource.h"
 #include "host/build/PyramidBuilder.h"
 
 namespace zmcgdal {
@@ -19,6 +21,7 @@ extern const char* const kCreationOptionsXml;
 struct OpenOptions {
     SignedByteAs signedByteAs = SignedByteAs::Int16;
     bool keepCopies = false;  // zmchost::Raster::KeepCopies
+    std::uint64_t remoteBytes = kRemoteBytes;
 };
 
 OpenOptions OpenOptionsFrom(CSLConstList options);
