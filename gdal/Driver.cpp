@@ -91,7 +91,7 @@ std::unique_ptr<Dataset> OpenDataset(GDALOpenInfo& info) {
 // GDAL has not looked at what a URL leads to, and has a driver of its own for those that no other
 // one takes: what cannot be read in parts, or is no pyramid, is left to that.
 std::unique_ptr<Dataset> OpenUrl(GDALOpenInfo& info) {
-    const std::string name = std::string("/vsicurl/") + info.pszFilename;
+    const std::string name = NameOfUrl(info.pszFilename);
     const OpenOptions options = OpenOptionsFrom(info.papszOpenOptions);
     std::shared_ptr<RemoteSource> source;
     try {
@@ -114,6 +114,7 @@ GDALDataset* Open(GDALOpenInfo* info) {
 void Describe(GDALDriver& driver) {
     driver.SetDescription(kName);
     driver.SetMetadataItem(GDAL_DCAP_RASTER, "YES");
+    driver.SetMetadataItem(GDAL_DCAP_VIRTUALIO, "YES");
     driver.SetMetadataItem(GDAL_DMD_LONGNAME, "Pyramid raster");
     driver.SetMetadataItem(GDAL_DMD_EXTENSION, "pyr");
     driver.SetMetadataItem(GDAL_DMD_EXTENSIONS, "pyr");

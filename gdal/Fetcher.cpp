@@ -142,6 +142,10 @@ std::string NetworkPart(const std::string& name) {
     return inArchive ? rest.substr(0, EndOfArchive(rest)) : rest;
 }
 
+std::string NameOfUrl(const std::string& name) {
+    return IsHttp(name) ? std::string(kCurl) + name : name;
+}
+
 std::unique_ptr<Fetcher> MakeFetcher(const std::string& name) {
     const bool plain =
         name.starts_with(kCurl) && IsHttp(std::string_view(name).substr(kCurl.size()));

@@ -56,6 +56,9 @@ public:
 // that part cannot be told, it is the rest of the name.
 std::string NetworkPart(const std::string& name);
 
+// What GDAL's file systems call a URL of the web; any other name as it is.
+std::string NameOfUrl(const std::string& name);
+
 // A fetcher for a name that has such a part. Nothing is asked for yet.
 std::unique_ptr<Fetcher> MakeFetcher(const std::string& name);
 // One that reads by GDAL's own file systems alone, with a further request before the first range

@@ -65,6 +65,7 @@ std::shared_ptr<ByteSource> OpenByName(const std::string& name, bool forUpdate,
 
 std::shared_ptr<VsiSource> VsiSource::Open(const std::string& name, OpenMode mode) {
     // Many of them cannot be written, and say so aloud.
+    const CPLErrorStateBackuper before;
     CPLPushErrorHandler(CPLQuietErrorHandler);
     VSILFILE* const opened = VSIFOpenL(name.c_str(), AccessFor(mode));
     CPLPopErrorHandler();

@@ -384,11 +384,9 @@ class Changes(ServedTest):
     def test_within_a_window(self):
         dataset = self.open()
         self.server.take()
-        later = []
 
         def swap_at_third(handler):
-            if len(self.server.log) == 3 and not later:
-                later.append(True)
+            if handler.number == 3:
                 self.swap()
 
         self.server.fault = swap_at_third
@@ -419,7 +417,7 @@ class Faults(ServedTest):
             dataset = self.open()
             self.server.take()
             self.server.fault = \
-                lambda handler, fault=fault: fault if len(self.server.log) == 2 else None
+                lambda handler, fault=fault: fault if handler.number >= 2 else None
             self.assert_fails("cannot read it: .*" + reason, lambda: self.read(dataset))
             self.server.fault = None
             self.check_window(dataset)

@@ -53,6 +53,7 @@ class Handler(BaseHTTPRequestHandler):
         self.log_entry.headers = dict(self.headers)
         with server.lock:
             server.log.append(self.log_entry)
+            self.number = len(server.log)  # since the last look at the log
         if server.delay:
             time.sleep(server.delay)
         fault = server.fault(self) if server.fault else None
