@@ -5,7 +5,8 @@ Two rasters, each as a pyramid and as both kinds of COG: 16,384 x 12,288 pixels 
 1,296,000 x 525,000 of one byte, of which nothing but the header, or the directories, is on disk. A
 local server writes down each request, and waits before each answer. Prints, for opening, one tile,
 a window of 1024 x 768, a screen of an overview and a full read, the requests (those that GDAL makes
-before it has chosen a driver included), the bytes of all answers and the time with either delay.
+before it has chosen a driver included), the bytes of all answers and the time with either delay;
+and the same with GDAL_DISABLE_READDIR_ON_OPEN=EMPTY_DIR, without a search for files beside the raster.
 Full reads are of the smaller raster alone.
 
     bench/remote_vs_cog.py [--scratch DIR] [--width N] [--delays 5,50]
@@ -97,7 +98,7 @@ def measure(server, name, work):
     gdal.VSICurlClearCache()
     server.take()
     start = time.monotonic()
-    dataset = gdal.Open("/vsicurl/" + server.url + name)
+    dataset = gdal.Open(name)
     if work:
         server.take()
         start = time.monotonic()
@@ -105,6 +106,15 @@ def measure(server, name, work):
     seconds = time.monotonic() - start
     requests = server.take()
     return len(requests), sum(request.sent for request in requests), seconds
+
+
+def row(server, name, work, delays):
+    times = []
+    for delay in delays:
+        server.delay = delay / 1000
+        requests, sent, seconds = measure(server, name, work)
+        times.append(f" {seconds:.3f} s |")
+    return f" {requests} | {sent:,} |" + "".join(times)
 
 
 def main():
@@ -118,9 +128,9 @@ def main():
         make_sparse(folder)
         server = Server(folder)
         delays = [int(delay) for delay in arguments.delays.split(",")]
-        print("| raster | step | file | requests | bytes |" +
-              "".join(f" {delay} ms |" for delay in delays))
-        print("|---|---|---|--:|--:|" + "--:|" * len(delays))
+        columns = " requests | bytes |" + "".join(f" {delay} ms |" for delay in delays)
+        print("| raster | step | file |" + columns + columns)
+        print("|---|---|---|" + ("--:|--:|" + "--:|" * len(delays)) * 2)
         for raster, files in (
                 (f"{arguments.width:,} x {arguments.width * 3 // 4:,} x 3",
                  ("large.pyr", "large_none.tif", "large_deflate.tif")),
@@ -129,14 +139,17 @@ def main():
             full = files[0] == "large.pyr"
             plain = gdal.Open(os.path.join(folder, files[0]))
             for step, work in steps(plain, full):
-                for name, label in zip(files, ("pyramid", "COG, raw", "COG, DEFLATE")):
-                    times = []
-                    for delay in delays:
-                        server.delay = delay / 1000
-                        requests, sent, seconds = measure(server, name, work)
-                        times.append(seconds)
-                    print(f"| {raster} | {step} | {label} | {requests} | {sent:,} |" +
-                          "".join(f" {seconds:.3f} s |" for seconds in times), flush=True)
+                names = ["/vsicurl/" + server.url + name for name in files]
+                labels = ["pyramid", "COG, raw", "COG, DEFLATE"]
+                if not work:
+                    names.insert(1, server.url + files[0])
+                    labels.insert(1, "pyramid, plain URL")
+                for name, label in zip(names, labels):
+                    print(f"| {raster} | {step} | {label} |", end="")
+                    for listing in ("FALSE", "EMPTY_DIR"):
+                        gdal.SetConfigOption("GDAL_DISABLE_READDIR_ON_OPEN", listing)
+                        print(row(server, name, work, delays), end="", flush=True)
+                    print()
         server.stop()
 
 

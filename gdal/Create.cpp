@@ -7,6 +7,7 @@
 #include "gdal/Band.h"
 #include "gdal/Dataset.h"
 #include "gdal/ErrorCatcher.h"
+#include "gdal/Fetcher.h"
 #include "gdal/GdalRasterSource.h"
 #include "gdal/Reporting.h"
 #include "gdal/Sidecar.h"
@@ -70,6 +71,12 @@ std::string SpoolName() {
     throw zmchost::Error(target, "create the pyramid", "GDAL cannot write it there");
 }
 
+// GDAL tells so of networks beforehand; of an archive that it can write, it says that it cannot.
+void CheckWritable(const std::string& target) {
+    if (!NetworkPart(target).empty() && !VSISupportsSequentialWrite(target.c_str(), true))
+        FailToWrite(target);
+}
+
 // In order from its beginning, as every file system that can be written takes it.
 void CopyFile(const std::string& from, const std::string& target) {
     const auto source = zmchost::OpenPlainFile(from, false);
@@ -115,6 +122,7 @@ void Build(zmchost::RasterSource& pixels, const std::string& target,
 
 GDALDataset* CopyTo(const std::string& target, GDALDataset& source, bool strict,
                     CreationOptions options, GDALProgressFunc progress, void* progressData) {
+    CheckWritable(target);
     GdalRasterSource pixels(source, options.signedByte);
     if (!AcceptLosses(pixels, strict)) return nullptr;
     UseProgress(options.build, progress, progressData);
@@ -181,6 +189,7 @@ GDALDataset* CreateNew(const char* target, int width, int height, int bands, GDA
         if (!parsed) return nullptr;
         const zelm::RasterProps props =
             PropsOf(target, width, height, bands, PixelTypeFor(type, parsed->signedByte));
+        CheckWritable(target);
         auto spool = std::make_unique<zmchost::BuildFile>(
             IsVirtualName(target) ? SpoolName() : target, true);
         const zmchost::Raster raster =

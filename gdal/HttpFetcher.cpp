@@ -101,6 +101,19 @@ private:
     CPLStringList list;
 };
 
+// GDAL's client changes how the process takes a broken pipe for the time of a request, and changes
+// it back: of several at once, the last one would put back what another one had made of it.
+class BrokenPipesIgnored {
+public:
+    BrokenPipesIgnored() : before(CPLHTTPIgnoreSigPipe()) {}
+    ~BrokenPipesIgnored() { CPLHTTPRestoreSigPipeHandler(before); }
+    BrokenPipesIgnored(const BrokenPipesIgnored&) = delete;
+    BrokenPipesIgnored& operator=(const BrokenPipesIgnored&) = delete;
+
+private:
+    void* const before;
+};
+
 // Calls work(index, worker) for all indices below `count`, on this thread and on as many more as
 // that takes and there are to be had. The first exception comes out when all have ended.
 template <class Work>
@@ -108,6 +121,7 @@ void OnThreads(std::size_t count, std::size_t workers, Work&& work) {
     std::atomic<std::size_t> next{0};
     std::vector<std::exception_ptr> thrown(workers);
     const Settings settings;
+    const BrokenPipesIgnored meanwhile;
     const auto run = [&](std::size_t worker) {
         try {
             for (std::size_t index = next++; index < count; index = next++) work(index, worker);

@@ -40,8 +40,9 @@ class Handler(BaseHTTPRequestHandler):
             return
         try:
             for start in range(0, len(body), 1 << 20):
-                self.wfile.write(body[start:start + (1 << 20)])
+                # Before, so that whoever has got it finds it counted.
                 self.log_entry.sent += len(body[start:start + (1 << 20)])
+                self.wfile.write(body[start:start + (1 << 20)])
         except OSError:
             self.close_connection = True
 
