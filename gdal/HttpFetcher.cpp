@@ -138,8 +138,8 @@ void OnThreads(std::size_t count, std::size_t workers, Work&& work) {
                 settings.Apply();
                 run(worker);
             });
-    } catch (const std::system_error&) {
-        // Those that there are do it.
+    } catch (const std::exception&) {
+        // Neither threads nor memory for more: those that there are do it.
     }
     run(0);
     for (std::thread& thread : threads) thread.join();

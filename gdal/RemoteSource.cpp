@@ -44,7 +44,9 @@ void RemoteSource::EndPlan() {
 
 bool RemoteSource::Advise(WindowTiles tiles) {
     const std::lock_guard lock(mutex);
-    return FetchMissing(tiles.First(groupBytes));
+    std::vector<ByteRange> ranges = tiles.First(groupBytes);
+    if (!ranges.empty()) ranges.front().size = std::min(ranges.front().size, groupBytes);
+    return FetchMissing(std::move(ranges));
 }
 
 void RemoteSource::SetDocument(std::uint64_t offset) {
@@ -100,7 +102,8 @@ bool RemoteSource::FetchMissing(std::vector<ByteRange> ranges) {
 bool RemoteSource::FetchAt(std::uint64_t offset, std::uint64_t size) {
     std::vector<ByteRange> ranges;
     if (plan) ranges = plan->From(offset, groupBytes);
-    if (ranges.empty()) ranges.push_back(Ahead(offset, size));
+    // Of a tile that has more than a group, what is asked for is enough.
+    if (ranges.empty() || ranges.front().size > groupBytes) ranges = {Ahead(offset, size)};
     return FetchMissing(std::move(ranges));
 }
 

@@ -66,9 +66,9 @@ std::vector<ByteRange> WindowTiles::Collect(std::uint32_t row, std::optional<std
         if (found.empty() && !matches) return true;
         if (found.empty()) reached = tileRow;
         bytes += range.size;
-        if (bytes > most) return false;
+        if (!found.empty() && bytes > most) return false;
         found.push_back(range);
-        return true;
+        return found.size() < kMostTiles;
     });
     return found;
 }
@@ -77,8 +77,16 @@ std::vector<ByteRange> WindowTiles::First(std::uint64_t most) {
     return Collect(window.y / grid.tileSize, std::nullopt, most);
 }
 
+// Without a look at each tile.
+bool WindowTiles::MayHave(std::uint64_t offset) const {
+    if (places) return offset >= header.tileDataStart && offset < header.tileDataEnd;
+    const std::uint64_t begin = header.LevelOffset(level);
+    return offset >= begin && offset - begin < header.LevelBytes(level);
+}
+
 // Reading goes on downwards as a rule.
 std::vector<ByteRange> WindowTiles::From(std::uint64_t offset, std::uint64_t most) {
+    if (!MayHave(offset)) return {};
     const std::uint32_t first = window.y / grid.tileSize;
     std::vector<ByteRange> found = Collect(reached, offset, most);
     if (found.empty() && reached != first) found = Collect(first, offset, most);

@@ -25,8 +25,11 @@ public:
     WindowTiles(const zmchost::PyramidHeader& fileHeader, std::uint32_t fileLevel,
                 const zelm::Rectangle& shown, std::vector<std::uint32_t> bandNumbers);
 
-    // The tiles from the first one on, as many as have `most` bytes together; none if the first
-    // alone has more.
+    // A file may have tiles of one byte: the most of them that are told at once.
+    static constexpr std::size_t kMostTiles = 65536;
+
+    // The tiles from the first one on, as many as have `most` bytes together, kMostTiles at most;
+    // the first one, whatever it has.
     std::vector<ByteRange> First(std::uint64_t most);
     // The same from the tile on that has the byte at `offset`; none where no tile has it.
     std::vector<ByteRange> From(std::uint64_t offset, std::uint64_t most);
@@ -39,6 +42,7 @@ private:
     std::vector<ByteRange> Collect(std::uint32_t row, std::optional<std::uint64_t> offset,
                                    std::uint64_t most);
     std::uint32_t EndRow() const;
+    bool MayHave(std::uint64_t offset) const;
     std::uint64_t PlaceOf(std::uint32_t band, std::uint32_t column, std::uint32_t row) const;
 
     zmchost::PyramidHeader header;

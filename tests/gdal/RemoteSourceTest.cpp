@@ -212,8 +212,19 @@ TEST(TilesOfAWindow, AreThoseOfAWalkThroughTheFile) {
         for (const ByteRange& range : part) most += range.size;
         ASSERT_EQ(tiles.From(part.front().End() - 1, most), part);
         ASSERT_THAT(tiles.From(5, 1 << 30), IsEmpty());
-        ASSERT_THAT(tiles.First(expected.front().size - 1), IsEmpty());
+        ASSERT_THAT(tiles.From(header.tileDataEnd, 1 << 30), IsEmpty());
+        ASSERT_THAT(tiles.First(0), ElementsAre(expected.front()));
     }
+}
+
+TEST(TilesOfAWindow, AreToldInPartsWhereTheyAreMany) {
+    const auto header = HeaderOf(1000, 500, 1, 1);
+    WindowTiles tiles(header, 0, header.Geometry(0).Whole(), {0});
+    const auto first = tiles.First(1 << 30);
+    EXPECT_EQ(first.size(), WindowTiles::kMostTiles);
+    const auto next = tiles.From(first.back().End(), 1 << 30);
+    EXPECT_EQ(next.size(), WindowTiles::kMostTiles);
+    EXPECT_EQ(next.front().offset, first.back().End());
 }
 
 // Gives out parts of `bytes`, and remembers which.
@@ -312,6 +323,19 @@ TEST(RemoteFile, KeepsToItsStoreWhateverIsPlanned) {
     }
     EXPECT_LE(remote.fetcher->groups, static_cast<int>(wanted / (1 << 19)) + 2);
     EXPECT_LE(fetched, 2 * wanted);
+}
+
+TEST(RemoteFile, FetchesPartsOfTilesThatAreLargerThanItsStore) {
+    const auto header = HeaderOf(2000, 1000, 8, 1000);
+    const Remote remote(RandomBytes(header.tileDataEnd), 1 << 20);
+    const WindowTiles tiles(header, 0, header.Geometry(0).Whole(), {0});
+    EXPECT_TRUE(remote.source->Advise(tiles));
+    remote.source->Plan(tiles);
+    const std::uint64_t place = header.LevelOffset(0) + 10000000;
+    Bytes got(1000);
+    EXPECT_EQ(remote.source->ReadAt(place, got.data(), got.size()), got.size());
+    EXPECT_EQ(got, Part(remote.fetcher->bytes, {place, got.size()}));
+    for (const ByteRange& range : remote.fetcher->asked) EXPECT_LE(range.size, 1U << 19);
 }
 
 TEST(RemoteFile, TellsWhyNothingCame) {
