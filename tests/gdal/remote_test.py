@@ -1,6 +1,8 @@
 """Pyramids behind a network: how many requests they take, and what a server may do wrong."""
 import gzip
 import os
+import shutil
+import tempfile
 import time
 import unittest
 import zipfile
@@ -8,7 +10,7 @@ import zipfile
 import numpy as np
 from osgeo import gdal
 
-from rasters import FolderTest, halve, memory_dataset, place, samples
+from rasters import DRIVER, FolderTest, halve, memory_dataset, place, samples
 from server import Server
 
 FRONT = "bytes=0-16383"
@@ -39,19 +41,25 @@ class ServedTest(FolderTest):
     def setUpClass(cls):
         cls.array = samples(gdal.GDT_Byte, cls.HEIGHT, cls.WIDTH, 3)
         cls.other = samples(gdal.GDT_Byte, cls.HEIGHT, cls.WIDTH, 3, seed=2)
+        cls.made = tempfile.mkdtemp(prefix="zmcgdal")
+        cls.addClassCleanup(shutil.rmtree, cls.made)
+        for array, name in ((cls.array, "scene.pyr"), (cls.other, "other.pyr")):
+            source = memory_dataset(array, gdal.GDT_Byte)
+            place(source)
+            gdal.GetDriverByName(DRIVER).CreateCopy(os.path.join(cls.made, name), source)
 
     def setUp(self):
         super().setUp()
-        self.file = self.make(self.array, "scene.pyr")
+        self.file = self.take("scene.pyr")
         self.server = Server(self.folder)
         self.addCleanup(self.server.stop)
         self.addCleanup(gdal.VSICurlClearCache)
         self.name = "/vsicurl/" + self.server.url + "scene.pyr"
 
-    def make(self, array, name):
-        source = memory_dataset(array, gdal.GDT_Byte)
-        place(source)
-        return self.copy(source, name)
+    def take(self, name):
+        for ending in ("", ".aux.xml"):
+            shutil.copy(os.path.join(self.made, name + ending), self.path(name + ending))
+        return self.path(name)
 
     def open(self, name=None, options=()):
         dataset = gdal.OpenEx(name or self.name, gdal.OF_RASTER, open_options=list(options))
@@ -70,7 +78,7 @@ class ServedTest(FolderTest):
     def swap(self):
         """Puts another raster of the same size in place of the one that is served."""
         size = os.path.getsize(self.file)
-        made = self.make(self.other, "other.pyr")
+        made = self.take("other.pyr")
         with open(made, "ab") as stream:
             stream.truncate(size)
         os.replace(made, self.file)
@@ -401,7 +409,7 @@ class Changes(ServedTest):
         pack(self.file)
         dataset = self.open(f"/vsizip//vsicurl/{self.server.url}a.zip/scene.pyr")
         self.check_window(dataset, 0, 0, 300, 300)
-        pack(self.make(self.other, "other.pyr"))
+        pack(self.take("other.pyr"))
         os.utime(self.path("a.zip"), (time.time() + 10,) * 2)
         self.assert_fails("has changed", lambda: dataset.ReadAsArray(600, 600, 1024, 768))
 
