@@ -155,13 +155,13 @@ HttpFetcher::HttpFetcher(std::string fileUrl, std::string vsiName)
 HttpFetcher::~HttpFetcher() {
     for (std::size_t slot = 0; slot < slots; ++slot) {
         CPLStringList options;
-        options.SetNameValue("CLOSE_PERSISTENT", Session(slot).c_str());
+        options.SetNameValue("CLOSE_PERSISTENT", ConnectionName(slot).c_str());
         CPLHTTPFetch(url.c_str(), options.List());
     }
 }
 
 // GDAL must not be asked for one from two threads at once.
-std::string HttpFetcher::Session(std::size_t slot) const {
+std::string HttpFetcher::ConnectionName(std::size_t slot) const {
     return "zmcraster-" + std::to_string(number) + '-' + std::to_string(slot);
 }
 
@@ -177,7 +177,7 @@ std::string HttpFetcher::HeadersFor(const ByteRange& range) const {
 
 HttpFetcher::Answer HttpFetcher::Ask(const ByteRange& range, std::size_t slot) const {
     CPLStringList options;
-    options.SetNameValue("PERSISTENT", Session(slot).c_str());
+    options.SetNameValue("PERSISTENT", ConnectionName(slot).c_str());
     options.SetNameValue("HEADERS", HeadersFor(range).c_str());
     options.SetNameValue("MAX_FILE_SIZE", std::to_string(range.size).c_str());
     const CPLErrorStateBackuper before;

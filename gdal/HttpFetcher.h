@@ -36,7 +36,7 @@ private:
 
     Answer Ask(const ByteRange& range, std::size_t slot) const;
     Bytes AskSame(const ByteRange& range, std::size_t slot) const;
-    std::string Session(std::size_t slot) const;
+    std::string ConnectionName(std::size_t slot) const;
     std::string HeadersFor(const ByteRange& range) const;
 
     const std::string url;
