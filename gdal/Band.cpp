@@ -3,6 +3,8 @@
 #include <algorithm>
 #include <climits>
 #include <cstring>
+#include <optional>
+#include <span>
 
 #include "core/PixelVocabulary.h"
 #include "gdal/Create.h"
@@ -179,8 +181,8 @@ void Band::WaitingBlock::Settle() const {
 // Nobody takes them for the new pixels. A sidecar without any is not written for this.
 void Band::DropSidecarStatistics() {
     if (owner.IsOverview()) return;
-    char** const items = GDALPamRasterBand::GetMetadata("");
-    if (HasStatistics(items)) GDALPamRasterBand::SetMetadata(WithoutStatistics(items).List(), "");
+    char** const items = CompanionBand::GetMetadata("");
+    if (HasStatistics(items)) CompanionBand::SetMetadata(WithoutStatistics(items).List(), "");
 }
 
 CPLErr Band::IWriteBlock(int blockX, int blockY, void* data) {
@@ -223,6 +225,10 @@ CPLErr Band::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, voi
                                     bufferType, pixelSpace, lineSpace, extra, &tried);
             if (tried) return result;
         }
+        std::optional<PlannedRead> planned;
+        if (mode == GF_Read)
+            planned.emplace(owner.File(), owner.Level(), RectangleOf(x, y, width, height),
+                            std::span(&nBand, 1));
         if (mode == GF_Read && bufferWidth == width && bufferHeight == height &&
             owner.ReadsDirectly(x, y, width, height)) {
             const int band = static_cast<int>(index);
@@ -232,9 +238,15 @@ CPLErr Band::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, voi
                 return CE_None;
             return CE_Failure;
         }
-        return GDALPamRasterBand::IRasterIO(mode, x, y, width, height, data, bufferWidth,
-                                            bufferHeight, bufferType, pixelSpace, lineSpace, extra);
+        return CompanionBand::IRasterIO(mode, x, y, width, height, data, bufferWidth, bufferHeight,
+                                        bufferType, pixelSpace, lineSpace, extra);
     });
+}
+
+CPLErr Band::AdviseRead(int x, int y, int width, int height, int bufferWidth, int bufferHeight,
+                        GDALDataType bufferType, char** options) {
+    return owner.AdviseRead(x, y, width, height, bufferWidth, bufferHeight, bufferType, 1, &nBand,
+                            options);
 }
 
 // --- no-data values and masks ---
@@ -243,7 +255,7 @@ double Band::GetNoDataValue(int* success) {
     ReportSuccess(success, false);
     return Reporting<double>(0.0, [&]() -> double {
         if (owner.IsOverview()) return MainBand()->GetNoDataValue(success);
-        return GDALPamRasterBand::GetNoDataValue(success);
+        return CompanionBand::GetNoDataValue(success);
     });
 }
 
@@ -251,7 +263,7 @@ std::int64_t Band::GetNoDataValueAsInt64(int* success) {
     ReportSuccess(success, false);
     return Reporting<std::int64_t>(0, [&]() -> std::int64_t {
         if (owner.IsOverview()) return MainBand()->GetNoDataValueAsInt64(success);
-        return GDALPamRasterBand::GetNoDataValueAsInt64(success);
+        return CompanionBand::GetNoDataValueAsInt64(success);
     });
 }
 
@@ -259,7 +271,7 @@ std::uint64_t Band::GetNoDataValueAsUInt64(int* success) {
     ReportSuccess(success, false);
     return Reporting<std::uint64_t>(0, [&]() -> std::uint64_t {
         if (owner.IsOverview()) return MainBand()->GetNoDataValueAsUInt64(success);
-        return GDALPamRasterBand::GetNoDataValueAsUInt64(success);
+        return CompanionBand::GetNoDataValueAsUInt64(success);
     });
 }
 
@@ -267,7 +279,7 @@ CPLErr Band::SetNoDataValue(double value) {
     return Reporting(CE_Failure, [&] {
         if (owner.IsOverview()) return MainBand()->SetNoDataValue(value);
         InvalidateMaskBand();
-        return GDALPamRasterBand::SetNoDataValue(value);
+        return CompanionBand::SetNoDataValue(value);
     });
 }
 
@@ -275,7 +287,7 @@ CPLErr Band::SetNoDataValueAsInt64(std::int64_t value) {
     return Reporting(CE_Failure, [&] {
         if (owner.IsOverview()) return MainBand()->SetNoDataValueAsInt64(value);
         InvalidateMaskBand();
-        return GDALPamRasterBand::SetNoDataValueAsInt64(value);
+        return CompanionBand::SetNoDataValueAsInt64(value);
     });
 }
 
@@ -283,7 +295,7 @@ CPLErr Band::SetNoDataValueAsUInt64(std::uint64_t value) {
     return Reporting(CE_Failure, [&] {
         if (owner.IsOverview()) return MainBand()->SetNoDataValueAsUInt64(value);
         InvalidateMaskBand();
-        return GDALPamRasterBand::SetNoDataValueAsUInt64(value);
+        return CompanionBand::SetNoDataValueAsUInt64(value);
     });
 }
 
@@ -291,14 +303,14 @@ CPLErr Band::DeleteNoDataValue() {
     return Reporting(CE_Failure, [&] {
         if (owner.IsOverview()) return MainBand()->DeleteNoDataValue();
         InvalidateMaskBand();
-        return GDALPamRasterBand::DeleteNoDataValue();
+        return CompanionBand::DeleteNoDataValue();
     });
 }
 
 // GDAL's own search comes first: a mask file, an alpha band or a set of values over all bands
 // override what the pixels of one band tell.
 bool Band::UsesOwnMask() {
-    GDALPamRasterBand::GetMaskBand();
+    CompanionBand::GetMaskBand();
     const bool byValue = (nMaskFlags & GMF_NODATA) != 0 && (nMaskFlags & GMF_PER_DATASET) == 0;
     const bool mayBeNotFinite =
         GDALDataTypeIsFloating(eDataType) || GDALDataTypeIsComplex(eDataType);
@@ -307,7 +319,7 @@ bool Band::UsesOwnMask() {
 
 GDALRasterBand* Band::GetMaskBand() {
     return Reporting<GDALRasterBand*>(nullptr, [&]() -> GDALRasterBand* {
-        if (!UsesOwnMask()) return GDALPamRasterBand::GetMaskBand();
+        if (!UsesOwnMask()) return CompanionBand::GetMaskBand();
         if (!ownMask) ownMask = std::make_unique<MaskBand>(*this);
         return ownMask.get();
     });
@@ -317,7 +329,7 @@ GDALRasterBand* Band::GetMaskBand() {
 // as a mask of its own, it would be copied into a mask file with every translation.
 int Band::GetMaskFlags() {
     return Reporting<int>(GMF_ALL_VALID, [&]() -> int {
-        return UsesOwnMask() ? GMF_NODATA : GDALPamRasterBand::GetMaskFlags();
+        return UsesOwnMask() ? GMF_NODATA : CompanionBand::GetMaskFlags();
     });
 }
 
@@ -326,14 +338,14 @@ int Band::GetMaskFlags() {
 int Band::GetOverviewCount() {
     return Reporting<int>(0, [&]() -> int {
         const auto own = static_cast<int>(owner.Overviews().size());
-        return own > 0 || owner.IsOverview() ? own : GDALPamRasterBand::GetOverviewCount();
+        return own > 0 || owner.IsOverview() ? own : CompanionBand::GetOverviewCount();
     });
 }
 
 GDALRasterBand* Band::GetOverview(int overview) {
     return Reporting<GDALRasterBand*>(nullptr, [&]() -> GDALRasterBand* {
         const auto& own = owner.Overviews();
-        if (own.empty() && !owner.IsOverview()) return GDALPamRasterBand::GetOverview(overview);
+        if (own.empty() && !owner.IsOverview()) return CompanionBand::GetOverview(overview);
         if (overview < 0 || overview >= static_cast<int>(own.size())) return nullptr;
         return own[static_cast<std::size_t>(overview)]->BandOf(nBand);
     });
@@ -354,7 +366,7 @@ GDALColorInterp Band::DefaultInterpretation() {
 GDALColorInterp Band::GetColorInterpretation() {
     return Reporting<GDALColorInterp>(GCI_Undefined, [&]() -> GDALColorInterp {
         if (owner.IsOverview()) return MainBand()->GetColorInterpretation();
-        const GDALColorInterp chosen = GDALPamRasterBand::GetColorInterpretation();
+        const GDALColorInterp chosen = CompanionBand::GetColorInterpretation();
         if (chosen != GCI_Undefined) return chosen;
         return GetColorTable() ? GCI_PaletteIndex : DefaultInterpretation();
     });
@@ -364,13 +376,13 @@ GDALColorTable* Band::GetColorTable() {
     return Reporting<GDALColorTable*>(nullptr, [&]() -> GDALColorTable* {
         if (owner.IsOverview()) return MainBand()->GetColorTable();
         GDALColorTable* const stored = owner.File().archive.ColorTable(index);
-        return stored ? stored : GDALPamRasterBand::GetColorTable();
+        return stored ? stored : CompanionBand::GetColorTable();
     });
 }
 
 CPLErr Band::SetColorTable(GDALColorTable* table) {
     return Reporting(CE_Failure, [&] {
-        if (!StoresInFile()) return GDALPamRasterBand::SetColorTable(table);
+        if (!StoresInFile()) return CompanionBand::SetColorTable(table);
         if (owner.File().archive.StoreColorTable(index, table)) return CE_None;
         ReportError(CE_Failure, CPLE_FileIO, "the color table was not stored");
         return CE_Failure;
@@ -399,20 +411,25 @@ const CPLStringList& Band::StatisticsItems() {
     return statistics;
 }
 
+// Whoever reads pixels asks for it: behind a network no sidecar is looked at for this.
+bool Band::TellsStructure(const char* domain) const {
+    return domain && EQUAL(domain, kStructureDomain) &&
+           (structure.Count() > 0 || owner.File().raster.Remote());
+}
+
 char** Band::GetMetadataDomainList() {
     return Reporting<char**>(nullptr, [&]() -> char** {
-        return BuildMetadataDomainList(GDALPamRasterBand::GetMetadataDomainList(), TRUE, "",
+        return BuildMetadataDomainList(CompanionBand::GetMetadataDomainList(), TRUE, "",
                                        kStructureDomain, nullptr);
     });
 }
 
 char** Band::GetMetadata(const char* domain) {
     return Reporting<char**>(nullptr, [&]() -> char** {
-        if (domain && EQUAL(domain, kStructureDomain) && structure.Count() > 0)
-            return structure.List();
+        if (TellsStructure(domain)) return structure.List();
         if (!IsDefaultDomain(domain) || StatisticsItems().Count() == 0)
-            return GDALPamRasterBand::GetMetadata(domain);
-        merged = CPLStringList(CSLDuplicate(GDALPamRasterBand::GetMetadata(domain)));
+            return CompanionBand::GetMetadata(domain);
+        merged = CPLStringList(CSLDuplicate(CompanionBand::GetMetadata(domain)));
         for (int i = 0; i < statistics.Count(); ++i) {
             char* name = nullptr;
             const char* const value = CPLParseNameValue(statistics[i], &name);
@@ -425,11 +442,10 @@ char** Band::GetMetadata(const char* domain) {
 
 const char* Band::GetMetadataItem(const char* name, const char* domain) {
     return Reporting<const char*>(nullptr, [&]() -> const char* {
-        if (domain && EQUAL(domain, kStructureDomain) && structure.Count() > 0)
-            return structure.FetchNameValue(name);
+        if (TellsStructure(domain)) return structure.FetchNameValue(name);
         if (IsDefaultDomain(domain) && STARTS_WITH_CI(name, "STATISTICS_"))
             if (const char* const value = StatisticsItems().FetchNameValue(name)) return value;
-        return GDALPamRasterBand::GetMetadataItem(name, domain);
+        return CompanionBand::GetMetadataItem(name, domain);
     });
 }
 
@@ -438,7 +454,7 @@ double Band::GetMinimum(int* success) {
     return Reporting<double>(0.0, [&]() -> double {
         const StoredStatistics* const stored = Stored();
         if (!stored || !(stored->flags & zelm::StatsFlag::Minimum))
-            return GDALPamRasterBand::GetMinimum(success);
+            return CompanionBand::GetMinimum(success);
         ReportSuccess(success, true);
         return stored->minimum;
     });
@@ -449,7 +465,7 @@ double Band::GetMaximum(int* success) {
     return Reporting<double>(0.0, [&]() -> double {
         const StoredStatistics* const stored = Stored();
         if (!stored || !(stored->flags & zelm::StatsFlag::Maximum))
-            return GDALPamRasterBand::GetMaximum(success);
+            return CompanionBand::GetMaximum(success);
         ReportSuccess(success, true);
         return stored->maximum;
     });
@@ -460,8 +476,8 @@ CPLErr Band::GetStatistics(int approximate, int force, double* minimum, double* 
     return Reporting(CE_Failure, [&] {
         const StoredStatistics* const stored = Stored();
         if (!stored || !stored->IsFull())
-            return GDALPamRasterBand::GetStatistics(approximate, force, minimum, maximum, mean,
-                                                    deviation);
+            return CompanionBand::GetStatistics(approximate, force, minimum, maximum, mean,
+                                                deviation);
         if (minimum) *minimum = stored->minimum;
         if (maximum) *maximum = stored->maximum;
         if (mean) *mean = stored->mean;
@@ -472,8 +488,7 @@ CPLErr Band::GetStatistics(int approximate, int force, double* minimum, double* 
 
 CPLErr Band::SetStatistics(double minimum, double maximum, double mean, double deviation) {
     return Reporting(CE_Failure, [&] {
-        if (!StoresInFile())
-            return GDALPamRasterBand::SetStatistics(minimum, maximum, mean, deviation);
+        if (!StoresInFile()) return CompanionBand::SetStatistics(minimum, maximum, mean, deviation);
         constexpr std::uint32_t kFlags = zelm::StatsFlag::Minimum | zelm::StatsFlag::Maximum |
                                          zelm::StatsFlag::Mean | zelm::StatsFlag::StandardDeviation;
         statisticsFetched = false;
@@ -490,8 +505,8 @@ CPLErr Band::GetDefaultHistogram(double* lower, double* upper, int* bucketCount,
     return Reporting(CE_Failure, [&] {
         const StoredHistogram* const stored = owner.File().archive.Histogram(index, owner.Level());
         if (!stored)
-            return GDALPamRasterBand::GetDefaultHistogram(lower, upper, bucketCount, counts, force,
-                                                          progress, progressData);
+            return CompanionBand::GetDefaultHistogram(lower, upper, bucketCount, counts, force,
+                                                      progress, progressData);
         auto* const copy =
             static_cast<GUIntBig*>(VSI_MALLOC2_VERBOSE(stored->counts.size(), sizeof(GUIntBig)));
         if (!copy) return CE_Failure;
@@ -507,7 +522,7 @@ CPLErr Band::GetDefaultHistogram(double* lower, double* upper, int* bucketCount,
 CPLErr Band::SetDefaultHistogram(double lower, double upper, int bucketCount, GUIntBig* counts) {
     return Reporting(CE_Failure, [&] {
         if (!StoresInFile() || bucketCount <= 0)
-            return GDALPamRasterBand::SetDefaultHistogram(lower, upper, bucketCount, counts);
+            return CompanionBand::SetDefaultHistogram(lower, upper, bucketCount, counts);
         StoredHistogram histogram{index, owner.Level(), lower, upper, {}};
         histogram.counts.assign(counts, counts + bucketCount);
         if (owner.File().archive.StoreHistogram(histogram)) return CE_None;

@@ -6,10 +6,15 @@
 #include "files/Lending.h"
 #include "gdal/Band.h"
 #include "gdal/Dataset.h"
+#include "gdal/ErrorCatcher.h"
+#include "gdal/Fetcher.h"
 #include "gdal/GdalRasterSource.h"
 #include "gdal/Reporting.h"
 #include "gdal/Sidecar.h"
+#include "gdal/VsiSource.h"
 #include "host/build/PyramidBuilder.h"
+#include "host/raster/LentFile.h"
+#include "platform/FileSystem.h"
 
 namespace zmcgdal {
 namespace {
@@ -55,12 +60,74 @@ std::unique_ptr<Dataset> OpenForUpdate(const std::string& name) {
     return dataset;
 }
 
+// Builders work in plain folders: what is to stand elsewhere is built in the folder for temporary
+// files first.
+std::string SpoolName() {
+    const char* const folder =
+        CPLGetConfigOption("CPL_TMPDIR", CPLGetConfigOption("TMPDIR", "/tmp"));
+    return platform::JoinPath(folder, "zmcraster");
+}
+
+[[noreturn]] void FailToWrite(const std::string& target) {
+    throw zmchost::Error(target, "create the pyramid", "GDAL cannot write it there");
+}
+
+// GDAL tells so of networks beforehand; of an archive that it can write, it says that it cannot.
+void CheckWritable(const std::string& target) {
+    if (!NetworkPart(target).empty() && !VSISupportsSequentialWrite(target.c_str(), true))
+        FailToWrite(target);
+}
+
+// In order from its beginning, as every file system that can be written takes it.
+void CopyFile(const std::string& from, const std::string& target) {
+    const auto source = zmchost::OpenPlainFile(from, false);
+    const CPLErrorStateBackuper before;
+    const ErrorCatcher errors(CE_Failure);
+    VSILFILE* const file = VSIFOpenL(target.c_str(), "wb");
+    if (!file) FailToWrite(target);
+    std::vector<unsigned char> piece(std::size_t{1} << 20);
+    int error = 0;
+    std::uint64_t at = 0;
+    bool written = true;
+    while (written && error == 0) {
+        const std::size_t size = source->ReadAt(at, piece.data(), piece.size(), &error);
+        if (size == 0) break;
+        written = VSIFWriteL(piece.data(), 1, size, file) == size;
+        at += size;
+    }
+    written = VSIFCloseL(file) == 0 && written && error == 0;
+    if (written) return;
+    VSIUnlink(target.c_str());
+    FailToWrite(target);
+}
+
+// The builder knows a file by the name of its spool.
+void BuildElsewhere(zmchost::RasterSource& pixels, const std::string& target,
+                    const zmchost::BuildOptions& options) {
+    const zmchost::BuildFile spool(SpoolName(), true);
+    try {
+        zmchost::PyramidBuilder(SharedModule()).Build(pixels, spool.Path(), options);
+        CopyFile(spool.Path(), target);
+    } catch (const zmchost::Cancelled& error) {
+        throw zmchost::Cancelled(target, error.Operation());
+    } catch (const zmchost::Error& error) {
+        throw zmchost::Error(target, error.Operation(), error.Reason());
+    }
+}
+
+void Build(zmchost::RasterSource& pixels, const std::string& target,
+           const zmchost::BuildOptions& options) {
+    if (IsVirtualName(target)) return BuildElsewhere(pixels, target, options);
+    zmchost::PyramidBuilder(SharedModule()).Build(pixels, target, options);
+}
+
 GDALDataset* CopyTo(const std::string& target, GDALDataset& source, bool strict,
                     CreationOptions options, GDALProgressFunc progress, void* progressData) {
+    CheckWritable(target);
     GdalRasterSource pixels(source, options.signedByte);
     if (!AcceptLosses(pixels, strict)) return nullptr;
     UseProgress(options.build, progress, progressData);
-    zmchost::PyramidBuilder(SharedModule()).Build(pixels, target, options.build);
+    Build(pixels, target, options.build);
     Unfinished made(target);
     auto dataset = OpenForUpdate(target);
     if (CopySidecar(source, *dataset, strict) != CE_None) return nullptr;
@@ -123,7 +190,9 @@ GDALDataset* CreateNew(const char* target, int width, int height, int bands, GDA
         if (!parsed) return nullptr;
         const zelm::RasterProps props =
             PropsOf(target, width, height, bands, PixelTypeFor(type, parsed->signedByte));
-        auto spool = std::make_unique<zmchost::BuildFile>(target, true);
+        CheckWritable(target);
+        auto spool = std::make_unique<zmchost::BuildFile>(
+            IsVirtualName(target) ? SpoolName() : target, true);
         const zmchost::Raster raster =
             zmchost::Raster::Create(SharedModule(), spool->Path(), props, 0);
         return OpenSpool(target, raster, std::move(*parsed), std::move(spool));
@@ -178,7 +247,7 @@ bool Creation::Finish(Dataset& dataset) {
             throw zmchost::Error(target, "build it", "some of its blocks could not be written");
         GdalRasterSource source(dataset, options.signedByte);
         AcceptLosses(source, false);
-        zmchost::PyramidBuilder(SharedModule()).Build(source, target, options.build);
+        Build(source, target, options.build);
     });
     if (!built) return false;
     // The palettes are in the file now.

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <climits>
 #include <cmath>
+#include <optional>
 #include <utility>
 
 #include "core/PixelVocabulary.h"
@@ -69,11 +70,46 @@ auto ReportingFlush(Work&& work) {
 }  // namespace
 
 OpenFile::OpenFile(const std::string& fileName, GDALAccess access, const OpenOptions& options)
-    : source(OpenByName(fileName, access == GA_Update)),
+    : OpenFile(fileName, OpenByName(fileName, access == GA_Update, options.remoteBytes), options) {}
+
+OpenFile::OpenFile(const std::string& fileName, std::shared_ptr<zelm::files::ByteSource> opened,
+                   const OpenOptions& options)
+    : source(std::move(opened)),
       info(CheckedInfo(fileName, zmchost::PyramidHeader::Read(*source, fileName))),
       raster(fileName, source, info.header, options.keepCopies),
-      tiles(raster, info, GdalTypeOf(info.header.pixelType, options.signedByteAs)),
-      archive(raster, info.HasMetadataDocument(), limits) {}
+      pixels(fileName, raster.WithoutDocument(), info.header, false),
+      tiles(raster.Remote() ? pixels : raster, info,
+            GdalTypeOf(info.header.pixelType, options.signedByteAs)),
+      archive(raster, info.HasMetadataDocument(), limits) {
+    if (raster.Remote()) raster.Remote()->SetDocument(info.MetaDocumentOffset());
+}
+
+WindowTiles OpenFile::TilesOf(std::uint32_t level, const zelm::Rectangle& window,
+                              std::span<const int> bandNumbers) const {
+    std::vector<std::uint32_t> bands;
+    for (const int number : bandNumbers) bands.push_back(static_cast<std::uint32_t>(number - 1));
+    return {info.header, level, window, std::move(bands)};
+}
+
+void OpenFile::Advise(std::uint32_t level, const zelm::Rectangle& window,
+                      std::span<const int> bandNumbers) {
+    RemoteSource* const remote = raster.Remote();
+    if (remote && !remote->Advise(TilesOf(level, window, bandNumbers))) raster.CheckNetwork();
+}
+
+PlannedRead::PlannedRead(OpenFile& file, std::uint32_t level, const zelm::Rectangle& window,
+                         std::span<const int> bandNumbers)
+    : remote(file.isPlanned ? nullptr : file.raster.Remote()), isPlanned(file.isPlanned) {
+    if (!remote) return;
+    remote->Plan(file.TilesOf(level, window, bandNumbers));
+    isPlanned = true;
+}
+
+PlannedRead::~PlannedRead() {
+    if (!remote) return;
+    remote->EndPlan();
+    isPlanned = false;
+}
 
 void OpenFile::CheckTile(std::uint32_t level, std::uint32_t bands, const char* operation) const {
     const zelm::LevelGeometry grid = info.header.Geometry(level);
@@ -186,6 +222,14 @@ void Dataset::BeginCreation(std::unique_ptr<Creation> state) { creation = std::m
 // Nor is anything written there.
 void Dataset::IgnoreCompanions() { nPamFlags |= GPF_DISABLED; }
 
+void Dataset::LoadSidecarLater(const char* fileName) {
+    SetDescription(fileName);
+    PutOff([this, name = std::string(fileName)] {
+        GDALOpenInfo info(name.c_str(), GDAL_OF_RASTER);
+        LoadSidecar(name.c_str(), info.GetSiblingFiles());
+    });
+}
+
 void Dataset::LoadSidecar(const char* fileName, char** siblings) {
     SetDescription(fileName);
     std::string base = fileName;
@@ -205,6 +249,7 @@ void Dataset::LoadSidecar(const char* fileName, char** siblings) {
 }
 
 bool Dataset::MayHaveMasks() {
+    Load();
     return main || oOvManager.HaveMaskFile() || GDALPamDataset::GetMetadataItem("NODATA_VALUES");
 }
 
@@ -234,7 +279,7 @@ CPLStringList* Dataset::OwnDomain(const char* domain) {
 
 char** Dataset::GetMetadataDomainList() {
     return Reporting<char**>(nullptr, [&] {
-        return BuildMetadataDomainList(GDALPamDataset::GetMetadataDomainList(), TRUE,
+        return BuildMetadataDomainList(CompanionDataset::GetMetadataDomainList(), TRUE,
                                        kStructureDomain, kOwnDomain, nullptr);
     });
 }
@@ -242,7 +287,7 @@ char** Dataset::GetMetadataDomainList() {
 char** Dataset::GetMetadata(const char* domain) {
     return Reporting<char**>(nullptr, [&] {
         if (CPLStringList* const own = OwnDomain(domain)) return own->List();
-        return kept ? ScaledDomain(domain) : GDALPamDataset::GetMetadata(domain);
+        return kept ? ScaledDomain(domain) : CompanionDataset::GetMetadata(domain);
     });
 }
 
@@ -250,7 +295,7 @@ const char* Dataset::GetMetadataItem(const char* name, const char* domain) {
     return Reporting<const char*>(nullptr, [&] {
         if (CPLStringList* const own = OwnDomain(domain)) return own->FetchNameValue(name);
         if (kept) return CSLFetchNameValue(ScaledDomain(domain), name);
-        return GDALPamDataset::GetMetadataItem(name, domain);
+        return CompanionDataset::GetMetadataItem(name, domain);
     });
 }
 
@@ -276,7 +321,7 @@ char** Dataset::ScaledDomain(const char* domain) {
 
 CPLErr Dataset::GetGeoTransform(double* transform) {
     return Reporting(CE_Failure, [&] {
-        if (!main) return GDALPamDataset::GetGeoTransform(transform);
+        if (!main) return CompanionDataset::GetGeoTransform(transform);
         const CPLErr result = main->GetGeoTransform(transform);
         for (const int i : {1, 2, 4, 5})
             if (result == CE_None) transform[i] *= Factor();
@@ -286,17 +331,17 @@ CPLErr Dataset::GetGeoTransform(double* transform) {
 
 const OGRSpatialReference* Dataset::GetSpatialRef() const {
     return Reporting<const OGRSpatialReference*>(
-        nullptr, [&] { return main ? main->GetSpatialRef() : GDALPamDataset::GetSpatialRef(); });
+        nullptr, [&] { return main ? main->GetSpatialRef() : CompanionDataset::GetSpatialRef(); });
 }
 
 int Dataset::GetGCPCount() {
     return Reporting<int>(
-        0, [&] { return main ? main->GetGCPCount() : GDALPamDataset::GetGCPCount(); });
+        0, [&] { return main ? main->GetGCPCount() : CompanionDataset::GetGCPCount(); });
 }
 
 const GDAL_GCP* Dataset::GetGCPs() {
     return Reporting<const GDAL_GCP*>(nullptr, [&]() -> const GDAL_GCP* {
-        if (!main) return GDALPamDataset::GetGCPs();
+        if (!main) return CompanionDataset::GetGCPs();
         const GDAL_GCP* const given = main->GetGCPs();
         points.assign(given, given + main->GetGCPCount());
         for (GDAL_GCP& point : points) {
@@ -309,13 +354,13 @@ const GDAL_GCP* Dataset::GetGCPs() {
 
 const OGRSpatialReference* Dataset::GetGCPSpatialRef() const {
     return Reporting<const OGRSpatialReference*>(nullptr, [&] {
-        return main ? main->GetGCPSpatialRef() : GDALPamDataset::GetGCPSpatialRef();
+        return main ? main->GetGCPSpatialRef() : CompanionDataset::GetGCPSpatialRef();
     });
 }
 
 char** Dataset::GetFileList() {
     return Reporting<char**>(
-        nullptr, [&] { return kept ? kept->GetFileList() : GDALPamDataset::GetFileList(); });
+        nullptr, [&] { return kept ? kept->GetFileList() : CompanionDataset::GetFileList(); });
 }
 
 CPLErr Dataset::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, void* data,
@@ -357,6 +402,10 @@ CPLErr Dataset::ReadOrWrite(GDALRWFlag mode, int x, int y, int width, int height
                                                   pixelSpace, lineSpace, bandSpace, extra, &tried);
         if (tried) return result;
     }
+    std::optional<PlannedRead> planned;
+    if (mode == GF_Read)
+        planned.emplace(*file, level, RectangleOf(x, y, width, height),
+                        std::span(bandMap, static_cast<std::size_t>(bandCount)));
     if (mode == GF_Read && bufferWidth == width && bufferHeight == height &&
         ReadsDirectly(x, y, width, height)) {
         std::vector<int> bands(bandMap, bandMap + bandCount);
@@ -370,6 +419,36 @@ CPLErr Dataset::ReadOrWrite(GDALRWFlag mode, int x, int y, int width, int height
     return GDALPamDataset::IRasterIO(mode, x, y, width, height, data, bufferWidth, bufferHeight,
                                      bufferType, bandCount, bandMap, pixelSpace, lineSpace,
                                      bandSpace, extra);
+}
+
+bool Dataset::HasWindow(int x, int y, int width, int height) const {
+    return x >= 0 && y >= 0 && width > 0 && height > 0 && width <= nRasterXSize - x &&
+           height <= nRasterYSize - y;
+}
+
+bool Dataset::HasBands(std::span<const int> numbers) const {
+    return std::all_of(numbers.begin(), numbers.end(),
+                       [this](int number) { return number >= 1 && number <= nBands; });
+}
+
+// GDAL looks at what it is asked for only where it does this itself.
+CPLErr Dataset::AdviseRead(int x, int y, int width, int height, int bufferWidth, int bufferHeight,
+                           GDALDataType, int bandCount, int* bandMap, char**) {
+    return Reporting(CE_Failure, [&] {
+        if (!file->raster.Remote()) return CE_None;
+        std::vector<int> bands;
+        for (int i = 0; i < bandCount; ++i) bands.push_back(bandMap ? bandMap[i] : i + 1);
+        if (!HasWindow(x, y, width, height) || !HasBands(bands))
+            throw zmchost::Error(GetDescription(), "read ahead", "it has no such window or band");
+        GDALRasterIOExtraArg extra;
+        INIT_RASTERIO_EXTRA_ARG(extra);
+        Shown shown(x, y, width, height, extra);
+        const bool reduced = bufferWidth < width && bufferHeight < height && !Overviews().empty();
+        Dataset* const coarser = reduced ? CoarserFor(shown, bufferWidth, bufferHeight) : nullptr;
+        file->Advise(coarser ? coarser->level : level,
+                     RectangleOf(shown.x, shown.y, shown.width, shown.height), bands);
+        return CE_None;
+    });
 }
 
 CPLErr Dataset::IBuildOverviews(const char* resampling, int overviewCount, const int* factors,

@@ -11,11 +11,13 @@
 #include <gdal_pam.h>
 
 #include <memory>
+#include <span>
 #include <string>
 #include <utility>
 #include <vector>
 
 #include "gdal/Archive.h"
+#include "gdal/Companions.h"
 #include "gdal/LazyRaster.h"
 #include "gdal/Options.h"
 #include "gdal/TileReader.h"
@@ -32,6 +34,9 @@ public:
     // Opens the file once, for all that is read from it and written to it. Throws zmchost::Error if
     // it cannot be opened, is no pyramid, or one that GDAL cannot hold.
     OpenFile(const std::string& fileName, GDALAccess access, const OpenOptions& options);
+    // The same of a file that is open already.
+    OpenFile(const std::string& fileName, std::shared_ptr<zelm::files::ByteSource> opened,
+             const OpenOptions& options);
 
     // Throws zmchost::Error where a tile of that level, with so many bands, is beyond the limit of
     // those that are held as a whole. `operation` stands behind "cannot".
@@ -39,15 +44,39 @@ public:
     // The same of what is read and written as one where some of it changes.
     void CheckBlock(std::uint32_t level) const;
 
+    // Where the tiles are that a window of a level touches; bands count from 1.
+    WindowTiles TilesOf(std::uint32_t level, const zelm::Rectangle& window,
+                        std::span<const int> bandNumbers) const;
+    // Fetches them ahead if the file lies behind a network. Throws zmchost::Error where that fails.
+    void Advise(std::uint32_t level, const zelm::Rectangle& window,
+                std::span<const int> bandNumbers);
+
     const std::shared_ptr<zelm::files::ByteSource> source;
     const zmchost::PyramidFileInfo info;
     const zmchost::Limits limits = zmchost::Limits::Current();
     LazyRaster raster;
+    LazyRaster pixels;  // without its metadata document if it lies behind a network, else the same
     TileReader tiles;
     Archive archive;
+    bool isPlanned = false;  // a PlannedRead lives
 };
 
-class Dataset final : public GDALPamDataset {
+// As long as it lives, that window is what is read of a file behind a network. One within another
+// one does nothing: what is read then is a part of the window outside. Bands count from 1.
+class PlannedRead {
+public:
+    PlannedRead(OpenFile& file, std::uint32_t level, const zelm::Rectangle& window,
+                std::span<const int> bandNumbers);
+    ~PlannedRead();
+    PlannedRead(const PlannedRead&) = delete;
+    PlannedRead& operator=(const PlannedRead&) = delete;
+
+private:
+    RemoteSource* remote;  // null where there is nothing to plan
+    bool& isPlanned;
+};
+
+class Dataset final : public CompanionDataset {
 public:
     static std::unique_ptr<Dataset> FromFile(std::shared_ptr<OpenFile> file, GDALAccess access);
     // An overview of a raster, counted from 0, as a raster of its own, which keeps that one and
@@ -86,6 +115,9 @@ public:
     // Reads the sidecar, and looks for other companions, of a file of that name. Those that are
     // staged for it (SidecarStage.h) are given their names first if it is open for update.
     void LoadSidecar(const char* fileName, char** siblings);
+    // The same, when something is first asked for that may stand in them. GDAL's list of the folder
+    // is what GDAL has asked the server for, or asks it for then.
+    void LoadSidecarLater(const char* fileName);
 
     // True if pixels of this window are better read past GDAL's block cache: it is not a sliver of
     // the tiles that it touches, or these are very large; and no block waits to be written.
@@ -116,6 +148,10 @@ public:
                      int bufferWidth, int bufferHeight, GDALDataType bufferType, int bandCount,
                      int* bandMap, GSpacing pixelSpace, GSpacing lineSpace, GSpacing bandSpace,
                      GDALRasterIOExtraArg* extra) override;
+    // Fetches a window of a file behind a network ahead, on this thread; else nothing.
+    CPLErr AdviseRead(int x, int y, int width, int height, int bufferWidth, int bufferHeight,
+                      GDALDataType bufferType, int bandCount, int* bandMap,
+                      char** options) override;
     CPLErr IBuildOverviews(const char* resampling, int overviewCount, const int* factors,
                            int bandCount, const int* bands, GDALProgressFunc progress,
                            void* progressData, CSLConstList options) override;
@@ -130,6 +166,8 @@ private:
     void IgnoreCompanions();
     void AddOverviews();
     void DescribeFile();
+    bool HasWindow(int x, int y, int width, int height) const;
+    bool HasBands(std::span<const int> numbers) const;
     CPLStringList* OwnDomain(const char* domain);
     // How many pixels of the finest level one of this covers along a side.
     double Factor() const;

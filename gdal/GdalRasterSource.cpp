@@ -51,8 +51,8 @@ bool IsMasked(GDALRasterBand& band) {
 // Ours are alpha where their sidecar says so, and need not be looked through for palettes.
 bool IsAlpha(GDALRasterBand& band) {
     auto* const own = dynamic_cast<Band*>(&band);
-    return (own ? own->GDALPamRasterBand::GetColorInterpretation()
-                : band.GetColorInterpretation()) == GCI_AlphaBand;
+    return (own ? own->CompanionBand::GetColorInterpretation() : band.GetColorInterpretation()) ==
+           GCI_AlphaBand;
 }
 
 bool FitsMask(GDALRasterBand& band) {

@@ -9,6 +9,7 @@
 #include <cstdlib>
 #include <string>
 
+#include "host/base/Error.h"
 #include "host/base/ScaledNumber.h"
 
 namespace zmcgdal {
@@ -20,6 +21,7 @@ const char* const kOpenOptionsXml = R"(<OpenOptionList>
   </Option>
   <Option name='KEEP_COPIES' type='boolean' default='NO' description='Whether stores of statistics, histograms and color tables keep what was stored before in FILE.zmcmeta until they have reached the disk'/>
   <Option name='OVERVIEW_LEVEL' type='string' description='Number of the overview, from 0, to show in place of the raster; "2 only" without the coarser ones, NONE for the raster without any'/>
+  <Option name='REMOTE_CACHE' type='string' default='64M' description='Bytes of a file behind a network that are kept, in bytes or with K, M or G'/>
 </OpenOptionList>)";
 
 namespace {
@@ -128,6 +130,12 @@ OpenOptions OpenOptionsFrom(CSLConstList options) {
         parsed.signedByteAs = SignedByteAs::FlaggedByte;
     parsed.keepCopies = CPLFetchBool(options, "KEEP_COPIES", false);
     TakeOverview(CSLFetchNameValueDef(options, "OVERVIEW_LEVEL", ""), parsed);
+    if (const char* const cache = CSLFetchNameValue(options, "REMOTE_CACHE")) {
+        const auto size = ParseSize(cache);
+        if (!size)
+            throw zmchost::Error("REMOTE_CACHE", "take " + std::string(cache), "it is no size");
+        parsed.remoteBytes = *size;
+    }
     return parsed;
 }
 

@@ -4,10 +4,12 @@
 
 #include <cpl_string.h>
 
+#include <cstdint>
 #include <optional>
 #include <string>
 
 #include "gdal/SampleType.h"
+#include "gdal/VsiSource.h"
 #include "host/build/PyramidBuilder.h"
 
 namespace zmcgdal {
@@ -22,6 +24,7 @@ struct OpenOptions {
     // The overview, counted from 0, that is shown in place of the raster; empty for the raster.
     std::optional<int> overview;
     bool alone = false;  // without coarser overviews
+    std::uint64_t remoteBytes = kRemoteBytes;
 };
 
 OpenOptions OpenOptionsFrom(CSLConstList options);

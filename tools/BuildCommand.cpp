@@ -156,6 +156,7 @@ zmchost::BuildOptions BuildCommand::Options(const zelm::RasterProps& props) cons
 
 // The builder looks at all of this again; here it is told with what helps.
 void BuildCommand::CheckTarget() const {
+    RefuseElsewhere(target, "pyramids are made in plain folders; copy the finished file there");
     std::error_code ignored;
     if (fs::is_directory(target, ignored))
         throw Failure(target, "it is a folder; name a file in it");

@@ -413,7 +413,7 @@ class BlockByBlock(FolderTest):
             with self.assertRaises(RuntimeError):
                 self.create(*arguments)
         with self.assertRaises(RuntimeError):
-            gdal.GetDriverByName(DRIVER).Create("/vsimem/new.pyr", 5, 5, 1)
+            gdal.GetDriverByName(DRIVER).Create("/vsicurl/http://127.0.0.1:9/new.pyr", 5, 5, 1)
         self.assertEqual(self.files(), [])
 
 
