@@ -124,11 +124,16 @@ void Program::ChangeLimits() const {
         }
 }
 
-// "-co K=V", as GDAL's own programs have it, is one dash with two letters.
+// Options that GDAL's own programs write with one dash and two letters.
+const char* LongForm(const char* word) {
+    if (std::strcmp(word, "-co") == 0) return "--co";
+    if (std::strcmp(word, "-of") == 0) return "--of";
+    return word;
+}
+
 std::vector<std::string> Reversed(int count, char** words) {
     std::vector<std::string> arguments;
-    for (int i = count - 1; i > 0; --i)
-        arguments.emplace_back(std::strcmp(words[i], "-co") == 0 ? "--co" : words[i]);
+    for (int i = count - 1; i > 0; --i) arguments.emplace_back(LongForm(words[i]));
     return arguments;
 }
 
