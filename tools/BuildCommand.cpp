@@ -83,7 +83,8 @@ void BuildCommand::Describe(OptionTable& table) {
     table
         .Text("--bands", bands,
               "Bands of the source in the order wanted, counted from 1 (default all)")
-        .Named("3,2,1");
+        .Named("3,2,1")
+        .Filled(kNoBands);
     table.Text("--bins", bins, "Bins of a histogram; 8-bit types have one per value (default 256)")
         .Named("N");
     table.Flag("--no-statistics", noStatistics, "Leave out statistics and histograms");

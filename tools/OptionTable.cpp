@@ -15,7 +15,16 @@ OptionTable::Word& OptionTable::Word::Named(const char* value) {
 }
 
 OptionTable::Word& OptionTable::Word::OneOf(const std::vector<std::string>& values) {
-    option.check(CLI::IsMember(values));
+    option.transform(CLI::IsMember(values, CLI::ignore_case));
+    return *this;
+}
+
+OptionTable::Word& OptionTable::Word::Filled(const char* refusal) {
+    option.check(
+        [refusal](const std::string& value) {
+            return value.empty() ? std::string(refusal) : std::string();
+        },
+        "");
     return *this;
 }
 

@@ -26,8 +26,10 @@ public:
         Word& Required();
         // How help writes its value.
         Word& Named(const char* value);
-        // Only these values are taken.
+        // Only these values are taken, in any case of letters; the variable gets them as here.
         Word& OneOf(const std::vector<std::string>& values);
+        // An empty value is refused, with these words.
+        Word& Filled(const char* refusal);
 
     private:
         CLI::Option& option;

@@ -44,7 +44,8 @@ void VerifyCommand::Describe(OptionTable& table) {
     table
         .Text("--bands", bands,
               "Bands of SOURCE that the file was built from, counted from 1 (default all)")
-        .Named("3,2,1");
+        .Named("3,2,1")
+        .Filled(kNoBands);
     table.Footer(
         "Examples:\n"
         "  zmcraster verify scene.pyr\n"

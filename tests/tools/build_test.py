@@ -83,6 +83,15 @@ class Options(ToolTest):
             np.testing.assert_array_equal(Pyramid(self.path("made.pyr")).read(1),
                                           function(pairs[:, ::2], pairs[:, 1::2]))
 
+    def test_methods_in_any_case_of_letters(self):
+        self.picture()
+        for word in ("MODE", "Mode", "mode"):
+            report = self.document("build", "picture.tif", "made.pyr", "--resampling", word,
+                                   "--ordering", "BLOCKED", "--overwrite")
+            self.assertEqual((report["resampling"], report["tileOrdering"]), ("mode", "Blocked"))
+            verified = self.document("verify", "made.pyr", "--resampling", word)
+            self.assertTrue(verified["good"])
+
     def test_orderings(self):
         pixels = self.picture()
         for word, stored in (("auto", "Blocked"), ("scanline", "Scanline"), ("blocked", "Blocked")):

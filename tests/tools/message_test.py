@@ -78,6 +78,7 @@ class Usage(ToolTest):
                 ("--nodata", "1.5", "--nodata: no sample of type Byte can be 1.5"),
                 ("--bands", "4", "--bands: there is no band 4: the raster has the bands 1 to 3"),
                 ("--bands", "0", "--bands: there is no band 0: the raster has the bands 1 to 3"),
+                ("--bands", "", "--bands: an empty list names no band" + tail),
                 ("--bands", "a", '--bands: "a" is no list such as 3,2,1'),
                 ("--bins", "0", "--bins: a histogram has one bin at least"),
                 ("--threads", "-2", '--threads: "-2" is no whole number'),
@@ -97,6 +98,14 @@ class Usage(ToolTest):
                          "1,2,3")
         self.refused(2, "--tolerance: -1 is below 0", "compare", "picture.pyr", "picture.tif",
                      "--tolerance", "-1")
+        self.assertEqual(self.files(), ["picture.pyr", "picture.tif"])
+
+    def test_empty_lists_of_bands(self):
+        self.pyramid()
+        for command, *names in (("hash", "picture.pyr"), ("verify", "picture.pyr"),
+                                ("export", "picture.pyr", "x.tif")):
+            self.refused(2, "--bands: an empty list names no band; see zmcraster "
+                            f"{command} --help", command, *names, "--bands", "")
         self.assertEqual(self.files(), ["picture.pyr", "picture.tif"])
 
     def test_a_method_that_complex_numbers_do_not_have(self):
