@@ -39,7 +39,28 @@ class Help(ToolTest):
 class Usage(ToolTest):
     def test_the_command(self):
         self.refused(2, "A subcommand is required; see zmcraster --help")
-        self.refused(2, "bild: there is no such command; see zmcraster --help", "bild")
+        self.refused(2, "stretch: there is no such command; see zmcraster --help", "stretch")
+
+    def test_words_that_are_nearly_right(self):
+        for word, meant in (("bild", "build"), ("verfiy", "verify"), ("Info", "info")):
+            self.refused(2, f"{word}: there is no such command (did you mean {meant}?); see "
+                            "zmcraster --help", word)
+        for word, meant in (("--jsn", "--json"), ("-json", "--json"), ("--quite", "--quiet")):
+            self.refused(2, f"The following argument was not expected: {word} (did you mean "
+                            f"{meant}?); see zmcraster info --help", "info", "a.pyr", word)
+        self.refused(2, "The following arguments were not expected: --level=2 --ordring x (did you "
+                        "mean --levels?); see zmcraster build --help", "build", "a.tif", "b.pyr",
+                     "--level=2", "--ordring", "x")
+        self.refused(2, "The following argument was not expected: --limt=bands=2 (did you mean "
+                        "--limit?); see zmcraster info --help", "--limt=bands=2", "info", "a.pyr")
+        for word in ("--palette", "-z", "-", "--", "---", "--="):
+            done = self.run_tool("info", "a.pyr", word)
+            self.assertNotIn("did you mean", done.stderr)
+            self.assertEqual(done.stderr.count("\n"), 1)
+
+    def test_words_that_nothing_takes_are_told_in_their_order(self):
+        self.refused(2, "The following arguments were not expected: c d e; see zmcraster build "
+                        "--help", "build", "a", "b", "c", "d", "e")
 
     def test_arguments_of_every_command(self):
         for command in COMMANDS:
