@@ -64,7 +64,9 @@ void WriteCommand(std::ostream& out, const CLI::App& command) {
     for (const CLI::Option* option : command.get_options())
         if (option->get_positional()) out << ' ' << Escape(option->get_name(true));
     out << '\n' << Escape(command.get_description()) << ".\n";
-    for (const CLI::Option* option : command.get_options()) WriteOption(out, *option);
+    for (const bool byPlace : {true, false})
+        for (const CLI::Option* option : command.get_options())
+            if (option->get_positional() == byPlace) WriteOption(out, *option);
     out << ".PP\n.nf\n" << Escape(command.get_footer()) << "\n.fi\n";
 }
 
