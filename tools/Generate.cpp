@@ -62,7 +62,9 @@ void WriteOption(std::ostream& out, const CLI::Option& option) {
 void WriteCommand(std::ostream& out, const CLI::App& command) {
     out << ".SS " << command.get_name();
     for (const CLI::Option* option : command.get_options())
-        if (option->get_positional()) out << ' ' << Escape(option->get_name(true));
+        if (option->get_positional())
+            out << ' ' << Escape(option->get_name(true))
+                << (option->get_items_expected_max() > 1 ? "..." : "");
     out << '\n' << Escape(command.get_description()) << ".\n";
     for (const bool byPlace : {true, false})
         for (const CLI::Option* option : command.get_options())

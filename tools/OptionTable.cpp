@@ -37,6 +37,11 @@ OptionTable::Word OptionTable::Texts(const char* names, std::vector<std::string>
     return Word(*app.add_option(names, values, help)->type_size(1)->allow_extra_args(false));
 }
 
+OptionTable::Word OptionTable::Names(const char* name, std::vector<std::string>& values,
+                                     const char* help) {
+    return Word(*app.add_option(name, values, help));
+}
+
 void OptionTable::Flag(const char* names, bool& given, const char* help) {
     app.add_flag(names, given, help);
 }

@@ -41,6 +41,8 @@ public:
     Word Text(const char* names, std::string& value, const char* help);
     // The same, given any number of times, with one value each.
     Word Texts(const char* names, std::vector<std::string>& values, const char* help);
+    // An argument by its place that takes all that stand there.
+    Word Names(const char* name, std::vector<std::string>& values, const char* help);
     // A word without a value.
     void Flag(const char* names, bool& given, const char* help);
     // What help ends with: examples, and what has to be known.

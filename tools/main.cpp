@@ -4,7 +4,6 @@
 #include <algorithm>
 #include <cstdio>
 #include <cstring>
-#include <new>
 #include <xercesc/util/XercesVersion.hpp>
 
 #include "files/Lending.h"
@@ -203,20 +202,11 @@ ExitStatus Program::Run(std::vector<std::string> arguments) {
 ExitStatus Guarded(int count, char** words) {
     try {
         return Program().Run(Reversed(count, words));
-    } catch (const UsageError& error) {
-        Say(error.what());
-        return ExitStatus::Usage;
-    } catch (const Interruption& error) {
-        Say(error.what());
-        return ExitStatus::Interrupted;
-    } catch (const std::bad_alloc&) {
-        Say("out of memory");
-    } catch (const zmchost::Error& error) {
-        Say(Visible(error.File()) + ": cannot " + error.Operation() + ": " + error.Reason());
-    } catch (const std::exception& error) {
-        Say(error.what());
+    } catch (const std::exception&) {
+        const Answer answer = AnswerOfException();
+        Say(answer.text);
+        return answer.status;
     }
-    return ExitStatus::Failed;
 }
 
 }  // namespace
