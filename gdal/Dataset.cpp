@@ -1,17 +1,22 @@
 #include "gdal/Dataset.h"
 
+#include <cpl_minixml.h>
+
 #include <algorithm>
 #include <climits>
+#include <memory>
 #include <utility>
 
 #include "core/PixelVocabulary.h"
 #include "gdal/Band.h"
 #include "gdal/Create.h"
+#include "gdal/ErrorCatcher.h"
 #include "gdal/LevelRefresh.h"
 #include "gdal/Reporting.h"
 #include "gdal/Sidecar.h"
 #include "gdal/SidecarStage.h"
 #include "gdal/VsiSource.h"
+#include "host/file/EmbeddedItems.h"
 #include "host/raster/LentFile.h"
 #include "platform/FileSystem.h"
 
@@ -182,9 +187,36 @@ void Dataset::LoadSidecar(const char* fileName, char** siblings) {
     const bool staged = base != fileName;
     if (staged) SetPhysicalFilename(base.c_str());
     TryLoadXML(staged ? nullptr : siblings);
+    Reported([&] { TakeEmbedded(staged ? nullptr : siblings); });
     oOvManager.Initialize(this, base.c_str(), staged ? nullptr : siblings);
     // Without this GDAL looks for a mask beside the usual name, when it is asked for one.
     if (staged) oOvManager.HaveMaskFile(nullptr, base.c_str());
+}
+
+// GDAL takes what it is given last, so the sidecar is read once more, behind the items of the file.
+// A sidecar that was made of them has all of them that are still wanted.
+void Dataset::TakeEmbedded(char** siblings) {
+    if (GDALPamDataset::GetMetadataItem(kEmbeddedItem, kEmbeddedDomain)) return;
+    const std::string items =
+        zmchost::ReadEmbeddedItems(*file->source, file->raster.Name(), file->info.header);
+    if (items.empty()) return;
+    const int changed = nPamFlags & GPF_DIRTY;
+    const ErrorCatcher quiet(CE_Failure);
+    const std::unique_ptr<CPLXMLNode, decltype(&CPLDestroyXMLNode)> tree(
+        CPLParseXMLString(items.c_str()), &CPLDestroyXMLNode);
+    CPLXMLNode* const root = CPLGetXMLNode(tree.get(), "=PAMDataset");
+    if (!root || XMLInit(root, nullptr) != CE_None) return;
+    TryLoadXML(siblings);
+    nPamFlags = (nPamFlags & ~GPF_DIRTY) | changed;
+}
+
+std::string Dataset::SidecarText() {
+    using Tree = std::unique_ptr<CPLXMLNode, decltype(&CPLDestroyXMLNode)>;
+    if (!Tree(SerializeToXML(nullptr), &CPLDestroyXMLNode)) return "";
+    SetMetadataItem(kEmbeddedItem, "YES", kEmbeddedDomain);
+    const Tree tree(SerializeToXML(nullptr), &CPLDestroyXMLNode);
+    const std::unique_ptr<char, decltype(&CPLFree)> text(CPLSerializeXMLTree(tree.get()), &CPLFree);
+    return text ? text.get() : "";
 }
 
 bool Dataset::ReadsDirectly(int x, int y, int width, int height) const {

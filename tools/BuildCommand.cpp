@@ -45,6 +45,7 @@ private:
     std::string memory = "256M";
     bool noStatistics = false;
     bool overwrite = false;
+    bool embed = false;
 
     zmchost::BuildOptions Options(const zelm::RasterProps& props) const;
     void CheckTarget() const;
@@ -91,6 +92,8 @@ void BuildCommand::Describe(OptionTable& table) {
     table.Text("--threads", threads, "Threads to work with (default: all processors)").Named("N");
     table.Text("--memory", memory, "Memory for pixels, such as 64M or 2G (default 256M)")
         .Named("SIZE");
+    table.Flag("--embed", embed,
+               "Keep georeference, no-data values and other metadata in TARGET itself");
     table.Flag("--overwrite", overwrite, "Replace TARGET if it exists");
     table.Footer(
         "Examples:\n"
@@ -101,7 +104,7 @@ void BuildCommand::Describe(OptionTable& table) {
         "The target appears when it is finished, and never half done: a build that fails or is\n"
         "interrupted leaves the old file as it was. Georeference, no-data values, descriptions "
         "and\n"
-        "other metadata go to TARGET.aux.xml.");
+        "other metadata go to TARGET.aux.xml, or into TARGET with --embed.");
 }
 
 bool IsInteger(std::uint32_t pixelType) {
@@ -207,7 +210,7 @@ void BuildCommand::WriteSidecar(GDALDataset& dataset, const zmchost::BuildOption
         std::make_shared<zmcgdal::OpenFile>(built, GA_Update, zmcgdal::OpenOptions{}), GA_Update);
     pyramid->LoadSidecar(base.c_str(), nullptr);
     bool kept = selected && zmcgdal::CopySidecar(*selected, *pyramid, true) == CE_None;
-    if (kept) zmcgdal::SaveSidecar(*pyramid, target);
+    if (kept) (embed ? zmcgdal::EmbedSidecar : zmcgdal::SaveSidecar)(*pyramid, target);
     pyramid.reset();
     const std::string reason = TakeGdalError(target);
     kept = kept && reason.empty();
