@@ -5,7 +5,9 @@
 #include <algorithm>
 #include <climits>
 #include <memory>
+#include <string>
 #include <utility>
+#include <vector>
 
 #include "core/PixelVocabulary.h"
 #include "gdal/Band.h"
@@ -58,6 +60,34 @@ bool HasPipesBeside(const std::string& base) {
         return true;
     }
     return false;
+}
+
+// What GDAL takes for told in any sidecar that tells something of the band: a unit of none, a scale
+// of 1 and an offset of 0.
+struct Scale {
+    int number = 0;  // of the band, from 1
+    std::string unit;
+    double scale = 1, offset = 0;
+};
+
+std::vector<Scale> ScalesOf(GDALDataset& dataset) {
+    std::vector<Scale> scales;
+    for (int number = 1; number <= dataset.GetRasterCount(); ++number) {
+        GDALRasterBand& band = *dataset.GetRasterBand(number);
+        Scale told{number, band.GetUnitType(), band.GetScale(), band.GetOffset()};
+        if (!told.unit.empty() || told.scale != 1 || told.offset != 0)
+            scales.push_back(std::move(told));
+    }
+    return scales;
+}
+
+void PutBack(const std::vector<Scale>& scales, GDALDataset& dataset) {
+    for (const Scale& told : scales) {
+        GDALRasterBand& band = *dataset.GetRasterBand(told.number);
+        if (*band.GetUnitType() == '\0') band.SetUnitType(told.unit.c_str());
+        if (band.GetScale() == 1) band.SetScale(told.scale);
+        if (band.GetOffset() == 0) band.SetOffset(told.offset);
+    }
 }
 
 // Flushes answer nothing before GDAL 3.7.
@@ -187,7 +217,11 @@ void Dataset::LoadSidecar(const char* fileName, char** siblings) {
     const bool staged = base != fileName;
     if (staged) SetPhysicalFilename(base.c_str());
     TryLoadXML(staged ? nullptr : siblings);
-    Reported([&] { TakeEmbedded(staged ? nullptr : siblings); });
+    try {
+        TakeEmbedded(staged ? nullptr : siblings);
+    } catch (const zmchost::Error& error) {
+        CPLError(CE_Warning, CPLE_AppDefined, "%s", error.what());
+    }
     oOvManager.Initialize(this, base.c_str(), staged ? nullptr : siblings);
     // Without this GDAL looks for a mask beside the usual name, when it is asked for one.
     if (staged) oOvManager.HaveMaskFile(nullptr, base.c_str());
@@ -206,7 +240,9 @@ void Dataset::TakeEmbedded(char** siblings) {
         CPLParseXMLString(items.c_str()), &CPLDestroyXMLNode);
     CPLXMLNode* const root = CPLGetXMLNode(tree.get(), "=PAMDataset");
     if (!root || XMLInit(root, nullptr) != CE_None) return;
+    const auto scales = ScalesOf(*this);
     TryLoadXML(siblings);
+    PutBack(scales, *this);
     nPamFlags = (nPamFlags & ~GPF_DIRTY) | changed;
 }
 
