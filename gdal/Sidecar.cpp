@@ -95,8 +95,8 @@ void SaveSidecar(Dataset& dataset, const std::string& name) {
 
 void EmbedSidecar(Dataset& dataset, const std::string& name) {
     const std::string items = dataset.SidecarText();
-    if (!items.empty()) zmchost::EmbedItems(*dataset.File().source, name, items);
     dataset.ForgetChanges();
+    if (!items.empty()) zmchost::EmbedItems(*dataset.File().source, name, items);
     SaveMask(dataset, name);
 }
 

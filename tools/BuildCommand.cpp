@@ -216,7 +216,7 @@ void BuildCommand::WriteSidecar(GDALDataset& dataset, const zmchost::BuildOption
     kept = kept && reason.empty();
     if (!kept)
         throw Failure(target, "its metadata cannot be kept in " + Visible(target) +
-                                  zmcgdal::kSidecarEnding + ": " +
+                                  (embed ? "" : zmcgdal::kSidecarEnding) + ": " +
                                   (reason.empty() ? "no reason given" : reason));
 }
 

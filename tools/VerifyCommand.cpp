@@ -54,7 +54,8 @@ void VerifyCommand::Describe(OptionTable& table) {
         "\n"
         "Checked are structure, completeness, documents, statistics and levels, and level 0 where "
         "a\n"
-        "source is named. No-data values are those of FILE.aux.xml. Exit status 3, and a list, if\n"
+        "source is named. No-data values are those of FILE.aux.xml, or else of FILE. Exit status "
+        "3, and a list, if\n"
         "something differs.");
 }
 
