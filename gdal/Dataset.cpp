@@ -90,6 +90,18 @@ void PutBack(const std::vector<Scale>& scales, GDALDataset& dataset) {
     }
 }
 
+// In the domain OVERVIEWS GDAL looks for the names of files to open. Who puts a sidecar beside a
+// file may say so; a file that comes from anywhere may not.
+void DropOtherFiles(CPLXMLNode& root) {
+    for (CPLXMLNode* child = root.psChild; child;) {
+        CPLXMLNode* const next = child->psNext;
+        if (EQUAL(CPLGetXMLValue(child, "domain", ""), "OVERVIEWS") &&
+            CPLRemoveXMLChild(&root, child))
+            CPLDestroyXMLNode(child);
+        child = next;
+    }
+}
+
 // Flushes answer nothing before GDAL 3.7.
 template <class Work>
 auto ReportingFlush(Work&& work) {
@@ -239,7 +251,9 @@ void Dataset::TakeEmbedded(char** siblings) {
     const std::unique_ptr<CPLXMLNode, decltype(&CPLDestroyXMLNode)> tree(
         CPLParseXMLString(items.c_str()), &CPLDestroyXMLNode);
     CPLXMLNode* const root = CPLGetXMLNode(tree.get(), "=PAMDataset");
-    if (!root || XMLInit(root, nullptr) != CE_None) return;
+    if (!root) return;
+    DropOtherFiles(*root);
+    if (XMLInit(root, nullptr) != CE_None) return;
     const auto scales = ScalesOf(*this);
     TryLoadXML(siblings);
     PutBack(scales, *this);

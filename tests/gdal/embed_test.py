@@ -210,6 +210,22 @@ class Embed(FolderTest):
             file.write(data.replace(b"&lt;PAMDataset&gt;", b"&lt;PAMDatasex&gt;"))
         self.assertEqual(self.told(path)[:2], (None, None))
 
+    def test_levels_in_other_files_are_not_looked_for(self):
+        """A sidecar may name a file of levels; a pyramid comes from anywhere, and opens no other."""
+        path = self.embedded(LEVELS="0")
+        gdal.GetDriverByName("GTiff").Create(self.path("other.tif"), 200, 150, 2)
+        item = (b'&lt;PAMDataset&gt;&lt;Metadata domain="OVERVIEWS"&gt;&lt;MDI key="OVERVIEW_FILE"&gt;'
+                b":::BASE:::other.tif&lt;/MDI&gt;&lt;/Metadata&gt;")
+        with open(path, "rb") as file:
+            data = file.read()
+        with open(path, "wb") as file:
+            file.write(data.replace(b"&lt;PAMDataset&gt;", item))
+        dataset = gdal.Open(path)
+        self.assertIsNone(dataset.GetMetadataItem("OVERVIEW_FILE", "OVERVIEWS"))
+        self.assertEqual(dataset.GetRasterBand(1).GetOverviewCount(), 0)
+        self.assertEqual(dataset.GetGeoTransform(), GEOTRANSFORM)
+        self.assertEqual(dataset.GetFileList(), [path])
+
     def test_text_that_no_document_takes_is_refused_and_leaves_nothing(self):
         source = memory_dataset(samples(gdal.GDT_Byte, 20, 20, 1), gdal.GDT_Byte)
         source.SetMetadataItem("KEY", "\uffff")
