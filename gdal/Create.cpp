@@ -13,6 +13,7 @@
 #include "gdal/Sidecar.h"
 #include "gdal/VsiSource.h"
 #include "host/build/PyramidBuilder.h"
+#include "host/file/EmbeddedItems.h"
 #include "host/raster/LentFile.h"
 #include "platform/FileSystem.h"
 
@@ -131,7 +132,13 @@ GDALDataset* CopyTo(const std::string& target, GDALDataset& source, bool strict,
     Unfinished made(target);
     auto dataset = OpenForUpdate(target);
     if (CopySidecar(source, *dataset, strict) != CE_None) return nullptr;
-    SaveSidecar(*dataset, target);
+    if (options.embed) {
+        EmbedSidecar(*dataset, target);
+        dataset.reset();
+        dataset = OpenForUpdate(target);
+    } else {
+        SaveSidecar(*dataset, target);
+    }
     made.Keep();
     return dataset.release();
 }
@@ -162,6 +169,11 @@ GDALDataset* OpenSpool(const std::string& target, const zmchost::Raster& raster,
     creation->Check(*dataset);
     dataset->BeginCreation(std::move(creation));
     return dataset.release();
+}
+
+void DropColors(Dataset& dataset) {
+    for (int number = 1; number <= dataset.GetRasterCount(); ++number)
+        static_cast<Band*>(dataset.GetRasterBand(number))->DropSidecarColors();
 }
 
 bool RefuseLent(const char* target) {
@@ -247,15 +259,21 @@ bool Creation::Finish(Dataset& dataset) {
             throw zmchost::Error(target, "build it", "some of its blocks could not be written");
         GdalRasterSource source(dataset, options.signedByte);
         AcceptLosses(source, false);
+        if (options.embed)
+            options.build.beforeNaming = [&](const std::string& made) { Embed(dataset, made); };
         Build(source, target, options.build);
     });
     if (!built) return false;
     // The palettes are in the file now.
-    Reported([&] {
-        for (int number = 1; number <= dataset.GetRasterCount(); ++number)
-            static_cast<Band*>(dataset.GetRasterBand(number))->DropSidecarColors();
-    });
+    Reported([&] { DropColors(dataset); });
+    if (options.embed) dataset.ForgetChanges();
     return true;
+}
+
+void Creation::Embed(Dataset& dataset, const std::string& made) const {
+    DropColors(dataset);
+    const std::string items = dataset.SidecarText();
+    if (!items.empty()) zmchost::EmbedItems(*OpenByName(made, true), target, items);
 }
 
 }  // namespace zmcgdal

@@ -1,19 +1,26 @@
 #include "gdal/Dataset.h"
 
+#include <cpl_minixml.h>
+
 #include <algorithm>
 #include <climits>
 #include <cmath>
+#include <memory>
 #include <optional>
+#include <string>
 #include <utility>
+#include <vector>
 
 #include "core/PixelVocabulary.h"
 #include "gdal/Band.h"
 #include "gdal/Create.h"
+#include "gdal/ErrorCatcher.h"
 #include "gdal/LevelRefresh.h"
 #include "gdal/Reporting.h"
 #include "gdal/Sidecar.h"
 #include "gdal/SidecarStage.h"
 #include "gdal/VsiSource.h"
+#include "host/file/EmbeddedItems.h"
 #include "host/raster/LentFile.h"
 #include "platform/FileSystem.h"
 
@@ -55,6 +62,46 @@ bool HasPipesBeside(const std::string& base) {
         return true;
     }
     return false;
+}
+
+// What GDAL takes for told in any sidecar that tells something of the band: a unit of none, a scale
+// of 1 and an offset of 0.
+struct Scale {
+    int number = 0;  // of the band, from 1
+    std::string unit;
+    double scale = 1, offset = 0;
+};
+
+std::vector<Scale> ScalesOf(GDALDataset& dataset) {
+    std::vector<Scale> scales;
+    for (int number = 1; number <= dataset.GetRasterCount(); ++number) {
+        GDALRasterBand& band = *dataset.GetRasterBand(number);
+        Scale told{number, band.GetUnitType(), band.GetScale(), band.GetOffset()};
+        if (!told.unit.empty() || told.scale != 1 || told.offset != 0)
+            scales.push_back(std::move(told));
+    }
+    return scales;
+}
+
+void PutBack(const std::vector<Scale>& scales, GDALDataset& dataset) {
+    for (const Scale& told : scales) {
+        GDALRasterBand& band = *dataset.GetRasterBand(told.number);
+        if (*band.GetUnitType() == '\0') band.SetUnitType(told.unit.c_str());
+        if (band.GetScale() == 1) band.SetScale(told.scale);
+        if (band.GetOffset() == 0) band.SetOffset(told.offset);
+    }
+}
+
+// In the domain OVERVIEWS GDAL looks for the names of files to open. Who puts a sidecar beside a
+// file may say so; a file that comes from anywhere may not.
+void DropOtherFiles(CPLXMLNode& root) {
+    for (CPLXMLNode* child = root.psChild; child;) {
+        CPLXMLNode* const next = child->psNext;
+        if (EQUAL(CPLGetXMLValue(child, "domain", ""), "OVERVIEWS") &&
+            CPLRemoveXMLChild(&root, child))
+            CPLDestroyXMLNode(child);
+        child = next;
+    }
 }
 
 // Flushes answer nothing before GDAL 3.7.
@@ -243,6 +290,11 @@ void Dataset::LoadSidecar(const char* fileName, char** siblings) {
     const bool staged = base != fileName;
     if (staged) SetPhysicalFilename(base.c_str());
     TryLoadXML(staged ? nullptr : siblings);
+    try {
+        TakeEmbedded(staged ? nullptr : siblings);
+    } catch (const zmchost::Error& error) {
+        CPLError(CE_Warning, CPLE_AppDefined, "%s", error.what());
+    }
     oOvManager.Initialize(this, base.c_str(), staged ? nullptr : siblings);
     // Without this GDAL looks for a mask beside the usual name, when it is asked for one.
     if (staged) oOvManager.HaveMaskFile(nullptr, base.c_str());
@@ -251,6 +303,36 @@ void Dataset::LoadSidecar(const char* fileName, char** siblings) {
 bool Dataset::MayHaveMasks() {
     Load();
     return main || oOvManager.HaveMaskFile() || GDALPamDataset::GetMetadataItem("NODATA_VALUES");
+}
+
+// GDAL takes what it is given last, so the sidecar is read once more, behind the items of the file.
+// A sidecar that was made of them has all of them that are still wanted.
+void Dataset::TakeEmbedded(char** siblings) {
+    if (GDALPamDataset::GetMetadataItem(kEmbeddedItem, kEmbeddedDomain)) return;
+    const std::string items =
+        zmchost::ReadEmbeddedItems(*file->source, file->raster.Name(), file->info.header);
+    if (items.empty()) return;
+    const int changed = nPamFlags & GPF_DIRTY;
+    const ErrorCatcher quiet(CE_Failure);
+    const std::unique_ptr<CPLXMLNode, decltype(&CPLDestroyXMLNode)> tree(
+        CPLParseXMLString(items.c_str()), &CPLDestroyXMLNode);
+    CPLXMLNode* const root = CPLGetXMLNode(tree.get(), "=PAMDataset");
+    if (!root) return;
+    DropOtherFiles(*root);
+    if (XMLInit(root, nullptr) != CE_None) return;
+    const auto scales = ScalesOf(*this);
+    TryLoadXML(siblings);
+    PutBack(scales, *this);
+    nPamFlags = (nPamFlags & ~GPF_DIRTY) | changed;
+}
+
+std::string Dataset::SidecarText() {
+    using Tree = std::unique_ptr<CPLXMLNode, decltype(&CPLDestroyXMLNode)>;
+    if (!Tree(SerializeToXML(nullptr), &CPLDestroyXMLNode)) return "";
+    SetMetadataItem(kEmbeddedItem, "YES", kEmbeddedDomain);
+    const Tree tree(SerializeToXML(nullptr), &CPLDestroyXMLNode);
+    const std::unique_ptr<char, decltype(&CPLFree)> text(CPLSerializeXMLTree(tree.get()), &CPLFree);
+    return text ? text.get() : "";
 }
 
 bool Dataset::ReadsDirectly(int x, int y, int width, int height) const {

@@ -3,7 +3,8 @@
 // The main dataset is the finest level that the file holds; it owns the open file and one more
 // Dataset for each coarser level, which its bands show as overviews. Georeference, no-data values,
 // descriptions and the like live in the sidecar file (.aux.xml), which is written only after
-// something has been set.
+// something has been set, or inside of the file (host/file/EmbeddedItems.h), for what the sidecar
+// does not tell.
 #ifndef ZMC_GDAL_DATASET_H
 #define ZMC_GDAL_DATASET_H
 
@@ -119,6 +120,13 @@ public:
     // is what GDAL has asked the server for, or asks it for then.
     void LoadSidecarLater(const char* fileName);
 
+    // What a sidecar would tell of this dataset, as XML; empty if that is nothing. Marks it, so
+    // that a sidecar that is made of a dataset which has read it from its file counts for all of
+    // it.
+    std::string SidecarText();
+    // What was set and is not saved yet is not to be saved.
+    void ForgetChanges() { nPamFlags &= ~GPF_DIRTY; }
+
     // True if pixels of this window are better read past GDAL's block cache: it is not a sliver of
     // the tiles that it touches, or these are very large; and no block waits to be written.
     bool ReadsDirectly(int x, int y, int width, int height) const;
@@ -164,6 +172,7 @@ private:
             Dataset* mainDataset);
     void AddBands();
     void IgnoreCompanions();
+    void TakeEmbedded(char** siblings);
     void AddOverviews();
     void DescribeFile();
     bool HasWindow(int x, int y, int width, int height) const;

@@ -57,6 +57,7 @@ const std::string kCreationOptions =
   <Option name='BINS' type='int' default='256' description='Bins of a histogram'/>
   <Option name='NUM_THREADS' type='string' default='ALL_CPUS' description='Threads to build with: a number or ALL_CPUS'/>
   <Option name='MEMORY' type='string' default='256M' description='Memory for pixels, in bytes or with K, M or G'/>
+  <Option name='EMBED' type='boolean' default='NO' description='Whether georeference, no-data values and further metadata go into the file and not beside it'/>
   <Option name='PIXELTYPE' type='string-select' default='DEFAULT' description='SIGNEDBYTE takes Byte for signed'>
     <Value>DEFAULT</Value>
     <Value>SIGNEDBYTE</Value>
@@ -167,6 +168,7 @@ std::optional<CreationOptions> ParseCreationOptions(CSLConstList options) {
     if (!parsed.build.weights && !EQUAL(weights, "NONE") && !Report("WEIGHTS", weights))
         return std::nullopt;
     parsed.build.statistics = CPLFetchBool(options, "STATISTICS", true);
+    parsed.embed = CPLFetchBool(options, "EMBED", false);
     parsed.signedByte =
         EQUAL(CSLFetchNameValueDef(options, "PIXELTYPE", "DEFAULT"), "SIGNEDBYTE") != 0;
     if (!TakeCount(options, "LEVELS", "AUTO", parsed.build.levels) ||

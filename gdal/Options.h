@@ -35,6 +35,7 @@ std::optional<zmchost::Resampling> ResamplingFrom(const char* word);
 struct CreationOptions {
     zmchost::BuildOptions build;
     bool signedByte = false;  // PIXELTYPE=SIGNEDBYTE
+    bool embed = false;       // what a sidecar would keep goes into the file
 };
 
 // Reads the creation options; reports the first bad one to GDAL and gives nothing.

@@ -46,6 +46,7 @@ private:
     std::string memory = "256M";
     bool noStatistics = false;
     bool overwrite = false;
+    bool embed = false;
 
     zmchost::BuildOptions Options(const zelm::RasterProps& props) const;
     void CheckTarget() const;
@@ -91,13 +92,16 @@ void BuildCommand::Describe(OptionTable& table) {
     table
         .Text("--bands", bands,
               "Bands of the source in the order wanted, counted from 1 (default all)")
-        .Named("3,2,1");
+        .Named("3,2,1")
+        .Filled(kNoBands);
     table.Text("--bins", bins, "Bins of a histogram; 8-bit types have one per value (default 256)")
         .Named("N");
     table.Flag("--no-statistics", noStatistics, "Leave out statistics and histograms");
     table.Text("--threads", threads, "Threads to work with (default: all processors)").Named("N");
     table.Text("--memory", memory, "Memory for pixels, such as 64M or 2G (default 256M)")
         .Named("SIZE");
+    table.Flag("--embed", embed,
+               "Keep georeference, no-data values and other metadata in TARGET itself");
     table.Flag("--overwrite", overwrite, "Replace TARGET if it exists");
     table.Footer(
         "Examples:\n"
@@ -108,7 +112,7 @@ void BuildCommand::Describe(OptionTable& table) {
         "The target appears when it is finished, and never half done: a build that fails or is\n"
         "interrupted leaves the old file as it was. Georeference, no-data values, descriptions "
         "and\n"
-        "other metadata go to TARGET.aux.xml.");
+        "other metadata go to TARGET.aux.xml, or into TARGET with --embed.");
 }
 
 bool IsInteger(std::uint32_t pixelType) {
@@ -216,13 +220,13 @@ void BuildCommand::WriteSidecar(GDALDataset& dataset, const zmchost::BuildOption
         std::make_shared<zmcgdal::OpenFile>(built, GA_Update, zmcgdal::OpenOptions{}), GA_Update);
     pyramid->LoadSidecar(base.c_str(), nullptr);
     bool kept = selected && zmcgdal::CopySidecar(*selected, *pyramid, true) == CE_None;
-    if (kept) zmcgdal::SaveSidecar(*pyramid, target);
+    if (kept) (embed ? zmcgdal::EmbedSidecar : zmcgdal::SaveSidecar)(*pyramid, target);
     pyramid.reset();
     const std::string reason = TakeGdalError(target);
     kept = kept && reason.empty();
     if (!kept)
         throw Failure(target, "its metadata cannot be kept in " + Visible(target) +
-                                  zmcgdal::kSidecarEnding + ": " +
+                                  (embed ? "" : zmcgdal::kSidecarEnding) + ": " +
                                   (reason.empty() ? "no reason given" : reason));
 }
 

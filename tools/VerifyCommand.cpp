@@ -53,7 +53,8 @@ void VerifyCommand::Describe(OptionTable& table) {
     table
         .Text("--bands", bands,
               "Bands of SOURCE that the file was built from, counted from 1 (default all)")
-        .Named("3,2,1");
+        .Named("3,2,1")
+        .Filled(kNoBands);
     table.Footer(
         "Examples:\n"
         "  zmcraster verify scene.pyr\n"
@@ -62,7 +63,8 @@ void VerifyCommand::Describe(OptionTable& table) {
         "\n"
         "Checked are structure, completeness, documents, statistics and levels, and level 0 where "
         "a\n"
-        "source is named. No-data values are those of FILE.aux.xml. Exit status 3, and a list, if\n"
+        "source is named. No-data values are those of FILE.aux.xml, or else of FILE. Exit status "
+        "3, and a list, if\n"
         "something differs.");
 }
 

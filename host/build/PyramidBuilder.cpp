@@ -238,7 +238,11 @@ BuildReport BuildRun::Run() {
     RunWithThreads(threads, [this] { Fill(); });
     StoreRecords();
     Check();
-    if (options.beforeNaming) options.beforeNaming(file->Path());
+    if (options.beforeNaming) {
+        options.beforeNaming(file->Path());
+        // It may have put something in.
+        report.fileSize = PyramidHeader::Read(file->Path()).fileSize;
+    }
     file->Commit();
     report.width = props.samples;
     report.height = props.lines;

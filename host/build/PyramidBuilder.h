@@ -64,7 +64,8 @@ struct BuildOptions {
     // Called now and then, one call at a time, on one of the build's threads; false cancels.
     std::function<bool(const BuildProgress&)> progress;
     // Called once with the path of the finished file, before it gets its name: the last moment to
-    // put beside the target what belongs to the new file. What it throws ends the build.
+    // put beside the target, or into the file, what belongs to it. What it writes into the file it
+    // brings to the disk itself. What it throws ends the build.
     std::function<void(const std::string& finished)> beforeNaming;
 };
 

@@ -86,6 +86,12 @@ class Export(ToolTest):
         self.good("export", "picture.pyr", "picture.dat", "--format", "GTiff", "--co=TILED=YES")
         self.assertEqual(gdal.Open(self.path("picture.dat")).GetDriver().ShortName, "GTiff")
 
+    def test_the_format_is_told_as_gdals_own_programs_tell_it(self):
+        self.pyramid()
+        for words in (["-of", "GTiff"], ["--of", "GTiff"], ["--of=GTiff"]):
+            self.good("export", "picture.pyr", "picture.dat", *words)
+            self.assertEqual(gdal.Open(self.path("picture.dat")).GetDriver().ShortName, "GTiff")
+
     def test_an_old_target_is_replaced(self):
         self.pyramid()
         self.good("export", "picture.pyr", "back.tif", "--level", 2)
