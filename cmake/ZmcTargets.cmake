@@ -55,8 +55,11 @@ include(CheckPIESupported)
 check_pie_supported(LANGUAGES CXX)
 
 # For folders of test programs: they work in the libraries, so that optimising them as well would
-# take longer than it saves. The fortified functions of a release want -O1 at least.
-set(ZMC_TEST_FLAGS $<IF:$<CONFIG:Debug>,-O0,-O1>)
+# take longer than it saves. The fortified functions of a release want optimised callers.
+macro(zmc_compile_plainly)
+    add_compile_options(-O0)
+    list(FILTER ZMC_HARDENING_FLAGS EXCLUDE REGEX FORTIFY_SOURCE)
+endmacro()
 
 # Options that every binary of ours is compiled and linked with.
 function(zmc_configure_target target)

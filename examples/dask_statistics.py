@@ -8,14 +8,21 @@ it for itself. Minimum and maximum of level 0 agree with the archive of the file
 mean and standard deviation within rounding; the archive's own figures are printed beside.
 """
 import argparse
+import warnings
 
 import dask
 import numpy as np
 import rioxarray
 from dask.distributed import Client, LocalCluster
 from osgeo import gdal
+from rasterio.errors import NotGeoreferencedWarning
 
 TILE = 256
+
+
+def need_no_place():
+    """Statistics do not ask where on earth a picture lies; many do not know it."""
+    warnings.filterwarnings("ignore", category=NotGeoreferencedWarning)
 
 
 def open_level(name, level):
@@ -58,7 +65,9 @@ def main():
     arguments = parser.parse_args()
     cluster = LocalCluster(n_workers=arguments.workers, threads_per_worker=1,
                            dashboard_address=None)
+    need_no_place()
     with cluster, Client(cluster) as client:
+        client.run(need_no_place)
         raster = open_level(arguments.pyramid, arguments.level)
         print(f"level {arguments.level}: {raster.sizes['x']} x {raster.sizes['y']}, "
               f"{raster.sizes['band']} bands, {raster.data.npartitions} chunks, "

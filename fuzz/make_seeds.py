@@ -401,6 +401,17 @@ def driver_seeds():
                                        bytes([len(script)]))
 
 
+    inside = sidecar.decode().replace("<", "&lt;").replace(">", "&gt;")
+    document = ('<?xml version="1.0" encoding="UTF-8" standalone="no" ?>\n<DATASET>\n\n  <SIDECAR>' +
+                inside + "</SIDECAR>" + statistics(0) + "</DATASET>").encode()
+    for number, second in enumerate((b"", sidecar)):
+        for update in (0, 1):
+            script = bytes([update]) + STEPS[(number + 5 * update) % len(STEPS)]
+            yield f"embedded-{number}-{update}", (pyramid_file(document) + second +
+                                                  struct.pack("<H", len(second)) + script +
+                                                  bytes([len(script)]))
+
+
 def host_seeds():
     for number, (name, data) in enumerate(plain_files()):
         for kind in (0, 6):

@@ -241,7 +241,7 @@ bool Archive::StoreHistogram(const StoredHistogram& histogram) {
 bool Archive::StoreColorTable(std::uint32_t band, const GDALColorTable* table) {
     const bool stored = Store([&](auto& reader) {
         zelm::Palette palette;
-        if (table) AddColors(*table, palette);
+        if (table) ColorsOf(*table).CopyTo(palette);
         return reader.SetPalette(band, palette);
     });
     colorTables.erase(band);

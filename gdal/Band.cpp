@@ -3,6 +3,8 @@
 #include <algorithm>
 #include <climits>
 #include <cstring>
+#include <optional>
+#include <span>
 
 #include "core/PixelVocabulary.h"
 #include "gdal/Create.h"
@@ -197,6 +199,10 @@ CPLErr Band::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, voi
                                     bufferType, pixelSpace, lineSpace, extra, &tried);
             if (tried) return result;
         }
+        std::optional<PlannedRead> planned;
+        if (mode == GF_Read)
+            planned.emplace(owner.File(), owner.Level(), RectangleOf(x, y, width, height),
+                            std::span(&nBand, 1));
         if (mode == GF_Read && bufferWidth == width && bufferHeight == height &&
             owner.ReadsDirectly(x, y, width, height)) {
             const int band = static_cast<int>(index);
@@ -206,9 +212,15 @@ CPLErr Band::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, voi
                 return CE_None;
             return CE_Failure;
         }
-        return GDALPamRasterBand::IRasterIO(mode, x, y, width, height, data, bufferWidth,
-                                            bufferHeight, bufferType, pixelSpace, lineSpace, extra);
+        return CompanionBand::IRasterIO(mode, x, y, width, height, data, bufferWidth, bufferHeight,
+                                        bufferType, pixelSpace, lineSpace, extra);
     });
+}
+
+CPLErr Band::AdviseRead(int x, int y, int width, int height, int bufferWidth, int bufferHeight,
+                        GDALDataType bufferType, char** options) {
+    return owner.AdviseRead(x, y, width, height, bufferWidth, bufferHeight, bufferType, 1, &nBand,
+                            options);
 }
 
 // --- no-data values and masks ---
@@ -217,7 +229,7 @@ double Band::GetNoDataValue(int* success) {
     ReportSuccess(success, false);
     return Reporting<double>(0.0, [&]() -> double {
         if (owner.IsOverview()) return MainBand()->GetNoDataValue(success);
-        return GDALPamRasterBand::GetNoDataValue(success);
+        return CompanionBand::GetNoDataValue(success);
     });
 }
 
@@ -225,7 +237,7 @@ std::int64_t Band::GetNoDataValueAsInt64(int* success) {
     ReportSuccess(success, false);
     return Reporting<std::int64_t>(0, [&]() -> std::int64_t {
         if (owner.IsOverview()) return MainBand()->GetNoDataValueAsInt64(success);
-        return GDALPamRasterBand::GetNoDataValueAsInt64(success);
+        return CompanionBand::GetNoDataValueAsInt64(success);
     });
 }
 
@@ -233,7 +245,7 @@ std::uint64_t Band::GetNoDataValueAsUInt64(int* success) {
     ReportSuccess(success, false);
     return Reporting<std::uint64_t>(0, [&]() -> std::uint64_t {
         if (owner.IsOverview()) return MainBand()->GetNoDataValueAsUInt64(success);
-        return GDALPamRasterBand::GetNoDataValueAsUInt64(success);
+        return CompanionBand::GetNoDataValueAsUInt64(success);
     });
 }
 
@@ -241,7 +253,7 @@ CPLErr Band::SetNoDataValue(double value) {
     return Reporting(CE_Failure, [&] {
         if (owner.IsOverview()) return MainBand()->SetNoDataValue(value);
         InvalidateMaskBand();
-        return GDALPamRasterBand::SetNoDataValue(value);
+        return CompanionBand::SetNoDataValue(value);
     });
 }
 
@@ -249,7 +261,7 @@ CPLErr Band::SetNoDataValueAsInt64(std::int64_t value) {
     return Reporting(CE_Failure, [&] {
         if (owner.IsOverview()) return MainBand()->SetNoDataValueAsInt64(value);
         InvalidateMaskBand();
-        return GDALPamRasterBand::SetNoDataValueAsInt64(value);
+        return CompanionBand::SetNoDataValueAsInt64(value);
     });
 }
 
@@ -257,7 +269,7 @@ CPLErr Band::SetNoDataValueAsUInt64(std::uint64_t value) {
     return Reporting(CE_Failure, [&] {
         if (owner.IsOverview()) return MainBand()->SetNoDataValueAsUInt64(value);
         InvalidateMaskBand();
-        return GDALPamRasterBand::SetNoDataValueAsUInt64(value);
+        return CompanionBand::SetNoDataValueAsUInt64(value);
     });
 }
 
@@ -265,14 +277,14 @@ CPLErr Band::DeleteNoDataValue() {
     return Reporting(CE_Failure, [&] {
         if (owner.IsOverview()) return MainBand()->DeleteNoDataValue();
         InvalidateMaskBand();
-        return GDALPamRasterBand::DeleteNoDataValue();
+        return CompanionBand::DeleteNoDataValue();
     });
 }
 
 // GDAL's own search comes first: a mask file, an alpha band or a set of values over all bands
 // override what the pixels of one band tell.
 bool Band::UsesOwnMask() {
-    GDALPamRasterBand::GetMaskBand();
+    CompanionBand::GetMaskBand();
     const bool byValue = (nMaskFlags & GMF_NODATA) != 0 && (nMaskFlags & GMF_PER_DATASET) == 0;
     const bool mayBeNotFinite =
         GDALDataTypeIsFloating(eDataType) || GDALDataTypeIsComplex(eDataType);
@@ -301,7 +313,7 @@ GDALRasterBand* Band::GetMaskBand() {
                                                         owner.Level() - owner.Main().Level());
             return levelMask.get();
         }
-        if (!UsesOwnMask()) return GDALPamRasterBand::GetMaskBand();
+        if (!UsesOwnMask()) return CompanionBand::GetMaskBand();
         if (!ownMask) ownMask = std::make_unique<MaskBand>(*this);
         return ownMask.get();
     });
@@ -312,7 +324,7 @@ GDALRasterBand* Band::GetMaskBand() {
 int Band::GetMaskFlags() {
     return Reporting<int>(GMF_ALL_VALID, [&]() -> int {
         if (MaskIsBesideTheFile()) return MainBand()->GetMaskFlags();
-        return UsesOwnMask() ? GMF_NODATA : GDALPamRasterBand::GetMaskFlags();
+        return UsesOwnMask() ? GMF_NODATA : CompanionBand::GetMaskFlags();
     });
 }
 
@@ -321,14 +333,14 @@ int Band::GetMaskFlags() {
 int Band::GetOverviewCount() {
     return Reporting<int>(0, [&]() -> int {
         const auto own = static_cast<int>(owner.Overviews().size());
-        return own > 0 || owner.IsOverview() ? own : GDALPamRasterBand::GetOverviewCount();
+        return own > 0 || owner.IsOverview() ? own : CompanionBand::GetOverviewCount();
     });
 }
 
 GDALRasterBand* Band::GetOverview(int overview) {
     return Reporting<GDALRasterBand*>(nullptr, [&]() -> GDALRasterBand* {
         const auto& own = owner.Overviews();
-        if (own.empty() && !owner.IsOverview()) return GDALPamRasterBand::GetOverview(overview);
+        if (own.empty() && !owner.IsOverview()) return CompanionBand::GetOverview(overview);
         if (overview < 0 || overview >= static_cast<int>(own.size())) return nullptr;
         return own[static_cast<std::size_t>(overview)]->BandOf(nBand);
     });
@@ -360,7 +372,7 @@ GDALColorInterp Band::DefaultInterpretation() {
 GDALColorInterp Band::GetColorInterpretation() {
     return Reporting<GDALColorInterp>(GCI_Undefined, [&]() -> GDALColorInterp {
         if (owner.IsOverview()) return MainBand()->GetColorInterpretation();
-        const GDALColorInterp chosen = GDALPamRasterBand::GetColorInterpretation();
+        const GDALColorInterp chosen = CompanionBand::GetColorInterpretation();
         if (chosen != GCI_Undefined) return chosen;
         return GetColorTable() ? GCI_PaletteIndex : DefaultInterpretation();
     });
@@ -370,7 +382,7 @@ GDALColorTable* Band::GetColorTable() {
     return Reporting<GDALColorTable*>(nullptr, [&]() -> GDALColorTable* {
         if (owner.IsOverview()) return MainBand()->GetColorTable();
         GDALColorTable* const stored = owner.File().archive.ColorTable(index);
-        return stored ? stored : GDALPamRasterBand::GetColorTable();
+        return stored ? stored : CompanionBand::GetColorTable();
     });
 }
 

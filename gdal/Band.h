@@ -19,7 +19,7 @@
 
 namespace zmcgdal {
 
-class Band final : public GDALPamRasterBand {
+class Band final : public CompanionBand {
 public:
     // `number` counts from 1, as GDAL does.
     Band(Dataset& dataset, int number);
@@ -28,7 +28,7 @@ public:
     Dataset& Owner() { return owner; }
 
     // The color table need not stand in the sidecar, because the file has it.
-    void DropSidecarColors() { GDALPamRasterBand::SetColorTable(nullptr); }
+    void DropSidecarColors() { CompanionBand::SetColorTable(nullptr); }
 
     double GetNoDataValue(int* success = nullptr) override;
     std::int64_t GetNoDataValueAsInt64(int* success = nullptr) override;
@@ -87,6 +87,9 @@ public:
                                int force, GDALProgressFunc progress, void* progressData) override;
     CPLErr SetDefaultHistogram(double lower, double upper, int bucketCount,
                                GUIntBig* counts) override;
+
+    CPLErr AdviseRead(int x, int y, int width, int height, int bufferWidth, int bufferHeight,
+                      GDALDataType bufferType, char** options) override;
 
 protected:
     CPLErr IReadBlock(int blockX, int blockY, void* data) override;
@@ -149,6 +152,7 @@ private:
     bool StoresInFile() const;
     const CPLStringList& StatisticsItems();
     GDALColorInterp DefaultInterpretation();
+    bool TellsStructure(const char* domain) const;
     bool UsesOwnMask();
     bool MaskIsBesideTheFile();
 };

@@ -68,7 +68,7 @@ bool Band::StoresInFile() const { return eAccess == GA_Update && owner.File().in
 
 std::uint32_t Band::CountOfOld(const char* item) {
     Band& main = owner.IsOverview() ? *MainBand() : *this;
-    const char* const text = main.GDALPamRasterBand::GetMetadataItem(item, kOwnDomain);
+    const char* const text = main.CompanionBand::GetMetadataItem(item, kOwnDomain);
     return text ? static_cast<std::uint32_t>(std::strtoul(text, nullptr, 10)) : 0;
 }
 
@@ -80,8 +80,8 @@ RecordCounts Band::OldRecords() {
 
 void Band::SetCountOfOld(const char* item, std::uint32_t count) {
     if (CountOfOld(item) == count) return;
-    GDALPamRasterBand::SetMetadataItem(item, count != 0 ? std::to_string(count).c_str() : nullptr,
-                                       kOwnDomain);
+    CompanionBand::SetMetadataItem(item, count != 0 ? std::to_string(count).c_str() : nullptr,
+                                   kOwnDomain);
 }
 
 void Band::HideStatistics(const Archive& inFile) {
@@ -114,8 +114,8 @@ void Band::SetOldRecords(const RecordCounts& counts) {
 
 // A sidecar without any is not written for this.
 void Band::DropSidecarStatistics() {
-    char** const items = GDALPamRasterBand::GetMetadata("");
-    if (HasStatistics(items)) GDALPamRasterBand::SetMetadata(WithoutStatistics(items).List(), "");
+    char** const items = CompanionBand::GetMetadata("");
+    if (HasStatistics(items)) CompanionBand::SetMetadata(WithoutStatistics(items).List(), "");
 }
 
 void Band::DropSidecarHistograms() {
@@ -170,20 +170,25 @@ const CPLStringList& Band::StatisticsItems() {
     return statistics;
 }
 
+// Whoever reads pixels asks for it: behind a network no sidecar is looked at for this.
+bool Band::TellsStructure(const char* domain) const {
+    return domain && EQUAL(domain, kStructureDomain) &&
+           (structure.Count() > 0 || owner.File().raster.Remote());
+}
+
 char** Band::GetMetadataDomainList() {
     return Reporting<char**>(nullptr, [&]() -> char** {
-        return BuildMetadataDomainList(GDALPamRasterBand::GetMetadataDomainList(), TRUE, "",
+        return BuildMetadataDomainList(CompanionBand::GetMetadataDomainList(), TRUE, "",
                                        kStructureDomain, nullptr);
     });
 }
 
 char** Band::GetMetadata(const char* domain) {
     return Reporting<char**>(nullptr, [&]() -> char** {
-        if (domain && EQUAL(domain, kStructureDomain) && structure.Count() > 0)
-            return structure.List();
+        if (TellsStructure(domain)) return structure.List();
         if (!IsDefaultDomain(domain) || StatisticsItems().Count() == 0)
-            return GDALPamRasterBand::GetMetadata(domain);
-        merged = CPLStringList(CSLDuplicate(GDALPamRasterBand::GetMetadata(domain)));
+            return CompanionBand::GetMetadata(domain);
+        merged = CPLStringList(CSLDuplicate(CompanionBand::GetMetadata(domain)));
         for (int i = 0; i < statistics.Count(); ++i) {
             char* name = nullptr;
             const char* const value = CPLParseNameValue(statistics[i], &name);
@@ -196,11 +201,10 @@ char** Band::GetMetadata(const char* domain) {
 
 const char* Band::GetMetadataItem(const char* name, const char* domain) {
     return Reporting<const char*>(nullptr, [&]() -> const char* {
-        if (domain && EQUAL(domain, kStructureDomain) && structure.Count() > 0)
-            return structure.FetchNameValue(name);
+        if (TellsStructure(domain)) return structure.FetchNameValue(name);
         if (IsDefaultDomain(domain) && STARTS_WITH_CI(name, "STATISTICS_"))
             if (const char* const value = StatisticsItems().FetchNameValue(name)) return value;
-        return GDALPamRasterBand::GetMetadataItem(name, domain);
+        return CompanionBand::GetMetadataItem(name, domain);
     });
 }
 
@@ -211,7 +215,7 @@ void Band::TakeStatisticsOver() {
     for (int i = 0; i < items.Count(); ++i) {
         char* name = nullptr;
         const char* const value = CPLParseNameValue(items[i], &name);
-        if (name) GDALPamRasterBand::SetMetadataItem(name, value, "");
+        if (name) CompanionBand::SetMetadataItem(name, value, "");
         CPLFree(name);
     }
     HideStatistics();
@@ -224,15 +228,14 @@ CPLErr Band::SetMetadataItem(const char* name, const char* value, const char* do
             if (shown && value && EQUAL(shown, value)) return CE_None;
             TakeStatisticsOver();
         }
-        return GDALPamRasterBand::SetMetadataItem(name, value, domain);
+        return CompanionBand::SetMetadataItem(name, value, domain);
     });
 }
 
 // Those who add an item give back all that they were shown.
 CPLErr Band::SetMetadata(char** items, const char* domain) {
     return Reporting(CE_Failure, [&] {
-        if (!IsDefaultDomain(domain) || !Stored())
-            return GDALPamRasterBand::SetMetadata(items, domain);
+        if (!IsDefaultDomain(domain) || !Stored()) return CompanionBand::SetMetadata(items, domain);
         CPLStringList kept(CSLDuplicate(items));
         const CPLStringList& shown = StatisticsItems();
         const bool same =
@@ -244,7 +247,7 @@ CPLErr Band::SetMetadata(char** items, const char* domain) {
             for (const char* const name : kStatisticItems) kept.SetNameValue(name, nullptr);
         else
             HideStatistics();
-        return GDALPamRasterBand::SetMetadata(kept.List(), domain);
+        return CompanionBand::SetMetadata(kept.List(), domain);
     });
 }
 
@@ -253,7 +256,7 @@ double Band::GetMinimum(int* success) {
     return Reporting<double>(0.0, [&]() -> double {
         const StoredStatistics* const stored = Stored();
         if (!stored || !(stored->flags & zelm::StatsFlag::Minimum))
-            return GDALPamRasterBand::GetMinimum(success);
+            return CompanionBand::GetMinimum(success);
         ReportSuccess(success, true);
         return stored->minimum;
     });
@@ -264,7 +267,7 @@ double Band::GetMaximum(int* success) {
     return Reporting<double>(0.0, [&]() -> double {
         const StoredStatistics* const stored = Stored();
         if (!stored || !(stored->flags & zelm::StatsFlag::Maximum))
-            return GDALPamRasterBand::GetMaximum(success);
+            return CompanionBand::GetMaximum(success);
         ReportSuccess(success, true);
         return stored->maximum;
     });
@@ -275,8 +278,8 @@ CPLErr Band::GetStatistics(int approximate, int force, double* minimum, double* 
     return Reporting(CE_Failure, [&] {
         const StoredStatistics* const stored = Stored();
         if (!stored || !stored->IsFull())
-            return GDALPamRasterBand::GetStatistics(approximate, force, minimum, maximum, mean,
-                                                    deviation);
+            return CompanionBand::GetStatistics(approximate, force, minimum, maximum, mean,
+                                                deviation);
         if (minimum) *minimum = stored->minimum;
         if (maximum) *maximum = stored->maximum;
         if (mean) *mean = stored->mean;
@@ -290,8 +293,8 @@ CPLErr Band::ComputeStatistics(int approximate, double* minimum, double* maximum
                                double* deviation, GDALProgressFunc progress, void* progressData) {
     computing = true;
     const CPLErr result = Reporting(CE_Failure, [&] {
-        return GDALPamRasterBand::ComputeStatistics(approximate, minimum, maximum, mean, deviation,
-                                                    progress, progressData);
+        return CompanionBand::ComputeStatistics(approximate, minimum, maximum, mean, deviation,
+                                                progress, progressData);
     });
     computing = false;
     return result;
@@ -299,8 +302,7 @@ CPLErr Band::ComputeStatistics(int approximate, double* minimum, double* maximum
 
 // A level has no place of its own for them.
 CPLErr Band::KeepInMemory(const StoredStatistics& given) {
-    GDALPamRasterBand::SetStatistics(given.minimum, given.maximum, given.mean,
-                                     given.standardDeviation);
+    CompanionBand::SetStatistics(given.minimum, given.maximum, given.mean, given.standardDeviation);
     ReportError(CE_Warning, CPLE_NotSupported,
                 "statistics of a level are kept until it is closed, and not stored");
     return CE_Warning;
@@ -309,7 +311,7 @@ CPLErr Band::KeepInMemory(const StoredStatistics& given) {
 void Band::KeepInSidecar(const StoredStatistics& given, const Archive& inFile) {
     const double values[] = {given.minimum, given.maximum, given.mean, given.standardDeviation};
     for (std::size_t i = 0; i < std::size(values); ++i)
-        GDALPamRasterBand::SetMetadataItem(kStatisticItems[i], NumberText(values[i]).c_str(), "");
+        CompanionBand::SetMetadataItem(kStatisticItems[i], NumberText(values[i]).c_str(), "");
     HideStatistics(inFile);
 }
 
@@ -318,8 +320,8 @@ void Band::ForgetInSidecar() {
     SetCountOfOld(kOldStatistics, 0);
     statisticsFetched = false;
     for (const char* const name : kStatisticItems)
-        if (GDALPamRasterBand::GetMetadataItem(name, ""))
-            GDALPamRasterBand::SetMetadataItem(name, nullptr, "");
+        if (CompanionBand::GetMetadataItem(name, ""))
+            CompanionBand::SetMetadataItem(name, nullptr, "");
 }
 
 void Band::KeepDigits(const StoredStatistics& given, Archive& inFile) {
@@ -353,8 +355,8 @@ CPLErr Band::GetDefaultHistogram(double* lower, double* upper, int* bucketCount,
     return Reporting(CE_Failure, [&] {
         const StoredHistogram* const stored = CurrentHistogram();
         if (!stored)
-            return GDALPamRasterBand::GetDefaultHistogram(lower, upper, bucketCount, counts, force,
-                                                          progress, progressData);
+            return CompanionBand::GetDefaultHistogram(lower, upper, bucketCount, counts, force,
+                                                      progress, progressData);
         auto* const copy =
             static_cast<GUIntBig*>(VSI_MALLOC2_VERBOSE(stored->counts.size(), sizeof(GUIntBig)));
         if (!copy) return CE_Failure;
@@ -373,7 +375,7 @@ CPLErr Band::KeepHistogram(double lower, double upper, int bucketCount, GUIntBig
                     "histograms of a level are in the file: open it for update");
         return CE_Failure;
     }
-    const CPLErr kept = GDALPamRasterBand::SetDefaultHistogram(lower, upper, bucketCount, counts);
+    const CPLErr kept = CompanionBand::SetDefaultHistogram(lower, upper, bucketCount, counts);
     if (kept != CE_None) return kept;
     HideHistograms();
     return owner.SaveSidecarNow();

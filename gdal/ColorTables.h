@@ -4,21 +4,20 @@
 
 #include <gdal_priv.h>
 
-#include "colour/Palette.h"
+#include "colour/ColorList.h"
 
 namespace zmcgdal {
 
-// Appends the entries, of which each component is cut to a byte.
-inline void AddColors(const GDALColorTable& table, zelm::Palette& palette) {
-    zelm::RGBAColor color{zelm::Array<unsigned char>()};  // one for all: its name is made once
+// The entries in their order, of which each component is cut to a byte.
+inline zelm::ColorList ColorsOf(const GDALColorTable& table) {
+    zelm::ColorList colors;
+    const auto cut = [](short component) { return static_cast<std::uint8_t>(component); };
     for (int i = 0; i < table.GetColorEntryCount(); ++i) {
         const GDALColorEntry& entry = *table.GetColorEntry(i);
-        color.red = static_cast<unsigned char>(entry.c1);
-        color.green = static_cast<unsigned char>(entry.c2);
-        color.blue = static_cast<unsigned char>(entry.c3);
-        color.alpha = static_cast<unsigned char>(entry.c4);
-        palette.AddColor(color);
+        colors.Add(
+            zelm::ColorList::Pack(cut(entry.c1), cut(entry.c2), cut(entry.c3), cut(entry.c4)));
     }
+    return colors;
 }
 
 }  // namespace zmcgdal

@@ -7,20 +7,26 @@
 #include "gdal/Band.h"
 #include "gdal/Dataset.h"
 #include "gdal/ErrorCatcher.h"
+#include "gdal/Fetcher.h"
 #include "gdal/GdalRasterSource.h"
 #include "gdal/Reporting.h"
 #include "gdal/Sidecar.h"
+#include "gdal/VsiSource.h"
 #include "host/build/PyramidBuilder.h"
+#include "host/file/EmbeddedItems.h"
+#include "host/raster/LentFile.h"
+#include "platform/FileSystem.h"
 
 namespace zmcgdal {
 namespace {
 
 // Names what cannot be kept; false if that is not acceptable.
 bool AcceptLosses(const GdalRasterSource& source, bool strict) {
-    for (const std::string& loss : source.Losses())
+    const std::vector<std::string> losses = source.Losses();
+    for (const std::string& loss : losses)
         CPLError(strict ? CE_Failure : CE_Warning, CPLE_NotSupported, "a pyramid does not keep %s",
                  loss.c_str());
-    return source.Losses().empty() || !strict;
+    return losses.empty() || !strict;
 }
 
 void UseProgress(zmchost::BuildOptions& options, GDALProgressFunc progress, void* data) {
@@ -55,19 +61,87 @@ std::unique_ptr<Dataset> OpenForUpdate(const std::string& name) {
     return dataset;
 }
 
+// Builders work in plain folders: what is to stand elsewhere is built in the folder for temporary
+// files first.
+std::string TemporaryName() {
+    const char* const folder =
+        CPLGetConfigOption("CPL_TMPDIR", CPLGetConfigOption("TMPDIR", "/tmp"));
+    return platform::JoinPath(folder, "zmcraster");
+}
+
+[[noreturn]] void FailToWrite(const std::string& target) {
+    throw zmchost::Error(target, "create the pyramid", "GDAL cannot write it there");
+}
+
+// GDAL tells so of networks beforehand; of an archive that it can write, it says that it cannot.
+void CheckWritable(const std::string& target) {
+    if (!NetworkPart(target).empty() && !VSISupportsSequentialWrite(target.c_str(), true))
+        FailToWrite(target);
+}
+
+// In order from its beginning, as every file system that can be written takes it.
+void CopyFile(const std::string& from, const std::string& target) {
+    const auto source = zmchost::OpenPlainFile(from, false);
+    const CPLErrorStateBackuper before;
+    const ErrorCatcher errors(CE_Failure);
+    VSILFILE* const file = VSIFOpenL(target.c_str(), "wb");
+    if (!file) FailToWrite(target);
+    std::vector<unsigned char> piece(std::size_t{1} << 20);
+    int error = 0;
+    std::uint64_t at = 0;
+    bool written = true;
+    while (written && error == 0) {
+        const std::size_t size = source->ReadAt(at, piece.data(), piece.size(), &error);
+        if (size == 0) break;
+        written = VSIFWriteL(piece.data(), 1, size, file) == size;
+        at += size;
+    }
+    written = VSIFCloseL(file) == 0 && written && error == 0;
+    if (written) return;
+    VSIUnlink(target.c_str());
+    FailToWrite(target);
+}
+
+// The builder knows a file by the name of its spool.
+void BuildElsewhere(zmchost::RasterSource& pixels, const std::string& target,
+                    const zmchost::BuildOptions& options) {
+    const zmchost::BuildFile spool(TemporaryName(), true);
+    try {
+        zmchost::PyramidBuilder(SharedModule()).Build(pixels, spool.Path(), options);
+        CopyFile(spool.Path(), target);
+    } catch (const zmchost::Cancelled& error) {
+        throw zmchost::Cancelled(target, error.Operation());
+    } catch (const zmchost::Error& error) {
+        throw zmchost::Error(target, error.Operation(), error.Reason());
+    }
+}
+
+void Build(zmchost::RasterSource& pixels, const std::string& target,
+           const zmchost::BuildOptions& options) {
+    if (IsVirtualName(target)) return BuildElsewhere(pixels, target, options);
+    zmchost::PyramidBuilder(SharedModule()).Build(pixels, target, options);
+}
+
 GDALDataset* CopyTo(const std::string& target, GDALDataset& source, bool strict,
                     CreationOptions options, GDALProgressFunc progress, void* progressData) {
+    CheckWritable(target);
     GdalRasterSource pixels(source, options.signedByte);
     if (!AcceptLosses(pixels, strict)) return nullptr;
     UseProgress(options.build, progress, progressData);
     std::vector<zmchost::FullStatistics> statistics;
     options.build.takeStatistics = [&](const auto& stored) { statistics = stored; };
-    zmchost::PyramidBuilder(SharedModule()).Build(pixels, target, options.build);
+    Build(pixels, target, options.build);
     Unfinished made(target);
     auto dataset = OpenForUpdate(target);
     if (CopySidecar(source, *dataset, strict) != CE_None) return nullptr;
     KeepStatistics(statistics, *dataset, dataset->File().archive);
-    SaveSidecar(*dataset, target);
+    if (options.embed) {
+        EmbedSidecar(*dataset, target);
+        dataset.reset();
+        dataset = OpenForUpdate(target);
+    } else {
+        SaveSidecar(*dataset, target);
+    }
     made.Keep();
     return dataset.release();
 }
@@ -100,6 +174,11 @@ GDALDataset* OpenSpool(const std::string& target, const zmchost::Raster& raster,
     return dataset.release();
 }
 
+void DropColors(Dataset& dataset) {
+    for (int number = 1; number <= dataset.GetRasterCount(); ++number)
+        static_cast<Band*>(dataset.GetRasterBand(number))->DropSidecarColors();
+}
+
 bool RefuseLent(const char* target) {
     if (!zelm::files::LooksLent(target)) return false;
     CPLError(CE_Failure, CPLE_IllegalArg, "%s: names of lent sources are not taken here", target);
@@ -128,7 +207,9 @@ GDALDataset* CreateNew(const char* target, int width, int height, int bands, GDA
         const bool changes = type == GDT_CInt16 || type == GDT_CInt32;
         const std::uint32_t pixelType = changes ? 0 : PixelTypeFor(type, parsed->signedByte);
         const zelm::RasterProps props = PropsOf(target, width, height, bands, pixelType);
-        auto spool = std::make_unique<zmchost::BuildFile>(target, true);
+        CheckWritable(target);
+        auto spool = std::make_unique<zmchost::BuildFile>(
+            IsVirtualName(target) ? TemporaryName() : target, true);
         const zmchost::Raster raster =
             zmchost::Raster::Create(SharedModule(), spool->Path(), props, 0);
         return OpenSpool(target, raster, std::move(*parsed), std::move(spool));
@@ -188,8 +269,10 @@ void Creation::KeepMask(Dataset& dataset) const {
     if (!errors.Text().empty())
         throw zmchost::Error(target, "keep its mask in " + target + kMaskEnding, errors.Text());
     VSIStatBufL status;
-    if (VSIStatL(mask.c_str(), &status) == 0 &&
-        VSIRename(mask.c_str(), (target + kMaskEnding).c_str()) != 0)
+    const bool exists = VSIStatL(mask.c_str(), &status) == 0;
+    if (exists && IsVirtualName(target))
+        CopyFile(mask, target + kMaskEnding);
+    else if (exists && VSIRename(mask.c_str(), (target + kMaskEnding).c_str()) != 0)
         throw zmchost::Error(target, "keep its mask", "it cannot be moved to its place");
     made.Keep();
 }
@@ -197,23 +280,37 @@ void Creation::KeepMask(Dataset& dataset) const {
 bool Creation::Finish(Dataset& dataset) {
     sealed = std::find(written.begin(), written.end(), false) == written.end();
     std::vector<zmchost::FullStatistics> statistics;
+    const auto keepStatistics = [&](const std::string& file) {
+        OpenFile made(file, GA_ReadOnly, OpenOptions{});
+        KeepStatistics(statistics, dataset, made.archive);
+    };
     const bool built = Reported([&] {
         if (std::find(lost.begin(), lost.end(), true) != lost.end())
             throw zmchost::Error(target, "build it", "some of its blocks could not be written");
         GdalRasterSource source(dataset, options.signedByte);
         AcceptLosses(source, false);
         options.build.takeStatistics = [&](const auto& stored) { statistics = stored; };
-        zmchost::PyramidBuilder(SharedModule()).Build(source, target, options.build);
+        if (options.embed)
+            options.build.beforeNaming = [&](const std::string& made) {
+                keepStatistics(made);
+                Embed(dataset, made);
+            };
+        Build(source, target, options.build);
     });
     if (!built || !Reported([&] { KeepMask(dataset); })) return false;
     // The palettes are in the file now.
     Reported([&] {
-        for (int number = 1; number <= dataset.GetRasterCount(); ++number)
-            static_cast<Band*>(dataset.GetRasterBand(number))->DropSidecarColors();
-        OpenFile made(target, GA_ReadOnly, OpenOptions{});
-        KeepStatistics(statistics, dataset, made.archive);
+        DropColors(dataset);
+        if (!options.embed) keepStatistics(target);
     });
+    if (options.embed) dataset.ForgetChanges();
     return true;
+}
+
+void Creation::Embed(Dataset& dataset, const std::string& made) const {
+    DropColors(dataset);
+    const std::string items = dataset.SidecarText();
+    if (!items.empty()) zmchost::EmbedItems(*OpenByName(made, true), target, items);
 }
 
 }  // namespace zmcgdal

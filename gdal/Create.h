@@ -71,6 +71,9 @@ private:
     std::vector<bool> written;  // by block and band
     std::vector<bool> lost;     // likewise
     bool sealed = false;
+
+    // Puts what was set into the finished file of that path, which has no name yet.
+    void Embed(Dataset& dataset, const std::string& made) const;
 };
 
 }  // namespace zmcgdal

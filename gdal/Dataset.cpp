@@ -1,21 +1,30 @@
 #include "gdal/Dataset.h"
 
+#include <cpl_minixml.h>
+
 #include <algorithm>
 #include <climits>
+#include <cmath>
 #include <cstdlib>
+#include <memory>
+#include <optional>
+#include <string>
 #include <string_view>
 #include <utility>
+#include <vector>
 
 #include "core/PixelVocabulary.h"
 #include "format/PyramidLayout.h"
 #include "gdal/Band.h"
 #include "gdal/Create.h"
+#include "gdal/ErrorCatcher.h"
 #include "gdal/LevelRefresh.h"
 #include "gdal/RecordRenewal.h"
 #include "gdal/Reporting.h"
 #include "gdal/Sidecar.h"
 #include "gdal/SidecarStage.h"
 #include "gdal/VsiSource.h"
+#include "host/file/EmbeddedItems.h"
 #include "host/raster/LentFile.h"
 #include "platform/FileSystem.h"
 
@@ -61,6 +70,46 @@ bool HasPipesBeside(const std::string& base) {
     return false;
 }
 
+// What GDAL takes for told in any sidecar that tells something of the band: a unit of none, a scale
+// of 1 and an offset of 0.
+struct Scale {
+    int number = 0;  // of the band, from 1
+    std::string unit;
+    double scale = 1, offset = 0;
+};
+
+std::vector<Scale> ScalesOf(GDALDataset& dataset) {
+    std::vector<Scale> scales;
+    for (int number = 1; number <= dataset.GetRasterCount(); ++number) {
+        GDALRasterBand& band = *dataset.GetRasterBand(number);
+        Scale told{number, band.GetUnitType(), band.GetScale(), band.GetOffset()};
+        if (!told.unit.empty() || told.scale != 1 || told.offset != 0)
+            scales.push_back(std::move(told));
+    }
+    return scales;
+}
+
+void PutBack(const std::vector<Scale>& scales, GDALDataset& dataset) {
+    for (const Scale& told : scales) {
+        GDALRasterBand& band = *dataset.GetRasterBand(told.number);
+        if (*band.GetUnitType() == '\0') band.SetUnitType(told.unit.c_str());
+        if (band.GetScale() == 1) band.SetScale(told.scale);
+        if (band.GetOffset() == 0) band.SetOffset(told.offset);
+    }
+}
+
+// In the domain OVERVIEWS GDAL looks for the names of files to open. Who puts a sidecar beside a
+// file may say so; a file that comes from anywhere may not.
+void DropOtherFiles(CPLXMLNode& root) {
+    for (CPLXMLNode* child = root.psChild; child;) {
+        CPLXMLNode* const next = child->psNext;
+        if (EQUAL(CPLGetXMLValue(child, "domain", ""), "OVERVIEWS") &&
+            CPLRemoveXMLChild(&root, child))
+            CPLDestroyXMLNode(child);
+        child = next;
+    }
+}
+
 // Flushes answer nothing before GDAL 3.7.
 template <class Work>
 auto ReportingFlush(Work&& work) {
@@ -74,13 +123,47 @@ auto ReportingFlush(Work&& work) {
 }  // namespace
 
 OpenFile::OpenFile(const std::string& fileName, GDALAccess access, const OpenOptions& options)
-    : source(OpenByName(fileName, access == GA_Update)),
+    : OpenFile(fileName, OpenByName(fileName, access == GA_Update, options.remoteBytes), options) {}
+
+OpenFile::OpenFile(const std::string& fileName, std::shared_ptr<zelm::files::ByteSource> opened,
+                   const OpenOptions& options)
+    : source(std::move(opened)),
       info(CheckedInfo(fileName, zmchost::PyramidHeader::Read(*source, fileName))),
       raster(fileName, source, info.header, options.keepCopies),
-      tiles(raster, info, GdalTypeOf(info.header.pixelType, options.signedByteAs),
-            options.missingAsZeros),
+      pixels(fileName, raster.WithoutDocument(), info.header, false),
+      tiles(raster.Remote() ? pixels : raster, info,
+            GdalTypeOf(info.header.pixelType, options.signedByteAs), options.missingAsZeros),
       archive(raster, info.HasMetadataDocument(), limits),
-      renewsStatistics(options.statistics) {}
+      renewsStatistics(options.statistics) {
+    if (raster.Remote()) raster.Remote()->SetDocument(info.MetaDocumentOffset());
+}
+
+WindowTiles OpenFile::TilesOf(std::uint32_t level, const zelm::Rectangle& window,
+                              std::span<const int> bandNumbers) const {
+    std::vector<std::uint32_t> bands;
+    for (const int number : bandNumbers) bands.push_back(static_cast<std::uint32_t>(number - 1));
+    return {info.header, level, window, std::move(bands)};
+}
+
+void OpenFile::Advise(std::uint32_t level, const zelm::Rectangle& window,
+                      std::span<const int> bandNumbers) {
+    RemoteSource* const remote = raster.Remote();
+    if (remote && !remote->Advise(TilesOf(level, window, bandNumbers))) raster.CheckNetwork();
+}
+
+PlannedRead::PlannedRead(OpenFile& file, std::uint32_t level, const zelm::Rectangle& window,
+                         std::span<const int> bandNumbers)
+    : remote(file.isPlanned ? nullptr : file.raster.Remote()), isPlanned(file.isPlanned) {
+    if (!remote) return;
+    remote->Plan(file.TilesOf(level, window, bandNumbers));
+    isPlanned = true;
+}
+
+PlannedRead::~PlannedRead() {
+    if (!remote) return;
+    remote->EndPlan();
+    isPlanned = false;
+}
 
 void OpenFile::CheckTile(std::uint32_t level, std::uint32_t bands, const char* operation) const {
     const zelm::LevelGeometry grid = info.header.Geometry(level);
@@ -124,6 +207,22 @@ std::unique_ptr<Dataset> Dataset::FromFile(std::shared_ptr<OpenFile> file, GDALA
     return std::unique_ptr<Dataset>(new Dataset(std::move(file), base, access, nullptr));
 }
 
+std::unique_ptr<Dataset> Dataset::FromOverview(std::unique_ptr<Dataset> raster, int overview) {
+    const auto& all = raster->Overviews();
+    if (overview >= static_cast<int>(all.size()))
+        throw zmchost::Error(raster->GetDescription(), "show overview " + std::to_string(overview),
+                             "it has " + std::to_string(all.size()));
+    if (raster->eAccess == GA_Update)
+        throw zmchost::Error(raster->GetDescription(), "show an overview for update",
+                             "the raster alone can be changed");
+    const std::uint32_t level = all[static_cast<std::size_t>(overview)]->level;
+    std::unique_ptr<Dataset> shown(new Dataset(raster->file, level, GA_ReadOnly, raster.get()));
+    shown->kept = std::move(raster);
+    shown->SetDescription(shown->kept->GetDescription());
+    for (int number = 1; number <= shown->GetRasterCount(); ++number) shown->BandOf(number);
+    return shown;
+}
+
 // GDAL holds half a kilobyte and more for each band of each level, and of tens of thousands only
 // some are looked at: levels have them when they are asked for. The last one tells the number.
 void Dataset::AddBands() {
@@ -151,12 +250,12 @@ void Dataset::AddOverviews() {
     const zmchost::PresentTiles present(header);
     const bool mayHave =
         zelm::PyramidLayout::MayHaveLevels(header.versionMajor, header.versionMinor);
-    if (!main && !creation && mayHave)
+    if ((!main || kept) && !creation && mayHave)
         for (const zmchost::PyramidLevelInfo& coarser : file->info.levels)
             if (coarser.level > level && coarser.width > 0 && coarser.height > 0 &&
                 present.HaveLevel(coarser.level, header.fileSize))
                 made.push_back(
-                    std::unique_ptr<Dataset>(new Dataset(file, coarser.level, eAccess, this)));
+                    std::unique_ptr<Dataset>(new Dataset(file, coarser.level, eAccess, &Main())));
     overviews = std::move(made);
     overviewsMade = true;
 }
@@ -205,6 +304,14 @@ CPLErr Dataset::CreateMaskBand(int flags) {
 // Nor is anything written there.
 void Dataset::IgnoreCompanions() { nPamFlags |= GPF_DISABLED; }
 
+void Dataset::LoadSidecarLater(const char* fileName) {
+    SetDescription(fileName);
+    PutOff([this, name = std::string(fileName)] {
+        GDALOpenInfo info(name.c_str(), GDAL_OF_RASTER);
+        LoadSidecar(name.c_str(), info.GetSiblingFiles());
+    });
+}
+
 void Dataset::LoadSidecar(const char* fileName, char** siblings) {
     SetDescription(fileName);
     std::string base = fileName;
@@ -218,6 +325,11 @@ void Dataset::LoadSidecar(const char* fileName, char** siblings) {
     const bool staged = base != fileName;
     if (staged) SetPhysicalFilename(base.c_str());
     TryLoadXML(staged ? nullptr : siblings);
+    try {
+        TakeEmbedded(staged ? nullptr : siblings);
+    } catch (const zmchost::Error& error) {
+        CPLError(CE_Warning, CPLE_AppDefined, "%s", error.what());
+    }
     oOvManager.Initialize(this, base.c_str(), staged ? nullptr : siblings);
     // Without this GDAL looks for a mask beside the usual name, when it is asked for one.
     if (staged) oOvManager.HaveMaskFile(nullptr, base.c_str());
@@ -273,6 +385,7 @@ void Dataset::SettleRecords() {
 
 CPLErr Dataset::SaveSidecarNow(CPLErr kind) {
     if (creation || main) return CE_None;
+    Load();
     if (!psPam || (nPamFlags & (GPF_DISABLED | GPF_NOSAVE)) != 0) {
         if (kind == CE_Failure)
             ReportError(kind, CPLE_NoWriteAccess, "it has no sidecar to store this in");
@@ -322,6 +435,41 @@ void Dataset::ClearStatistics() {
     });
 }
 
+bool Dataset::MayHaveMasks() {
+    Load();
+    return main || oOvManager.HaveMaskFile() || GDALPamDataset::GetMetadataItem("NODATA_VALUES");
+}
+
+// GDAL takes what it is given last, so the sidecar is read once more, behind the items of the file.
+// A sidecar that was made of them has all of them that are still wanted.
+void Dataset::TakeEmbedded(char** siblings) {
+    if (GDALPamDataset::GetMetadataItem(kEmbeddedItem, kEmbeddedDomain)) return;
+    const std::string items =
+        zmchost::ReadEmbeddedItems(*file->source, file->raster.Name(), file->info.header);
+    if (items.empty()) return;
+    const int changed = nPamFlags & GPF_DIRTY;
+    const ErrorCatcher quiet(CE_Failure);
+    const std::unique_ptr<CPLXMLNode, decltype(&CPLDestroyXMLNode)> tree(
+        CPLParseXMLString(items.c_str()), &CPLDestroyXMLNode);
+    CPLXMLNode* const root = CPLGetXMLNode(tree.get(), "=PAMDataset");
+    if (!root) return;
+    DropOtherFiles(*root);
+    if (XMLInit(root, nullptr) != CE_None) return;
+    const auto scales = ScalesOf(*this);
+    TryLoadXML(siblings);
+    PutBack(scales, *this);
+    nPamFlags = (nPamFlags & ~GPF_DIRTY) | changed;
+}
+
+std::string Dataset::SidecarText() {
+    using Tree = std::unique_ptr<CPLXMLNode, decltype(&CPLDestroyXMLNode)>;
+    if (!Tree(SerializeToXML(nullptr), &CPLDestroyXMLNode)) return "";
+    SetMetadataItem(kEmbeddedItem, "YES", kEmbeddedDomain);
+    const Tree tree(SerializeToXML(nullptr), &CPLDestroyXMLNode);
+    const std::unique_ptr<char, decltype(&CPLFree)> text(CPLSerializeXMLTree(tree.get()), &CPLFree);
+    return text ? text.get() : "";
+}
+
 bool Dataset::ReadsDirectly(int x, int y, int width, int height) const {
     // Blocks may wait in the cache to be written.
     const bool quiet = eAccess != GA_Update || (creation && creation->IsSealed());
@@ -348,7 +496,7 @@ CPLStringList* Dataset::OwnDomain(const char* domain) {
 
 char** Dataset::GetMetadataDomainList() {
     return Reporting<char**>(nullptr, [&] {
-        return BuildMetadataDomainList(GDALPamDataset::GetMetadataDomainList(), TRUE,
+        return BuildMetadataDomainList(CompanionDataset::GetMetadataDomainList(), TRUE,
                                        kStructureDomain, kOwnDomain, nullptr);
     });
 }
@@ -356,15 +504,80 @@ char** Dataset::GetMetadataDomainList() {
 char** Dataset::GetMetadata(const char* domain) {
     return Reporting<char**>(nullptr, [&] {
         if (CPLStringList* const own = OwnDomain(domain)) return own->List();
-        return GDALPamDataset::GetMetadata(domain);
+        return kept ? ScaledDomain(domain) : CompanionDataset::GetMetadata(domain);
     });
 }
 
 const char* Dataset::GetMetadataItem(const char* name, const char* domain) {
     return Reporting<const char*>(nullptr, [&] {
         if (CPLStringList* const own = OwnDomain(domain)) return own->FetchNameValue(name);
-        return GDALPamDataset::GetMetadataItem(name, domain);
+        if (kept) return CSLFetchNameValue(ScaledDomain(domain), name);
+        return CompanionDataset::GetMetadataItem(name, domain);
     });
+}
+
+double Dataset::Factor() const {
+    return std::ldexp(1.0, static_cast<int>(level - (main ? main->level : level)));
+}
+
+// What counts in pixels of the raster counts in those of the level.
+char** Dataset::ScaledDomain(const char* domain) {
+    constexpr const char* kDivided[] = {"LINE_OFF",   "SAMP_OFF",    "LINE_SCALE",
+                                        "SAMP_SCALE", "LINE_OFFSET", "PIXEL_OFFSET"};
+    constexpr const char* kMultiplied[] = {"LINE_STEP", "PIXEL_STEP"};
+    scaled = CPLStringList(CSLDuplicate(main->GetMetadata(domain)), TRUE);
+    if (!domain || !(EQUAL(domain, "RPC") || EQUAL(domain, "GEOLOCATION"))) return scaled.List();
+    const auto scale = [&](const char* name, double factor) {
+        if (const char* const value = scaled.FetchNameValue(name))
+            scaled.SetNameValue(name, CPLSPrintf("%.17g", CPLAtof(value) * factor));
+    };
+    for (const char* const name : kDivided) scale(name, 1 / Factor());
+    for (const char* const name : kMultiplied) scale(name, Factor());
+    return scaled.List();
+}
+
+CPLErr Dataset::GetGeoTransform(double* transform) {
+    return Reporting(CE_Failure, [&] {
+        if (!main) return CompanionDataset::GetGeoTransform(transform);
+        const CPLErr result = main->GetGeoTransform(transform);
+        for (const int i : {1, 2, 4, 5})
+            if (result == CE_None) transform[i] *= Factor();
+        return result;
+    });
+}
+
+const OGRSpatialReference* Dataset::GetSpatialRef() const {
+    return Reporting<const OGRSpatialReference*>(
+        nullptr, [&] { return main ? main->GetSpatialRef() : CompanionDataset::GetSpatialRef(); });
+}
+
+int Dataset::GetGCPCount() {
+    return Reporting<int>(
+        0, [&] { return main ? main->GetGCPCount() : CompanionDataset::GetGCPCount(); });
+}
+
+const GDAL_GCP* Dataset::GetGCPs() {
+    return Reporting<const GDAL_GCP*>(nullptr, [&]() -> const GDAL_GCP* {
+        if (!main) return CompanionDataset::GetGCPs();
+        const GDAL_GCP* const given = main->GetGCPs();
+        points.assign(given, given + main->GetGCPCount());
+        for (GDAL_GCP& point : points) {
+            point.dfGCPPixel /= Factor();
+            point.dfGCPLine /= Factor();
+        }
+        return points.data();
+    });
+}
+
+const OGRSpatialReference* Dataset::GetGCPSpatialRef() const {
+    return Reporting<const OGRSpatialReference*>(nullptr, [&] {
+        return main ? main->GetGCPSpatialRef() : CompanionDataset::GetGCPSpatialRef();
+    });
+}
+
+char** Dataset::GetFileList() {
+    return Reporting<char**>(
+        nullptr, [&] { return kept ? kept->GetFileList() : CompanionDataset::GetFileList(); });
 }
 
 CPLErr Dataset::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, void* data,
@@ -406,6 +619,10 @@ CPLErr Dataset::ReadOrWrite(GDALRWFlag mode, int x, int y, int width, int height
                                                   pixelSpace, lineSpace, bandSpace, extra, &tried);
         if (tried) return result;
     }
+    std::optional<PlannedRead> planned;
+    if (mode == GF_Read)
+        planned.emplace(*file, level, RectangleOf(x, y, width, height),
+                        std::span(bandMap, static_cast<std::size_t>(bandCount)));
     if (mode == GF_Read && bufferWidth == width && bufferHeight == height &&
         ReadsDirectly(x, y, width, height)) {
         std::vector<int> bands(bandMap, bandMap + bandCount);
@@ -419,6 +636,36 @@ CPLErr Dataset::ReadOrWrite(GDALRWFlag mode, int x, int y, int width, int height
     return GDALPamDataset::IRasterIO(mode, x, y, width, height, data, bufferWidth, bufferHeight,
                                      bufferType, bandCount, bandMap, pixelSpace, lineSpace,
                                      bandSpace, extra);
+}
+
+bool Dataset::HasWindow(int x, int y, int width, int height) const {
+    return x >= 0 && y >= 0 && width > 0 && height > 0 && width <= nRasterXSize - x &&
+           height <= nRasterYSize - y;
+}
+
+bool Dataset::HasBands(std::span<const int> numbers) const {
+    return std::all_of(numbers.begin(), numbers.end(),
+                       [this](int number) { return number >= 1 && number <= nBands; });
+}
+
+// GDAL looks at what it is asked for only where it does this itself.
+CPLErr Dataset::AdviseRead(int x, int y, int width, int height, int bufferWidth, int bufferHeight,
+                           GDALDataType, int bandCount, int* bandMap, char**) {
+    return Reporting(CE_Failure, [&] {
+        if (!file->raster.Remote()) return CE_None;
+        std::vector<int> bands;
+        for (int i = 0; i < bandCount; ++i) bands.push_back(bandMap ? bandMap[i] : i + 1);
+        if (!HasWindow(x, y, width, height) || !HasBands(bands))
+            throw zmchost::Error(GetDescription(), "read ahead", "it has no such window or band");
+        GDALRasterIOExtraArg extra;
+        INIT_RASTERIO_EXTRA_ARG(extra);
+        Shown shown(x, y, width, height, extra);
+        const bool reduced = bufferWidth < width && bufferHeight < height && !Overviews().empty();
+        Dataset* const coarser = reduced ? CoarserFor(shown, bufferWidth, bufferHeight) : nullptr;
+        file->Advise(coarser ? coarser->level : level,
+                     RectangleOf(shown.x, shown.y, shown.width, shown.height), bands);
+        return CE_None;
+    });
 }
 
 CPLErr Dataset::IBuildOverviews(const char* resampling, int overviewCount, const int* factors,

@@ -3,7 +3,8 @@
 // The main dataset is the finest level that the file holds; it owns the open file and one more
 // Dataset for each coarser level, which its bands show as overviews. Georeference, no-data values,
 // descriptions and the like live in the sidecar file (.aux.xml), which is written only after
-// something has been set.
+// something has been set, or inside of the file (host/file/EmbeddedItems.h), for what the sidecar
+// does not tell.
 #ifndef ZMC_GDAL_DATASET_H
 #define ZMC_GDAL_DATASET_H
 
@@ -12,11 +13,13 @@
 
 #include <functional>
 #include <memory>
+#include <span>
 #include <string>
 #include <utility>
 #include <vector>
 
 #include "gdal/Archive.h"
+#include "gdal/Companions.h"
 #include "gdal/LazyRaster.h"
 #include "gdal/Options.h"
 #include "gdal/TileReader.h"
@@ -36,6 +39,9 @@ public:
     // Opens the file once, for all that is read from it and written to it. Throws zmchost::Error if
     // it cannot be opened, is no pyramid, or one that GDAL cannot hold.
     OpenFile(const std::string& fileName, GDALAccess access, const OpenOptions& options);
+    // The same of a file that is open already.
+    OpenFile(const std::string& fileName, std::shared_ptr<zelm::files::ByteSource> opened,
+             const OpenOptions& options);
 
     // Throws zmchost::Error where a tile of that level, with so many bands, is beyond the limit of
     // those that are held as a whole. `operation` stands behind "cannot".
@@ -43,19 +49,49 @@ public:
     // The same of what is read and written as one where some of it changes.
     void CheckBlock(std::uint32_t level) const;
 
+    // Where the tiles are that a window of a level touches; bands count from 1.
+    WindowTiles TilesOf(std::uint32_t level, const zelm::Rectangle& window,
+                        std::span<const int> bandNumbers) const;
+    // Fetches them ahead if the file lies behind a network. Throws zmchost::Error where that fails.
+    void Advise(std::uint32_t level, const zelm::Rectangle& window,
+                std::span<const int> bandNumbers);
+
     const std::shared_ptr<zelm::files::ByteSource> source;
     const zmchost::PyramidFileInfo info;
     const zmchost::Limits limits = zmchost::Limits::Current();
     LazyRaster raster;
+    LazyRaster pixels;  // without its metadata document if it lies behind a network, else the same
     TileReader tiles;
     Archive archive;
     const bool renewsStatistics;  // OpenOptions::statistics
+    bool isPlanned = false;       // a PlannedRead lives
 };
 
-class Dataset final : public GDALPamDataset {
+// As long as it lives, that window is what is read of a file behind a network. One within another
+// one does nothing: what is read then is a part of the window outside. Bands count from 1.
+class PlannedRead {
+public:
+    PlannedRead(OpenFile& file, std::uint32_t level, const zelm::Rectangle& window,
+                std::span<const int> bandNumbers);
+    ~PlannedRead();
+    PlannedRead(const PlannedRead&) = delete;
+    PlannedRead& operator=(const PlannedRead&) = delete;
+
+private:
+    RemoteSource* remote;  // null where there is nothing to plan
+    bool& isPlanned;
+};
+
+class Dataset final : public CompanionDataset {
 public:
     static std::unique_ptr<Dataset> FromFile(std::shared_ptr<OpenFile> file, GDALAccess access);
+    // An overview of a raster, counted from 0, as a raster of its own, which keeps that one and
+    // shows what it knows of all its pixels. Throws zmchost::Error if there is no such overview.
+    static std::unique_ptr<Dataset> FromOverview(std::unique_ptr<Dataset> raster, int overview);
     ~Dataset() override;
+
+    // Shows no overviews.
+    void StandAlone() { overviewsMade = true; }
 
     OpenFile& File() { return *file; }
     std::uint32_t Level() const { return level; }
@@ -79,10 +115,22 @@ public:
     // The level of ours that GDAL would read such a window from into a buffer of that size, and
     // `shown` is the window in that level then. Null for this one. No band is made for this.
     Dataset* CoarserFor(Shown& shown, int bufferWidth, int bufferHeight);
+    // False where a mask can only follow from alpha or from a band's own no-data value.
+    bool MayHaveMasks();
 
     // Reads the sidecar, and looks for other companions, of a file of that name. Those that are
     // staged for it (SidecarStage.h) are given their names first if it is open for update.
     void LoadSidecar(const char* fileName, char** siblings);
+    // The same, when something is first asked for that may stand in them. GDAL's list of the folder
+    // is what GDAL has asked the server for, or asks it for then.
+    void LoadSidecarLater(const char* fileName);
+
+    // What a sidecar would tell of this dataset, as XML; empty if that is nothing. Marks it, so
+    // that a sidecar that is made of a dataset which has read it from its file counts for all of
+    // it.
+    std::string SidecarText();
+    // What was set and is not saved yet is not to be saved.
+    void ForgetChanges() { nPamFlags &= ~GPF_DIRTY; }
 
     // True if pixels of this window are better read past GDAL's block cache: it is not a sliver of
     // the tiles that it touches, or these are very large; and no block waits to be written.
@@ -93,7 +141,10 @@ public:
     // warning, if that cannot be kept.
     void NoteEditing();
     // The records of all bands that an editing which was cut off has left in doubt.
-    RecordCounts OldRecords() const { return inDoubt; }
+    RecordCounts OldRecords() const {
+        Load();
+        return inDoubt;
+    }
     // No record is in doubt any more.
     void SettleRecords();
 
@@ -120,10 +171,23 @@ public:
     using Flushed = decltype(std::declval<GDALPamDataset&>().FlushCache(false));
     Flushed FlushCache(bool atClosing) override;
 
+    // Of a coarser level, those of the finest with pixels 2, 4, 8 ... times as large: each covers
+    // just so many, and what is over at the right and at the bottom belongs to none.
+    CPLErr GetGeoTransform(double* transform) override;
+    const OGRSpatialReference* GetSpatialRef() const override;
+    int GetGCPCount() override;
+    const GDAL_GCP* GetGCPs() override;
+    const OGRSpatialReference* GetGCPSpatialRef() const override;
+    char** GetFileList() override;
+
     CPLErr IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, void* data,
                      int bufferWidth, int bufferHeight, GDALDataType bufferType, int bandCount,
                      int* bandMap, GSpacing pixelSpace, GSpacing lineSpace, GSpacing bandSpace,
                      GDALRasterIOExtraArg* extra) override;
+    // Fetches a window of a file behind a network ahead, on this thread; else nothing.
+    CPLErr AdviseRead(int x, int y, int width, int height, int bufferWidth, int bufferHeight,
+                      GDALDataType bufferType, int bandCount, int* bandMap,
+                      char** options) override;
     CPLErr IBuildOverviews(const char* resampling, int overviewCount, const int* factors,
                            int bandCount, const int* bands, GDALProgressFunc progress,
                            void* progressData, CSLConstList options) override;
@@ -137,13 +201,19 @@ private:
             Dataset* mainDataset);
     void AddBands();
     void IgnoreCompanions();
+    void TakeEmbedded(char** siblings);
     void AddOverviews();
     void DescribeFile();
     void LoadNote();
     void RenewEdited();
     void EndEditing();
     bool SidecarIsWhole() const;
+    bool HasWindow(int x, int y, int width, int height) const;
+    bool HasBands(std::span<const int> numbers) const;
     CPLStringList* OwnDomain(const char* domain);
+    // How many pixels of the finest level one of this covers along a side.
+    double Factor() const;
+    char** ScaledDomain(const char* domain);
     CPLErr ReadOrWrite(GDALRWFlag mode, int x, int y, int width, int height, void* data,
                        int bufferWidth, int bufferHeight, GDALDataType bufferType, int bandCount,
                        int* bandMap, GSpacing pixelSpace, GSpacing lineSpace, GSpacing bandSpace,
@@ -151,7 +221,10 @@ private:
 
     std::shared_ptr<OpenFile> file;
     std::uint32_t level;
-    Dataset* main;  // null in the main dataset
+    Dataset* main;                  // null in the main dataset
+    std::unique_ptr<Dataset> kept;  // `main`, where no other dataset has it
+    std::vector<GDAL_GCP> points;   // of a level: names and identifiers are those of `main`
+    CPLStringList scaled;           // the domain of a level that was asked for last
     std::vector<std::unique_ptr<Dataset>> overviews;
     bool overviewsMade = false;
     CPLStringList structure;    // domain IMAGE_STRUCTURE, when it was asked for

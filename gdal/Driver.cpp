@@ -7,6 +7,7 @@
 #include "files/Lending.h"
 #include "gdal/Create.h"
 #include "gdal/Dataset.h"
+#include "gdal/Fetcher.h"
 #include "gdal/Options.h"
 #include "gdal/Reporting.h"
 #include "gdal/VsiSource.h"
@@ -25,10 +26,18 @@ std::string_view StartOf(const GDALOpenInfo& info) {
             static_cast<std::size_t>(info.nHeaderBytes)};
 }
 
+// Whether it leads to a file on a server whose name is one of a pyramid: GDAL leaves URLs to
+// drivers without a look at them, and most are none of ours.
+bool IsPyramidUrl(std::string_view name) {
+    if (!name.starts_with("http://") && !name.starts_with("https://")) return false;
+    return name.substr(0, name.find_first_of("?#")).ends_with(".pyr");
+}
+
 // Names of lent sources are made and used within code of one process: one that comes from a user of
 // GDAL is nobody's.
 int Identify(GDALOpenInfo* info) {
-    return Reporting<int>(FALSE, [&] {
+    return Reporting<int>(FALSE, [&]() -> int {
+        if (IsPyramidUrl(info->pszFilename)) return GDAL_IDENTIFY_UNKNOWN;
         const bool lent = zelm::files::LooksLent(info->pszFilename);
         return !lent && zmchost::LooksLikePyramid(StartOf(*info)) ? TRUE : FALSE;
     });
@@ -56,28 +65,57 @@ void PutInOrder(const std::string& name, GDALAccess access) {
         CPLDebug(kName, "%s: %s", name.c_str(), recovery.text.c_str());
 }
 
-std::unique_ptr<Dataset> OpenDataset(GDALOpenInfo* info) {
-    if (!IsVirtualName(info->pszFilename)) PutInOrder(info->pszFilename, info->eAccess);
-    const OpenOptions options = OpenOptionsFrom(info->papszOpenOptions);
-    auto file = std::make_shared<OpenFile>(info->pszFilename, info->eAccess, options);
+std::unique_ptr<Dataset> Show(std::shared_ptr<OpenFile> file, const std::string& name,
+                              GDALOpenInfo& info, const OpenOptions& options) {
     const zmchost::PyramidFileInfo layout = file->info;
-    auto dataset = Dataset::FromFile(std::move(file), info->eAccess);
+    const bool isRemote = file->raster.Remote();
+    auto dataset = Dataset::FromFile(std::move(file), info.eAccess);
     // A look for each companion is cheaper than a list of the whole folder, unless that is there.
-    char** const siblings = info->AreSiblingFilesLoaded() ? info->GetSiblingFiles() : nullptr;
-    dataset->LoadSidecar(info->pszFilename, siblings);
+    char** const siblings = info.AreSiblingFilesLoaded() ? info.GetSiblingFiles() : nullptr;
+    if (isRemote)
+        dataset->LoadSidecarLater(name.c_str());
+    else
+        dataset->LoadSidecar(name.c_str(), siblings);
     WarnIfIncomplete(*dataset, layout, options.missingAsZeros);
+    if (options.overview) dataset = Dataset::FromOverview(std::move(dataset), *options.overview);
+    if (options.alone) dataset->StandAlone();
     return dataset;
+}
+
+std::unique_ptr<Dataset> OpenDataset(GDALOpenInfo& info) {
+    const std::string name = info.pszFilename;
+    if (!IsVirtualName(name)) PutInOrder(name, info.eAccess);
+    const OpenOptions options = OpenOptionsFrom(info.papszOpenOptions);
+    return Show(std::make_shared<OpenFile>(name, info.eAccess, options), name, info, options);
+}
+
+// GDAL has not looked at what a URL leads to, and has a driver of its own for those that no other
+// one takes: what cannot be read in parts, or is no pyramid, is left to that.
+std::unique_ptr<Dataset> OpenUrl(GDALOpenInfo& info) {
+    const std::string name = NameOfUrl(info.pszFilename);
+    const OpenOptions options = OpenOptionsFrom(info.papszOpenOptions);
+    std::shared_ptr<RemoteSource> source;
+    try {
+        source = std::make_shared<RemoteSource>(MakeFetcher(name), options.remoteBytes);
+    } catch (const FetchError&) {
+        return nullptr;
+    }
+    char start[64];
+    if (!zmchost::LooksLikePyramid({start, source->ReadAt(0, start, sizeof start)})) return nullptr;
+    return Show(std::make_shared<OpenFile>(name, source, options), name, info, options);
 }
 
 GDALDataset* Open(GDALOpenInfo* info) {
     if (!Identify(info)) return nullptr;
+    const auto open = IsPyramidUrl(info->pszFilename) ? OpenUrl : OpenDataset;
     return Reporting<GDALDataset*>(
-        nullptr, [&] { return OpenDataset(info).release(); }, CPLE_OpenFailed);
+        nullptr, [&] { return open(*info).release(); }, CPLE_OpenFailed);
 }
 
 void Describe(GDALDriver& driver) {
     driver.SetDescription(kName);
     driver.SetMetadataItem(GDAL_DCAP_RASTER, "YES");
+    driver.SetMetadataItem(GDAL_DCAP_VIRTUALIO, "YES");
     driver.SetMetadataItem(GDAL_DMD_LONGNAME, "Pyramid raster");
     driver.SetMetadataItem(GDAL_DMD_EXTENSION, "pyr");
     driver.SetMetadataItem(GDAL_DMD_EXTENSIONS, "pyr");

@@ -2,8 +2,12 @@
 
 #include <cpl_error.h>
 
+#include <new>
+
 #include "core/PixelVocabulary.h"
+#include "gdal/Band.h"
 #include "gdal/ColorTables.h"
+#include "gdal/Dataset.h"
 #include "gdal/ErrorCatcher.h"
 #include "gdal/NoDataValues.h"
 #include "gdal/SampleType.h"
@@ -13,6 +17,14 @@ namespace zmcgdal {
 namespace {
 
 constexpr const char* kSource = "read the source";
+
+// Some drivers report a failure and answer that all went well.
+void CheckRead(const std::string& name, const zmchost::Window& window, CPLErr result,
+               const ErrorCatcher& errors) {
+    if (result == CE_None && errors.Text().empty()) return;
+    throw zmchost::Error(name, "read lines from " + std::to_string(window.y),
+                         errors.Text().empty() ? "GDAL gives no reason" : errors.Text());
+}
 
 bool FitsBytes(const GDALColorEntry& entry) {
     const auto fits = [](short component) { return component >= 0 && component <= 255; };
@@ -26,6 +38,28 @@ bool FitsPalette(const GDALColorTable& table) {
     return true;
 }
 
+// Whether GDAL knows of a mask that follows neither from alpha nor from the band's own no-data
+// value.
+bool IsMasked(GDALRasterBand& band) {
+    // GDAL looks for alpha first, and so for palettes.
+    auto* const own = dynamic_cast<Band*>(&band);
+    if (own && !own->Owner().MayHaveMasks()) return false;
+    const int flags = band.GetMaskFlags();
+    return (flags & (GMF_ALL_VALID | GMF_ALPHA)) == 0 && flags != GMF_NODATA;
+}
+
+// Ours are alpha where their sidecar says so, and need not be looked through for palettes.
+bool IsAlpha(GDALRasterBand& band) {
+    auto* const own = dynamic_cast<Band*>(&band);
+    return (own ? own->CompanionBand::GetColorInterpretation() : band.GetColorInterpretation()) ==
+           GCI_AlphaBand;
+}
+
+bool FitsMask(GDALRasterBand& band) {
+    GDALRasterBand* const mask = band.GetMaskBand();
+    return mask && mask->GetXSize() == band.GetXSize() && mask->GetYSize() == band.GetYSize();
+}
+
 }  // namespace
 
 bool IsSignedByte(GDALRasterBand& band) {
@@ -36,7 +70,17 @@ bool IsSignedByte(GDALRasterBand& band) {
 GdalRasterSource::GdalRasterSource(GDALDataset& source, bool signedByte) : dataset(source) {
     if (dataset.GetRasterCount() == 0) throw zmchost::Error(Name(), kSource, "it has no bands");
     ChooseType(signedByte);
-    FindLosses();
+    FindAlpha();
+}
+
+GDALRasterBand& GdalRasterSource::BandOf(std::uint32_t band) const {
+    return *dataset.GetRasterBand(static_cast<int>(band) + 1);
+}
+
+void GdalRasterSource::FindAlpha() {
+    for (int number = 1; number <= dataset.GetRasterCount() && !alphaBand; ++number)
+        if (IsAlpha(*dataset.GetRasterBand(number)))
+            alphaBand = static_cast<std::uint32_t>(number - 1);
 }
 
 void GdalRasterSource::ChooseType(bool signedByte) {
@@ -58,7 +102,8 @@ void GdalRasterSource::ChooseType(bool signedByte) {
     bufferType = GdalTypeOf(pixelType, SignedByteAs::FlaggedByte);
 }
 
-void GdalRasterSource::FindLosses() {
+std::vector<std::string> GdalRasterSource::Losses() const {
+    std::vector<std::string> losses;
     for (int number = 1; number <= dataset.GetRasterCount(); ++number) {
         GDALRasterBand& band = *dataset.GetRasterBand(number);
         const std::string which = "of band " + std::to_string(number);
@@ -68,7 +113,10 @@ void GdalRasterSource::FindLosses() {
         if (NoDataAsDouble(band) && !NoDataFitsDouble(band))
             losses.push_back("the last digits of the no-data value " + which +
                              " while levels are reduced");
+        if (IsMasked(band) && !FitsMask(band))
+            losses.push_back("the mask " + which + ", which is of another size");
     }
+    return losses;
 }
 
 std::string GdalRasterSource::Name() const { return dataset.GetDescription(); }
@@ -92,7 +140,8 @@ zelm::PalettePtr GdalRasterSource::BandPalette(std::uint32_t band) const {
         dataset.GetRasterBand(static_cast<int>(band) + 1)->GetColorTable();
     if (!table || !FitsPalette(*table)) return zelm::PalettePtr();
     zelm::PalettePtr palette(new zelm::Palette);
-    AddColors(*table, *palette);
+    if (!palette) throw std::bad_alloc();
+    ColorsOf(*table).CopyTo(*palette);
     return palette;
 }
 
@@ -112,10 +161,53 @@ void GdalRasterSource::Read(const zmchost::Window& window, std::span<const std::
                                            static_cast<int>(window.y), width, height, pixels, width,
                                            height, bufferType, static_cast<int>(numbers.size()),
                                            numbers.data(), pixel, pixel * width, size, &extra);
-    // Some drivers report a failure and answer that all went well.
-    if (result == CE_None && errors.Text().empty()) return;
-    throw zmchost::Error(Name(), "read lines from " + std::to_string(window.y),
-                         errors.Text().empty() ? "GDAL gives no reason" : errors.Text());
+    CheckRead(Name(), window, result, errors);
+}
+
+std::optional<std::uint32_t> GdalRasterSource::AlphaBand(std::uint32_t band) const {
+    return alphaBand == band ? std::nullopt : alphaBand;
+}
+
+bool GdalRasterSource::HasMask(std::uint32_t band) const {
+    return IsMasked(BandOf(band)) && FitsMask(BandOf(band));
+}
+
+void GdalRasterSource::ReadMask(const zmchost::Window& window, std::span<const std::uint32_t> bands,
+                                unsigned char* shown) {
+    const std::size_t pixels = std::size_t{window.width} * window.height;
+    const std::size_t stride = bands.size();
+    // Bands of one mask follow each other, as a rule: it is read once for all of them.
+    std::vector<unsigned char> plane(pixels);
+    GDALRasterBand* known = nullptr;
+    for (std::size_t i = 0; i < stride; ++i) {
+        GDALRasterBand& band = BandOf(bands[i]);
+        GDALRasterBand* const mask =
+            HasMask(bands[i]) ? band.GetMaskBand() : &BandOf(alphaBand.value());
+        const bool shared = known && (mask == known || (band.GetMaskFlags() & GMF_PER_DATASET));
+        if (!shared) ReadShown(*mask, HasMask(bands[i]), window, plane);
+        known = mask;
+        for (std::size_t pixel = 0; pixel < pixels; ++pixel)
+            shown[pixel * stride + i] = plane[pixel];
+    }
+}
+
+void GdalRasterSource::ReadShown(GDALRasterBand& from, bool isMask, const zmchost::Window& window,
+                                 std::vector<unsigned char>& shown) {
+    // A mask is made of bytes; alpha may be less than 1.
+    const GDALDataType type = isMask ? GDT_Byte : GDT_Float64;
+    std::vector<double> alpha(isMask ? 0 : shown.size());
+    void* const target = isMask ? static_cast<void*>(shown.data()) : alpha.data();
+    const int width = static_cast<int>(window.width);
+    const int height = static_cast<int>(window.height);
+    GDALRasterIOExtraArg extra;
+    INIT_RASTERIO_EXTRA_ARG(extra);
+    CPLErrorReset();
+    const ErrorCatcher errors(CE_Failure);
+    const CPLErr result =
+        from.RasterIO(GF_Read, static_cast<int>(window.x), static_cast<int>(window.y), width,
+                      height, target, width, height, type, 0, 0, &extra);
+    CheckRead(Name(), window, result, errors);
+    for (std::size_t i = 0; i < alpha.size(); ++i) shown[i] = alpha[i] > 0 ? 1 : 0;
 }
 
 }  // namespace zmcgdal

@@ -1,12 +1,15 @@
 // GdalRasterSource: a GDAL dataset as the source of a pyramid.
 //
 // Pixels are asked for in the pyramid's own type, so nothing passes through another one. A read
-// that GDAL fails is thrown as zmchost::Error with GDAL's text, whatever thread it happened on.
+// that GDAL fails is thrown as zmchost::Error with GDAL's text, whatever thread it happened on. The
+// first band whose color interpretation is alpha weighs the others; masks are those that GDAL tells
+// of beside alpha and no-data values: of the dataset, of a band, or where all bands are no data.
 #ifndef ZMC_GDAL_GDALRASTERSOURCE_H
 #define ZMC_GDAL_GDALRASTERSOURCE_H
 
 #include <gdal_priv.h>
 
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -26,17 +29,25 @@ public:
     void Read(const zmchost::Window& window, std::span<const std::uint32_t> bands,
               void* pixels) override;
 
+    std::optional<std::uint32_t> AlphaBand(std::uint32_t band) const override;
+    bool HasMask(std::uint32_t band) const override;
+    void ReadMask(const zmchost::Window& window, std::span<const std::uint32_t> bands,
+                  unsigned char* shown) override;
+
     // What of the source a pyramid cannot keep, in a few words each; empty as a rule.
-    const std::vector<std::string>& Losses() const { return losses; }
+    std::vector<std::string> Losses() const;
 
 private:
     GDALDataset& dataset;
     std::uint32_t pixelType = 0;
     GDALDataType bufferType = GDT_Unknown;
-    std::vector<std::string> losses;
+    std::optional<std::uint32_t> alphaBand;
 
+    GDALRasterBand& BandOf(std::uint32_t band) const;
+    void FindAlpha();
+    void ReadShown(GDALRasterBand& from, bool isMask, const zmchost::Window& window,
+                   std::vector<unsigned char>& shown);
     void ChooseType(bool signedByte);
-    void FindLosses();
 };
 
 // True if the band's samples are declared as signed bytes by its IMAGE_STRUCTURE.

@@ -12,6 +12,7 @@
 #include <string>
 #include <utility>
 
+#include "gdal/RemoteSource.h"
 #include "gdal/Reporting.h"
 #include "host/raster/Raster.h"
 
@@ -31,6 +32,7 @@ public:
                const zmchost::PyramidHeader& told, bool keepCopies)
         : name(std::move(fileName)),
           source(std::move(byteSource)),
+          remote(ClippedSource::RemoteOf(source)),
           header(told),
           keepsCopies(keepCopies) {}
 
@@ -62,10 +64,29 @@ public:
     template <class Visitor>
     bool Visit(Visitor&& visit) {
         return Reported([&] {
-            Get().Visit(std::forward<Visitor>(visit));
-            raster->CheckDisk("read it");
+            try {
+                Get().Visit(std::forward<Visitor>(visit));
+                raster->CheckDisk("read it");
+            } catch (const zmchost::Error&) {
+                CheckNetwork();
+                throw;
+            }
         });
     }
+
+    // Throws what a fetch told since the last call.
+    void CheckNetwork() const {
+        if (const std::string reason = remote ? remote->TakeTrouble() : ""; !reason.empty())
+            throw zmchost::Error(name, "read it", reason);
+    }
+    // The source as far as its tiles reach, of a file behind a network: the module reads the
+    // metadata document of every file that it opens. Else the source.
+    std::shared_ptr<zelm::files::ByteSource> WithoutDocument() const {
+        if (!remote) return source;
+        return std::make_shared<ClippedSource>(remote, header.tileDataEnd);
+    }
+    // Null where the file lies behind no network.
+    RemoteSource* Remote() const { return remote.get(); }
 
 private:
     // Buffers are made by the header that was told.
@@ -81,6 +102,7 @@ private:
 
     std::string name;
     std::shared_ptr<zelm::files::ByteSource> source;
+    std::shared_ptr<RemoteSource> remote;  // the same, if it is one
     zmchost::PyramidHeader header;
     bool keepsCopies;
     std::optional<zmchost::Raster> raster;

@@ -7,6 +7,7 @@
 #include <set>
 
 #include "format/TileWalk.h"
+#include "gdal/GdalRasterSource.h"
 #include "gdal/NoDataValues.h"
 #include "gdal/Options.h"
 #include "gdal/Reporting.h"
@@ -18,8 +19,8 @@ namespace {
 template <class T>
 class TileMaker {
 public:
-    TileMaker(zmchost::Raster& pyramid, zmchost::Resampling method)
-        : raster(pyramid), reduction(pyramid, method) {}
+    TileMaker(zmchost::Raster& pyramid, zmchost::Resampling method, zmchost::SampleWeights& weights)
+        : raster(pyramid), reduction(pyramid, method, &weights) {}
 
     void Make(std::uint32_t level, const zmchost::Window& tile) {
         const std::size_t samples = std::size_t{tile.width} * raster.Bands();
@@ -87,9 +88,9 @@ std::uint64_t TilesOf(const zmchost::Raster& raster, const std::set<std::uint32_
 // False if the caller cancelled.
 template <class T>
 bool MakeLevels(zmchost::Raster& raster, zmchost::Resampling method,
-                const std::set<std::uint32_t>& levels, GDALProgressFunc progress,
-                void* progressData) {
-    TileMaker<T> maker(raster, method);
+                zmchost::SampleWeights& weights, const std::set<std::uint32_t>& levels,
+                GDALProgressFunc progress, void* progressData) {
+    TileMaker<T> maker(raster, method, weights);
     const auto total = static_cast<double>(TilesOf(raster, levels));
     double done = 0;
     return std::all_of(levels.begin(), levels.end(), [&](std::uint32_t level) {
@@ -144,8 +145,9 @@ CPLErr RefreshLevels(Dataset& dataset, const char* resampling, const std::vector
                                      "make its levels anew");
         TellNoDataValues(dataset);
         zmchost::Raster& raster = dataset.File().raster.Get();
+        GdalRasterSource weights(dataset);
         zelm::VisitElementType(raster.PixelType(), [&]<class T>(std::type_identity<T>) {
-            finished = MakeLevels<T>(raster, *method, *levels, progress, progressData);
+            finished = MakeLevels<T>(raster, *method, weights, *levels, progress, progressData);
         });
         if (!finished) CPLError(CE_Failure, CPLE_UserInterrupt, "cancelled");
     };

@@ -4,9 +4,12 @@
 
 #include <algorithm>
 #include <cctype>
+#include <charconv>
 #include <cstdint>
 #include <cstdlib>
+#include <string>
 
+#include "host/base/Error.h"
 #include "host/base/ScaledNumber.h"
 
 namespace zmcgdal {
@@ -22,21 +25,28 @@ const char* const kOpenOptionsXml = R"(<OpenOptionList>
     <Value>ZEROS</Value>
   </Option>
   <Option name='STATISTICS' type='boolean' default='NO' description='Whether closing renews the statistics and histograms of bands whose pixels were changed'/>
+  <Option name='OVERVIEW_LEVEL' type='string' description='Number of the overview, from 0, to show in place of the raster; "2 only" without the coarser ones, NONE for the raster without any'/>
+  <Option name='REMOTE_CACHE' type='string' default='64M' description='Bytes of a file behind a network that are kept, in bytes or with K, M or G'/>
 </OpenOptionList>)";
 
-const char* const kCreationOptionsXml = R"(<CreationOptionList>
+namespace {
+
+// The methods as values of an option: one list for all who name them.
+std::string MethodValues() {
+    std::string values;
+    for (std::uint32_t method = 0; method < zmchost::kResamplings; ++method) {
+        std::string name = zmchost::ResamplingName(static_cast<zmchost::Resampling>(method));
+        for (char& c : name) c = static_cast<char>(std::toupper(static_cast<unsigned char>(c)));
+        values += "    <Value>" + name + "</Value>\n";
+    }
+    return values;
+}
+
+const std::string kCreationOptions =
+    R"(<CreationOptionList>
   <Option name='RESAMPLING' type='string-select' description='How levels are reduced; MODE by default for a raster with a color table, else AVERAGE'>
-    <Value>NEAREST</Value>
-    <Value>AVERAGE</Value>
-    <Value>RMS</Value>
-    <Value>MODE</Value>
-    <Value>MINIMUM</Value>
-    <Value>MAXIMUM</Value>
-    <Value>MEDIAN</Value>
-    <Value>BILINEAR</Value>
-    <Value>CUBIC</Value>
-    <Value>LANCZOS</Value>
-  </Option>
+)" + MethodValues() +
+    R"(  </Option>
   <Option name='LEVELS' type='string' default='AUTO' description='Number of the coarsest level, 0 for no reduced level; AUTO goes on until a level fits one tile'/>
   <Option name='ORDERING' type='string-select' default='AUTO' description='Order of the tiles in the file; MORTON for more than eight bands, and only then'>
     <Value>AUTO</Value>
@@ -45,14 +55,23 @@ const char* const kCreationOptionsXml = R"(<CreationOptionList>
     <Value>MORTON</Value>
   </Option>
   <Option name='STATISTICS' type='boolean' default='YES' description='Whether to store statistics and histograms'/>
+  <Option name='WEIGHTS' type='string-select' default='AUTO' description='Whether an alpha band and masks weigh the pixels that levels are reduced from; NONE: all count alike'>
+    <Value>AUTO</Value>
+    <Value>NONE</Value>
+  </Option>
   <Option name='BINS' type='int' default='256' description='Bins of a histogram'/>
   <Option name='NUM_THREADS' type='string' default='ALL_CPUS' description='Threads to build with: a number or ALL_CPUS'/>
   <Option name='MEMORY' type='string' default='256M' description='Memory for pixels, in bytes or with K, M or G'/>
+  <Option name='EMBED' type='boolean' default='NO' description='Whether georeference, no-data values and further metadata go into the file and not beside it'/>
   <Option name='PIXELTYPE' type='string-select' default='DEFAULT' description='SIGNEDBYTE takes Byte for signed'>
     <Value>DEFAULT</Value>
     <Value>SIGNEDBYTE</Value>
   </Option>
 </CreationOptionList>)";
+
+}  // namespace
+
+const char* const kCreationOptionsXml = kCreationOptions.c_str();
 
 namespace {
 
@@ -100,6 +119,15 @@ bool TakeCount(CSLConstList options, const char* name, const char* automatic, Nu
     return true;
 }
 
+// Words of GDAL's own: "2", "2 only", "NONE" for the raster without overviews.
+void TakeOverview(const std::string& word, OpenOptions& parsed) {
+    int number = 0;
+    if (std::from_chars(word.data(), word.data() + word.size(), number).ec == std::errc() &&
+        number >= 0)
+        parsed.overview = number;
+    parsed.alone = EQUAL(word.c_str(), "NONE") || CPLString(word).ifind("only") != word.npos;
+}
+
 }  // namespace
 
 OpenOptions OpenOptionsFrom(CSLConstList options) {
@@ -109,6 +137,13 @@ OpenOptions OpenOptionsFrom(CSLConstList options) {
     parsed.keepCopies = CPLFetchBool(options, "KEEP_COPIES", false);
     parsed.missingAsZeros = EQUAL(CSLFetchNameValueDef(options, "MISSING", "FAIL"), "ZEROS") != 0;
     parsed.statistics = CPLFetchBool(options, "STATISTICS", false);
+    TakeOverview(CSLFetchNameValueDef(options, "OVERVIEW_LEVEL", ""), parsed);
+    if (const char* const cache = CSLFetchNameValue(options, "REMOTE_CACHE")) {
+        const auto size = ParseSize(cache);
+        if (!size)
+            throw zmchost::Error("REMOTE_CACHE", "take " + std::string(cache), "it is no size");
+        parsed.remoteBytes = *size;
+    }
     return parsed;
 }
 
@@ -135,7 +170,12 @@ std::optional<CreationOptions> ParseCreationOptions(CSLConstList options) {
         if (!size && !Report("MEMORY", memory)) return std::nullopt;
         parsed.build.memory = *size;
     }
+    const char* const weights = CSLFetchNameValueDef(options, "WEIGHTS", "AUTO");
+    parsed.build.weights = EQUAL(weights, "AUTO");
+    if (!parsed.build.weights && !EQUAL(weights, "NONE") && !Report("WEIGHTS", weights))
+        return std::nullopt;
     parsed.build.statistics = CPLFetchBool(options, "STATISTICS", true);
+    parsed.embed = CPLFetchBool(options, "EMBED", false);
     parsed.signedByte =
         EQUAL(CSLFetchNameValueDef(options, "PIXELTYPE", "DEFAULT"), "SIGNEDBYTE") != 0;
     if (!TakeCount(options, "LEVELS", "AUTO", parsed.build.levels) ||

@@ -4,10 +4,12 @@
 
 #include <cpl_string.h>
 
+#include <cstdint>
 #include <optional>
 #include <string>
 
 #include "gdal/SampleType.h"
+#include "gdal/VsiSource.h"
 #include "host/build/PyramidBuilder.h"
 
 namespace zmcgdal {
@@ -21,6 +23,10 @@ struct OpenOptions {
     bool keepCopies = false;      // zmchost::Raster::KeepCopies
     bool missingAsZeros = false;  // pixels that an incomplete file does not have
     bool statistics = false;      // are renewed when a dataset whose pixels were edited is closed
+    // The overview, counted from 0, that is shown in place of the raster; empty for the raster.
+    std::optional<int> overview;
+    bool alone = false;  // without coarser overviews
+    std::uint64_t remoteBytes = kRemoteBytes;
 };
 
 OpenOptions OpenOptionsFrom(CSLConstList options);
@@ -31,6 +37,7 @@ std::optional<zmchost::Resampling> ResamplingFrom(const char* word);
 struct CreationOptions {
     zmchost::BuildOptions build;
     bool signedByte = false;  // PIXELTYPE=SIGNEDBYTE
+    bool embed = false;       // what a sidecar would keep goes into the file
 };
 
 // Reads the creation options; reports the first bad one to GDAL and gives nothing.

@@ -9,14 +9,15 @@
 #include "gdal/Dataset.h"
 #include "gdal/ErrorCatcher.h"
 #include "host/base/Error.h"
+#include "host/file/EmbeddedItems.h"
 
 namespace zmcgdal {
 namespace {
 
 // Domains that describe the source's own file.
 bool DescribesTheFile(const char* domain) {
-    const char* const names[] = {"IMAGE_STRUCTURE", "SUBDATASETS", "DERIVED_SUBDATASETS",
-                                 "ZMCPYRAMID", "TIFF"};
+    const char* const names[] = {"IMAGE_STRUCTURE", "SUBDATASETS",   "DERIVED_SUBDATASETS",
+                                 "ZMCPYRAMID",      kEmbeddedDomain, "TIFF"};
     return std::any_of(std::begin(names), std::end(names),
                        [&](const char* name) { return EQUAL(domain, name); });
 }
@@ -65,6 +66,13 @@ void Save(GDALDataset& dataset, const std::string& name, const std::string& oper
     if (!errors.Text().empty()) throw zmchost::Error(name, operation, errors.Text());
 }
 
+void SaveMask(Dataset& dataset, const std::string& name) {
+    GDALRasterBand& first = *dataset.GetRasterBand(1);
+    if ((first.GetMaskFlags() & GMF_PER_DATASET) == 0) return;
+    if (GDALDataset* const mask = first.GetMaskBand()->GetDataset())
+        Save(*mask, name, "keep its mask in " + name + kMaskEnding);
+}
+
 }  // namespace
 
 bool HasStatistics(CSLConstList items) {
@@ -104,10 +112,14 @@ void KeepStatistics(const std::vector<zmchost::FullStatistics>& stored, Dataset&
 
 void SaveSidecar(Dataset& dataset, const std::string& name) {
     Save(dataset, name, "keep its metadata in " + name + kSidecarEnding);
-    GDALRasterBand& first = *dataset.GetRasterBand(1);
-    if ((first.GetMaskFlags() & GMF_PER_DATASET) == 0) return;
-    if (GDALDataset* const mask = first.GetMaskBand()->GetDataset())
-        Save(*mask, name, "keep its mask in " + name + kMaskEnding);
+    SaveMask(dataset, name);
+}
+
+void EmbedSidecar(Dataset& dataset, const std::string& name) {
+    const std::string items = dataset.SidecarText();
+    dataset.ForgetChanges();
+    if (!items.empty()) zmchost::EmbedItems(*dataset.File().source, name, items);
+    SaveMask(dataset, name);
 }
 
 }  // namespace zmcgdal

@@ -35,6 +35,15 @@ void KeepStatistics(const std::vector<zmchost::FullStatistics>& stored, Dataset&
 // could not save all of it; what there is of it by then is anything.
 void SaveSidecar(Dataset& dataset, const std::string& name);
 
+// The same, but what a sidecar would tell goes into the file, in front of its records; a mask still
+// stands beside it. The dataset is open for update, was built just now, and is not to be used any
+// more. Throws zmchost::Error.
+void EmbedSidecar(Dataset& dataset, const std::string& name);
+
+// A sidecar with this item was made of all that the file itself keeps.
+inline constexpr const char* kEmbeddedDomain = "ZMCPYRAMID_SIDECAR";
+inline constexpr const char* kEmbeddedItem = "EMBEDDED";
+
 // Whether a metadata domain has statistics, and its items that are none.
 bool HasStatistics(CSLConstList items);
 CPLStringList WithoutStatistics(CSLConstList items);

@@ -9,6 +9,7 @@
 #include <vector>
 
 #include "files/Lending.h"
+#include "gdal/RemoteSource.h"
 #include "host/base/Error.h"
 #include "host/raster/LentFile.h"
 
@@ -33,14 +34,28 @@ const char* AccessFor(OpenMode mode) {
     return mode == OpenMode::Update ? "r+b" : "rb";
 }
 
+// Null where the file has to be read from its beginning on.
+std::shared_ptr<ByteSource> OpenRemote(const std::string& name, std::uint64_t bytes) {
+    try {
+        return std::make_shared<RemoteSource>(MakeFetcher(name), bytes);
+    } catch (const NoRanges&) {
+        return nullptr;
+    } catch (const FetchError& error) {
+        throw zmchost::Error(name, "open the raster", error.what());
+    }
+}
+
 }  // namespace
 
 bool IsVirtualName(const std::string& name) { return name.starts_with("/vsi"); }
 
-std::shared_ptr<ByteSource> OpenByName(const std::string& name, bool forUpdate) {
+std::shared_ptr<ByteSource> OpenByName(const std::string& name, bool forUpdate,
+                                       std::uint64_t remoteBytes) {
     if (zelm::files::LooksLent(name))
         throw zmchost::Error(name, "open the raster", "names of lent sources are not taken here");
     if (!IsVirtualName(name)) return zmchost::OpenPlainFile(name, forUpdate);
+    if (!NetworkPart(name).empty())
+        if (auto remote = OpenRemote(name, remoteBytes)) return remote;
     std::shared_ptr<ByteSource> source;
     if (forUpdate) source = VsiSource::Open(name, OpenMode::Update);
     if (!source) source = VsiSource::Open(name, OpenMode::Read);
@@ -50,6 +65,7 @@ std::shared_ptr<ByteSource> OpenByName(const std::string& name, bool forUpdate) 
 
 std::shared_ptr<VsiSource> VsiSource::Open(const std::string& name, OpenMode mode) {
     // Many of them cannot be written, and say so aloud.
+    const CPLErrorStateBackuper before;
     CPLPushErrorHandler(CPLQuietErrorHandler);
     VSILFILE* const opened = VSIFOpenL(name.c_str(), AccessFor(mode));
     CPLPopErrorHandler();

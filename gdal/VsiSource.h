@@ -19,13 +19,18 @@
 
 namespace zmcgdal {
 
+// Bytes of a file behind a network that are kept if nobody says otherwise.
+inline constexpr std::uint64_t kRemoteBytes = std::uint64_t{64} << 20;
+
 // Whether a name is one of those file systems'.
 bool IsVirtualName(const std::string& name);
 
 // What a name of GDAL's user stands for, a plain file included: for update where that is wanted and
 // can be done, else for reading. Throws zmchost::Error where it cannot be opened, and for a name
-// that looks lent, since none comes from outside.
-std::shared_ptr<zelm::files::ByteSource> OpenByName(const std::string& name, bool forUpdate);
+// that looks lent, since none comes from outside. What lies behind a network is a RemoteSource of
+// so many bytes, for reading alone, unless its server only gives whole files.
+std::shared_ptr<zelm::files::ByteSource> OpenByName(const std::string& name, bool forUpdate,
+                                                    std::uint64_t remoteBytes = kRemoteBytes);
 
 class VsiSource final : public zelm::files::ByteSource {
 public:

@@ -23,6 +23,9 @@ double ParseNumber(const std::string& option, const std::string& text);
 // "B" alone.
 std::uint64_t ParseSize(const std::string& option, const std::string& text);
 
+// What is said of a list of bands that is given and empty.
+inline constexpr const char* kNoBands = "an empty list names no band";
+
 // "3,2,1" as bands from 0. Every one lies below `bands`. An empty text means all of them.
 std::vector<std::uint32_t> ParseBands(const std::string& text, std::uint32_t bands);
 

@@ -37,6 +37,7 @@ private:
     std::string target;
     std::string levels = "auto";
     std::string resampling;
+    std::string weights = "auto";
     std::string ordering = "auto";
     std::string noData;
     std::string bands;
@@ -45,6 +46,7 @@ private:
     std::string memory = "256M";
     bool noStatistics = false;
     bool overwrite = false;
+    bool embed = false;
 
     zmchost::BuildOptions Options(const zelm::RasterProps& props) const;
     void CheckTarget() const;
@@ -71,6 +73,13 @@ void BuildCommand::Describe(OptionTable& table) {
         .Named("METHOD")
         .OneOf(MethodNames());
     table
+        .Text(
+            "--weights", weights,
+            "Whether an alpha band and masks weigh the pixels that levels are reduced from; none: "
+            "all count alike (default auto)")
+        .Named("WEIGHTS")
+        .OneOf({"auto", "none"});
+    table
         .Text("--ordering", ordering,
               "Order of the tiles in the file; more than eight bands are always in the Morton "
               "ordering (default auto)")
@@ -84,13 +93,16 @@ void BuildCommand::Describe(OptionTable& table) {
     table
         .Text("--bands", bands,
               "Bands of the source in the order wanted, counted from 1 (default all)")
-        .Named("3,2,1");
+        .Named("3,2,1")
+        .Filled(kNoBands);
     table.Text("--bins", bins, "Bins of a histogram; 8-bit types have one per value (default 256)")
         .Named("N");
     table.Flag("--no-statistics", noStatistics, "Leave out statistics and histograms");
     table.Text("--threads", threads, "Threads to work with (default: all processors)").Named("N");
     table.Text("--memory", memory, "Memory for pixels, such as 64M or 2G (default 256M)")
         .Named("SIZE");
+    table.Flag("--embed", embed,
+               "Keep georeference, no-data values and other metadata in TARGET itself");
     table.Flag("--overwrite", overwrite, "Replace TARGET if it exists");
     table.Footer(
         "Examples:\n"
@@ -101,7 +113,7 @@ void BuildCommand::Describe(OptionTable& table) {
         "The target appears when it is finished, and never half done: a build that fails or is\n"
         "interrupted leaves the old file as it was. Georeference, no-data values, descriptions "
         "and\n"
-        "other metadata go to TARGET.aux.xml.");
+        "other metadata go to TARGET.aux.xml, or into TARGET with --embed.");
 }
 
 bool IsInteger(std::uint32_t pixelType) {
@@ -116,6 +128,7 @@ zmchost::BuildOptions BuildCommand::Options(const zelm::RasterProps& props) cons
     if (levels != "auto")
         options.levels = static_cast<std::uint32_t>(ParseCount("--levels", levels, 31));
     if (!resampling.empty()) options.resampling = zmchost::ParseResampling(resampling);
+    options.weights = weights == "auto";
     if (ordering == "scanline") options.ordering = zmchost::Ordering::Scanline;
     if (ordering == "blocked") options.ordering = zmchost::Ordering::Blocked;
     if (noData == "none") options.noData = zmchost::BuildOptions::NoData{};
@@ -148,6 +161,7 @@ zmchost::BuildOptions BuildCommand::Options(const zelm::RasterProps& props) cons
 
 // The builder looks at all of this again; here it is told with what helps.
 void BuildCommand::CheckTarget() const {
+    RefuseElsewhere(target, "pyramids are made in plain folders; copy the finished file there");
     std::error_code ignored;
     if (fs::is_directory(target, ignored))
         throw Failure(target, "it is a folder; name a file in it");
@@ -212,14 +226,14 @@ void BuildCommand::WriteSidecar(GDALDataset& dataset, const zmchost::BuildOption
     bool kept = selected && zmcgdal::CopySidecar(*selected, *pyramid, true) == CE_None;
     if (kept) {
         zmcgdal::KeepStatistics(statistics, *pyramid, pyramid->File().archive);
-        zmcgdal::SaveSidecar(*pyramid, target);
+        (embed ? zmcgdal::EmbedSidecar : zmcgdal::SaveSidecar)(*pyramid, target);
     }
     pyramid.reset();
     const std::string reason = TakeGdalError(target);
     kept = kept && reason.empty();
     if (!kept)
         throw Failure(target, "its metadata cannot be kept in " + Visible(target) +
-                                  zmcgdal::kSidecarEnding + ": " +
+                                  (embed ? "" : zmcgdal::kSidecarEnding) + ": " +
                                   (reason.empty() ? "no reason given" : reason));
 }
 

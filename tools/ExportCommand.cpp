@@ -43,8 +43,9 @@ void ExportCommand::Describe(OptionTable& table) {
     table.Text("TARGET", target, "Raster to write; a file of that name is replaced").Required();
     part.Describe(table);
     table
-        .Text("--format", format,
-              "GDAL's short name of the format (default: what the ending of TARGET tells)")
+        .Text("--format,--of", format,
+              "GDAL's short name of the format, also written -of (default: what the ending of "
+              "TARGET tells)")
         .Named("NAME");
     table.Texts("--co", creationOptions, "Creation option of the format, also written -co")
         .Named("K=V");

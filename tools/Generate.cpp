@@ -62,9 +62,13 @@ void WriteOption(std::ostream& out, const CLI::Option& option) {
 void WriteCommand(std::ostream& out, const CLI::App& command) {
     out << ".SS " << command.get_name();
     for (const CLI::Option* option : command.get_options())
-        if (option->get_positional()) out << ' ' << Escape(option->get_name(true));
+        if (option->get_positional())
+            out << ' ' << Escape(option->get_name(true))
+                << (option->get_items_expected_max() > 1 ? "..." : "");
     out << '\n' << Escape(command.get_description()) << ".\n";
-    for (const CLI::Option* option : command.get_options()) WriteOption(out, *option);
+    for (const bool byPlace : {true, false})
+        for (const CLI::Option* option : command.get_options())
+            if (option->get_positional() == byPlace) WriteOption(out, *option);
     out << ".PP\n.nf\n" << Escape(command.get_footer()) << "\n.fi\n";
 }
 

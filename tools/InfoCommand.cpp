@@ -8,6 +8,7 @@
 #include "platform/Terminal.h"
 #include "tools/Command.h"
 #include "tools/HistogramBars.h"
+#include "tools/Place.h"
 #include "tools/RasterView.h"
 
 namespace zmctools {
@@ -235,6 +236,7 @@ void Print(const Json& document) {
         std::printf("complete\n");
     else
         std::printf("not complete: %s bytes are missing\n", Text(document["bytesMissing"]).c_str());
+    PrintPlace(document);
     PrintLevels(document);
     PrintStatistics(document);
     PrintHistograms(document);
@@ -242,7 +244,8 @@ void Print(const Json& document) {
 }
 
 ExitStatus InfoCommand::Run() {
-    const Json document = zmctools::Describe(file, json ? kAllColors : kColorsOnALine);
+    Json document = zmctools::Describe(file, json ? kAllColors : kColorsOnALine);
+    document.update(PlaceOf(file));
     if (json)
         PrintDocument(document);
     else

@@ -20,8 +20,9 @@ constexpr std::uint64_t kMostBlockBytes = 4 * kBlockBytes;
 template <class T>
 class LevelsChecker {
 public:
-    LevelsChecker(zmchost::Raster& pyramid, zmchost::Resampling method)
-        : raster(pyramid), reduction(pyramid, method), bands(pyramid.Bands()) {}
+    LevelsChecker(zmchost::Raster& pyramid, zmchost::Resampling method,
+                  zmchost::SampleWeights* weights)
+        : raster(pyramid), reduction(pyramid, method, weights), bands(pyramid.Bands()) {}
 
     // A multiple of the tile's side: whole tiles are read once but for the margins. A part of a
     // tile where that is beyond what may be held.
@@ -83,7 +84,8 @@ void Tell(const SampleDifferences& differences, std::uint32_t level, zmchost::Re
 
 }  // namespace
 
-CheckResult CheckLevels(zmchost::Raster& raster, zmchost::Resampling method, bool quiet) {
+CheckResult CheckLevels(zmchost::Raster& raster, zmchost::Resampling method,
+                        zmchost::SampleWeights* weights, bool quiet) {
     CheckResult result{"levels", {}, {}};
     if (!zmchost::SupportsElementType(method, raster.PixelType()))
         throw UsageError("--resampling", std::string(zmchost::ResamplingName(method)) +
@@ -93,7 +95,7 @@ CheckResult CheckLevels(zmchost::Raster& raster, zmchost::Resampling method, boo
     for (std::uint32_t level = raster.MinLevel() + 1; level <= raster.MaxLevel(); ++level)
         total += std::uint64_t{raster.Width(level)} * raster.Height(level);
     zelm::VisitElementType(raster.PixelType(), [&]<class T>(std::type_identity<T>) {
-        LevelsChecker<T> checker(raster, method);
+        LevelsChecker<T> checker(raster, method, weights);
         TerminalProgress bar("levels", !quiet);
         std::uint64_t done = 0;
         for (std::uint32_t level = raster.MinLevel() + 1; level <= raster.MaxLevel(); ++level)

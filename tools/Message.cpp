@@ -2,8 +2,10 @@
 
 #include <atomic>
 #include <mutex>
+#include <new>
 #include <set>
 
+#include "host/base/Error.h"
 #include "platform/Terminal.h"
 #include "tools/Visible.h"
 
@@ -25,6 +27,23 @@ void Say(const std::string& text) {
             line += ' ';
     while (line.back() == ' ') line.pop_back();
     platform::WriteAtOnce(platform::StandardStream::Errors, Visible(line) + '\n');
+}
+
+Answer AnswerOfException() {
+    try {
+        throw;
+    } catch (const UsageError& error) {
+        return {ExitStatus::Usage, error.what()};
+    } catch (const Interruption& error) {
+        return {ExitStatus::Interrupted, error.what()};
+    } catch (const std::bad_alloc&) {
+        return {ExitStatus::Failed, "out of memory"};
+    } catch (const zmchost::Error& error) {
+        return {ExitStatus::Failed,
+                Visible(error.File()) + ": cannot " + error.Operation() + ": " + error.Reason()};
+    } catch (const std::exception& error) {
+        return {ExitStatus::Failed, error.what()};
+    }
 }
 
 // What several readers of one file find is said once.

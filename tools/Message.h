@@ -39,6 +39,14 @@ public:
 // Writes a message, on one line and with nothing that steers a terminal, whatever `text` holds.
 void Say(const std::string& text);
 
+// What the exception that is being handled is answered with: a message, which is not said yet, and
+// a status. To be called from a handler.
+struct Answer {
+    ExitStatus status = ExitStatus::Failed;
+    std::string text;
+};
+Answer AnswerOfException();
+
 // Says of a file what does not keep a command from going on, each text once; silent after
 // SetQuiet(true). Any thread may call.
 void Warn(const std::string& file, const std::string& what);

@@ -26,8 +26,10 @@ public:
         Word& Required();
         // How help writes its value.
         Word& Named(const char* value);
-        // Only these values are taken.
+        // Only these values are taken, in any case of letters; the variable gets them as here.
         Word& OneOf(const std::vector<std::string>& values);
+        // An empty value is refused, with these words.
+        Word& Filled(const char* refusal);
 
     private:
         CLI::Option& option;
@@ -39,6 +41,8 @@ public:
     Word Text(const char* names, std::string& value, const char* help);
     // The same, given any number of times, with one value each.
     Word Texts(const char* names, std::vector<std::string>& values, const char* help);
+    // An argument by its place that takes all that stand there.
+    Word Names(const char* name, std::vector<std::string>& values, const char* help);
     // A word without a value.
     void Flag(const char* names, bool& given, const char* help);
     // What help ends with: examples, and what has to be known.

@@ -9,7 +9,8 @@ void PartOptions::Describe(OptionTable& table) {
     table.Text("--window", window, "Part of the level, in its pixels (default all)")
         .Named("X,Y,W,H");
     table.Text("--bands", bands, "Bands in the order wanted, counted from 1 (default all)")
-        .Named("3,2,1");
+        .Named("3,2,1")
+        .Filled(kNoBands);
 }
 
 std::uint32_t PartOptions::Level() const {

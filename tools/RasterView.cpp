@@ -11,7 +11,10 @@
 #include "files/FileSource.h"
 #include "format/PyramidHeaderRecord.h"
 #include "gdal/Dataset.h"
+#include "gdal/Fetcher.h"
 #include "gdal/GdalRasterSource.h"
+#include "gdal/RemoteSource.h"
+#include "gdal/VsiSource.h"
 #include "host/journal/MetadataJournal.h"
 #include "platform/File.h"
 #include "platform/FileSystem.h"
@@ -24,7 +27,54 @@ namespace {
 
 constexpr std::uint64_t kStripBudget = std::uint64_t{32} << 20;
 
+using zelm::files::ByteSource;
 using zelm::files::Identity;
+
+// Names of GDAL's file systems, and URLs.
+bool IsElsewhere(const std::string& name) {
+    return zmcgdal::IsVirtualName(zmcgdal::NameOfUrl(name));
+}
+
+std::shared_ptr<ByteSource> OpenElsewhere(const std::string& name) {
+    try {
+        return zmcgdal::OpenByName(zmcgdal::NameOfUrl(name), false);
+    } catch (const zmchost::Error& error) {
+        throw Failure(name, error.Reason());
+    }
+}
+
+bool IsPyramid(ByteSource& source) {
+    char start[64];
+    return zmchost::LooksLikePyramid({start, source.ReadAt(0, start, sizeof start)});
+}
+
+// Behind a network only pixels are asked for.
+std::shared_ptr<ByteSource> WithoutDocument(const std::shared_ptr<ByteSource>& source,
+                                            const std::string& name) {
+    const auto remote = zmcgdal::ClippedSource::RemoteOf(source);
+    if (!remote) return source;
+    return std::make_shared<zmcgdal::ClippedSource>(
+        remote, zmchost::PyramidHeader::Read(*source, name).tileDataEnd);
+}
+
+// What the module reads of a raster behind a network is told there beforehand.
+class Planned {
+public:
+    Planned(const std::shared_ptr<zmcgdal::RemoteSource>& source, const zmchost::Raster& raster,
+            std::uint32_t level, const zmchost::Window& window,
+            std::span<const std::uint32_t> bands)
+        : remote(source.get()) {
+        if (remote) remote->Plan({raster.Header(), level, window, {bands.begin(), bands.end()}});
+    }
+    ~Planned() {
+        if (remote) remote->EndPlan();
+    }
+    Planned(const Planned&) = delete;
+    Planned& operator=(const Planned&) = delete;
+
+private:
+    zmcgdal::RemoteSource* remote;
+};
 
 Identity IdentityOf(const std::string& name) {
     return zelm::files::FileSource::IdentifyName(zelm::String(name.c_str()));
@@ -55,6 +105,10 @@ class PyramidView final : public RasterView {
 public:
     explicit PyramidView(const std::string& name)
         : before(IdentityAtRest(name)), raster(OpenPyramid(name)) {}
+    PyramidView(const std::string& name, const std::shared_ptr<ByteSource>& source)
+        : remote(zmcgdal::ClippedSource::RemoteOf(source)),
+          raster(zmchost::Raster::Open(zmcgdal::SharedModule(), WithoutDocument(source, name),
+                                       name)) {}
     std::string Name() const override { return raster.Name(); }
     std::uint32_t PixelType() const override { return raster.PixelType(); }
     std::uint32_t Bands() const override { return raster.Bands(); }
@@ -64,7 +118,14 @@ public:
     std::uint32_t Height(std::uint32_t level) const override { return raster.Height(level); }
     void Read(std::uint32_t level, const zmchost::Window& window,
               std::span<const std::uint32_t> bands, void* pixels) override {
-        raster.Read(level, window, bands, pixels);
+        const Planned planned(remote, raster, level, window, bands);
+        try {
+            raster.Read(level, window, bands, pixels);
+        } catch (const zmchost::Error&) {
+            const std::string reason = remote ? remote->TakeTrouble() : "";
+            if (reason.empty()) throw;
+            throw Failure(Name(), reason);
+        }
     }
     void CheckUnchanged() const override {
         if (before.known && !raster.OpenedAs().SameContent(before))
@@ -81,6 +142,7 @@ public:
 
 private:
     Identity before;
+    std::shared_ptr<zmcgdal::RemoteSource> remote;  // null where there is no network between
     zmchost::Raster raster;
 };
 
@@ -139,6 +201,10 @@ bool IsPyramidFile(const std::string& name) {
     return file && zmchost::LooksLikePyramid({start, file->ReadAt(0, start, sizeof start)});
 }
 
+void RefuseElsewhere(const std::string& name, const char* reason) {
+    if (IsElsewhere(name)) throw Failure(name, reason);
+}
+
 void CheckIsNoDevice(const std::string& name) {
     if (platform::StatusOf(name).IsSpecial()) throw Failure(name, "it is not a regular file");
 }
@@ -159,12 +225,17 @@ void FailAsIncomplete(const std::string& name, const std::string& bytes) {
 }
 
 zmchost::PyramidFileInfo ReadLayout(const std::string& name) {
+    if (IsElsewhere(name))
+        return zmchost::DescribePyramidFile(
+            zmchost::PyramidHeader::Read(*OpenElsewhere(name), name));
     CheckIsFile(name);
     TellRecovery(name, zmchost::LookForCopy(name).text);
     return zmchost::ReadPyramidFileInfo(name);
 }
 
 zmchost::Raster OpenPyramid(const std::string& name) {
+    if (IsElsewhere(name))
+        return zmchost::Raster::Open(zmcgdal::SharedModule(), OpenElsewhere(name), name);
     zmchost::Raster raster =
         zmchost::Raster::Open(zmcgdal::SharedModule(), name, zmchost::Access::Read);
     TellRecovery(name, raster.RecoveryNote());
@@ -174,6 +245,11 @@ zmchost::Raster OpenPyramid(const std::string& name) {
 std::unique_ptr<RasterView> OpenView(const std::string& name) {
     // Loaded before the file is looked at, so that little time is left for others to replace it.
     static_cast<void>(zmcgdal::SharedModule());
+    if (IsElsewhere(name)) {
+        const std::shared_ptr<ByteSource> source = OpenElsewhere(name);
+        if (IsPyramid(*source)) return std::make_unique<PyramidView>(name, source);
+        return std::make_unique<GdalView>(name);
+    }
     if (IsPyramidFile(name)) return std::make_unique<PyramidView>(name);
     return std::make_unique<GdalView>(name);
 }

@@ -60,6 +60,8 @@ public:
 // True if there is a regular file of that name that begins like a pyramid.
 bool IsPyramidFile(const std::string& name);
 
+// Throws Failure for names of GDAL's virtual file systems and for URLs.
+void RefuseElsewhere(const std::string& name, const char* reason);
 // Throws Failure if there is no regular file of that name: opening a pipe would wait for its other
 // end, and a device may do anything.
 void CheckIsFile(const std::string& name);

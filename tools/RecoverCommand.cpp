@@ -83,6 +83,7 @@ void RecoverCommand::Discard() const {
 }
 
 ExitStatus RecoverCommand::Run() {
+    RefuseElsewhere(file, "only files in plain folders are put in order");
     CheckIsFile(file);
     discard ? Discard() : Recover();
     return ExitStatus::Done;

@@ -31,8 +31,9 @@ CheckResult CheckCompleteness(const zmchost::PyramidFileInfo& info);
 CheckResult CheckDocuments(const zmchost::PyramidFileInfo& info, const zmchost::Raster& raster);
 // Stored statistics and histograms against those of level 0, as exact as a file keeps them.
 CheckResult CheckStatistics(zmchost::Raster& raster, bool quiet);
-// Every coarser level against what the method makes of the level below it.
-CheckResult CheckLevels(zmchost::Raster& raster, zmchost::Resampling method, bool quiet);
+// Every coarser level against what the method makes of the level below it; `weights` may be null.
+CheckResult CheckLevels(zmchost::Raster& raster, zmchost::Resampling method,
+                        zmchost::SampleWeights* weights, bool quiet);
 // Level 0 against bands of another raster.
 CheckResult CheckSource(zmchost::Raster& raster, RasterView& source,
                         const std::vector<std::uint32_t>& sourceBands, bool quiet);

@@ -2,6 +2,7 @@
 #include <map>
 
 #include "core/PixelVocabulary.h"
+#include "gdal/GdalRasterSource.h"
 #include "gdal/NoDataValues.h"
 #include "tools/Arguments.h"
 #include "tools/Command.h"
@@ -24,6 +25,7 @@ public:
 private:
     std::string file;
     std::string resampling;
+    std::string weights = "auto";
     std::string source;
     std::string bands;
     std::vector<CheckResult> results;
@@ -40,11 +42,19 @@ void VerifyCommand::Describe(OptionTable& table) {
               "with a palette)")
         .Named("METHOD")
         .OneOf(MethodNames());
+    table
+        .Text(
+            "--weights", weights,
+            "Whether an alpha band and masks weighed the pixels that levels were made of (default "
+            "auto)")
+        .Named("WEIGHTS")
+        .OneOf({"auto", "none"});
     table.Text("--against", source, "Raster that level 0 must be equal to").Named("SOURCE");
     table
         .Text("--bands", bands,
               "Bands of SOURCE that the file was built from, counted from 1 (default all)")
-        .Named("3,2,1");
+        .Named("3,2,1")
+        .Filled(kNoBands);
     table.Footer(
         "Examples:\n"
         "  zmcraster verify scene.pyr\n"
@@ -53,16 +63,16 @@ void VerifyCommand::Describe(OptionTable& table) {
         "\n"
         "Checked are structure, completeness, documents, statistics and levels, and level 0 where "
         "a\n"
-        "source is named. No-data values are those of FILE.aux.xml. Exit status 3, and a list, if\n"
+        "source is named. No-data values are those of FILE.aux.xml, or else of FILE. Exit status "
+        "3, and a list, if\n"
         "something differs.");
 }
 
 // The file has no place for no-data values; masks go by those of the sidecar.
-void TakeNoDataValues(zmchost::Raster& raster) {
-    const DatasetPtr dataset = OpenDataset(raster.Name());
+void TakeNoDataValues(zmchost::Raster& raster, GDALDataset& dataset) {
     std::map<std::uint32_t, double> values;
-    for (int number = 1; number <= dataset->GetRasterCount(); ++number)
-        if (const auto value = zmcgdal::NoDataAsDouble(*dataset->GetRasterBand(number)))
+    for (int number = 1; number <= dataset.GetRasterCount(); ++number)
+        if (const auto value = zmcgdal::NoDataAsDouble(*dataset.GetRasterBand(number)))
             values[static_cast<std::uint32_t>(number - 1)] = *value;
     raster.SetNoDataValues(values);
 }
@@ -74,14 +84,16 @@ bool HasPalette(const zmchost::Raster& raster) {
 }
 
 void VerifyCommand::CheckPixels(zmchost::Raster& raster, bool documentIsGood) {
-    TakeNoDataValues(raster);
+    const DatasetPtr dataset = OpenDataset(raster.Name());
+    TakeNoDataValues(raster, *dataset);
+    zmcgdal::GdalRasterSource shown(*dataset);
     results.push_back(documentIsGood
                           ? CheckStatistics(raster, quiet)
                           : CheckResult{"statistics", "the document cannot be read", {}});
     const auto usual = documentIsGood && HasPalette(raster) ? zmchost::Resampling::Mode
                                                             : zmchost::Resampling::Average;
-    results.push_back(
-        CheckLevels(raster, zmchost::ParseResampling(resampling).value_or(usual), quiet));
+    results.push_back(CheckLevels(raster, zmchost::ParseResampling(resampling).value_or(usual),
+                                  weights == "auto" ? &shown : nullptr, quiet));
     if (source.empty()) return;
     const auto view = OpenView(source);
     results.push_back(CheckSource(raster, *view, ParseBands(bands, view->Bands()), quiet));

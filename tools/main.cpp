@@ -1,9 +1,9 @@
 // zmcraster: build pyramids, look inside, compare. One command per source file; this one is the
 // table of them and turns what they throw into messages and exit statuses.
 #include <CLI/CLI.hpp>
+#include <algorithm>
 #include <cstdio>
 #include <cstring>
-#include <new>
 #include <xercesc/util/XercesVersion.hpp>
 
 #include "files/Lending.h"
@@ -14,6 +14,7 @@
 #include "tools/Command.h"
 #include "tools/GdalWorld.h"
 #include "tools/Generate.h"
+#include "tools/Suggestion.h"
 
 namespace zmctools {
 namespace {
@@ -55,6 +56,7 @@ private:
     ExitStatus RunChosen();
     void ChangeLimits() const;
     void CheckCommand(const std::string& word) const;
+    std::string WhatIsWrong(const CLI::ParseError& error) const;
 };
 
 Program::Program() {
@@ -125,19 +127,62 @@ void Program::ChangeLimits() const {
         }
 }
 
-// "-co K=V", as GDAL's own programs have it, is one dash with two letters.
+// Options that GDAL's own programs write with one dash and two letters.
+const char* LongForm(const char* word) {
+    if (std::strcmp(word, "-co") == 0) return "--co";
+    if (std::strcmp(word, "-of") == 0) return "--of";
+    return word;
+}
+
 std::vector<std::string> Reversed(int count, char** words) {
     std::vector<std::string> arguments;
-    for (int i = count - 1; i > 0; --i)
-        arguments.emplace_back(std::strcmp(words[i], "-co") == 0 ? "--co" : words[i]);
+    for (int i = count - 1; i > 0; --i) arguments.emplace_back(LongForm(words[i]));
     return arguments;
 }
 
+std::string DidYouMean(const std::string& name) { return " (did you mean " + name + "?)"; }
+
 void Program::CheckCommand(const std::string& word) const {
     if (word.empty() || word[0] == '-' || word == generate->get_name()) return;
-    for (const CLI::App* part : parts)
-        if (part->get_name() == word) return;
-    throw UsageError(word, "there is no such command; see zmcraster --help");
+    std::vector<std::string> names;
+    for (const CLI::App* part : parts) names.push_back(part->get_name());
+    if (std::find(names.begin(), names.end(), word) != names.end()) return;
+    const std::string meant = Suggestion(word, names);
+    throw UsageError(word, "there is no such command" + (meant.empty() ? "" : DidYouMean(meant)) +
+                               "; see zmcraster --help");
+}
+
+// What an option was meant to be that a part of the command line does not have; empty if `word` is
+// no option, or like none.
+std::string MeantOption(const CLI::App& part, const std::string& word) {
+    const std::size_t dashes = word.find_first_not_of('-');
+    if (dashes == 0 || dashes == word.npos) return {};
+    std::vector<std::string> names;
+    for (const CLI::Option* option : part.get_options())
+        for (const std::string& name : option->get_lnames()) names.push_back(name);
+    const std::string bare = word.substr(dashes, word.find('=') - dashes);
+    // "-json" lacks nothing but a dash.
+    const bool dashed = dashes == 1 && std::find(names.begin(), names.end(), bare) != names.end();
+    const std::string meant = dashed ? bare : Suggestion(bare, names);
+    return meant.empty() ? meant : DidYouMean("--" + meant);
+}
+
+// The library tells words that nothing takes from the last to the first.
+std::string Program::WhatIsWrong(const CLI::ParseError& error) const {
+    if (!dynamic_cast<const CLI::ExtrasError*>(&error)) return error.what();
+    std::vector<const CLI::App*> all = {&app};
+    for (const CLI::App* part : app.get_subcommands()) all.push_back(part);
+    std::string words, hint;
+    std::size_t count = 0;
+    for (const CLI::App* part : all)
+        for (const std::string& word : part->remaining()) {
+            words += ' ' + word;
+            if (hint.empty()) hint = MeantOption(*part, word);
+            ++count;
+        }
+    return (count == 1 ? "The following argument was not expected:"
+                       : "The following arguments were not expected:") +
+           words + hint;
 }
 
 ExitStatus Program::Run(std::vector<std::string> arguments) {
@@ -149,7 +194,7 @@ ExitStatus Program::Run(std::vector<std::string> arguments) {
         if (error.get_exit_code() == 0) return app.exit(error), ExitStatus::Done;
         std::string command;
         for (const CLI::App* part : app.get_subcommands()) command = ' ' + part->get_name();
-        Say(std::string(error.what()) + "; see zmcraster" + command + " --help");
+        Say(WhatIsWrong(error) + "; see zmcraster" + command + " --help");
         return ExitStatus::Usage;
     }
     return RunChosen();
@@ -158,20 +203,11 @@ ExitStatus Program::Run(std::vector<std::string> arguments) {
 ExitStatus Guarded(int count, char** words) {
     try {
         return Program().Run(Reversed(count, words));
-    } catch (const UsageError& error) {
-        Say(error.what());
-        return ExitStatus::Usage;
-    } catch (const Interruption& error) {
-        Say(error.what());
-        return ExitStatus::Interrupted;
-    } catch (const std::bad_alloc&) {
-        Say("out of memory");
-    } catch (const zmchost::Error& error) {
-        Say(Visible(error.File()) + ": cannot " + error.Operation() + ": " + error.Reason());
-    } catch (const std::exception& error) {
-        Say(error.what());
+    } catch (const std::exception&) {
+        const Answer answer = AnswerOfException();
+        Say(answer.text);
+        return answer.status;
     }
-    return ExitStatus::Failed;
 }
 
 }  // namespace

@@ -6,6 +6,17 @@
 #include "host/base/Lanes.h"
 
 namespace zmchost {
+namespace {
+
+// Whether a mask has a byte that is not 0: 1 as a rule, others only where samples are hidden.
+bool AnyMarked(const unsigned char* mask, std::size_t bytes) {
+    if (std::memchr(mask, 1, bytes)) return true;
+    unsigned char any = 0;
+    for (std::size_t i = 0; i < bytes; ++i) any |= mask[i];
+    return any != 0;
+}
+
+}  // namespace
 
 LevelCascade::LevelCascade(const CascadeSetup& cascadeSetup, const Column& column,
                            PixelWork& pixelWork, StripStore& stripStore, MemoryMeter& meter)
@@ -71,9 +82,9 @@ void LevelCascade::MakeRow(std::uint32_t level, const Strip& strip, Strip& targe
     const std::int64_t first = std::int64_t{2} * row - setup.halo;
     for (std::uint32_t place = 0; place < 2 * setup.halo + 2; ++place)
         TakeSourceRow(source, strip, first + place, place, window);
-    unsigned char* const mask = window.anyMask ? target.MaskRow(row) : nullptr;
+    unsigned char* const mask = window.anyMask || work.MayMark() ? target.MaskRow(row) : nullptr;
     work.ReduceRow(window, source.width, target.Row(row), mask);
-    target.SetMarked(row, mask && std::memchr(mask, 1, target.MaskRowBytes()) != nullptr);
+    target.SetMarked(row, mask && AnyMarked(mask, target.MaskRowBytes()));
 }
 
 void LevelCascade::TakeSourceRow(const Level& level, const Strip& strip, std::int64_t line,

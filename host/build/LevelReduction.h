@@ -1,17 +1,20 @@
 // LevelReduction: makes windows of a level anew from the level below it, as the builder makes them.
 //
 // It holds the part of the finer level that the window's kernels reach, so its memory goes with the
-// window and not with the raster. One thread; the raster has to outlive it. Failures to read are
-// thrown as by Raster::Read.
+// window and not with the raster, but for masks: those of level 0 are looked at for every level.
+// One thread; the raster has to outlive it. Failures to read are thrown as by Raster::Read.
 #ifndef ZMC_HOST_BUILD_LEVELREDUCTION_H
 #define ZMC_HOST_BUILD_LEVELREDUCTION_H
 
 #include <algorithm>
 #include <cstddef>
 #include <cstdint>
+#include <optional>
 #include <utility>
 #include <vector>
 
+#include "host/build/BandWeights.h"
+#include "host/build/HiddenSamples.h"
 #include "host/raster/NoData.h"
 #include "host/raster/Raster.h"
 #include "host/reduce/Reduction.h"
@@ -22,17 +25,29 @@ namespace zmchost {
 template <class T>
 class LevelReduction {
 public:
-    LevelReduction(Raster& finer, Resampling resampling)
+    // `weights` tell of the raster's bands what a source tells of its own, and have to outlive this
+    // object; null where all samples count alike. Palettes are those of the raster.
+    LevelReduction(Raster& finer, Resampling resampling, SampleWeights* sampleWeights = nullptr)
         : raster(finer),
           method(resampling),
           halo(ReductionHalo(resampling)),
           margin((halo + 1) / 2),
-          bands(finer.Bands()) {
+          bands(finer.Bands()),
+          allBands(finer.AllBands()) {
         if (finer.PixelType() != zelm::ElementTraits<T>::code)
             throw Error(finer.Name(), "reduce it", "it is of another pixel type");
         for (std::uint32_t band = 0; band < bands; ++band)
             rules.push_back(RuleOfBand<T>(finer.Props(), band));
+        std::vector<zelm::PalettePtr> palettes;
+        for (const std::uint32_t band : allBands)
+            palettes.push_back(Computes(method) ? finer.BandPalette(band) : zelm::PalettePtr());
+        const BandWeights weights = BandWeights::Of(sampleWeights, finer.Name(), bands, allBands,
+                                                    method, std::move(palettes));
+        weighing = WeighingOf<T>(weights, method, rules);
+        if (weights.IsMasked()) hidden.emplace(*sampleWeights, allBands, weights.masked);
     }
+    LevelReduction(const LevelReduction&) = delete;
+    LevelReduction& operator=(const LevelReduction&) = delete;
 
     // Reads what `wanted`, a window inside `level`, is made of; `level` is not the finest.
     void Load(std::uint32_t level, const Window& wanted) {
@@ -43,7 +58,12 @@ public:
         fine.resize(std::size_t{width} * height * bands);
         mask.assign(fine.size(), 0);
         raster.Read(level - 1, source, raster.AllBands(), fine.data(), mask.data());
+        if (hidden) {
+            for (unsigned char& byte : mask) byte &= kInvalidBit;
+            hidden->Mark(level - 1, source, mask.data());
+        }
         line.resize(std::size_t{width} / 2 * bands);
+        lineMask.resize(line.size());
     }
 
     // Row `row` of the window, counted from its first: its width times the bands, all samples of a
@@ -60,8 +80,12 @@ public:
             rows.push_back(inside ? fine.data() + at : nullptr);
             masks.push_back(inside ? mask.data() + at : nullptr);
         }
-        ReduceRow<T>(method, bands, source.width, {rows.data(), masks.data()}, rules.data(),
-                     line.data(), nullptr);
+        const ReductionRows<T> reach{rows.data(), masks.data()};
+        ReduceRow<T>(method, bands, source.width, reach, rules.data(), line.data(),
+                     lineMask.data());
+        if (weighing.Any())
+            WeighRow<T>(method, bands, source.width, reach, rules.data(), weighing, line.data(),
+                        lineMask.data());
         const std::size_t skipped = window.x - source.x / 2;
         return line.data() + skipped * bands;
     }
@@ -74,10 +98,13 @@ private:
     // that the halo touches. None of a method that goes by a cell's own samples.
     std::uint32_t margin;
     std::uint32_t bands;
+    std::vector<std::uint32_t> allBands;
     std::vector<zelm::NoDataRule<T>> rules;
+    Weighing weighing;
+    std::optional<HiddenSamples> hidden;
     Window window{}, source{};
     std::vector<T> fine, line;
-    std::vector<unsigned char> mask;
+    std::vector<unsigned char> mask, lineMask;
     std::vector<const T*> rows;
     std::vector<const unsigned char*> masks;
 

@@ -157,17 +157,30 @@ public:
             rules.push_back(RuleOfBand<T>(setup.props, band));
             anyValue = anyValue || rules.back().hasValue;
         }
+        weighing = WeighingOf<T>(setup.weights, method, rules);
+        weighs = weighing.Any();
         if (!allBands.SetShape(zelm::ArrayShape(bands))) throw std::bad_alloc();
         for (std::uint32_t band = 0; band < bands; ++band)
             allBands.data[band] = static_cast<int>(band);
     }
 
-    bool NeedsMasks() const override { return anyValue || !std::is_integral_v<T>; }
+    bool NeedsMasks() const override {
+        return anyValue || weighing.hidden || !std::is_integral_v<T>;
+    }
+    bool MayMark() const override { return anyValue && weighs; }
 
     bool MarkRow(const std::byte* row, unsigned char* mask, std::uint32_t width) const override {
         const T* samples = Samples(row);
         const std::size_t count = std::size_t{width} * bands;
         unsigned any = 0;
+        if (weighing.hidden) {
+            for (std::size_t i = 0; i < count; ++i) {
+                const int marked = rules[i % bands].Marks(samples[i]) ? kInvalidBit : 0;
+                mask[i] = static_cast<unsigned char>((mask[i] & kHiddenBit) | marked);
+                any |= mask[i];
+            }
+            return any != 0;
+        }
         if (bands == 1) {
             const zelm::NoDataRule<T> rule = rules[0];
             for (std::size_t i = 0; i < count; ++i) {
@@ -192,6 +205,9 @@ public:
         const ReductionRows<T> typed{rows, source.anyMask ? source.masks : nullptr};
         zmchost::ReduceRow(method, bands, sourceWidth, typed, anyValue ? rules.data() : nullptr,
                            Samples(row), mask);
+        if (weighs)
+            WeighRow(method, bands, sourceWidth, typed, anyValue ? rules.data() : nullptr, weighing,
+                     Samples(row), mask);
     }
 
     void TakeStatistics(std::uint32_t lane, const std::byte* row, const unsigned char* mask,
@@ -243,6 +259,8 @@ private:
     std::uint32_t bands;
     std::vector<zelm::NoDataRule<T>> rules;
     bool anyValue = false;
+    Weighing weighing;
+    bool weighs = false;
     zelm::Array<int> allBands;
     zelm::RasterReader<T>* reader = nullptr;
     Harvest<T> harvest;

@@ -13,6 +13,7 @@
 #include <string>
 #include <vector>
 
+#include "host/build/BandWeights.h"
 #include "host/build/FullStatistics.h"
 #include "host/raster/RasterSource.h"
 #include "host/reduce/Reduction.h"
@@ -32,12 +33,16 @@ class PixelWork {
 public:
     virtual ~PixelWork() = default;
 
-    // Whether samples can be invalid at all: a band has a no-data value, or values may be infinite.
+    // Whether samples can be marked at all: a band has a no-data value, values may be infinite, or
+    // masks hide some.
     virtual bool NeedsMasks() const = 0;
     // Sets every byte of a row's mask to 1 for a sample that is not valid, else 0; true if there
-    // is one that is not.
+    // is one that is not. Where masks hide samples kHiddenBit stays as it is, and counts as well.
     virtual bool MarkRow(const std::byte* row, unsigned char* mask, std::uint32_t width) const = 0;
+    // Whether ReduceRow may mark samples although nothing is marked in the source.
+    virtual bool MayMark() const = 0;
 
+    // `mask` may be null where the source has no masks and nothing may be marked.
     virtual void ReduceRow(const RowWindow& source, std::uint32_t sourceWidth, std::byte* row,
                            unsigned char* mask) const = 0;
 
@@ -65,6 +70,7 @@ public:
 
 struct PixelWorkSetup {
     zelm::RasterProps props;  // of the target: bands, pixel type, no-data values
+    BandWeights weights;
     Resampling resampling = Resampling::Average;
     std::uint32_t lanes = 1;
     std::uint32_t bins = 256;

@@ -4,6 +4,7 @@
 
 #include <algorithm>
 #include <chrono>
+#include <cstring>
 #include <memory>
 #include <optional>
 
@@ -13,6 +14,7 @@
 #include "host/base/Threads.h"
 #include "host/build/BuildFile.h"
 #include "host/build/BuildPlan.h"
+#include "host/build/HiddenSamples.h"
 #include "host/build/LevelCascade.h"
 #include "host/build/PixelWork.h"
 #include "host/build/TileStore.h"
@@ -49,6 +51,7 @@ private:
     void SettleLevels();
     void SettleOrdering();
     void SettleResampling();
+    void SettleWeights(std::uint32_t sourceBands);
     void Plan();
 
     void LayOut();
@@ -79,6 +82,8 @@ private:
     std::vector<std::uint32_t> colors;  // of the palette of each band
     std::uint32_t maxLevel = 0;
     Resampling resampling = Resampling::Average;
+    BandWeights weights;
+    std::optional<HiddenSamples> hidden;
     std::uint32_t pixelBytes = 0;
     std::vector<Pass> passes;
 
@@ -115,6 +120,7 @@ BuildRun::BuildRun(ModulePtr loadedModule, RasterSource& rasterSource, std::stri
     SettleOrdering();
     SettleLevels();
     SettleResampling();
+    SettleWeights(given.bands);
     pixelBytes = props.bands * zelm::PixelSize(props.pixelType);
 }
 
@@ -190,12 +196,22 @@ void BuildRun::SettleResampling() {
                         " have no order");
 }
 
+void BuildRun::SettleWeights(std::uint32_t sourceBands) {
+    std::vector<zelm::PalettePtr> palettes;
+    if (Computes(resampling))
+        for (const std::uint32_t band : bands) palettes.push_back(source.BandPalette(band));
+    weights = BandWeights::Of(options.weights ? &source : nullptr, source.Name(), sourceBands,
+                              bands, resampling, std::move(palettes));
+    if (weights.IsMasked()) hidden.emplace(source, bands, weights.masked);
+}
+
 TileStoreSetup BuildRun::StoreSetup() const {
     return {name, props.samples, props.lines, maxLevel, pixelBytes, props.bands};
 }
 
 PixelWorkSetup BuildRun::WorkSetup() const {
     return {props,
+            weights,
             resampling,
             lanes,
             std::max(options.bins, 1u),
@@ -204,7 +220,8 @@ PixelWorkSetup BuildRun::WorkSetup() const {
 }
 
 void BuildRun::Plan() {
-    const std::uint64_t besides = TileStore::WorkMemory(StoreSetup()) + work->StatisticsMemory();
+    const std::uint64_t besides = TileStore::WorkMemory(StoreSetup()) + work->StatisticsMemory() +
+                                  (hidden ? HiddenSamples::WorkMemory(weights.masked.size()) : 0);
     PlanInput input{props.samples, props.lines, maxLevel, ReductionHalo(resampling), 0, 0};
     input.pixelBytes = pixelBytes + (work->NeedsMasks() ? props.bands : 0);
     input.budget = options.memory - std::min(options.memory, besides);
@@ -221,7 +238,11 @@ BuildReport BuildRun::Run() {
     RunWithThreads(threads, [this] { Fill(); });
     StoreRecords();
     Check();
-    if (options.beforeNaming) options.beforeNaming(file->Path());
+    if (options.beforeNaming) {
+        options.beforeNaming(file->Path());
+        // It may have put something in.
+        report.fileSize = PyramidHeader::Read(file->Path()).fileSize;
+    }
     file->Commit();
     report.width = props.samples;
     report.height = props.lines;
@@ -256,6 +277,7 @@ void BuildRun::LayOut() {
     file->Reserve(raster->Header().tileDataEnd + MetadataBound());
     work = MakePixelWork(*raster, WorkSetup());
     meter.Add(work->StatisticsMemory());
+    if (hidden) meter.Add(HiddenSamples::WorkMemory(weights.masked.size()));
     Plan();
     tiles.emplace(StoreSetup(), *work, meter);
 }
@@ -324,9 +346,13 @@ void BuildRun::ReadStrip(const Pass& pass, const Column& column, Strip& strip) {
         source.Read(window, bands, pixels);
     else
         tiles->Read(pass.baseLevel, window, pixels);
+    if (!hidden) return;
+    unsigned char* const mask = strip.MaskRow(strip.firstLine);
+    std::memset(mask, 0, strip.MaskRowBytes() * strip.lines);
+    hidden->Mark(pass.baseLevel, window, mask);
 }
 
-// Masks of a base strip; and its statistics, of what the column owns.
+// Masks of a base strip, and its statistics, of what the column owns.
 void BuildRun::LookAtStrip(const Pass& pass, const Column& column, Strip& strip) {
     const bool counts = pass.baseLevel == 0 && options.statistics;
     if (!counts && !work->NeedsMasks()) return;
@@ -373,6 +399,7 @@ void BuildRun::CountLevel0() {
                 [&](std::uint32_t lane, std::uint32_t first, std::uint32_t last) {
                     auto* const mask = static_cast<unsigned char*>(
                         static_cast<void*>(masks.Data() + lane * maskRow));
+                    std::memset(mask, 0, maskRow);
                     for (std::size_t i = 0; i < chunk.size(); ++i)
                         for (std::uint32_t line = first; line < last; ++line) {
                             const std::byte* const samples =

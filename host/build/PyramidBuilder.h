@@ -54,9 +54,12 @@ struct BuildOptions {
     std::optional<NoData> noData;
     std::vector<std::uint32_t> bands;  // of the source, from 0, in the order wanted; empty: all
     std::uint32_t bins = 256;          // of a histogram; one per value for 8-bit types
-    bool statistics = true;            // statistics and histograms, which complex types never get
-    std::uint32_t threads = 0;         // 0: as many as the machine has processors; at
-                                       // most 1024, which more are taken for
+    // Whether the alpha bands and masks of the source weigh its samples in the levels (see
+    // host/reduce/Weighing.h). Level 0 and the statistics do not go by them.
+    bool weights = true;
+    bool statistics = true;     // statistics and histograms, which complex types never get
+    std::uint32_t threads = 0;  // 0: as many as the machine has processors; at
+                                // most 1024, which more are taken for
     std::uint64_t memory = std::uint64_t{256} << 20;  // budget in bytes
     bool overwrite = false;
     // Called now and then, one call at a time, on one of the build's threads; false cancels.
@@ -64,7 +67,8 @@ struct BuildOptions {
     // Called once, before beforeNaming, with the statistics that were stored, of all bands.
     std::function<void(const std::vector<FullStatistics>&)> takeStatistics;
     // Called once with the path of the finished file, before it gets its name: the last moment to
-    // put beside the target what belongs to the new file. What it throws ends the build.
+    // put beside the target, or into the file, what belongs to it. What it writes into the file it
+    // brings to the disk itself. What it throws ends the build.
     std::function<void(const std::string& finished)> beforeNaming;
 };
 

@@ -605,6 +605,7 @@ zelm::PalettePtr Raster::BandPalette(std::uint32_t band) const {
     const zelm::ColorList* const found = stored ? stored->BandPalette(band) : nullptr;
     if (!found) return palette;
     palette.Reset(new zelm::Palette);
+    if (!palette) throw std::bad_alloc();
     found->CopyTo(*palette);
     return palette;
 }

@@ -7,6 +7,7 @@
 #define ZMC_HOST_RASTER_RASTERSOURCE_H
 
 #include <cstdint>
+#include <optional>
 #include <span>
 #include <string>
 
@@ -19,10 +20,39 @@ namespace zmchost {
 // Columns [x, x + width) and lines [y, y + height) of a level or of a source, in pixels.
 using Window = zelm::Rectangle;
 
-class RasterSource {
+// What tells that samples of a raster do not all count alike when levels are reduced (see
+// host/reduce/Weighing.h), beside no-data values. By default nothing does.
+class SampleWeights {
 public:
-    virtual ~RasterSource() = default;
+    virtual ~SampleWeights() = default;
 
+    // The band whose samples are the alpha of this one; never itself.
+    virtual std::optional<std::uint32_t> AlphaBand(std::uint32_t band) const {
+        static_cast<void>(band);
+        return std::nullopt;
+    }
+
+    // Whether a mask hides samples of the band; bands may have one in common.
+    virtual bool HasMask(std::uint32_t band) const {
+        static_cast<void>(band);
+        return false;
+    }
+
+    // Fills `shown` with a window of the finest level, one byte for each sample in the order of
+    // RasterSource::Read: 0 where the mask of the band hides it, anything else where it does not.
+    // Of a band without a mask it tells where its alpha band is 0. Asked only for bands that have
+    // one of both, for any window within the raster, and for the same one as often as it is needed.
+    // Throws as Read does.
+    virtual void ReadMask(const Window& window, std::span<const std::uint32_t> bands,
+                          unsigned char* shown) {
+        static_cast<void>(window);
+        static_cast<void>(bands);
+        static_cast<void>(shown);
+    }
+};
+
+class RasterSource : public SampleWeights {
+public:
     // Name for messages, a file name as a rule.
     virtual std::string Name() const = 0;
 

@@ -286,6 +286,10 @@ void ReduceRow(Resampling method, std::uint32_t bands, std::uint32_t sourceWidth
             return reducer.template Window<CubicKernel>();
         case Resampling::Lanczos:
             return reducer.template Window<LanczosKernel>();
+        case Resampling::Gauss:
+            return reducer.template Window<GaussKernel>();
+        case Resampling::CubicSpline:
+            return reducer.template Window<CubicSplineKernel>();
         default:
             if constexpr (!zelm::kIsComplex<T>) ReduceOrdered(method, reducer);
     }

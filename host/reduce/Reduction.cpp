@@ -32,6 +32,8 @@ constexpr MethodTraits kMethods[] = {
     {Resampling::Bilinear, "bilinear", HaloOf<BilinearKernel>(), true},
     {Resampling::Cubic, "cubic", HaloOf<CubicKernel>(), true},
     {Resampling::Lanczos, "lanczos", HaloOf<LanczosKernel>(), true},
+    {Resampling::Gauss, "gauss", HaloOf<GaussKernel>(), true},
+    {Resampling::CubicSpline, "cubicspline", HaloOf<CubicSplineKernel>(), true},
 };
 
 constexpr bool MethodsAreInOrder() {

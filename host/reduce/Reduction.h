@@ -1,5 +1,11 @@
 // Reduction of raster rows to the next coarser level: two rows and two columns become one.
 //
+// A level has half the columns and rows of the one before, rounded down: the pixel (x, y) stands
+// for just the cell of (2x, 2y) to (2x + 1, 2y + 1), so that pixels are twice as large from level
+// to level and never move. The last column or row of an odd size belongs to no cell; methods on a
+// window tap it like any other sample inside the level. What counts beside validity tells
+// Weighing.h.
+//
 // Pure functions on rows of one level, pixel-interleaved; no files, no threads, no state. Every
 // method works in the raster's own type, takes valid samples only, and gives a cell without any
 // the band's no-data value. Any number of threads may reduce different rows at the same time.
@@ -28,6 +34,13 @@ namespace zmchost {
 //   Bilinear  4 x 4 samples, weights 1 3 3 1
 //   Cubic     8 x 8 samples, convolution with a = -1/2
 //   Lanczos   12 x 12 samples, three lobes
+//   CubicSpline  8 x 8 samples, the cubic B-spline of radius 2: B(d) = 2/3 - d^2 + d^3 / 2 for d <
+//   1
+//             and (2 - d)^3 / 6 for d < 2, which is 235 121 27 1 of 384 at the taps. It smooths,
+//             and gives back no sample as it was
+//   Gauss     3 x 3 samples, weights 1 2 1 in both directions, as GDAL documents its overviews of
+//             factor 2 and computes them: around the second sample of the cell, so the taps of cell
+//             x are the columns 2x, 2x + 1 and 2x + 2, and pictures move by half a finer pixel
 // Their weights are normalised over the valid taps inside the level. Where so few remain that their
 // sum is below a quarter of the whole, taps of negative weight are left out as well. A cell whose
 // own 2 x 2 samples are all invalid is invalid, whatever lies around it, so that valid areas do not
@@ -43,22 +56,25 @@ enum class Resampling {
     Median,
     Bilinear,
     Cubic,
-    Lanczos
+    Lanczos,
+    Gauss,
+    CubicSpline
 };
 
-inline constexpr std::uint32_t kResamplings = static_cast<std::uint32_t>(Resampling::Lanczos) + 1;
+inline constexpr std::uint32_t kResamplings =
+    static_cast<std::uint32_t>(Resampling::CubicSpline) + 1;
 
 // "nearest", "average", "rms", "mode", "minimum", "maximum", "median", "bilinear", "cubic",
-// "lanczos", in this spelling only.
+// "lanczos", "gauss", "cubicspline", in this spelling only.
 std::optional<Resampling> ParseResampling(std::string_view word);
 const char* ResamplingName(Resampling method);
 
 // Whether the method is defined for a pixel type: complex types, which have no order, know nearest,
-// average, bilinear, cubic and lanczos. False for a code that is no pixel type.
+// average and the methods on a window. False for a code that is no pixel type.
 bool SupportsElementType(Resampling method, std::uint32_t pixelType);
 
 // Rows of the finer level needed above and below the pair (2y, 2y + 1) for coarse row y: 0 for the
-// methods on 2 x 2 samples, 1, 3 and 5 for the others.
+// methods on 2 x 2 samples, 1 (bilinear, gauss), 3 (both cubics) and 5 for the others.
 std::uint32_t ReductionHalo(Resampling method);
 // The largest of them.
 inline constexpr std::uint32_t kMaxReductionHalo = 5;

@@ -3,6 +3,7 @@
 #define ZMC_HOST_REDUCE_REDUCTIONWINDOW_H
 
 #include <algorithm>
+#include <bit>
 #include <cstddef>
 #include <cstdint>
 #include <type_traits>
@@ -14,7 +15,7 @@
 namespace zmchost {
 
 // Weights of one side, from the cell outwards, at distances 1/4, 3/4, 5/4 ... of the kernel; both
-// sides together weigh 2 to the kShift.
+// sides together weigh at most 2 to the kShift, and just that in all but the spline.
 struct BilinearKernel {
     static constexpr int kReach = 2;
     static constexpr int kShift = 3;
@@ -33,11 +34,45 @@ struct LanczosKernel {
                                                       -36505753, 16166410,  3961179};
 };
 
+// The cubic B-spline, 2/3 - d^2 + d^3 / 2 up to 1 and (2 - d)^3 / 6 up to 2, times 384.
+struct CubicSplineKernel {
+    static constexpr int kReach = 4;
+    static constexpr int kShift = 10;
+    static constexpr std::int64_t kWeights[kReach] = {235, 121, 27, 1};
+};
+// 1 2 1 around the second sample of the cell: all taps from left to right, of which the first is
+// none.
+struct GaussKernel {
+    static constexpr int kReach = 2;
+    static constexpr int kShift = 2;
+    static constexpr std::int64_t kTaps[2 * kReach] = {0, 1, 2, 1};
+};
+// The cell itself, as a window.
+struct BoxKernel {
+    static constexpr int kReach = 1;
+    static constexpr int kShift = 1;
+    static constexpr std::int64_t kWeights[kReach] = {1};
+};
+
 // Weight of tap 0 to 2 * kReach - 1, from left to right or top to bottom.
 template <class Kernel>
 constexpr std::int64_t Weight(int tap) {
-    return Kernel::kWeights[tap < Kernel::kReach ? Kernel::kReach - 1 - tap : tap - Kernel::kReach];
+    if constexpr (requires { Kernel::kTaps; })
+        return Kernel::kTaps[tap];
+    else
+        return Kernel::kWeights[tap < Kernel::kReach ? Kernel::kReach - 1 - tap
+                                                     : tap - Kernel::kReach];
 }
+
+// The weights of all taps of a row together.
+template <class Kernel>
+constexpr std::int64_t RowWeight() {
+    std::int64_t sum = 0;
+    for (int tap = 0; tap < 2 * Kernel::kReach; ++tap) sum += Weight<Kernel>(tap);
+    return sum;
+}
+template <class Kernel>
+inline constexpr std::int64_t kWholeWeight = RowWeight<Kernel>() * RowWeight<Kernel>();
 
 // The narrowest type that holds any sum of samples P times weights of `bits` bits; no kernel has
 // weights whose magnitudes sum up to twice the whole.
@@ -94,8 +129,7 @@ Rounded<P> WindowPart(const PartRows<P>& source, std::size_t part, std::size_t b
             positiveWeights += weight;
         }
     }
-    constexpr std::int64_t whole = std::int64_t{1} << (2 * Kernel::kShift);
-    if (weights < whole / 4) {
+    if (weights < kWholeWeight<Kernel> / 4) {
         sum = positiveSum;
         weights = positiveWeights;
     }
@@ -105,12 +139,16 @@ Rounded<P> WindowPart(const PartRows<P>& source, std::size_t part, std::size_t b
         return RoundedQuotient<P, Sum>(sum, static_cast<Sum>(weights));
 }
 
-// A sum of the whole weight, 2 to the shift, in the raster's type.
-template <class P, int shift, class Sum>
+// A sum of the whole weight in the raster's type.
+template <class P, class Kernel, class Sum>
 P OfWholeWeight(Sum sum) {
+    constexpr std::int64_t whole = kWholeWeight<Kernel>;
+    constexpr int shift = std::countr_zero(static_cast<std::uint64_t>(whole));
     if constexpr (std::is_floating_point_v<P>) {
-        constexpr Sum unit = Sum{1} / (std::int64_t{1} << shift);
-        return RoundedFloat<P>(sum * unit).value;
+        // Of a power of two the compiler makes a product.
+        return RoundedFloat<P>(sum / static_cast<Sum>(whole)).value;
+    } else if constexpr (whole != std::int64_t{1} << shift) {
+        return RoundedQuotient<P, Sum>(sum, static_cast<Sum>(whole)).value;
     } else {
         constexpr Sum half = Sum{1} << (shift - 1);
         const Sum rounded = sum < 0 ? -((half - sum) >> shift) : (sum + half) >> shift;
@@ -146,7 +184,7 @@ void WindowRun(const PartRows<P>& source, std::size_t part, std::uint32_t x, std
             for (int k = 0; k < taps; ++k)
                 sum += static_cast<Sum>(Weight<Kernel>(k)) *
                        static_cast<Sum>(columns[2 * i + static_cast<std::size_t>(k)]);
-            out[(done + i) * source.stride + part] = OfWholeWeight<P, 2 * Kernel::kShift>(sum);
+            out[(done + i) * source.stride + part] = OfWholeWeight<P, Kernel>(sum);
         }
         done += n;
     }

@@ -11,11 +11,21 @@
 namespace zmchost {
 namespace {
 
+constexpr std::uint64_t kOnce[4] = {1, 1, 1, 1};
+
 // n * term, for comparison with a sum of squares.
-WideSum Times(UInt128 term, int n) {
+WideSum Times(UInt128 term, std::uint64_t n) {
     WideSum product;
-    product.AddProduct(term, static_cast<std::uint64_t>(n));
+    product.AddProduct(term, n);
     return product;
+}
+
+// A root rounds to the least k with squares / n < (k + 1/2) squared, which for integers is squares
+// < n * k * (k + 1) + n / 4, the last term rounded up.
+WideSum BoundAbove(UInt128 term, std::uint64_t n) {
+    WideSum bound = Times(term, n);
+    bound.Add((n + 3) / 4);
+    return bound;
 }
 
 UInt128 Square(std::uint64_t value) { return UInt128{value} * value; }
@@ -31,18 +41,20 @@ std::uint64_t Magnitude(T value) {
 }
 
 template <class T>
-Rounded<T> IntegerRoot(const T* values, int count) {
+Rounded<T> IntegerRoot(const T* values, const std::uint64_t* weights, int samples) {
     WideSum squares;
-    for (int i = 0; i < count; ++i) squares.Add(Square(Magnitude(values[i])));
+    std::uint64_t count = 0;
+    for (int i = 0; i < samples; ++i) {
+        squares.AddProduct(Square(Magnitude(values[i])), weights[i]);
+        count += weights[i];
+    }
     const long double mean = (std::ldexp(static_cast<long double>(squares.high), 128) +
                               static_cast<long double>(squares.low)) /
-                             count;
+                             static_cast<long double>(count);
     constexpr auto limit = static_cast<long double>(~std::uint64_t{0});
     auto root = static_cast<std::uint64_t>(std::min(std::sqrt(mean), limit));
-    // The root rounds to the least k with squares / n <= (k + 1/2) squared, which for integers is
-    // squares <= n * k * (k + 1).
-    while (root > 0 && !Less(Times(Square(root) - root, count), squares)) --root;
-    while (Less(Times(Square(root) + root, count), squares)) ++root;
+    while (root > 0 && Less(squares, BoundAbove(Square(root) - root, count))) --root;
+    while (!Less(squares, BoundAbove(Square(root) + root, count))) ++root;
     root = std::min(root, static_cast<std::uint64_t>(std::numeric_limits<T>::max()));
     const WideSum whole = Times(Square(root), count);
     return {static_cast<T>(root), Less(whole, squares) ? 1 : Less(squares, whole) ? -1 : 0};
@@ -132,10 +144,20 @@ Rounded<T> RootMeanSquare(const T* values, int count) {
     else if constexpr (sizeof(T) <= 2)
         return SmallIntegerRoot(values, count);
     else
-        return IntegerRoot(values, count);
+        return RootMeanSquare(values, kOnce, count);
 }
 
-#define ZMC_X(type, name, code) template Rounded<type> RootMeanSquare(const type*, int);
+template <class T>
+Rounded<T> RootMeanSquare(const T* values, const std::uint64_t* weights, int count) {
+    if constexpr (std::is_integral_v<T>)
+        return IntegerRoot(values, weights, count);
+    else
+        return {values[0]};
+}
+
+#define ZMC_X(type, name, code)                              \
+    template Rounded<type> RootMeanSquare(const type*, int); \
+    template Rounded<type> RootMeanSquare(const type*, const std::uint64_t*, int);
 ZMC_ELEMENT_TYPES(ZMC_X)
 #undef ZMC_X
 

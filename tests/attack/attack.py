@@ -4,8 +4,9 @@ Nothing may crash, hang, write where it was to read, leave a file open, or cost 
 second of processor time, 64 MiB of memory and 64 MiB of files beyond what the same takes on a small
 good file, and as much again for each 32 MiB of what it is asked to go through or prints. Commands go
 through all pixels of a complete file, holes included; where that is more than GOES_THROUGH, what is
-judged is that they end when they are asked to. So are levels that the driver makes. A store makes a
-tree of the document, which takes several times its text. The memory of a build is what it is told.
+judged is that they end when they are asked to. So are levels that the driver makes; those that GDAL
+writes beside the file count as what was gone through. A store makes a tree of the document, which takes
+several times its text. The memory of a build is what it is told.
 
     attack.py FOLDER [--files N] [--first K] [--jobs N]
 
@@ -371,7 +372,8 @@ class Attacker:
         listed = set(os.listdir(self.folder))
         for name, cost in self.all_runs(file, self.ask_after if whole > GOES_THROUGH else None):
             # Nothing else has to look at more than the document that is in the file.
-            for what in self.judge(name, cost, size, held, bands):
+            beside = os.path.getsize(file + ".ovr") if os.path.exists(file + ".ovr") else 0
+            for what in self.judge(name, cost, size + beside, held + beside, bands):
                 findings.append(f"{name} {what}")
             if name in READING or name == "gdal-read":
                 if digest(names) != before:

@@ -16,6 +16,7 @@
 
 #include "tests/support/CampaignLength.h"
 #include "tests/support/MemoryMeter.h"
+#include "tests/support/Sanitizers.h"
 
 namespace zmctest {
 namespace {
@@ -75,9 +76,8 @@ void CatchDeath() {
     std::signal(SIGALRM, OnSignal);
     std::signal(SIGABRT, OnSignal);
     ForSanitizers<void (*)(void (*)())>("__sanitizer_set_death_callback", &TellAgain);
-#if !defined(__SANITIZE_ADDRESS__)
+    if (zmctest::IsSanitized()) return;
     for (const int number : {SIGSEGV, SIGBUS, SIGFPE, SIGILL}) std::signal(number, OnSignal);
-#endif
 }
 
 // The C stream leads nowhere while one of these lives. Sanitizers and the C library do not go

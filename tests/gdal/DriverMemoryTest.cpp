@@ -35,15 +35,21 @@ protected:
         for (int band = 1; band <= 2; ++band) dataset->GetRasterBand(band)->Fill(band);
         return dataset;
     }
-    static void Make(const std::string& name, GDALDataType type) {
+    static void Make(const std::string& name, GDALDataType type, bool embeds = false) {
         const DatasetPtr source = Memory(type);
+        CPLStringList options;
+        if (embeds) {
+            options.SetNameValue("EMBED", "YES");
+            source->SetMetadataItem("KEY", "value");
+            source->GetRasterBand(1)->SetDescription("first");
+        }
         GDALColorTable table;
         const GDALColorEntry color{1, 2, 3, 255};
         table.SetColorEntry(1, &color);
         if (type == GDT_Byte) source->GetRasterBand(1)->SetColorTable(&table);
         ASSERT_TRUE(DatasetPtr(
             Driver("ZMCPyramid")
-                .CreateCopy(name.c_str(), source.get(), FALSE, nullptr, nullptr, nullptr)));
+                .CreateCopy(name.c_str(), source.get(), FALSE, options.List(), nullptr, nullptr)));
     }
     // By the driver's own entry: what GDAL allocates around it is not ours.
     static DatasetPtr Open(const std::string& name, unsigned flags = 0) {
@@ -143,19 +149,21 @@ const std::vector<DriverMemory::Call>& DriverMemory::Calls() {
 }
 
 TEST_F(DriverMemory, OpeningFailsWithAnError) {
-    Make(name, GDT_Byte);
-    GDALOpenInfo info(name.c_str(), GDAL_OF_RASTER);
-    const std::size_t points = zmctest::ForEachAllocationFailing([&](AllocationFaults& faults) {
-        faults.Disarm();
-        CPLErrorReset();
-        faults.Rearm();
-        DatasetPtr dataset;
-        EXPECT_NO_THROW(
-            dataset.reset(static_cast<GDALDataset*>(Driver("ZMCPyramid").pfnOpen(&info))));
-        faults.Disarm();
-        EXPECT_TRUE(dataset || CPLGetLastErrorType() == CE_Failure);
-    });
-    EXPECT_GT(points, 20u);
+    for (const bool embeds : {false, true}) {
+        Make(name, GDT_Byte, embeds);
+        GDALOpenInfo info(name.c_str(), GDAL_OF_RASTER);
+        const std::size_t points = zmctest::ForEachAllocationFailing([&](AllocationFaults& faults) {
+            faults.Disarm();
+            CPLErrorReset();
+            faults.Rearm();
+            DatasetPtr dataset;
+            EXPECT_NO_THROW(
+                dataset.reset(static_cast<GDALDataset*>(Driver("ZMCPyramid").pfnOpen(&info))));
+            faults.Disarm();
+            EXPECT_TRUE(dataset || CPLGetLastErrorType() == CE_Failure);
+        });
+        EXPECT_GT(points, embeds ? 40u : 20u);
+    }
 }
 
 // For each call: nothing is thrown, what fails is told, and the dataset is as good as before.

@@ -150,7 +150,9 @@ TEST_F(DriverTest, CreationOptionsDoWhatTheirDescriptionTells) {
         EXPECT_EQ(parsed->build.levels, none->build.levels) << name;
         EXPECT_EQ(parsed->build.statistics, none->build.statistics) << name;
         EXPECT_EQ(parsed->build.ordering, none->build.ordering) << name;
+        EXPECT_EQ(parsed->build.weights, none->build.weights) << name;
         EXPECT_EQ(parsed->signedByte, none->signedByte) << name;
+        EXPECT_EQ(parsed->embed, none->embed) << name;
         std::size_t values = 0;
         for (const CPLXMLNode* value = option->psChild; value; value = value->psNext) {
             if (value->eType != CXT_Element || !EQUAL(value->pszValue, "Value")) continue;
@@ -162,8 +164,9 @@ TEST_F(DriverTest, CreationOptionsDoWhatTheirDescriptionTells) {
         const bool methods = name == "RESAMPLING";
         EXPECT_EQ(methods ? values : 0, methods ? zmchost::kResamplings : 0) << name;
     }
-    EXPECT_EQ(names, (std::set<std::string>{"BINS", "LEVELS", "MEMORY", "NUM_THREADS", "ORDERING",
-                                            "PIXELTYPE", "RESAMPLING", "STATISTICS"}));
+    EXPECT_EQ(names,
+              (std::set<std::string>{"BINS", "EMBED", "LEVELS", "MEMORY", "NUM_THREADS", "ORDERING",
+                                     "PIXELTYPE", "RESAMPLING", "STATISTICS", "WEIGHTS"}));
 }
 
 TEST_F(DriverTest, CopiesOfEveryTypeHoldTheSamePixels) {

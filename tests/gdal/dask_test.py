@@ -14,7 +14,7 @@ EXAMPLES = os.path.join(os.path.dirname(__file__), "..", "..", "examples")
 def run(name, *arguments):
     done = subprocess.run([sys.executable, os.path.join(EXAMPLES, name), *arguments],
                           stdout=subprocess.PIPE, stderr=subprocess.PIPE, text=True, check=False)
-    if done.returncode != 0:
+    if done.returncode != 0 or "Warning" in done.stderr:
         raise AssertionError(done.stderr)
     return done.stdout
 

@@ -8,6 +8,7 @@ from rasters import DRIVER, FolderTest, halve, memory_dataset, place, samples
 
 import rasterio
 from rasterio.enums import ColorInterp
+from rasterio.io import MemoryFile
 from rasterio.windows import Window
 
 
@@ -58,6 +59,25 @@ class Rasterio(FolderTest):
             np.testing.assert_array_equal(raster.read(), self.array)
             self.assertEqual(raster.descriptions[1], "green one")
             self.assertEqual((raster.crs.to_epsg(), raster.nodata), (32631, 9))
+            self.assertEqual(raster.overviews(1), [2, 4])
+
+    def test_files_in_memory(self):
+        with open(self.name, "rb") as stream, MemoryFile(stream.read(), ext=".pyr") as memory:
+            with memory.open() as raster:
+                self.assertEqual(raster.driver, DRIVER)
+                np.testing.assert_array_equal(raster.read(), self.array)
+
+    def test_writing_into_memory(self):
+        with MemoryFile(ext=".pyr") as memory:
+            with memory.open(driver=DRIVER, width=700, height=600, count=3, dtype="uint8") as out:
+                out.write(self.array)
+            content = memory.read()
+            with memory.open() as raster:
+                np.testing.assert_array_equal(raster.read(), self.array)
+        with open(self.path("written.pyr"), "wb") as stream:
+            stream.write(content)
+        with rasterio.open(self.path("written.pyr")) as raster:
+            np.testing.assert_array_equal(raster.read(), self.array)
             self.assertEqual(raster.overviews(1), [2, 4])
 
 

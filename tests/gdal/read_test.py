@@ -4,9 +4,15 @@ import threading
 import unittest
 
 import numpy as np
-from osgeo import gdal
+from osgeo import gdal, osr
 
 from rasters import COMPLEX, DRIVER, TYPES, FolderTest, halve, memory_dataset, place, samples
+
+
+def osr_text(code):
+    reference = osr.SpatialReference()
+    reference.ImportFromEPSG(code)
+    return reference.ExportToWkt()
 
 
 class Reading(FolderTest):
@@ -80,6 +86,39 @@ class Reading(FolderTest):
         again = gdal.Open(self.copy(flagged, "again.pyr"))
         self.assertEqual(again.GetMetadataItem("PIXEL_TYPE", "ZMCPYRAMID"), "Char")
         np.testing.assert_array_equal(again.ReadAsArray(), signed.astype(np.int16))
+
+    def test_levels_as_datasets_have_the_pixel_size_that_they_cover(self):
+        source = memory_dataset(samples(gdal.GDT_Byte, 1021, 1023, 1), gdal.GDT_Byte)
+        source.SetGeoTransform([1000, 300.0379, 0.25, 2000, -0.5, -299.9])
+        source.SetProjection(srs := osr_text(32633))
+        dataset = gdal.Open(self.copy(source, options=["LEVELS=3"]))
+        for index in range(3):
+            level = dataset.GetRasterBand(1).GetOverview(index).GetDataset()
+            size = 2 << index
+            self.assertEqual(level.GetGeoTransform(), (1000, size * 300.0379, size * 0.25, 2000,
+                                                       size * -0.5, size * -299.9))
+            self.assertEqual(level.GetProjection(), dataset.GetProjection())
+        self.assertIn("32633", srs)
+        for index, width in enumerate((511, 255, 127)):
+            for word in ("%d", "%d only"):
+                level = gdal.OpenEx(dataset.GetDescription(),
+                                    open_options=["OVERVIEW_LEVEL=" + word % index])
+                self.assertEqual(level.RasterXSize, width)
+                np.testing.assert_allclose(
+                    level.GetGeoTransform(),
+                    dataset.GetRasterBand(1).GetOverview(index).GetDataset().GetGeoTransform(),
+                    rtol=1e-15)
+                np.testing.assert_array_equal(
+                    level.ReadAsArray(), dataset.GetRasterBand(1).GetOverview(index).ReadAsArray())
+        # That of a translation with -ovr is stretched over the whole raster, without a word to us.
+        stretched = gdal.Translate("", dataset, format="MEM", overviewLevel=2)
+        self.assertEqual(stretched.GetGeoTransform()[1], 300.0379 * (1023 / 127))
+
+    def test_levels_of_a_raster_without_georeference_have_none(self):
+        source = memory_dataset(samples(gdal.GDT_Byte, 600, 600, 1), gdal.GDT_Byte)
+        dataset = gdal.Open(self.copy(source))
+        level = dataset.GetRasterBand(1).GetOverview(0).GetDataset()
+        self.assertIsNone(level.GetGeoTransform(can_return_null=True))
 
     def test_levels_are_overviews_of_their_exact_size(self):
         array = samples(gdal.GDT_Byte, 777, 1001, 3)

@@ -9,7 +9,7 @@ import zipfile
 import numpy as np
 from osgeo import gdal
 
-from rasters import FolderTest, memory_dataset, samples
+from rasters import FolderTest, memory_dataset, place, samples
 
 
 class VirtualFiles(FolderTest):
@@ -119,6 +119,86 @@ class VirtualFiles(FolderTest):
         gdal.VSIFCloseL(stream)
         with self.assertRaisesRegex(RuntimeError, "it was cut from"):
             dataset.ReadAsArray()
+
+
+class VirtualTargets(FolderTest):
+    """Pyramids made where GDAL's file systems can write."""
+
+    def setUp(self):
+        super().setUp()
+        self.array = samples(gdal.GDT_UInt16, 700, 600, 3)
+        self.source = memory_dataset(self.array, gdal.GDT_UInt16)
+        place(self.source)
+        self.driver = gdal.GetDriverByName("ZMCPyramid")
+        self.before = self.spools()
+
+    def spools(self):
+        return [name for name in os.listdir("/tmp") if name.startswith(".zmcraster.zmcbuild")]
+
+    def remove(self, *names):
+        for name in names:
+            self.addCleanup(gdal.Unlink, name)
+
+    def check(self, name):
+        dataset = gdal.Open(name)
+        self.assertEqual(dataset.GetDriver().ShortName, "ZMCPyramid")
+        np.testing.assert_array_equal(dataset.ReadAsArray(), self.array)
+        self.assertEqual(dataset.GetRasterBand(1).GetOverviewCount(), 2)
+        self.assertEqual(dataset.GetGeoTransform()[1], 30)
+        low, high = self.array[0].min(), self.array[0].max()
+        self.assertEqual(dataset.GetRasterBand(1).GetStatistics(False, False)[:2], [low, high])
+        self.assertEqual(self.spools(), self.before)
+
+    def test_copy_into_memory(self):
+        name = "/vsimem/made.pyr"
+        self.remove(name, name + ".aux.xml")
+        made = self.driver.CreateCopy(name, self.source)
+        np.testing.assert_array_equal(made.ReadAsArray(), self.array)
+        made = None
+        self.check(name)
+        self.driver.CreateCopy(name, self.source)
+        self.check(name)
+
+    def test_translate_into_memory_and_back(self):
+        self.remove("/vsimem/made.pyr", "/vsimem/made.pyr.aux.xml", "/vsimem/back.tif")
+        gdal.Translate("/vsimem/made.pyr", self.source, format="ZMCPyramid")
+        self.check("/vsimem/made.pyr")
+        gdal.Translate("/vsimem/back.tif", "/vsimem/made.pyr")
+        np.testing.assert_array_equal(gdal.Open("/vsimem/back.tif").ReadAsArray(), self.array)
+
+    def test_created_in_memory_and_written(self):
+        name = "/vsimem/made.pyr"
+        self.remove(name, name + ".aux.xml")
+        made = self.driver.Create(name, 600, 700, 3, gdal.GDT_UInt16)
+        place(made)
+        made.WriteArray(self.array)
+        made = None
+        self.check(name)
+
+    def test_into_an_archive(self):
+        path = self.path("made.zip")
+        self.driver.CreateCopy(f"/vsizip/{path}/made.pyr", memory_dataset(self.array,
+                                                                         gdal.GDT_UInt16))
+        with zipfile.ZipFile(path) as archive:
+            self.assertIn("made.pyr", archive.namelist())
+        np.testing.assert_array_equal(gdal.Open(f"/vsizip/{path}/made.pyr").ReadAsArray(),
+                                      self.array)
+
+    def test_where_nothing_can_be_written(self):
+        for name in ("/vsicurl/http://127.0.0.1:9/a.pyr", f"/vsitar/{self.path('a.tar')}/a.pyr",
+                     f"/vsisubfile/0_100,{self.path('missing')}"):
+            with self.assertRaises(RuntimeError) as caught:
+                self.driver.CreateCopy(name, self.source)
+            self.assertNotIn("\n", str(caught.exception))
+        self.assertEqual(self.spools(), self.before)
+
+    def test_a_copy_that_is_cancelled_leaves_nothing(self):
+        gdal.PushErrorHandler("CPLQuietErrorHandler")
+        self.addCleanup(gdal.PopErrorHandler)
+        with self.assertRaises(RuntimeError):
+            self.driver.CreateCopy("/vsimem/made.pyr", self.source, callback=lambda *_: 0)
+        self.assertIsNone(gdal.VSIStatL("/vsimem/made.pyr"))
+        self.assertEqual(self.spools(), self.before)
 
 
 class ReplacedFiles(FolderTest):

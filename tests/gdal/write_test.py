@@ -30,6 +30,12 @@ def file_sizes_up_to(size):
         resource.setrlimit(resource.RLIMIT_FSIZE, before)
 
 
+def gdal_levels(name, number):
+    dataset = gdal.Open(name)
+    band = dataset.GetRasterBand(number)
+    return [band.GetOverview(index).ReadAsArray() for index in range(band.GetOverviewCount())]
+
+
 class Copies(FolderTest):
     def test_every_type_and_number_of_bands(self):
         for data_type in TYPES:
@@ -407,7 +413,7 @@ class BlockByBlock(FolderTest):
             with self.assertRaises(RuntimeError):
                 self.create(*arguments)
         with self.assertRaises(RuntimeError):
-            gdal.GetDriverByName(DRIVER).Create("/vsimem/new.pyr", 5, 5, 1)
+            gdal.GetDriverByName(DRIVER).Create("/vsicurl/http://127.0.0.1:9/new.pyr", 5, 5, 1)
         self.assertEqual(self.files(), [])
 
 
@@ -450,13 +456,34 @@ class Updates(FolderTest):
             reread = gdal.Open(self.name).GetRasterBand(1)
         self.assertEqual(self.files(), ["built.pyr", "raster.pyr"])
 
+    def test_levels_are_renewed_by_alpha_masks_and_every_method(self):
+        for method in ("gauss", "cubicspline", "average", "lanczos"):
+            with self.subTest(method):
+                array = samples(gdal.GDT_Byte, 500, 700, 4)
+                array[3] = np.where(array[3] > 99, 255, 0)
+                source = memory_dataset(array, gdal.GDT_Byte)
+                for number, meaning in enumerate((gdal.GCI_RedBand, gdal.GCI_GreenBand,
+                                                  gdal.GCI_BlueBand, gdal.GCI_AlphaBand)):
+                    source.GetRasterBand(number + 1).SetColorInterpretation(meaning)
+                built = self.copy(source, options=["RESAMPLING=" + method])
+                expected = [gdal_levels(built, number) for number in (1, 4)]
+                plain = self.copy(source, "plain.zmc", options=["RESAMPLING=" + method,
+                                                                "WEIGHTS=NONE"])
+                self.assertFalse((gdal_levels(plain, 1)[0] == expected[0][0]).all())
+                dataset = gdal.Open(plain, gdal.GA_Update)
+                dataset.BuildOverviews(method, [2, 4])
+                dataset = None
+                for number, levels in zip((1, 4), expected):
+                    for ours, theirs in zip(gdal_levels(plain, number), levels):
+                        np.testing.assert_array_equal(ours, theirs)
+
     def test_levels_without_room_are_refused(self):
         dataset = gdal.Open(self.name, gdal.GA_Update)
         for factors in ([8], [3], []):
             with self.assertRaises(RuntimeError):
                 quiet(lambda: dataset.BuildOverviews("AVERAGE", factors))
         with self.assertRaises(RuntimeError):
-            quiet(lambda: dataset.BuildOverviews("GAUSS", [2]))
+            quiet(lambda: dataset.BuildOverviews("AVERAGE_MAGPHASE", [2]))
         with self.assertRaises(RuntimeError):
             quiet(lambda: gdal.Open(self.name).BuildOverviews("AVERAGE", [2]))
         del dataset

@@ -256,6 +256,7 @@ class FailingWork : public PixelWork {
 public:
     bool NeedsMasks() const override { return false; }
     bool MarkRow(const std::byte*, unsigned char*, std::uint32_t) const override { return false; }
+    bool MayMark() const override { return false; }
     void ReduceRow(const RowWindow&, std::uint32_t, std::byte*, unsigned char*) const override {}
     void TakeStatistics(std::uint32_t, const std::byte*, const unsigned char*,
                         std::uint32_t) override {}

@@ -10,12 +10,14 @@
 #include <filesystem>
 #include <iterator>
 #include <limits>
+#include <random>
 
 #include "core/PixelVocabulary.h"
 #include "host/raster/Raster.h"
 #include "host/statistics/BandStatistics.h"
 #include "host/statistics/HistogramBins.h"
 #include "tests/host/NaivePyramid.h"
+#include "tests/host/Palettes.h"
 #include "tests/support/FailureOf.h"
 #include "tests/support/MemorySource.h"
 #include "tests/support/ScratchDirectory.h"
@@ -27,10 +29,10 @@ using zmctest::MemorySource;
 using zmctest::ScratchDirectory;
 using zmctest::TestModule;
 
-constexpr Resampling kMethods[] = {Resampling::Nearest, Resampling::Average,  Resampling::Rms,
-                                   Resampling::Mode,    Resampling::Minimum,  Resampling::Maximum,
-                                   Resampling::Median,  Resampling::Bilinear, Resampling::Cubic,
-                                   Resampling::Lanczos};
+constexpr Resampling kMethods[] = {
+    Resampling::Nearest, Resampling::Average, Resampling::Rms,    Resampling::Mode,
+    Resampling::Minimum, Resampling::Maximum, Resampling::Median, Resampling::Bilinear,
+    Resampling::Cubic,   Resampling::Lanczos, Resampling::Gauss,  Resampling::CubicSpline};
 static_assert(std::size(kMethods) == kResamplings);
 
 template <class T>
@@ -127,6 +129,186 @@ TEST(PyramidBuilder, BuildsManyBandsInMortonOrder) {
     source.FillWithNoise(3);
     const BuildReport report = PyramidBuilder(TestModule()).Build(source, folder / "a.zmc");
     EXPECT_EQ(report.tileOrdering, zelm::TileOrder::Morton);
+    ExpectPyramidOf(source, folder / "a.zmc", Resampling::Average);
+}
+
+// Alpha and masks in blocks and in noise, over samples that are no data here and there.
+template <class T>
+MemorySource<T> WeighedSource(std::uint32_t width, std::uint32_t height, bool masked) {
+    MemorySource<T> source(width, height, 4);
+    source.FillWithNoise(width);
+    std::mt19937 random(height);
+    source.props.noDataValues[1] = 5;
+    std::vector<unsigned char> mask;
+    for (std::uint32_t y = 0; y < height; ++y)
+        for (std::uint32_t x = 0; x < width; ++x) {
+            T* const pixel = &source.pixels[(std::size_t{y} * width + x) * 4];
+            const bool noisy = (x / 50 + y / 50) % 3 == 0;
+            pixel[3] = noisy ? static_cast<T>(random() % 4) : static_cast<T>(x / 64 % 2 * 120);
+            if (random() % 9 == 0) pixel[1] = 5;
+            if constexpr (std::is_floating_point_v<T>)
+                if (random() % 7 == 0) pixel[0] = std::numeric_limits<T>::quiet_NaN();
+            mask.push_back(noisy ? random() % 5 == 0 : x / 37 % 2);
+        }
+    source.alphas = {{0, 3}, {1, 3}};
+    if (masked) source.masks = {{1, mask}, {2, mask}};
+    return source;
+}
+
+template <class T>
+void ExpectWeighedPyramidOf(const MemorySource<T>& source, const std::string& file,
+                            Resampling method, const Weighing& weighing) {
+    Raster raster = Raster::Open(TestModule(), file);
+    std::vector<zelm::NoDataRule<T>> rules;
+    const std::uint32_t bands = source.props.bands;
+    for (std::uint32_t band = 0; band < bands; ++band)
+        rules.push_back(RuleOfBand<T>(source.props, band));
+    std::vector<T> expected = source.pixels;
+    for (std::uint32_t level = 1; level <= raster.MaxLevel(); ++level) {
+        const std::uint32_t width = raster.Width(level - 1);
+        const std::uint32_t height = raster.Height(level - 1);
+        std::vector<unsigned char> hidden(expected.size());
+        for (std::size_t i = 0; i < hidden.size(); ++i) {
+            const auto x = static_cast<std::uint32_t>(i / bands % width);
+            const auto y = static_cast<std::uint32_t>(i / bands / width);
+            const auto band = static_cast<std::uint32_t>(i % bands);
+            if (!source.HasMask(band)) continue;
+            hidden[i] = 1;
+            for (std::uint32_t v = y << (level - 1); v < (y + 1) << (level - 1); ++v)
+                for (std::uint32_t u = x << (level - 1); u < (x + 1) << (level - 1); ++u)
+                    if (source.masks.at(band)[std::size_t{v} * source.props.samples + u] != 0)
+                        hidden[i] = 0;
+        }
+        expected = zmctest::NaiveReduce(expected, width, height, method, rules, &weighing, hidden);
+        EXPECT_TRUE(SameBytes(
+            raster.Read<T>(level, {0, 0, raster.Width(level), raster.Height(level)}), expected))
+            << ResamplingName(method) << " level " << level;
+    }
+}
+
+// In one walk over the whole width, and in columns and several walks; by one thread and by several.
+template <class T>
+void ExpectWeighedLevels() {
+    const ScratchDirectory folder;
+    const PyramidBuilder builder(TestModule());
+    for (const bool masked : {false, true}) {
+        MemorySource<T> source = WeighedSource<T>(2103, 707, masked);
+        Weighing weighing;
+        weighing.bands.resize(4);
+        for (const std::uint32_t band : {0u, 1u}) weighing.bands[band].alpha = 3;
+        weighing.hidden = masked;
+        for (const Resampling method : {Resampling::Average, Resampling::Mode, Resampling::Cubic}) {
+            BuildOptions options;
+            options.resampling = method;
+            options.overwrite = true;
+            for (const std::uint64_t memory : {std::uint64_t{256} << 20, std::uint64_t{14} << 20}) {
+                options.memory = memory;
+                options.threads = memory > std::uint64_t{99} << 20 ? 1 : 3;
+                EXPECT_LE(builder.Build(source, folder / "a.zmc", options).peakMemory, memory);
+                ExpectWeighedPyramidOf(source, folder / "a.zmc", method, weighing);
+            }
+        }
+    }
+}
+
+TEST(PyramidBuilder, AlphaAndMasksWeighEveryLevelWhateverTheMemory) {
+    ExpectWeighedLevels<unsigned char>();
+    ExpectWeighedLevels<float>();
+}
+
+TEST(PyramidBuilder, WeightsChangeNeitherTheFinestLevelNorStatistics) {
+    const ScratchDirectory folder;
+    MemorySource<unsigned char> source = WeighedSource<unsigned char>(600, 500, true);
+    BuildOptions options;
+    PyramidBuilder(TestModule()).Build(source, folder / "a.zmc", options);
+    options.weights = false;
+    PyramidBuilder(TestModule()).Build(source, folder / "b.zmc", options);
+    Raster weighed = Raster::Open(TestModule(), folder / "a.zmc");
+    Raster plain = Raster::Open(TestModule(), folder / "b.zmc");
+    EXPECT_EQ(weighed.Read<unsigned char>(0, {0, 0, 600, 500}), source.pixels);
+    for (std::uint32_t band = 0; band < 4; ++band) {
+        const auto one = weighed.Statistics<unsigned char>(band);
+        const auto other = plain.Statistics<unsigned char>(band);
+        EXPECT_EQ(one.mean, other.mean);
+        EXPECT_EQ(one.minimum, other.minimum);
+    }
+    EXPECT_NE(weighed.Read<unsigned char>(1, {0, 0, 300, 250}),
+              plain.Read<unsigned char>(1, {0, 0, 300, 250}));
+    ExpectPyramidOf(source, folder / "b.zmc", Resampling::Average);
+}
+
+// Before the band that it weighs, behind it, and not among them at all.
+TEST(PyramidBuilder, AlphaIsFoundAmongTheBandsThatAreTaken) {
+    const ScratchDirectory folder;
+    MemorySource<short> source(4, 4, 3);
+    for (std::size_t i = 0; i < 16; ++i) {
+        source.pixels[3 * i] = i % 2 == 0 ? 200 : 10;
+        source.pixels[3 * i + 2] = i % 2 == 0 ? 7 : 0;
+    }
+    source.alphas = {{0, 2}};
+    BuildOptions options;
+    options.overwrite = true;
+    options.levels = 1;
+    for (const auto& bands : std::vector<std::vector<std::uint32_t>>{{2, 0}, {0, 2}, {1, 0}}) {
+        options.bands = bands;
+        PyramidBuilder(TestModule()).Build(source, folder / "a.zmc", options);
+        Raster raster = Raster::Open(TestModule(), folder / "a.zmc");
+        const auto level = raster.Read<short>(1, {0, 0, 2, 2});
+        for (std::size_t i = bands[0] == 0 ? 0 : 1; i < level.size(); i += 2)
+            EXPECT_EQ(level[i], 200);
+    }
+}
+
+TEST(PyramidBuilder, AnAlphaBandThatThereIsNotIsRefused) {
+    const ScratchDirectory folder;
+    MemorySource<short> source(4, 4, 3);
+    source.alphas = {{0, 3}};
+    EXPECT_THAT(
+        zmctest::FailureOf([&] { PyramidBuilder(TestModule()).Build(source, folder / "a.zmc"); }),
+        testing::HasSubstr("cannot take band 3, counted from 0, for alpha: there are 3"));
+    EXPECT_FALSE(std::filesystem::exists(folder / "a.zmc"));
+}
+
+TEST(PyramidBuilder, ABandIsNotItsOwnAlphaAndComplexTypesHaveNone) {
+    const ScratchDirectory folder;
+    MemorySource<unsigned char> plain(300, 300, 2);
+    plain.FillWithNoise(3);
+    plain.alphas = {{1, 1}};
+    PyramidBuilder(TestModule()).Build(plain, folder / "a.zmc");
+    ExpectPyramidOf(plain, folder / "a.zmc", Resampling::Average);
+    MemorySource<zelm::Complex<float>> complex(300, 300, 2);
+    complex.FillWithNoise(4);
+    complex.alphas = {{0, 1}};
+    complex.palettes[0] = zmctest::PaletteOf({{1, 2, 3, 255}});
+    BuildOptions options;
+    options.overwrite = true;
+    options.resampling = Resampling::Average;
+    PyramidBuilder(TestModule()).Build(complex, folder / "a.zmc", options);
+    ExpectPyramidOf(complex, folder / "a.zmc", Resampling::Average);
+}
+
+TEST(PyramidBuilder, PalettesAreAveragedAsColours) {
+    const ScratchDirectory folder;
+    MemorySource<unsigned char> source(512, 512, 1);
+    // Black and white alternate; grey is entry 9, and 200 has no colour.
+    std::vector<std::array<std::uint8_t, 4>> colors(10, {255, 0, 0, 255});
+    colors[0] = {0, 0, 0, 255};
+    colors[1] = {255, 255, 255, 255};
+    colors[9] = {128, 128, 128, 255};
+    source.palettes[0] = zmctest::PaletteOf(colors);
+    for (std::size_t i = 0; i < source.pixels.size(); ++i)
+        source.pixels[i] = i < 4096 ? 200 : static_cast<unsigned char>(i % 2);
+    BuildOptions options;
+    options.resampling = Resampling::Average;
+    options.overwrite = true;
+    PyramidBuilder(TestModule()).Build(source, folder / "a.zmc", options);
+    Raster raster = Raster::Open(TestModule(), folder / "a.zmc");
+    const auto level = raster.Read<unsigned char>(1, {0, 0, 256, 256});
+    EXPECT_EQ(level.front(), 200);
+    EXPECT_EQ(level.back(), 9);
+    // Without colours the indices are quantities.
+    source.palettes[0] = zelm::PalettePtr(new zelm::Palette);
+    PyramidBuilder(TestModule()).Build(source, folder / "a.zmc", options);
     ExpectPyramidOf(source, folder / "a.zmc", Resampling::Average);
 }
 

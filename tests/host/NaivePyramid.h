@@ -8,6 +8,7 @@
 
 #include "host/raster/NoData.h"
 #include "host/reduce/Reduction.h"
+#include "host/reduce/Weighing.h"
 
 namespace zmctest {
 
@@ -20,13 +21,18 @@ std::vector<unsigned char> NaiveMask(const std::vector<T>& pixels,
     return mask;
 }
 
+// `weighing` may be null; `hidden` tells of each sample whether a mask hides it, and may be empty.
 template <class T>
 std::vector<T> NaiveReduce(const std::vector<T>& fine, std::uint32_t width, std::uint32_t height,
                            zmchost::Resampling method,
-                           const std::vector<zelm::NoDataRule<T>>& rules) {
+                           const std::vector<zelm::NoDataRule<T>>& rules,
+                           const zmchost::Weighing* weighing = nullptr,
+                           const std::vector<unsigned char>& hidden = {}) {
     const auto bands = static_cast<std::uint32_t>(rules.size());
     const auto halo = static_cast<std::int64_t>(zmchost::ReductionHalo(method));
-    const std::vector<unsigned char> mask = NaiveMask(fine, rules);
+    std::vector<unsigned char> mask = NaiveMask(fine, rules);
+    for (std::size_t i = 0; i < hidden.size(); ++i)
+        if (hidden[i] != 0) mask[i] |= zmchost::kHiddenBit;
     const bool anyValue =
         std::any_of(rules.begin(), rules.end(), [](const auto& rule) { return rule.hasValue; });
     const std::size_t stride = std::size_t{width} * bands;
@@ -43,6 +49,13 @@ std::vector<T> NaiveReduce(const std::vector<T>& fine, std::uint32_t width, std:
         zmchost::ReduceRow<T>(
             method, bands, width, {rows.data(), masks.data()}, anyValue ? rules.data() : nullptr,
             coarse.data() + static_cast<std::size_t>(row) * (width / 2) * bands, nullptr);
+        std::vector<unsigned char> coarseMask(std::size_t{width / 2} * bands);
+        if (!weighing) continue;
+        T* const out = coarse.data() + static_cast<std::size_t>(row) * coarseMask.size();
+        zmchost::ReduceRow<T>(method, bands, width, {rows.data(), masks.data()}, rules.data(), out,
+                              coarseMask.data());
+        zmchost::WeighRow<T>(method, bands, width, {rows.data(), masks.data()}, rules.data(),
+                             *weighing, out, coarseMask.data());
     }
     return coarse;
 }

@@ -29,6 +29,7 @@ struct Picture {
     std::uint32_t halo = 0;
     std::vector<std::vector<T>> rows;  // an empty one is outside the level
     std::vector<std::vector<unsigned char>> masks;
+    bool hides = false;  // bit 1 of a mask hides a sample
 
     bool Valid(int row, std::int64_t column, std::uint32_t band) const {
         if (row < 0 || row >= static_cast<int>(rows.size()) || column < 0 || column >= width)
@@ -36,6 +37,11 @@ struct Picture {
         const auto r = static_cast<std::size_t>(row);
         if (rows[r].empty()) return false;
         return masks.empty() || masks[r].empty() || (masks[r][Index(column, band)] & 1) == 0;
+    }
+    bool Hidden(int row, std::int64_t column, std::uint32_t band) const {
+        const auto r = static_cast<std::size_t>(row);
+        return hides && !masks.empty() && !masks[r].empty() &&
+               (masks[r][Index(column, band)] & 2) != 0;
     }
     T At(int row, std::int64_t column, std::uint32_t band) const {
         return rows[static_cast<std::size_t>(row)][Index(column, band)];
@@ -64,23 +70,40 @@ inline long double KernelValue(Resampling method, long double d) {
         case Resampling::Cubic:
             if (d < 1) return (1.5L * d - 2.5L) * d * d + 1;
             return d < 2 ? ((-0.5L * d + 2.5L) * d - 4) * d + 2 : 0;
+        case Resampling::CubicSpline:
+            if (d < 1) return 2.0L / 3 - d * d + d * d * d / 2;
+            return d < 2 ? (2 - d) * (2 - d) * (2 - d) / 6 : 0;
         default:
             return d < 3 ? 3 * std::sin(pi * d) * std::sin(pi * d / 3) / (pi * pi * d * d) : 0;
     }
 }
 
-inline int Shift(Resampling method) {
-    return method == Resampling::Bilinear ? 3 : method == Resampling::Cubic ? 8 : 30;
+// What all taps of a row weigh together.
+inline std::int64_t Whole(Resampling method) {
+    switch (method) {
+        case Resampling::Bilinear:
+            return 8;
+        case Resampling::Cubic:
+            return 256;
+        case Resampling::Gauss:
+            return 4;
+        case Resampling::CubicSpline:
+            return 768;
+        default:
+            return std::int64_t{1} << 30;
+    }
 }
 
-// Weight of the tap at distance (2 * i + 1) / 4, in units of 2 to the -shift of the sum over all.
+// Weight of the tap at distance (2 * i + 1) / 4. The Gaussian has 1 2 1 around the sample behind
+// the middle of the cell.
 inline std::int64_t TapWeight(Resampling method, int i) {
+    if (method == Resampling::Gauss) return std::abs(i) > 1 ? 0 : 2 - std::abs(i);
     static std::map<std::pair<Resampling, int>, std::int64_t> known;
     const auto [entry, isNew] = known.try_emplace({method, i}, 0);
     if (isNew) {
         long double total = 0;
         for (int k = -6; k < 6; ++k) total += KernelValue(method, (k + 0.5L) / 2);
-        const long double unit = std::ldexp(1.0L, Shift(method)) / total;
+        const long double unit = static_cast<long double>(Whole(method)) / total;
         entry->second = std::llround(KernelValue(method, (i + 0.5L) / 2) * unit);
     }
     return entry->second;
@@ -105,7 +128,7 @@ Fraction<P> WindowFraction(Resampling method, const Picture<T>& picture, std::ui
             positive.divisor += static_cast<Wide<P>>(weight);
         }
     }
-    const auto whole = static_cast<Wide<P>>(std::int64_t{1} << (2 * Shift(method)));
+    const auto whole = static_cast<Wide<P>>(Whole(method) * Whole(method));
     return all.divisor * 4 < whole ? positive : all;
 }
 

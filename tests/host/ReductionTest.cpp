@@ -6,23 +6,28 @@
 #include <array>
 #include <bit>
 #include <cstring>
-#include <random>
 #include <vector>
 
 #include "core/ElementTypes.h"
 #include "host/reduce/ReductionWindow.h"
+#include "tests/host/AnyPicture.h"
 #include "tests/host/NaiveReduction.h"
 
 namespace {
 
+using naive::AnyPicture;
+using naive::AnySample;
+using naive::MaskKind;
 using naive::Picture;
+using naive::Random;
+using naive::SameBits;
 using zelm::NoDataRule;
 using zmchost::Resampling;
 
 constexpr Resampling kAll[] = {Resampling::Nearest, Resampling::Average,  Resampling::Rms,
                                Resampling::Mode,    Resampling::Minimum,  Resampling::Maximum,
                                Resampling::Median,  Resampling::Bilinear, Resampling::Cubic,
-                               Resampling::Lanczos};
+                               Resampling::Lanczos, Resampling::Gauss,    Resampling::CubicSpline};
 
 template <class T>
 constexpr T kUntouched = T(77);
@@ -67,72 +72,6 @@ T ReduceOne(Resampling method, T a, T b, T c, T d) {
     return Reduce<T>(method, OneCell<T>({a, b}, {c, d}), {}).out[0];
 }
 
-using Random = std::mt19937_64;
-
-template <class T>
-T AnySample(Random& random, bool extreme) {
-    if constexpr (zelm::kIsComplex<T>) {
-        using P = decltype(T::re);
-        return {AnySample<P>(random, extreme), AnySample<P>(random, extreme)};
-    } else if constexpr (std::is_floating_point_v<T>) {
-        if (!extreme) return static_cast<T>(static_cast<int>(random() % 9) - 4);
-        return std::ldexp(static_cast<T>(static_cast<std::int64_t>(random())),
-                          static_cast<int>(random() % 30) - 60);
-    } else {
-        if (!extreme) return static_cast<T>(random() % 5);
-        const T ends[] = {std::numeric_limits<T>::min(), std::numeric_limits<T>::max(), T(0), T(1)};
-        return random() % 3 == 0 ? ends[random() % 4] : static_cast<T>(random());
-    }
-}
-
-template <class T>
-bool SameBits(const T& a, const T& b) {
-    return std::memcmp(&a, &b, sizeof(T)) == 0;
-}
-
-enum class MaskKind { None, Clear, Noise, Runs, Full };
-
-template <class T>
-Picture<T> AnyPicture(Random& random, std::uint32_t halo, std::uint32_t bands, std::uint32_t width,
-                      MaskKind kind, const std::vector<NoDataRule<T>>& rules, bool extreme) {
-    Picture<T> picture{bands, width, halo, {}, {}};
-    const std::uint32_t count = 2 + 2 * halo;
-    const std::uint32_t above =
-        random() % 3 == 0 ? static_cast<std::uint32_t>(random()) % (halo + 1) : 0;
-    const std::uint32_t below =
-        random() % 3 == 0 ? static_cast<std::uint32_t>(random()) % (halo + 1) : 0;
-    for (std::uint32_t r = 0; r < count; ++r) {
-        const bool outside = r < above || r >= count - below;
-        std::vector<T> row(outside ? 0 : std::size_t{width} * bands);
-        for (std::size_t i = 0; i < row.size(); ++i) {
-            const NoDataRule<T>& rule = rules[i % bands];
-            do row[i] = AnySample<T>(random, extreme);
-            while (rule.hasValue && row[i] == rule.value);
-        }
-        std::vector<unsigned char> mask(row.size());
-        std::size_t left = 0;
-        bool marked = false;
-        for (std::size_t i = 0; i < mask.size(); ++i) {
-            if (left-- == 0) {
-                left = random() % 150;
-                marked = random() % 2 == 0;
-            }
-            const bool on = kind == MaskKind::Full ||
-                            (kind == MaskKind::Noise && random() % 2 == 0) ||
-                            (kind == MaskKind::Runs && marked);
-            mask[i] = static_cast<unsigned char>((random() & 0xFE) | (on ? 1 : 0));
-            // What is marked must not matter, so it is anything, and often no number.
-            if (on) row[i] = AnySample<T>(random, true);
-            if constexpr (std::is_floating_point_v<T>) {
-                if (on) row[i] = std::numeric_limits<T>::quiet_NaN();
-            }
-        }
-        picture.rows.push_back(std::move(row));
-        if (kind != MaskKind::None) picture.masks.push_back(std::move(mask));
-    }
-    return picture;
-}
-
 // Integers: the result must be the one exact rounding, moved aside where the rule says.
 template <class T>
 void ExpectComputed(Resampling method, const Picture<T>& picture, std::uint32_t x,
@@ -166,7 +105,9 @@ void ExpectComputed(Resampling method, const Picture<T>& picture, std::uint32_t 
     } else {
         using P = decltype(T::re);
         const auto close = [&](P found, naive::Fraction<P> exact) {
-            ASSERT_NEAR(found, static_cast<double>(exact.dividend / exact.divisor), 1e-4);
+            // The parts of samples are whole numbers from -4 to 4.
+            ASSERT_NEAR(static_cast<double>(found - exact.dividend / exact.divisor), 0.0,
+                        8 * static_cast<double>(std::numeric_limits<P>::epsilon()));
         };
         close(result.re, naive::ExactPart<P>(method, picture, x, band, [](T v) { return v.re; }));
         close(result.im, naive::ExactPart<P>(method, picture, x, band, [](T v) { return v.im; }));
@@ -300,14 +241,14 @@ TEST(Reduction, WordsAndNamesAgree) {
     EXPECT_FALSE(zmchost::ParseResampling("bicubic"));
 }
 
-TEST(Reduction, ComplexTypesKnowFiveMethods) {
+TEST(Reduction, ComplexTypesKnowTheLinearMethodsAndNearest) {
     int supported = 0;
     for (const Resampling method : kAll) {
         supported += zmchost::SupportsElementType(method, zelm::PixelTypeCode::ComplexDouble);
         EXPECT_TRUE(zmchost::SupportsElementType(method, zelm::PixelTypeCode::UInt64));
         EXPECT_FALSE(zmchost::SupportsElementType(method, 7));
     }
-    EXPECT_EQ(supported, 5);
+    EXPECT_EQ(supported, 7);
 }
 
 TEST(Reduction, UnsupportedMethodWritesNothing) {
@@ -325,12 +266,36 @@ TEST(Reduction, WeightsAreThoseOfTheKernels) {
             EXPECT_EQ(Kernel::kWeights[i], naive::TapWeight(method, i)) << i;
             total += 2 * Kernel::kWeights[i];
         }
-        EXPECT_EQ(total, std::int64_t{1} << Kernel::kShift);
+        EXPECT_EQ(total, naive::Whole(method));
+        EXPECT_EQ(zmchost::kWholeWeight<Kernel>, total * total);
+        EXPECT_LE(total, std::int64_t{1} << Kernel::kShift);
         EXPECT_EQ(zmchost::ReductionHalo(method), Kernel::kReach - 1);
     };
     check(zmchost::BilinearKernel{}, Resampling::Bilinear);
     check(zmchost::CubicKernel{}, Resampling::Cubic);
     check(zmchost::LanczosKernel{}, Resampling::Lanczos);
+    check(zmchost::CubicSplineKernel{}, Resampling::CubicSpline);
+}
+
+// As GDAL places it: the taps of cell x are the columns 2x, 2x + 1 and 2x + 2.
+TEST(Reduction, GaussStandsAroundTheSecondSampleOfTheCell) {
+    Picture<short> picture{1, 6, 1, {}, {}};
+    picture.rows = {
+        {9, 9, 9, 9, 9, 9}, {160, 0, 0, 16, 0, 0}, {0, 0, 0, 0, 0, 0}, {0, 0, 0, 0, 0, 64}};
+    // Rows weigh 0 1 2 1, and the last cell has two columns of 1 2.
+    EXPECT_THAT(Reduce<short>(Resampling::Gauss, picture, {}).out,
+                ::testing::ElementsAre(10, 2, 11));
+    picture.rows[3].clear();
+    EXPECT_THAT(Reduce<short>(Resampling::Gauss, picture, {}).out,
+                ::testing::ElementsAre(13, 3, 0));
+}
+
+TEST(Reduction, SplineOfAnImpulseIsItsWeights) {
+    Picture<int> picture{1, 16, 3, {}, {}};
+    picture.rows.assign(8, std::vector<int>(16, 0));
+    picture.rows[3][7] = 768 * 768;
+    EXPECT_THAT(Reduce<int>(Resampling::CubicSpline, picture, {}).out,
+                ::testing::ElementsAre(0, 0, 235 * 27, 235 * 235, 235 * 121, 235, 0, 0));
 }
 
 TEST(Reduction, AverageRoundsHalfAwayFromZero) {
@@ -450,6 +415,9 @@ TEST(Reduction, OddLastColumnBelongsToNoCellButIsTapped) {
     // Weights 3 3 1 along the row.
     EXPECT_THAT(Reduce<unsigned char>(Resampling::Bilinear, tapped, {}).out,
                 ::testing::ElementsAre(10));
+    // 1 2 1.
+    EXPECT_THAT(Reduce<unsigned char>(Resampling::Gauss, tapped, {}).out,
+                ::testing::ElementsAre(18));
 }
 
 TEST(Reduction, NarrowLevelsGiveNothing) {

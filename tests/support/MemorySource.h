@@ -5,6 +5,7 @@
 #include <cstring>
 #include <functional>
 #include <map>
+#include <optional>
 #include <random>
 #include <span>
 #include <stdexcept>
@@ -48,6 +49,24 @@ public:
                     *to++ = pixels[(std::size_t{y} * props.samples + x) * props.bands + band];
     }
 
+    std::optional<std::uint32_t> AlphaBand(std::uint32_t band) const override {
+        const auto found = alphas.find(band);
+        return found == alphas.end() ? std::nullopt : std::optional(found->second);
+    }
+    bool HasMask(std::uint32_t band) const override { return masks.count(band) != 0; }
+    void ReadMask(const zmchost::Window& window, std::span<const std::uint32_t> bands,
+                  unsigned char* shown) override {
+        for (std::uint32_t y = window.y; y < window.y + window.height; ++y)
+            for (std::uint32_t x = window.x; x < window.x + window.width; ++x)
+                for (const std::uint32_t band : bands) *shown++ = Shown(x, y, band) ? 255 : 0;
+    }
+    bool Shown(std::uint32_t x, std::uint32_t y, std::uint32_t band) const {
+        const std::size_t pixel = std::size_t{y} * props.samples + x;
+        if (const auto mask = masks.find(band); mask != masks.end())
+            return mask->second[pixel] != 0;
+        return !(pixels[pixel * props.bands + alphas.at(band)] == T{});
+    }
+
     // Reproducible noise over a slope, so that neighbours differ and no value is special.
     void FillWithNoise(unsigned seed) {
         std::mt19937 random(seed);
@@ -58,6 +77,8 @@ public:
     zelm::RasterProps props;
     std::vector<T> pixels;
     std::map<std::uint32_t, zelm::PalettePtr> palettes;
+    std::map<std::uint32_t, std::uint32_t> alphas;              // of a band, its alpha band
+    std::map<std::uint32_t, std::vector<unsigned char>> masks;  // by pixel
     std::function<void(const zmchost::Window&)> beforeRead;
     std::uint64_t read = 0;  // pixels asked for so far
 

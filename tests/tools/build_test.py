@@ -1,4 +1,5 @@
 """Building: every type, every option, and what is kept beside the pixels."""
+import os
 import resource
 import signal
 
@@ -82,6 +83,15 @@ class Options(ToolTest):
             pairs = function(pixels[::2], pixels[1::2])
             np.testing.assert_array_equal(Pyramid(self.path("made.pyr")).read(1),
                                           function(pairs[:, ::2], pairs[:, 1::2]))
+
+    def test_methods_in_any_case_of_letters(self):
+        self.picture()
+        for word in ("MODE", "Mode", "mode"):
+            report = self.document("build", "picture.tif", "made.pyr", "--resampling", word,
+                                   "--ordering", "BLOCKED", "--overwrite")
+            self.assertEqual((report["resampling"], report["tileOrdering"]), ("mode", "Blocked"))
+            verified = self.document("verify", "made.pyr", "--resampling", word)
+            self.assertTrue(verified["good"])
 
     def test_orderings(self):
         pixels = self.picture()
@@ -205,6 +215,54 @@ class Beside(ToolTest):
         self.assertIn("made.pyr.aux.xml", self.files())
         self.good("build", "without.tif", "made.pyr", "--overwrite")
         self.assertNotIn("made.pyr.aux.xml", self.files())
+
+    def test_embedded_metadata_go_with_the_file(self):
+        geotiff(self.path("source.tif"), samples("Int16", 300, 400, 2), "Int16", nodata=-5)
+        dataset = gdal.Open(self.path("source.tif"), gdal.GA_Update)
+        dataset.SetGeoTransform([500000, 30, 0, 4000000, 0, -30])
+        dataset.GetRasterBand(2).SetDescription("infrared")
+        dataset = None
+        self.good("build", "source.tif", "plain.pyr", "--bands", "2")
+        for words in (["made.pyr"], ["plain.pyr", "--overwrite"]):
+            report = self.document("build", "source.tif", *words, "--bands", "2", "--nodata", "-6",
+                                   "--embed")
+            self.assertEqual(report["bytes"], os.path.getsize(self.path(words[0])))
+        self.assertEqual(self.files(), ["made.pyr", "plain.pyr", "source.tif"])
+        os.mkdir(self.path("far"))
+        os.rename(self.path("made.pyr"), self.path("far/moved.pyr"))
+        info = self.document("info", "far/moved.pyr")
+        self.assertEqual((info["geoTransform"], info["noData"]),
+                         ([500000, 30, 0, 4000000, 0, -30], [-6]))
+        self.good("verify", "far/moved.pyr")
+        self.good("export", "far/moved.pyr", "back.tif")
+        back = gdal.Open(self.path("back.tif"))
+        self.assertEqual(back.GetRasterBand(1).GetDescription(), "infrared")
+
+    def test_verify_takes_no_data_values_out_of_the_file(self):
+        pixels = samples("Byte", 300, 400, 1)
+        pixels[:, :200] = 7
+        geotiff(self.path("source.tif"), pixels, nodata=7)
+        self.good("build", "source.tif", "made.pyr", "--embed")
+        self.good("verify", "made.pyr")
+        self.good("build", "source.tif", "made.pyr", "--overwrite")
+        os.remove(self.path("made.pyr.aux.xml"))
+        self.assertEqual(self.run_tool("verify", "made.pyr").returncode, 3)
+
+    def test_a_disk_that_does_not_take_embedded_metadata_leaves_nothing(self):
+        def limit():
+            signal.signal(signal.SIGXFSZ, signal.SIG_IGN)
+            resource.setrlimit(resource.RLIMIT_FSIZE, (1024000, 1024000))
+
+        self.picture("source.tif", 20, 20, 1)
+        dataset = gdal.Open(self.path("source.tif"), gdal.GA_Update)
+        dataset.SetMetadata({"LONG": "x" * 1500000})
+        dataset = None
+        before = self.files()
+        done = self.run_tool("build", "source.tif", "made.pyr", "--embed", preexec_fn=limit)
+        self.assertEqual((done.returncode, done.stdout), (1, ""), done)
+        self.assertRegex(done.stderr, r"^zmcraster: made\.pyr: cannot keep its metadata in the file: "
+                                      r"File too large\n$")
+        self.assertEqual(self.files(), before)
 
     def test_a_sidecar_that_is_cut_off_leaves_what_was_there(self):
         def limit():

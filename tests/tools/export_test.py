@@ -1,5 +1,6 @@
 """Exports, read back through GDAL."""
 import os
+
 import numpy as np
 from osgeo import gdal
 
@@ -36,6 +37,50 @@ class Export(ToolTest):
         self.assertEqual(gdal.Open(self.path("part.tif")).GetMetadata("IMAGE_STRUCTURE")
                          ["COMPRESSION"], "DEFLATE")
 
+    def georeferenced(self, width, height, points=()):
+        geotiff(self.path("picture.tif"), samples("Int16", height, width, 1), "Int16", nodata=7)
+        dataset = gdal.Open(self.path("picture.tif"), gdal.GA_Update)
+        if points:
+            dataset.SetGCPs(points, "")
+        else:
+            dataset.SetGeoTransform([1000, 300.0379, 0.25, 2000, -0.5, -299.9])
+        dataset = None
+        self.good("build", "picture.tif", "picture.pyr", "--levels", "3")
+
+    def test_pixels_of_a_level_have_the_size_that_they_cover(self):
+        for width, height in ((1023, 1021), (1024, 1016), (1024, 1017)):
+            self.georeferenced(width, height)
+            for level in (1, 2, 3):
+                with self.subTest(width=width, height=height, level=level):
+                    self.good("export", "picture.pyr", "out.tif", "--level", level)
+                    dataset = gdal.Open(self.path("out.tif"))
+                    size = 2 ** level
+                    np.testing.assert_allclose(
+                        dataset.GetGeoTransform(),
+                        [1000, size * 300.0379, size * 0.25, 2000, size * -0.5, size * -299.9],
+                        rtol=1e-15)
+                    self.assertEqual(dataset.GetRasterBand(1).GetNoDataValue(), 7)
+                    np.testing.assert_array_equal(dataset.ReadAsArray(),
+                                                  Pyramid(self.path("picture.pyr")).read(level)
+                                                  [:, :, 0])
+            os.remove(self.path("picture.pyr"))
+
+    def test_windows_of_a_level_stand_where_their_pixels_are(self):
+        self.georeferenced(1023, 1021)
+        self.good("export", "picture.pyr", "out.tif", "--level", "2", "--window", "30,20,100,50")
+        transform = gdal.Open(self.path("out.tif")).GetGeoTransform()
+        np.testing.assert_allclose(
+            transform, [1000 + 120 * 300.0379 + 80 * 0.25, 4 * 300.0379, 1,
+                        2000 - 120 * 0.5 - 80 * 299.9, -2, 4 * -299.9], rtol=1e-14)
+
+    def test_control_points_of_a_level(self):
+        points = [gdal.GCP(x, y, 0, x / 10, y / 10) for x, y in ((0, 0), (999, 8), (80, 1001))]
+        self.georeferenced(1023, 1021, points)
+        self.good("export", "picture.pyr", "out.tif", "--level", "3")
+        found = gdal.Open(self.path("out.tif")).GetGCPs()
+        self.assertEqual([(p.GCPPixel, p.GCPLine) for p in found],
+                         [(p.GCPPixel / 8, p.GCPLine / 8) for p in points])
+
     def test_the_format_is_taken_before_the_ending(self):
         self.pyramid()
         self.good("export", "picture.pyr", "picture.dat", "--format", "GTiff", "--co=TILED=YES")
@@ -59,6 +104,12 @@ class Export(ToolTest):
             del back
             for name in ("back.tif", "back.tif.msk"):
                 os.remove(self.path(name))
+
+    def test_the_format_is_told_as_gdals_own_programs_tell_it(self):
+        self.pyramid()
+        for words in (["-of", "GTiff"], ["--of", "GTiff"], ["--of=GTiff"]):
+            self.good("export", "picture.pyr", "picture.dat", *words)
+            self.assertEqual(gdal.Open(self.path("picture.dat")).GetDriver().ShortName, "GTiff")
 
     def test_an_old_target_is_replaced(self):
         self.pyramid()

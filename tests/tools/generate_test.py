@@ -18,6 +18,19 @@ class Generate(ToolTest):
             for option in self.options(command):
                 self.assertIn(option.replace("-", "\\-"), page)
 
+    def test_arguments_come_first_and_in_the_order_in_which_they_are_given(self):
+        page = self.good("generate", "man")
+        for command, names in (("build", ["SOURCE", "TARGET"]), ("export", ["FILE", "TARGET"]),
+                               ("compare", ["A", "B"]), ("info", ["FILE"]), ("hash", ["FILE..."])):
+            usage, rest = self.good(command, "--help").split("\n\nPositionals:\n")
+            self.assertTrue(usage.endswith(" ".join(["[OPTIONS]"] + names)), usage)
+            bare = [name.rstrip(".") for name in names]
+            self.assertEqual(re.findall(r"^  ([A-Z]+) ", rest.split("\n\n")[0], re.M), bare)
+            section = page.split(f"\n.SS {command} ")[1].split("\n.SS ")[0]
+            self.assertEqual(section.split("\n")[0], " ".join(names))
+            listed = re.findall(r"^\.B (\S+)", section, re.M)
+            self.assertEqual(listed[:len(names)], bare)
+
     def test_the_man_page_is_sound(self):
         with open(self.path("zmcraster.1"), "w") as file:
             file.write(self.good("generate", "man"))

@@ -1,5 +1,6 @@
 """The hash of samples, against hashlib."""
 import hashlib
+import json
 
 from frame import COUNT, TYPES, ToolTest, geotiff, samples
 from pyramid import Pyramid
@@ -44,6 +45,39 @@ class Hash(ToolTest):
         geotiff(self.path("source.tif"), pixels, "Double")
         digest = hashlib.sha256(pixels.tobytes()).hexdigest()
         self.assertEqual(self.good("hash", "source.tif"), f"{digest}  source.tif\n")
+
+    def test_many_files(self):
+        digests = {}
+        for number, name in enumerate(("a.tif", "b.tif", "c.tif")):
+            digests[name] = hashlib.sha256(self.picture(name, 20, 30, seed=number)).hexdigest()
+        self.assertEqual(len(set(digests.values())), 3)
+        lines = "".join(f"{digests[name]}  {name}\n" for name in ("c.tif", "a.tif", "b.tif"))
+        self.assertEqual(self.good("hash", "c.tif", "a.tif", "--level", 0, "b.tif"), lines)
+        document = self.document("hash", "c.tif", "a.tif", "--bands", "2")
+        self.assertEqual(list(document), ["schema", "files"])
+        for name, told in zip(("c.tif", "a.tif"), document["files"], strict=True):
+            alone = self.document("hash", name, "--bands", "2")
+            del alone["schema"]
+            self.assertEqual(told, alone)
+
+    def test_a_file_that_fails_does_not_keep_the_others_from_theirs(self):
+        digest = hashlib.sha256(self.picture("a.tif", 20, 30)).hexdigest()
+        self.picture("small.tif", 2, 2)
+        done = self.run_tool("hash", "nonesuch", "a.tif", "small.tif", "--window", "0,0,30,20")
+        self.assertEqual(done.stdout, f"{digest}  a.tif\n")
+        self.assertEqual(done.stderr,
+                         "zmcraster: nonesuch: there is no such file\n"
+                         "zmcraster: small.tif: --window: 0,0,30,20 is not inside the level, "
+                         "which has 2 x 2 pixels\n")
+        self.assertEqual(done.returncode, 1)
+        done = self.run_tool("hash", "small.tif", "a.tif", "nonesuch", "--window", "0,0,30,20",
+                             "--json")
+        self.assertEqual((done.returncode, done.stderr.count("\n")), (2, 2))
+        files = json.loads(done.stdout)["files"]
+        self.assertEqual(files[1]["sha256"], digest)
+        self.assertEqual(files[2], {"file": "nonesuch",
+                                    "error": "nonesuch: there is no such file"})
+        self.assertEqual(list(files[0]), ["file", "error"])
 
     def test_an_incomplete_file_has_hashes_of_what_is_there(self):
         self.pyramid()

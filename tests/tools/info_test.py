@@ -5,6 +5,7 @@ import subprocess
 import unittest
 
 import numpy as np
+from osgeo import gdal, osr
 
 from frame import COUNT, REAL, TOOL, ToolTest, geotiff, samples
 from pyramid import Pyramid
@@ -22,6 +23,8 @@ SHAPE = {
     "histograms": [{"band": int, "level": int, "binCount": int, "binSize": REAL, "minimum": REAL,
                     "maximum": REAL, "counts": [COUNT]}],
     "palettes": [{"band": int, "colors": [[int]]}],
+    "crs": ({"name": str, "authority": (str, None), "wkt": str}, None),
+    "geoTransform": ([REAL], None), "noData": ([OPTIONAL], None),
 }
 
 
@@ -50,6 +53,56 @@ class Info(ToolTest):
         for band, record in enumerate(info["histograms"]):
             counts = np.bincount(pixels[:, :, band].ravel(), minlength=256)
             self.assertEqual(record["counts"], counts.tolist())
+
+    def test_the_place_on_earth_and_no_data(self):
+        geotiff(self.path("source.tif"), samples("Int16", 20, 30, 2), "Int16", nodata=-7)
+        source = gdal.Open(self.path("source.tif"), gdal.GA_Update)
+        system = osr.SpatialReference()
+        system.ImportFromEPSG(32633)
+        source.SetSpatialRef(system)
+        source.SetGeoTransform((500000, 10, 0, 4600000, 0, -10.5))
+        del source
+        self.good("build", "source.tif", "made.pyr")
+        info = self.document("info", "made.pyr")
+        self.assertShape(info, SHAPE)
+        self.assertEqual((info["crs"]["name"], info["crs"]["authority"]),
+                         ("WGS 84 / UTM zone 33N", "EPSG:32633"))
+        self.assertTrue(osr.SpatialReference(info["crs"]["wkt"]).IsSame(system))
+        self.assertEqual(info["geoTransform"], [500000, 10, 0, 4600000, 0, -10.5])
+        self.assertEqual(info["noData"], [-7, -7])
+        self.assertIn("\ncoordinate system WGS 84 / UTM zone 33N, EPSG:32633\n"
+                      "upper left corner 500000, 4600000; pixels of 10 x -10.5\n"
+                      "no-data value -7\n", self.good("info", "made.pyr"))
+        os.remove(self.path("made.pyr.aux.xml"))
+        info = self.document("info", "made.pyr")
+        self.assertEqual((info["crs"], info["geoTransform"], info["noData"]), (None, None, None))
+
+    def test_a_place_that_is_turned_and_no_data_of_some_bands(self):
+        geotiff(self.path("source.tif"), samples("Double", 20, 30, 3), "Double")
+        self.good("build", "source.tif", "made.pyr")
+        with open(self.path("made.pyr.aux.xml"), "w") as file:
+            file.write('<PAMDataset><SRS>LOCAL_CS["a\x7fb"]</SRS><GeoTransform>1,2,3,4,5,6'
+                       '</GeoTransform><PAMRasterBand band="2"><NoDataValue>nan</NoDataValue>'
+                       '</PAMRasterBand></PAMDataset>')
+        self.assertIn("\ncoordinate system a\\x7fb\ngeotransform 1, 2, 3, 4, 5, 6\n"
+                      "no-data values of the bands none, NaN, none\n",
+                      self.good("info", "made.pyr"))
+        self.assertEqual(self.document("info", "made.pyr")["noData"], [None, "NaN", None])
+
+    def test_integers_of_64_bits_that_mean_no_data(self):
+        geotiff(self.path("source.tif"), samples("Int64", 20, 30, 1), "Int64")
+        self.good("build", "source.tif", "made.pyr")
+        with open(self.path("made.pyr.aux.xml"), "w") as file:
+            file.write('<PAMDataset><PAMRasterBand band="1"><NoDataValue>-9223372036854775807'
+                       '</NoDataValue></PAMRasterBand></PAMDataset>')
+        self.assertEqual(self.document("info", "made.pyr")["noData"], ["-9223372036854775807"])
+
+    def test_a_sidecar_that_is_no_xml(self):
+        self.pyramid()
+        with open(self.path("picture.pyr.aux.xml"), "w") as file:
+            file.write("<PAMDataset><SRS>")
+        info = self.document("info", "picture.pyr")
+        self.assertEqual((info["crs"], len(info["statistics"])), (None, 3))
 
     def test_records_behind_those_of_as_many_bands_as_there_are(self):
         """As GDAL's users leave them who ask for the statistics of the first band again."""

@@ -39,7 +39,28 @@ class Help(ToolTest):
 class Usage(ToolTest):
     def test_the_command(self):
         self.refused(2, "A subcommand is required; see zmcraster --help")
-        self.refused(2, "bild: there is no such command; see zmcraster --help", "bild")
+        self.refused(2, "stretch: there is no such command; see zmcraster --help", "stretch")
+
+    def test_words_that_are_nearly_right(self):
+        for word, meant in (("bild", "build"), ("verfiy", "verify"), ("Info", "info")):
+            self.refused(2, f"{word}: there is no such command (did you mean {meant}?); see "
+                            "zmcraster --help", word)
+        for word, meant in (("--jsn", "--json"), ("-json", "--json"), ("--quite", "--quiet")):
+            self.refused(2, f"The following argument was not expected: {word} (did you mean "
+                            f"{meant}?); see zmcraster info --help", "info", "a.pyr", word)
+        self.refused(2, "The following arguments were not expected: --level=2 --ordring x (did you "
+                        "mean --levels?); see zmcraster build --help", "build", "a.tif", "b.pyr",
+                     "--level=2", "--ordring", "x")
+        self.refused(2, "The following argument was not expected: --limt=bands=2 (did you mean "
+                        "--limit?); see zmcraster info --help", "--limt=bands=2", "info", "a.pyr")
+        for word in ("--palette", "-z", "-", "--", "---", "--="):
+            done = self.run_tool("info", "a.pyr", word)
+            self.assertNotIn("did you mean", done.stderr)
+            self.assertEqual(done.stderr.count("\n"), 1)
+
+    def test_words_that_nothing_takes_are_told_in_their_order(self):
+        self.refused(2, "The following arguments were not expected: c d e; see zmcraster build "
+                        "--help", "build", "a", "b", "c", "d", "e")
 
     def test_arguments_of_every_command(self):
         for command in COMMANDS:
@@ -66,7 +87,7 @@ class Usage(ToolTest):
     def test_options_of_build(self):
         self.picture()
         tail = "; see zmcraster build --help"
-        methods = "nearest,average,rms,mode,minimum,maximum,median,bilinear,cubic,lanczos"
+        methods = "nearest,average,rms,mode,minimum,maximum,median,bilinear,cubic,lanczos,gauss,cubicspline"
         for option, value, message in (
                 ("--levels", "z", '--levels: "z" is no whole number'),
                 ("--levels", "32", "--levels: 32 is more than 31"),
@@ -78,6 +99,7 @@ class Usage(ToolTest):
                 ("--nodata", "1.5", "--nodata: no sample of type Byte can be 1.5"),
                 ("--bands", "4", "--bands: there is no band 4: the raster has the bands 1 to 3"),
                 ("--bands", "0", "--bands: there is no band 0: the raster has the bands 1 to 3"),
+                ("--bands", "", "--bands: an empty list names no band" + tail),
                 ("--bands", "a", '--bands: "a" is no list such as 3,2,1'),
                 ("--bins", "0", "--bins: a histogram has one bin at least"),
                 ("--threads", "-2", '--threads: "-2" is no whole number'),
@@ -97,6 +119,14 @@ class Usage(ToolTest):
                          "1,2,3")
         self.refused(2, "--tolerance: -1 is below 0", "compare", "picture.pyr", "picture.tif",
                      "--tolerance", "-1")
+        self.assertEqual(self.files(), ["picture.pyr", "picture.tif"])
+
+    def test_empty_lists_of_bands(self):
+        self.pyramid()
+        for command, *names in (("hash", "picture.pyr"), ("verify", "picture.pyr"),
+                                ("export", "picture.pyr", "x.tif")):
+            self.refused(2, "--bands: an empty list names no band; see zmcraster "
+                            f"{command} --help", command, *names, "--bands", "")
         self.assertEqual(self.files(), ["picture.pyr", "picture.tif"])
 
     def test_a_method_that_complex_numbers_do_not_have(self):

@@ -39,7 +39,7 @@ class Verify(ToolTest):
     def test_every_method_is_made_again(self):
         geotiff(self.path("source.tif"), samples("Int16", 1100, 700, 2), "Int16", nodata=77)
         for method in ("nearest", "average", "rms", "mode", "minimum", "maximum", "median",
-                       "bilinear", "cubic", "lanczos"):
+                       "bilinear", "cubic", "lanczos", "gauss", "cubicspline"):
             with self.subTest(method):
                 self.good("build", "source.tif", "made.pyr", "--resampling", method, "--overwrite")
                 self.results("made.pyr", "--resampling", method)

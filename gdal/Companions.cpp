@@ -1,0 +1,278 @@
+#include "gdal/Companions.h"
+
+#include <utility>
+
+#include "gdal/Reporting.h"
+
+namespace zmcgdal {
+
+// What it looks at asks this dataset again.
+void CompanionDataset::Load() const {
+    if (!waiting) return;
+    const std::function<void()> look = std::exchange(waiting, nullptr);
+    Reported([&] { look(); });
+}
+
+void CompanionBand::Load() const {
+    if (poDS) static_cast<CompanionDataset*>(poDS)->Load();
+}
+
+const OGRSpatialReference* CompanionDataset::GetSpatialRef() const {
+    Load();
+    return GDALPamDataset::GetSpatialRef();
+}
+
+CPLErr CompanionDataset::SetSpatialRef(const OGRSpatialReference* reference) {
+    Load();
+    return GDALPamDataset::SetSpatialRef(reference);
+}
+
+CPLErr CompanionDataset::GetGeoTransform(double* transform) {
+    Load();
+    return GDALPamDataset::GetGeoTransform(transform);
+}
+
+CPLErr CompanionDataset::SetGeoTransform(double* transform) {
+    Load();
+    return GDALPamDataset::SetGeoTransform(transform);
+}
+
+int CompanionDataset::GetGCPCount() {
+    Load();
+    return GDALPamDataset::GetGCPCount();
+}
+
+const OGRSpatialReference* CompanionDataset::GetGCPSpatialRef() const {
+    Load();
+    return GDALPamDataset::GetGCPSpatialRef();
+}
+
+const GDAL_GCP* CompanionDataset::GetGCPs() {
+    Load();
+    return GDALPamDataset::GetGCPs();
+}
+
+CPLErr CompanionDataset::SetGCPs(int count, const GDAL_GCP* points,
+                                 const OGRSpatialReference* reference) {
+    Load();
+    return GDALPamDataset::SetGCPs(count, points, reference);
+}
+
+char** CompanionDataset::GetMetadataDomainList() {
+    Load();
+    return GDALPamDataset::GetMetadataDomainList();
+}
+
+CPLErr CompanionDataset::SetMetadata(char** items, const char* domain) {
+    Load();
+    return GDALPamDataset::SetMetadata(items, domain);
+}
+
+CPLErr CompanionDataset::SetMetadataItem(const char* name, const char* value, const char* domain) {
+    Load();
+    return GDALPamDataset::SetMetadataItem(name, value, domain);
+}
+
+char** CompanionDataset::GetMetadata(const char* domain) {
+    Load();
+    return GDALPamDataset::GetMetadata(domain);
+}
+
+const char* CompanionDataset::GetMetadataItem(const char* name, const char* domain) {
+    Load();
+    return GDALPamDataset::GetMetadataItem(name, domain);
+}
+
+char** CompanionDataset::GetFileList() {
+    Load();
+    return GDALPamDataset::GetFileList();
+}
+
+void CompanionDataset::ClearStatistics() {
+    Load();
+    return GDALPamDataset::ClearStatistics();
+}
+
+const char* CompanionBand::GetDescription() const {
+    Load();
+    return GDALPamRasterBand::GetDescription();
+}
+
+void CompanionBand::SetDescription(const char* text) {
+    Load();
+    return GDALPamRasterBand::SetDescription(text);
+}
+
+CPLErr CompanionBand::SetNoDataValue(double value) {
+    Load();
+    return GDALPamRasterBand::SetNoDataValue(value);
+}
+
+CPLErr CompanionBand::SetNoDataValueAsInt64(std::int64_t value) {
+    Load();
+    return GDALPamRasterBand::SetNoDataValueAsInt64(value);
+}
+
+CPLErr CompanionBand::SetNoDataValueAsUInt64(std::uint64_t value) {
+    Load();
+    return GDALPamRasterBand::SetNoDataValueAsUInt64(value);
+}
+
+double CompanionBand::GetNoDataValue(int* success) {
+    Load();
+    return GDALPamRasterBand::GetNoDataValue(success);
+}
+
+std::int64_t CompanionBand::GetNoDataValueAsInt64(int* success) {
+    Load();
+    return GDALPamRasterBand::GetNoDataValueAsInt64(success);
+}
+
+std::uint64_t CompanionBand::GetNoDataValueAsUInt64(int* success) {
+    Load();
+    return GDALPamRasterBand::GetNoDataValueAsUInt64(success);
+}
+
+CPLErr CompanionBand::DeleteNoDataValue() {
+    Load();
+    return GDALPamRasterBand::DeleteNoDataValue();
+}
+
+CPLErr CompanionBand::SetColorTable(GDALColorTable* table) {
+    Load();
+    return GDALPamRasterBand::SetColorTable(table);
+}
+
+GDALColorTable* CompanionBand::GetColorTable() {
+    Load();
+    return GDALPamRasterBand::GetColorTable();
+}
+
+CPLErr CompanionBand::SetColorInterpretation(GDALColorInterp interpretation) {
+    Load();
+    return GDALPamRasterBand::SetColorInterpretation(interpretation);
+}
+
+GDALColorInterp CompanionBand::GetColorInterpretation() {
+    Load();
+    return GDALPamRasterBand::GetColorInterpretation();
+}
+
+const char* CompanionBand::GetUnitType() {
+    Load();
+    return GDALPamRasterBand::GetUnitType();
+}
+
+CPLErr CompanionBand::SetUnitType(const char* unit) {
+    Load();
+    return GDALPamRasterBand::SetUnitType(unit);
+}
+
+char** CompanionBand::GetCategoryNames() {
+    Load();
+    return GDALPamRasterBand::GetCategoryNames();
+}
+
+CPLErr CompanionBand::SetCategoryNames(char** names) {
+    Load();
+    return GDALPamRasterBand::SetCategoryNames(names);
+}
+
+double CompanionBand::GetOffset(int* success) {
+    Load();
+    return GDALPamRasterBand::GetOffset(success);
+}
+
+CPLErr CompanionBand::SetOffset(double offset) {
+    Load();
+    return GDALPamRasterBand::SetOffset(offset);
+}
+
+double CompanionBand::GetScale(int* success) {
+    Load();
+    return GDALPamRasterBand::GetScale(success);
+}
+
+CPLErr CompanionBand::SetScale(double scale) {
+    Load();
+    return GDALPamRasterBand::SetScale(scale);
+}
+
+char** CompanionBand::GetMetadataDomainList() {
+    Load();
+    return GDALPamRasterBand::GetMetadataDomainList();
+}
+
+CPLErr CompanionBand::SetMetadata(char** items, const char* domain) {
+    Load();
+    return GDALPamRasterBand::SetMetadata(items, domain);
+}
+
+CPLErr CompanionBand::SetMetadataItem(const char* name, const char* value, const char* domain) {
+    Load();
+    return GDALPamRasterBand::SetMetadataItem(name, value, domain);
+}
+
+char** CompanionBand::GetMetadata(const char* domain) {
+    Load();
+    return GDALPamRasterBand::GetMetadata(domain);
+}
+
+const char* CompanionBand::GetMetadataItem(const char* name, const char* domain) {
+    Load();
+    return GDALPamRasterBand::GetMetadataItem(name, domain);
+}
+
+CPLErr CompanionBand::GetHistogram(double lower, double upper, int buckets, GUIntBig* counts,
+                                   int includeOutside, int approximate, GDALProgressFunc progress,
+                                   void* progressData) {
+    Load();
+    return GDALPamRasterBand::GetHistogram(lower, upper, buckets, counts, includeOutside,
+                                           approximate, progress, progressData);
+}
+
+CPLErr CompanionBand::GetDefaultHistogram(double* lower, double* upper, int* buckets,
+                                          GUIntBig** counts, int force, GDALProgressFunc progress,
+                                          void* progressData) {
+    Load();
+    return GDALPamRasterBand::GetDefaultHistogram(lower, upper, buckets, counts, force, progress,
+                                                  progressData);
+}
+
+CPLErr CompanionBand::SetDefaultHistogram(double lower, double upper, int buckets,
+                                          GUIntBig* counts) {
+    Load();
+    return GDALPamRasterBand::SetDefaultHistogram(lower, upper, buckets, counts);
+}
+
+GDALRasterAttributeTable* CompanionBand::GetDefaultRAT() {
+    Load();
+    return GDALPamRasterBand::GetDefaultRAT();
+}
+
+CPLErr CompanionBand::SetDefaultRAT(const GDALRasterAttributeTable* table) {
+    Load();
+    return GDALPamRasterBand::SetDefaultRAT(table);
+}
+
+GDALRasterBand* CompanionBand::GetMaskBand() {
+    Load();
+    return GDALPamRasterBand::GetMaskBand();
+}
+
+int CompanionBand::GetMaskFlags() {
+    Load();
+    return GDALPamRasterBand::GetMaskFlags();
+}
+
+int CompanionBand::GetOverviewCount() {
+    Load();
+    return GDALPamRasterBand::GetOverviewCount();
+}
+
+GDALRasterBand* CompanionBand::GetOverview(int number) {
+    Load();
+    return GDALPamRasterBand::GetOverview(number);
+}
+
+}  // namespace zmcgdal

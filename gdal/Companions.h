@@ -1,0 +1,97 @@
+// CompanionDataset, CompanionBand: GDAL's datasets and bands with a sidecar, which is looked for at
+// once, or when something is first asked for that it may tell.
+//
+// Behind a network every companion that is looked for costs requests, where most readers want the
+// pixels alone. Everything that GDAL answers from the sidecar, or keeps there, passes through here
+// first, so that nobody sees a dataset without it.
+#ifndef ZMC_GDAL_COMPANIONS_H
+#define ZMC_GDAL_COMPANIONS_H
+
+#include <gdal_pam.h>
+
+#include <cstdint>
+#include <functional>
+#include <utility>
+
+namespace zmcgdal {
+
+class CompanionDataset : public GDALPamDataset {
+public:
+    // Does what was put off. What it throws goes to GDAL as a failure.
+    void Load() const;
+
+    using GDALDataset::SetGCPs;
+    const OGRSpatialReference* GetSpatialRef() const override;
+    CPLErr SetSpatialRef(const OGRSpatialReference* reference) override;
+    CPLErr GetGeoTransform(double* transform) override;
+    CPLErr SetGeoTransform(double* transform) override;
+    int GetGCPCount() override;
+    const OGRSpatialReference* GetGCPSpatialRef() const override;
+    const GDAL_GCP* GetGCPs() override;
+    CPLErr SetGCPs(int count, const GDAL_GCP* points,
+                   const OGRSpatialReference* reference) override;
+    char** GetMetadataDomainList() override;
+    CPLErr SetMetadata(char** items, const char* domain = "") override;
+    CPLErr SetMetadataItem(const char* name, const char* value, const char* domain = "") override;
+    char** GetMetadata(const char* domain = "") override;
+    const char* GetMetadataItem(const char* name, const char* domain = "") override;
+    char** GetFileList() override;
+    void ClearStatistics() override;
+
+protected:
+    // `look` is called by the first Load.
+    void PutOff(std::function<void()> look) { waiting = std::move(look); }
+
+private:
+    mutable std::function<void()> waiting;  // empty once it was done
+};
+
+// A band of a CompanionDataset.
+class CompanionBand : public GDALPamRasterBand {
+public:
+    const char* GetDescription() const override;
+    void SetDescription(const char* text) override;
+    CPLErr SetNoDataValue(double value) override;
+    CPLErr SetNoDataValueAsInt64(std::int64_t value) override;
+    CPLErr SetNoDataValueAsUInt64(std::uint64_t value) override;
+    double GetNoDataValue(int* success = nullptr) override;
+    std::int64_t GetNoDataValueAsInt64(int* success = nullptr) override;
+    std::uint64_t GetNoDataValueAsUInt64(int* success = nullptr) override;
+    CPLErr DeleteNoDataValue() override;
+    CPLErr SetColorTable(GDALColorTable* table) override;
+    GDALColorTable* GetColorTable() override;
+    CPLErr SetColorInterpretation(GDALColorInterp interpretation) override;
+    GDALColorInterp GetColorInterpretation() override;
+    const char* GetUnitType() override;
+    CPLErr SetUnitType(const char* unit) override;
+    char** GetCategoryNames() override;
+    CPLErr SetCategoryNames(char** names) override;
+    double GetOffset(int* success = nullptr) override;
+    CPLErr SetOffset(double offset) override;
+    double GetScale(int* success = nullptr) override;
+    CPLErr SetScale(double scale) override;
+    char** GetMetadataDomainList() override;
+    CPLErr SetMetadata(char** items, const char* domain = "") override;
+    CPLErr SetMetadataItem(const char* name, const char* value, const char* domain = "") override;
+    char** GetMetadata(const char* domain = "") override;
+    const char* GetMetadataItem(const char* name, const char* domain = "") override;
+    CPLErr GetHistogram(double lower, double upper, int buckets, GUIntBig* counts,
+                        int includeOutside, int approximate, GDALProgressFunc progress,
+                        void* progressData) override;
+    CPLErr GetDefaultHistogram(double* lower, double* upper, int* buckets, GUIntBig** counts,
+                               int force, GDALProgressFunc progress, void* progressData) override;
+    CPLErr SetDefaultHistogram(double lower, double upper, int buckets, GUIntBig* counts) override;
+    GDALRasterAttributeTable* GetDefaultRAT() override;
+    CPLErr SetDefaultRAT(const GDALRasterAttributeTable* table) override;
+    GDALRasterBand* GetMaskBand() override;
+    int GetMaskFlags() override;
+    int GetOverviewCount() override;
+    GDALRasterBand* GetOverview(int number) override;
+
+private:
+    void Load() const;
+};
+
+}  // namespace zmcgdal
+
+#endif
