@@ -32,10 +32,10 @@ TEST(HardeningCommandLine, EverySourceThatIsShippedHasTheFlags) {
         const std::filesystem::path file(entry.at("file").get<std::string>());
         const std::string folder = file.lexically_relative(ZMC_SOURCE_DIR).begin()->string();
         if (!shippedFolders.contains(folder)) continue;
-        // What a test program compiles for itself is not shipped.
-        if (entry.at("output").get<std::string>().starts_with("tests/")) continue;
-        seen.insert(folder);
         const auto command = entry.at("command").get<std::string>();
+        // What a test program compiles for itself is not shipped.
+        if (command.find(" -o tests/") != std::string::npos) continue;
+        seen.insert(folder);
         for (const char* flag :
              {" -D_FORTIFY_SOURCE=3", " -fstack-protector-strong", " -fstack-clash-protection",
               " -D_GLIBCXX_ASSERTIONS", " -fcf-protection=full", " -O3"})
