@@ -437,13 +437,13 @@ void Dataset::ClearStatistics() {
 
 bool Dataset::MayHaveMasks() {
     Load();
-    return main || oOvManager.HaveMaskFile() || GDALPamDataset::GetMetadataItem("NODATA_VALUES");
+    return main || oOvManager.HaveMaskFile() || CompanionDataset::GetMetadataItem("NODATA_VALUES");
 }
 
 // GDAL takes what it is given last, so the sidecar is read once more, behind the items of the file.
 // A sidecar that was made of them has all of them that are still wanted.
 void Dataset::TakeEmbedded(char** siblings) {
-    if (GDALPamDataset::GetMetadataItem(kEmbeddedItem, kEmbeddedDomain)) return;
+    if (CompanionDataset::GetMetadataItem(kEmbeddedItem, kEmbeddedDomain)) return;
     const std::string items =
         zmchost::ReadEmbeddedItems(*file->source, file->raster.Name(), file->info.header);
     if (items.empty()) return;

@@ -48,30 +48,17 @@ bool IsHttp(std::string_view url) {
     return url.starts_with("http://") || url.starts_with("https://");
 }
 
-// What the server of a network says of a file now. It is asked anew each time.
-struct Told {
-    std::string tag;
-    std::string date;
-    std::string size;
-
-    bool Differs(const Told& other) const {
-        const auto differ = [](const std::string& a, const std::string& b) {
-            return !a.empty() && !b.empty() && a != b;
-        };
-        return differ(tag, other.tag) || differ(date, other.date) || differ(size, other.size);
-    }
-};
-
 std::string Item(const CPLStringList& headers, const char* name) {
     const char* const value = headers.FetchNameValue(name);
     return value ? value : "";
 }
 
-Told AskServer(const std::string& watched) {
+// It is asked anew each time.
+ServerState AskServer(const std::string& watched) {
     const CPLErrorStateBackuper before;
     const ErrorCatcher quiet(CE_Failure);
     const CPLStringList headers(VSIGetFileMetadata(watched.c_str(), "HEADERS", nullptr));
-    return {Item(headers, "ETag"), Item(headers, "Last-Modified"), Item(headers, "Content-Length")};
+    return {Item(headers, "Content-Length"), Item(headers, "ETag"), Item(headers, "Last-Modified")};
 }
 
 class VsiFetcher final : public Fetcher {
@@ -94,8 +81,7 @@ public:
     std::uint64_t Size() const override { return size; }
     std::vector<Bytes> Fetch(std::span<const ByteRange> ranges) override {
         std::vector<Bytes> fetched = FetchUnwatched({ranges.begin(), ranges.end()});
-        if (AskServer(watched).Differs(told))
-            throw FetchError("it has changed on its server since it was opened");
+        if (AskServer(watched).DiffersFrom(told)) throw FileChanged();
         return fetched;
     }
 
@@ -126,10 +112,17 @@ private:
     const std::string watched;
     std::shared_ptr<VsiSource> opened;
     std::uint64_t size = 0;
-    Told told;
+    ServerState told;
 };
 
 }  // namespace
+
+bool ServerState::DiffersFrom(const ServerState& other) const {
+    const auto differ = [](const std::string& a, const std::string& b) {
+        return !a.empty() && !b.empty() && a != b;
+    };
+    return differ(size, other.size) || differ(tag, other.tag) || differ(date, other.date);
+}
 
 std::string NetworkPart(const std::string& name) {
     const std::size_t first = FirstNetwork(name);

@@ -31,6 +31,22 @@ public:
     NoRanges() : FetchError("its server does not give parts of files") {}
 };
 
+// Another state of the file than the one that the fetcher stands for.
+class FileChanged : public FetchError {
+public:
+    FileChanged() : FetchError("it has changed on its server since it was opened") {}
+};
+
+// What a server tells of the state of a file; texts are empty where it does not.
+struct ServerState {
+    std::string size;
+    std::string tag;
+    std::string date;
+
+    // What only one of the two tells is no sign of a change.
+    bool DiffersFrom(const ServerState& other) const;
+};
+
 class Fetcher {
 public:
     // Bytes that are asked for first: a header, and as a rule the coarsest levels.

@@ -178,14 +178,12 @@ void GdalRasterSource::ReadMask(const zmchost::Window& window, std::span<const s
     const std::size_t stride = bands.size();
     // Bands of one mask follow each other, as a rule: it is read once for all of them.
     std::vector<unsigned char> plane(pixels);
-    GDALRasterBand* known = nullptr;
+    const GDALRasterBand* known = nullptr;
     for (std::size_t i = 0; i < stride; ++i) {
-        GDALRasterBand& band = BandOf(bands[i]);
-        GDALRasterBand* const mask =
-            HasMask(bands[i]) ? band.GetMaskBand() : &BandOf(alphaBand.value());
-        const bool shared = known && (mask == known || (band.GetMaskFlags() & GMF_PER_DATASET));
-        if (!shared) ReadShown(*mask, HasMask(bands[i]), window, plane);
-        known = mask;
+        const bool masked = HasMask(bands[i]);
+        GDALRasterBand& from = masked ? *BandOf(bands[i]).GetMaskBand() : BandOf(alphaBand.value());
+        if (&from != known) ReadShown(from, masked, window, plane);
+        known = &from;
         for (std::size_t pixel = 0; pixel < pixels; ++pixel)
             shown[pixel * stride + i] = plane[pixel];
     }

@@ -22,7 +22,6 @@ namespace zmcgdal {
 namespace {
 
 constexpr std::size_t kMostConnections = 8;
-constexpr const char* kChanged = "it has changed on its server since it was opened";
 
 struct DestroyResult {
     void operator()(CPLHTTPResult* result) const { CPLHTTPDestroyResult(result); }
@@ -196,24 +195,21 @@ HttpFetcher::Answer HttpFetcher::Ask(const ByteRange& range, std::size_t slot) c
     if (static_cast<std::uint64_t>(result->nDataLen) != came.range.size)
         throw FetchError("its server answers less than it says");
     return {Bytes(result->pabyData, result->pabyData + result->nDataLen),
-            {came.total, HeaderOf(*result, "ETag"), HeaderOf(*result, "Last-Modified")}};
+            came.total,
+            {std::to_string(came.total), HeaderOf(*result, "ETag"),
+             HeaderOf(*result, "Last-Modified")}};
 }
 
 Bytes HttpFetcher::FetchFront() {
     Answer answer = Ask({0, kFrontBytes}, 0);
+    total = answer.total;
     told = std::move(answer.state);
     return std::move(answer.bytes);
 }
 
-// What only one of two answers tells is no sign of a change.
 Bytes HttpFetcher::AskSame(const ByteRange& range, std::size_t slot) const {
     Answer answer = Ask(range, slot);
-    const auto differ = [](const std::string& a, const std::string& b) {
-        return !a.empty() && !b.empty() && a != b;
-    };
-    if (answer.state.size != told.size || differ(answer.state.tag, told.tag) ||
-        differ(answer.state.date, told.date))
-        throw FetchError(kChanged);
+    if (answer.state.DiffersFrom(told)) throw FileChanged();
     return std::move(answer.bytes);
 }
 

@@ -19,19 +19,14 @@ public:
 
     // Throws NoRanges as well.
     Bytes FetchFront() override;
-    std::uint64_t Size() const override { return told.size; }
+    std::uint64_t Size() const override { return total; }
     std::vector<Bytes> Fetch(std::span<const ByteRange> ranges) override;
 
 private:
-    // What a server tells of the state of a file; texts are empty where it does not.
-    struct State {
-        std::uint64_t size = 0;
-        std::string tag;
-        std::string date;
-    };
     struct Answer {
         Bytes bytes;
-        State state;
+        std::uint64_t total = 0;  // bytes of the whole file
+        ServerState state;
     };
 
     Answer Ask(const ByteRange& range, std::size_t slot) const;
@@ -42,7 +37,8 @@ private:
     const std::string url;
     const std::string name;
     const std::uint64_t number;  // of this object in the process
-    State told;
+    std::uint64_t total = 0;     // bytes of the file
+    ServerState told;
     std::size_t slots = 1;  // connections that were used
 };
 

@@ -99,10 +99,4 @@ bool RangeStore::Holds(const ByteRange& range) const {
     return true;
 }
 
-void RangeStore::Clear() {
-    parts.clear();
-    byUse.clear();
-    held = 0;
-}
-
 }  // namespace zmcgdal

@@ -44,7 +44,6 @@ public:
     // Whether all bytes of the range are held.
     bool Holds(const ByteRange& range) const;
     std::uint64_t Held() const { return held; }
-    void Clear();
 
 private:
     struct Part {

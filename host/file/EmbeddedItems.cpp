@@ -128,7 +128,7 @@ void EmbedItems(ByteSource& file, const std::string& name, std::string_view item
 std::string ReadEmbeddedItems(ByteSource& file, const std::string& name,
                               const PyramidHeader& header) {
     if (header.fileSize <= header.tileDataEnd) return "";
-    char start[kDocumentStart.size() + kItemsStart.size()];
+    char start[kDocumentStart.size() + kItemsStart.size()] = {};
     if (!BeginsWithItems({start, file.ReadAt(header.tileDataEnd, start, sizeof start)})) return "";
     const std::string wrong = JudgeMetadataSize(header.fileSize - header.tileDataEnd);
     if (!wrong.empty()) throw Error(name, "read its metadata document", wrong);
