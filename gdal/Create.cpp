@@ -42,8 +42,9 @@ class Unfinished {
 public:
     explicit Unfinished(const std::string& target) : name(target) {}
     ~Unfinished() {
+        if (kept) return;
         for (const char* const ending : {"", kSidecarEnding, kMaskEnding})
-            if (!kept) VSIUnlink((name + ending).c_str());
+            Reported([&] { VSIUnlink((name + ending).c_str()); });
     }
     Unfinished(const Unfinished&) = delete;
     Unfinished& operator=(const Unfinished&) = delete;
@@ -258,7 +259,9 @@ CPLErr Creation::ChooseLevels(Dataset& dataset, const char* resampling, int coun
 }
 
 // What there is of a mask by the end of a creation that failed.
-Creation::~Creation() { VSIUnlink((SpoolName() + kMaskEnding).c_str()); }
+Creation::~Creation() {
+    Reported([&] { VSIUnlink((SpoolName() + kMaskEnding).c_str()); });
+}
 
 // A target whose mask cannot be kept goes again.
 void Creation::KeepMask(Dataset& dataset) const {

@@ -44,7 +44,7 @@ std::shared_ptr<ByteSource> OpenElsewhere(const std::string& name) {
 }
 
 bool IsPyramid(ByteSource& source) {
-    char start[64];
+    char start[64] = {};
     return zmchost::LooksLikePyramid({start, source.ReadAt(0, start, sizeof start)});
 }
 
@@ -134,7 +134,7 @@ public:
             FailAsChanged(Name(), change);
     }
     std::uint32_t TileSide() const override { return raster.TileSide(); }
-    void CheckReadable() override {
+    void WarnOfMissing() const override {
         if (!raster.IsComplete())
             Warn(Name(), IncompleteText(std::to_string(raster.Header().BytesMissing())) +
                              "; what is there is read");
@@ -197,7 +197,7 @@ bool IsPyramidFile(const std::string& name) {
     const zelm::String wide(name.c_str());
     const auto file =
         wide.wide ? platform::File::Open(wide.wide, platform::File::Mode::Read) : nullptr;
-    char start[64];
+    char start[64] = {};
     return file && zmchost::LooksLikePyramid({start, file->ReadAt(0, start, sizeof start)});
 }
 
@@ -290,10 +290,10 @@ void Strips::Walk(const std::string& name, TerminalProgress& progress,
 
 void WalkStrips(RasterView& view, const Selection& selection, TerminalProgress& progress,
                 const std::function<void(const zmchost::Window& strip)>& take) {
-    view.CheckReadable();
     Strips{selection.window, selection.bands.size() * zelm::PixelSize(view.PixelType()),
            kStripBudget, view.TileSide()}
         .Walk(view.Name(), progress, take);
+    view.WarnOfMissing();
 }
 
 }  // namespace zmctools

@@ -50,8 +50,8 @@ public:
     virtual void CheckUnchanged() const = 0;
     // Side of the tiles that are moved at once.
     virtual std::uint32_t TileSide() const { return kUsualTile; }
-    // Says what is missing, before anything is made ready for reading.
-    virtual void CheckReadable() {}
+    // After a walk that went well: pixels elsewhere in the file may be missing.
+    virtual void WarnOfMissing() const {}
 
     // Throws UsageError for a level that there is not.
     void CheckLevel(std::uint32_t level) const;

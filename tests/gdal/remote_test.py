@@ -164,7 +164,11 @@ class Requests(ServedTest):
                              plain.GetRasterBand(band).GetStatistics(False, False))
             self.assertEqual(dataset.GetRasterBand(band).GetDefaultHistogram(),
                              plain.GetRasterBand(band).GetDefaultHistogram())
-        self.assertEqual(len(self.asked()), 1)
+        # The document, and once whether a sidecar tells that its records are of other pixels.
+        paths = [path for _, path, _ in self.asked()]
+        self.assertEqual(paths.count("/scene.pyr"), 1)
+        self.assertEqual(len(paths), len(set(paths)))
+        self.assertIn("/scene.pyr.aux.xml", paths)
 
     def test_the_sidecar_is_looked_for_when_it_is_asked_for(self):
         dataset = self.open()
@@ -488,7 +492,14 @@ class Faults(ServedTest):
             stream.truncate(os.path.getsize(self.file) // 2)
         dataset = self.open()
         plain = gdal.Open(self.file)
-        np.testing.assert_array_equal(dataset.ReadAsArray(), plain.ReadAsArray())
+        np.testing.assert_array_equal(dataset.ReadAsArray(0, 0, 300, 256), self.array[:, :256, :300])
+        for reader in (dataset, plain):
+            with self.assertRaisesRegex(RuntimeError, "its file ends before the pixels"):
+                reader.ReadAsArray()
+        zeros = gdal.OpenEx(self.name, open_options=["MISSING=ZEROS"])
+        np.testing.assert_array_equal(
+            zeros.ReadAsArray(),
+            gdal.OpenEx(self.file, open_options=["MISSING=ZEROS"]).ReadAsArray())
 
     def test_writing_is_refused(self):
         with self.assertRaises(RuntimeError):

@@ -155,7 +155,7 @@ TEST_F(RasterFileTest, ReadingAFileThatWasCutFails) {
     const auto size = std::filesystem::file_size(file);
     std::filesystem::resize_file(file, size - 1);
     EXPECT_THAT(FailureOf([&] {
-                    SumOf(raster, {0, 0, 256, 256});
+                    SumOf(raster, {256, 256, 256, 256});
                 }),
                 HasSubstr("1 bytes are missing"));
     EXPECT_EQ(raster.Change(), "it was cut from " + std::to_string(size) + " to " +
