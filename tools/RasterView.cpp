@@ -44,7 +44,7 @@ std::shared_ptr<ByteSource> OpenElsewhere(const std::string& name) {
 }
 
 bool IsPyramid(ByteSource& source) {
-    char start[64];
+    char start[64] = {};
     return zmchost::LooksLikePyramid({start, source.ReadAt(0, start, sizeof start)});
 }
 
@@ -189,7 +189,7 @@ bool IsPyramidFile(const std::string& name) {
     const zelm::String wide(name.c_str());
     const auto file =
         wide.wide ? platform::File::Open(wide.wide, platform::File::Mode::Read) : nullptr;
-    char start[64];
+    char start[64] = {};
     return file && zmchost::LooksLikePyramid({start, file->ReadAt(0, start, sizeof start)});
 }
 
