@@ -16,33 +16,32 @@ namespace {
 
 using WideView = std::basic_string_view<WideChar>;
 
-struct Registry {
-    std::mutex mutex;  // guards what follows; no code of a source runs under it
-    std::map<std::basic_string<WideChar>, std::shared_ptr<ByteSource>, std::less<>> lent;
-};
+using Lent = std::map<std::basic_string<WideChar>, std::shared_ptr<ByteSource>, std::less<>>;
 
-Registry* MakeRegistry(void* storage);
-
-// In static storage from its first use on, and never destroyed: names may be lent while the process
-// starts, and withdrawn while it ends.
-Registry& TheRegistry() {
-    alignas(Registry) static std::byte storage[sizeof(Registry)];
-    static Registry* const registry = MakeRegistry(storage);
-    return *registry;
-}
+// Guards the registry; no code of a source runs under it. It is there before the first name is
+// lent, which may be while the process starts, and needs no first use: a copy of the process that
+// is made in the middle of one would wait for it for good.
+constinit std::mutex registryMutex;
 
 // A copy of the process must not find the lock held by a thread that it does not have.
-Registry* MakeRegistry(void* storage) {
-    platform::AtFork([] { TheRegistry().mutex.lock(); }, [] { TheRegistry().mutex.unlock(); });
-    return new (storage) Registry;
+[[maybe_unused]] const bool unlockedInCopies = [] {
+    platform::AtFork([] { registryMutex.lock(); }, [] { registryMutex.unlock(); });
+    return true;
+}();
+
+// Under the lock. Never destroyed: names may be withdrawn while the process ends.
+Lent& Registry() {
+    alignas(Lent) static std::byte storage[sizeof(Lent)];
+    constinit static Lent* lent = nullptr;
+    if (!lent) lent = new (storage) Lent;
+    return *lent;
 }
 
 // False without memory, and for a name that is taken.
 bool Register(const WideChar* name, std::shared_ptr<ByteSource>&& source) noexcept {
-    Registry& registry = TheRegistry();
-    const std::lock_guard lock(registry.mutex);
+    const std::lock_guard lock(registryMutex);
     try {
-        return registry.lent.try_emplace(name, std::move(source)).second;
+        return Registry().try_emplace(name, std::move(source)).second;
     } catch (const std::bad_alloc&) {
         return false;
     }
@@ -50,12 +49,11 @@ bool Register(const WideChar* name, std::shared_ptr<ByteSource>&& source) noexce
 
 // The source goes behind the lock: its end is its own code, which may lend and withdraw.
 void Unregister(const WideChar* name) noexcept {
-    Registry& registry = TheRegistry();
-    decltype(registry.lent)::node_type gone;
-    const std::lock_guard lock(registry.mutex);
-    const auto found = registry.lent.find(WideView(name));
+    Lent::node_type gone;
+    const std::lock_guard lock(registryMutex);
+    const auto found = Registry().find(WideView(name));
     // unreachable: a LentName that has a text is registered under it
-    if (found != registry.lent.end()) gone = registry.lent.extract(found);
+    if (found != Registry().end()) gone = Registry().extract(found);
 }
 
 char HexDigit(unsigned value) { return "0123456789abcdef"[value & 15]; }
@@ -111,10 +109,9 @@ LentName Lend(std::shared_ptr<ByteSource> source) noexcept {
 
 std::shared_ptr<ByteSource> FindLent(const String& name) noexcept {
     if (!LooksLent(name)) return nullptr;
-    Registry& registry = TheRegistry();
-    const std::lock_guard lock(registry.mutex);
-    const auto found = registry.lent.find(name.View());
-    return found == registry.lent.end() ? nullptr : found->second;
+    const std::lock_guard lock(registryMutex);
+    const auto found = Registry().find(name.View());
+    return found == Registry().end() ? nullptr : found->second;
 }
 
 bool LooksLent(const String& name) noexcept {

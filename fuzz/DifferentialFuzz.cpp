@@ -137,8 +137,10 @@ private:
         } catch (const zmchost::Error&) {
             readByHost = false;
         }
-        const bool complete = reader.HasPyramid();
-        ZMC_EXPECT(readByHost == (read && complete));
+        // The module leaves a buffer as it was where the file has ended.
+        const zmchost::PyramidHeader& header = raster.Header();
+        const bool there = zmchost::PresentTiles(header).Have(base, window, bands, header.fileSize);
+        ZMC_EXPECT(readByHost == (read && there));
         const std::size_t bytes = count * sizeof(T);
         if (readByHost) ZMC_EXPECT(std::memcmp(modules.data(), hosts.data(), bytes) == 0);
         if (!gdal) return;
@@ -149,8 +151,8 @@ private:
             GF_Read, static_cast<int>(window.x), static_cast<int>(window.y),
             static_cast<int>(window.width), static_cast<int>(window.height), gdals.data(),
             static_cast<int>(window.width), static_cast<int>(window.height), type, 0, 0, nullptr);
-        ZMC_EXPECT((told == CE_None) == read);
-        if (read) ExpectSame(modules, gdals);
+        ZMC_EXPECT((told == CE_None) == readByHost);
+        if (readByHost) ExpectSame(modules, gdals);
     }
 
     static void ExpectSame(const std::vector<T>& samples, const std::vector<unsigned char>& gdals) {

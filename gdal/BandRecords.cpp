@@ -324,9 +324,11 @@ void Band::ForgetInSidecar() {
             CompanionBand::SetMetadataItem(name, nullptr, "");
 }
 
+// Where the record cannot be read back, it is not shown either.
 void Band::KeepDigits(const StoredStatistics& given, Archive& inFile) {
     const StoredStatistics* const stored = inFile.Statistics(index);
-    if (stored && HasDigitsOf(*stored, given))
+    if (!stored) return;
+    if (HasDigitsOf(*stored, given))
         ForgetInSidecar();
     else
         KeepInSidecar(given, inFile);

@@ -134,7 +134,7 @@ public:
             FailAsChanged(Name(), change);
     }
     std::uint32_t TileSide() const override { return raster.TileSide(); }
-    void WarnOfMissing() const override {
+    void WarnOfMissing() override {
         if (!raster.IsComplete())
             Warn(Name(), IncompleteText(std::to_string(raster.Header().BytesMissing())) +
                              "; what is there is read");

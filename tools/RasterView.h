@@ -51,7 +51,7 @@ public:
     // Side of the tiles that are moved at once.
     virtual std::uint32_t TileSide() const { return kUsualTile; }
     // After a walk that went well: pixels elsewhere in the file may be missing.
-    virtual void WarnOfMissing() const {}
+    virtual void WarnOfMissing() {}
 
     // Throws UsageError for a level that there is not.
     void CheckLevel(std::uint32_t level) const;
