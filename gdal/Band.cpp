@@ -63,7 +63,7 @@ CPLErr Band::IReadBlock(int blockX, int blockY, void* data) {
                 static_cast<std::size_t>(nBlockXSize) * static_cast<std::size_t>(nBlockYSize));
             return CE_None;
         }
-        TileReader& tiles = owner.File().tiles;
+        WindowReader& tiles = owner.File().tiles;
         const zelm::Rectangle tile = tiles.TileAt(owner.Level(), blockX, blockY);
         const auto size = static_cast<GSpacing>(GDALGetDataTypeSizeBytes(eDataType));
         const int band = static_cast<int>(index);
@@ -154,11 +154,16 @@ std::vector<unsigned char> Band::GatherTile(int blockX, int blockY, const zelm::
     return samples;
 }
 
+bool Band::HasDirtyBlock(int blockX, int blockY) {
+    const LockedBlock block(TryGetLockedBlockRef(blockX, blockY));
+    return block && block->GetDirty();
+}
+
 // Its samples are in the file with those of its tile.
 void Band::WaitingBlock::Settle() const { block->MarkClean(); }
 
 CPLErr Band::IWriteBlock(int blockX, int blockY, void* data) {
-    TileReader& tiles = owner.File().tiles;
+    WindowReader& tiles = owner.File().tiles;
     const zelm::Rectangle tile = tiles.TileAt(owner.Level(), blockX, blockY);
     Creation* const creation = owner.UnderCreation();
     const auto write = [&] {
@@ -204,7 +209,7 @@ CPLErr Band::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, voi
             planned.emplace(owner.File(), owner.Level(), RectangleOf(x, y, width, height),
                             std::span(&nBand, 1));
         if (mode == GF_Read && bufferWidth == width && bufferHeight == height &&
-            owner.ReadsDirectly(x, y, width, height)) {
+            owner.ReadsDirectly(x, y, width, height, std::span(&nBand, 1))) {
             const int band = static_cast<int>(index);
             const Target target{data, bufferType, pixelSpace, lineSpace, 0};
             if (owner.File().tiles.Read(owner.Level(), RectangleOf(x, y, width, height), &band, 1,

@@ -65,6 +65,8 @@ public:
     // is not written yet.
     void KeepFull(const zmchost::FullStatistics& full, Archive& inFile);
     void TakeRenewed(const zmchost::FullStatistics& full);
+    // Whether that block waits in GDAL's cache to be written.
+    bool HasDirtyBlock(int blockX, int blockY);
     // Whether pixels were written since the dataset was opened.
     bool IsEdited() const { return edited; }
 

@@ -132,7 +132,8 @@ OpenFile::OpenFile(const std::string& fileName, std::shared_ptr<zelm::files::Byt
       raster(fileName, source, info.header, options.keepCopies),
       pixels(fileName, raster.WithoutDocument(), info.header, false),
       tiles(raster.Remote() ? pixels : raster, info,
-            GdalTypeOf(info.header.pixelType, options.signedByteAs), options.missingAsZeros),
+            {GdalTypeOf(info.header.pixelType, options.signedByteAs), options.missingAsZeros,
+             options.threads, options.shared}),
       archive(raster, info.HasMetadataDocument(), limits),
       renewsStatistics(options.statistics) {
     if (raster.Remote()) raster.Remote()->SetDocument(info.MetaDocumentOffset());
@@ -470,9 +471,27 @@ std::string Dataset::SidecarText() {
     return text ? text.get() : "";
 }
 
-bool Dataset::ReadsDirectly(int x, int y, int width, int height) const {
-    // Blocks may wait in the cache to be written.
-    const bool quiet = eAccess != GA_Update || (creation && creation->IsSealed());
+// Whether no block of the window waits in the cache to be written.
+bool Dataset::IsWritten(const zelm::Rectangle& window, std::span<const int> bandNumbers) {
+    const std::uint32_t side = file->info.header.tileSize;
+    const auto lastColumn = static_cast<std::uint32_t>((window.Right() - 1) / side);
+    const auto lastRow = static_cast<std::uint32_t>((window.Bottom() - 1) / side);
+    return std::all_of(bandNumbers.begin(), bandNumbers.end(), [&](int number) {
+        auto* const band = static_cast<Band*>(BandOf(number));
+        for (std::uint32_t row = window.y / side; row <= lastRow; ++row)
+            for (std::uint32_t column = window.x / side; column <= lastColumn; ++column)
+                if (band->HasDirtyBlock(static_cast<int>(column), static_cast<int>(row)))
+                    return false;
+        return true;
+    });
+}
+
+bool Dataset::ReadsDirectly(int x, int y, int width, int height, std::span<const int> bandNumbers) {
+    const zelm::Rectangle window = RectangleOf(x, y, width, height);
+    const bool together =
+        !creation && file->tiles.ThreadsFor(window, static_cast<int>(bandNumbers.size())) > 1;
+    const bool quiet = eAccess != GA_Update || (creation && creation->IsSealed()) ||
+                       (together && IsWritten(window, bandNumbers));
     if (!quiet || bForceCachedIO) return false;
     // Blocks of such tiles would fill the cache.
     if (!file->tiles.IsHeld(file->tiles.TileAt(level, 0, 0))) return true;
@@ -624,7 +643,8 @@ CPLErr Dataset::ReadOrWrite(GDALRWFlag mode, int x, int y, int width, int height
         planned.emplace(*file, level, RectangleOf(x, y, width, height),
                         std::span(bandMap, static_cast<std::size_t>(bandCount)));
     if (mode == GF_Read && bufferWidth == width && bufferHeight == height &&
-        ReadsDirectly(x, y, width, height)) {
+        ReadsDirectly(x, y, width, height,
+                      std::span(bandMap, static_cast<std::size_t>(bandCount)))) {
         std::vector<int> bands(bandMap, bandMap + bandCount);
         for (int& band : bands) --band;
         const Target target{data, bufferType, pixelSpace, lineSpace, bandSpace};

@@ -22,7 +22,7 @@
 #include "gdal/Companions.h"
 #include "gdal/LazyRaster.h"
 #include "gdal/Options.h"
-#include "gdal/TileReader.h"
+#include "gdal/WindowReader.h"
 #include "host/file/Limits.h"
 #include "host/file/PyramidFileInfo.h"
 
@@ -61,7 +61,7 @@ public:
     const zmchost::Limits limits = zmchost::Limits::Current();
     LazyRaster raster;
     LazyRaster pixels;  // without its metadata document if it lies behind a network, else the same
-    TileReader tiles;
+    WindowReader tiles;
     Archive archive;
     const bool renewsStatistics;  // OpenOptions::statistics
     bool isPlanned = false;       // a PlannedRead lives
@@ -133,8 +133,9 @@ public:
     void ForgetChanges() { nPamFlags &= ~GPF_DIRTY; }
 
     // True if pixels of this window are better read past GDAL's block cache: it is not a sliver of
-    // the tiles that it touches, or these are very large; and no block waits to be written.
-    bool ReadsDirectly(int x, int y, int width, int height) const;
+    // the tiles that it touches, or these are very large; and no block waits to be written. Of a
+    // file that is open for update only windows that several threads read are. Bands count from 1.
+    bool ReadsDirectly(int x, int y, int width, int height, std::span<const int> bandNumbers);
 
     // Tells whoever opens the file from now on that its records may be of other pixels than it
     // has: on the disk before the first pixel is written, until FlushCache has written all. A
@@ -200,6 +201,7 @@ private:
     Dataset(std::shared_ptr<OpenFile> openFile, std::uint32_t levelShown, GDALAccess access,
             Dataset* mainDataset);
     void AddBands();
+    bool IsWritten(const zelm::Rectangle& window, std::span<const int> bandNumbers);
     void IgnoreCompanions();
     void TakeEmbedded(char** siblings);
     void AddOverviews();

@@ -35,7 +35,7 @@ protected:
 
 private:
     Band& band;
-    std::vector<unsigned char> pixels;
+    const int number;  // of the band, from 1
 
     // Reads a window of the band and judges it; `stride` bytes lie between the lines of `out`.
     CPLErr ReadMask(int x, int y, int width, int height, unsigned char* out, std::size_t stride);
