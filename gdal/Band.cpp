@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <climits>
 #include <cstring>
+#include <mutex>
 #include <optional>
 #include <span>
 
@@ -257,6 +258,7 @@ std::uint64_t Band::GetNoDataValueAsUInt64(int* success) {
 CPLErr Band::SetNoDataValue(double value) {
     return Reporting(CE_Failure, [&] {
         if (owner.IsOverview()) return MainBand()->SetNoDataValue(value);
+        if (!owner.MayChange()) return CE_Failure;
         InvalidateMaskBand();
         return CompanionBand::SetNoDataValue(value);
     });
@@ -265,6 +267,7 @@ CPLErr Band::SetNoDataValue(double value) {
 CPLErr Band::SetNoDataValueAsInt64(std::int64_t value) {
     return Reporting(CE_Failure, [&] {
         if (owner.IsOverview()) return MainBand()->SetNoDataValueAsInt64(value);
+        if (!owner.MayChange()) return CE_Failure;
         InvalidateMaskBand();
         return CompanionBand::SetNoDataValueAsInt64(value);
     });
@@ -273,6 +276,7 @@ CPLErr Band::SetNoDataValueAsInt64(std::int64_t value) {
 CPLErr Band::SetNoDataValueAsUInt64(std::uint64_t value) {
     return Reporting(CE_Failure, [&] {
         if (owner.IsOverview()) return MainBand()->SetNoDataValueAsUInt64(value);
+        if (!owner.MayChange()) return CE_Failure;
         InvalidateMaskBand();
         return CompanionBand::SetNoDataValueAsUInt64(value);
     });
@@ -281,6 +285,7 @@ CPLErr Band::SetNoDataValueAsUInt64(std::uint64_t value) {
 CPLErr Band::DeleteNoDataValue() {
     return Reporting(CE_Failure, [&] {
         if (owner.IsOverview()) return MainBand()->DeleteNoDataValue();
+        if (!owner.MayChange()) return CE_Failure;
         InvalidateMaskBand();
         return CompanionBand::DeleteNoDataValue();
     });
@@ -306,19 +311,23 @@ bool Band::MaskIsBesideTheFile() {
 
 CPLErr Band::CreateMaskBand(int flags) {
     return Reporting(CE_Failure, [&] {
+        if (!owner.MayChange()) return CE_Failure;
         return owner.NamedAsSpool([&] { return GDALPamRasterBand::CreateMaskBand(flags); });
     });
 }
 
 GDALRasterBand* Band::GetMaskBand() {
     return Reporting<GDALRasterBand*>(nullptr, [&]() -> GDALRasterBand* {
+        const std::lock_guard lock(owner.File().late);
         if (MaskIsBesideTheFile()) {
             if (!levelMask)
                 levelMask = std::make_unique<LevelMask>(*this, *MainBand(),
                                                         owner.Level() - owner.Main().Level());
             return levelMask.get();
         }
-        if (!UsesOwnMask()) return CompanionBand::GetMaskBand();
+        // GDAL's own mask of pixels that are all valid serves one thread; ours comes out the same.
+        const bool ours = UsesOwnMask() || (owner.IsShared() && nMaskFlags == GMF_ALL_VALID);
+        if (!ours) return CompanionBand::GetMaskBand();
         if (!ownMask) ownMask = std::make_unique<MaskBand>(*this);
         return ownMask.get();
     });
@@ -328,9 +337,16 @@ GDALRasterBand* Band::GetMaskBand() {
 // as a mask of its own, it would be copied into a mask file with every translation.
 int Band::GetMaskFlags() {
     return Reporting<int>(GMF_ALL_VALID, [&]() -> int {
+        const std::lock_guard lock(owner.File().late);
         if (MaskIsBesideTheFile()) return MainBand()->GetMaskFlags();
         return UsesOwnMask() ? GMF_NODATA : CompanionBand::GetMaskFlags();
     });
+}
+
+bool Band::MaskIsOurs() {
+    const int flags = GetMaskFlags();
+    if (UsesOwnMask() || flags == GMF_ALL_VALID) return true;
+    return (flags & GMF_ALPHA) != 0 && eDataType == GDT_Byte;
 }
 
 // --- levels ---
@@ -386,6 +402,7 @@ GDALColorInterp Band::GetColorInterpretation() {
 GDALColorTable* Band::GetColorTable() {
     return Reporting<GDALColorTable*>(nullptr, [&]() -> GDALColorTable* {
         if (owner.IsOverview()) return MainBand()->GetColorTable();
+        const std::lock_guard lock(owner.File().late);
         GDALColorTable* const stored = owner.File().archive.ColorTable(index);
         return stored ? stored : CompanionBand::GetColorTable();
     });
@@ -393,6 +410,7 @@ GDALColorTable* Band::GetColorTable() {
 
 CPLErr Band::SetColorTable(GDALColorTable* table) {
     return Reporting(CE_Failure, [&] {
+        if (!owner.MayChange()) return CE_Failure;
         if (!StoresInFile() || owner.IsOverview()) return KeepColorTable(table);
         if (owner.File().archive.StoreColorTable(index, table)) return CE_None;
         ReportError(CE_Failure, CPLE_FileIO, "the color table was not stored");

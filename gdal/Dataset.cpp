@@ -261,6 +261,38 @@ void Dataset::AddOverviews() {
     overviewsMade = true;
 }
 
+// GDAL's objects for what stands beside a file, or follows from several bands, serve one thread.
+bool Dataset::IsAllOurs() {
+    if (eAccess == GA_Update || creation || kept || main || file->raster.Remote()) return false;
+    if (oOvManager.HaveMaskFile()) return false;
+    if (Overviews().empty() && GetRasterBand(1)->GetOverviewCount() > 0) return false;
+    for (int number = 1; number <= nBands; ++number)
+        if (!static_cast<Band*>(GetRasterBand(number))->MaskIsOurs()) return false;
+    return true;
+}
+
+// All that is made at the first use of it otherwise, but for what has a lock.
+void Dataset::Prepare() {
+    DescribeFile();
+    for (int number = 1; number <= nBands; ++number) BandOf(number);
+    GetGCPs();
+    for (const auto& coarser : Overviews()) coarser->Prepare();
+    SetShared();
+#if GDAL_VERSION_NUM >= GDAL_COMPUTE_VERSION(3, 10, 0)
+    nOpenFlags = GDAL_OF_RASTER | GDAL_OF_THREAD_SAFE;
+    for (const OGRSpatialReference* const told : {GetSpatialRef(), GetGCPSpatialRef()})
+        if (told && !main)
+            const_cast<OGRSpatialReference*>(told)->AssignAndSetThreadSafe(
+                OGRSpatialReference(*told));
+#endif
+}
+
+bool Dataset::Share() {
+    if (!IsAllOurs()) return false;
+    Prepare();
+    return true;
+}
+
 void Dataset::DescribeFile() {
     const zmchost::PyramidHeader& header = file->info.header;
     const auto set = [&](const char* name, const std::string& value) {
@@ -298,6 +330,7 @@ CPLErr Dataset::NamedAsSpool(const std::function<CPLErr()>& make) {
 
 CPLErr Dataset::CreateMaskBand(int flags) {
     return Reporting(CE_Failure, [&] {
+        if (!MayChange()) return CE_Failure;
         return NamedAsSpool([&] { return GDALPamDataset::CreateMaskBand(flags); });
     });
 }
@@ -429,6 +462,7 @@ CPLErr Dataset::TrySaveXML() {
 
 void Dataset::ClearStatistics() {
     Reported([&] {
+        if (!MayChange()) return;
         if (creation || main) return GDALPamDataset::ClearStatistics();
         for (int number = 1; number <= nBands; ++number)
             static_cast<Band*>(GetRasterBand(number))->ForgetStatistics();
@@ -493,6 +527,8 @@ bool Dataset::ReadsDirectly(int x, int y, int width, int height, std::span<const
     const bool quiet = eAccess != GA_Update || (creation && creation->IsSealed()) ||
                        (together && IsWritten(window, bandNumbers));
     if (!quiet || bForceCachedIO) return false;
+    // Threads need no lock for this.
+    if (IsShared()) return true;
     // Blocks of such tiles would fill the cache.
     if (!file->tiles.IsHeld(file->tiles.TileAt(level, 0, 0))) return true;
     // In 64 bits: a raster may have as many columns as an int can tell.
@@ -515,6 +551,7 @@ CPLStringList* Dataset::OwnDomain(const char* domain) {
 
 char** Dataset::GetMetadataDomainList() {
     return Reporting<char**>(nullptr, [&] {
+        const std::lock_guard lock(file->late);
         return BuildMetadataDomainList(CompanionDataset::GetMetadataDomainList(), TRUE,
                                        kStructureDomain, kOwnDomain, nullptr);
     });
@@ -522,6 +559,7 @@ char** Dataset::GetMetadataDomainList() {
 
 char** Dataset::GetMetadata(const char* domain) {
     return Reporting<char**>(nullptr, [&] {
+        const std::lock_guard lock(file->late);
         if (CPLStringList* const own = OwnDomain(domain)) return own->List();
         return kept ? ScaledDomain(domain) : CompanionDataset::GetMetadata(domain);
     });
@@ -529,6 +567,7 @@ char** Dataset::GetMetadata(const char* domain) {
 
 const char* Dataset::GetMetadataItem(const char* name, const char* domain) {
     return Reporting<const char*>(nullptr, [&] {
+        const std::lock_guard lock(file->late);
         if (CPLStringList* const own = OwnDomain(domain)) return own->FetchNameValue(name);
         if (kept) return CSLFetchNameValue(ScaledDomain(domain), name);
         return CompanionDataset::GetMetadataItem(name, domain);
@@ -578,6 +617,7 @@ int Dataset::GetGCPCount() {
 const GDAL_GCP* Dataset::GetGCPs() {
     return Reporting<const GDAL_GCP*>(nullptr, [&]() -> const GDAL_GCP* {
         if (!main) return CompanionDataset::GetGCPs();
+        if (IsShared()) return points.data();
         const GDAL_GCP* const given = main->GetGCPs();
         points.assign(given, given + main->GetGCPCount());
         for (GDAL_GCP& point : points) {
@@ -595,8 +635,10 @@ const OGRSpatialReference* Dataset::GetGCPSpatialRef() const {
 }
 
 char** Dataset::GetFileList() {
-    return Reporting<char**>(
-        nullptr, [&] { return kept ? kept->GetFileList() : CompanionDataset::GetFileList(); });
+    return Reporting<char**>(nullptr, [&] {
+        const std::lock_guard lock(file->late);
+        return kept ? kept->GetFileList() : CompanionDataset::GetFileList();
+    });
 }
 
 CPLErr Dataset::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, void* data,
@@ -697,6 +739,7 @@ CPLErr Dataset::IBuildOverviews(const char* resampling, int overviewCount, const
         return CE_Failure;
     }
     return Reporting(CE_Failure, [&] {
+        if (!MayChange()) return CE_Failure;
         if (creation) return creation->ChooseLevels(*this, resampling, overviewCount, factors);
         if (file->info.bytesMissing > 0) {
             CPLError(CE_Failure, CPLE_NotSupported,

@@ -5,6 +5,9 @@
 // descriptions and the like live in the sidecar file (.aux.xml), which is written only after
 // something has been set, or inside of the file (host/file/EmbeddedItems.h), for what the sidecar
 // does not tell.
+//
+// One thread at a time uses a dataset with all that belongs to it, and large windows are read by
+// more of its own (WindowReader.h). One that is shared (Share) is used by any number.
 #ifndef ZMC_GDAL_DATASET_H
 #define ZMC_GDAL_DATASET_H
 
@@ -13,6 +16,7 @@
 
 #include <functional>
 #include <memory>
+#include <mutex>
 #include <span>
 #include <string>
 #include <utility>
@@ -65,6 +69,9 @@ public:
     Archive archive;
     const bool renewsStatistics;  // OpenOptions::statistics
     bool isPlanned = false;       // a PlannedRead lives
+    // Held while something is made or looked up that threads of a shared dataset may ask for at
+    // once and that is not made when it is opened; never while pixels are read.
+    std::recursive_mutex late;
 };
 
 // As long as it lives, that window is what is read of a file behind a network. One within another
@@ -89,6 +96,14 @@ public:
     // shows what it knows of all its pixels. Throws zmchost::Error if there is no such overview.
     static std::unique_ptr<Dataset> FromOverview(std::unique_ptr<Dataset> raster, int overview);
     ~Dataset() override;
+
+    // Lets any number of threads read this dataset, its bands, levels and masks at once, and ask
+    // what they know. No lock is held while pixels are read, but for windows that GDAL puts
+    // together from its blocks, which are those of another size than their buffer; changes are
+    // refused. From GDAL 3.10 on GDAL is told. False, and nothing is different, where that cannot
+    // be: the dataset can be written to, lies behind a network, or needs objects of GDAL's own for
+    // what stands beside it. Its file was opened with OpenOptions::shared.
+    bool Share();
 
     // Shows no overviews.
     void StandAlone() { overviewsMade = true; }
@@ -201,6 +216,8 @@ private:
     Dataset(std::shared_ptr<OpenFile> openFile, std::uint32_t levelShown, GDALAccess access,
             Dataset* mainDataset);
     void AddBands();
+    bool IsAllOurs();
+    void Prepare();
     bool IsWritten(const zelm::Rectangle& window, std::span<const int> bandNumbers);
     void IgnoreCompanions();
     void TakeEmbedded(char** siblings);
