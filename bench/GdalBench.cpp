@@ -1,7 +1,8 @@
 // Pyramids beside GDAL's own GeoTIFF, read through GDAL: the same pixels, uncompressed, tiles of
 // 256, pixel-interleaved, with levels of the same sizes. Prints the ratio of the times, GeoTIFF to
 // pyramid; runs of the two alternate, and the median of each counts. The rasters are made in a
-// folder that is the first argument, or else a temporary one.
+// folder that is the first argument, or else a temporary one. Then the pyramid with itself: readers
+// of its own on two threads, and one whose windows two threads of the driver read.
 #include <gdal_priv.h>
 
 #include <algorithm>
@@ -143,6 +144,30 @@ void InTwoThreads(const std::string& name) {
     other.join();
 }
 
+// Windows of 64 tiles and more, by so many threads of the driver's own.
+class LargeWindows {
+public:
+    LargeWindows(const std::string& name, int side, const char* threads)
+        : size(side), buffer(std::size_t(side) * std::size_t(side) * kBands) {
+        CPLStringList options;
+        options.SetNameValue("NUM_THREADS", threads);
+        dataset.reset(
+            GDALDataset::Open(name.c_str(), GDAL_OF_RASTER, nullptr, options.List(), nullptr));
+        if (!dataset) std::exit(1);
+    }
+    void Read() {
+        for (int i = 0; i < 8; ++i)
+            Check(dataset->RasterIO(GF_Read, i * 256 % (kWidth - size), i * 128, size, size,
+                                    buffer.data(), size, size, GDT_Byte, kBands, nullptr, kBands,
+                                    GSpacing{kBands} * size, 1));
+    }
+
+private:
+    const int size;
+    std::vector<unsigned char> buffer;
+    DatasetPtr dataset;
+};
+
 void InTurn(const std::string& name) {
     RandomWindows(name, 3);
     RandomWindows(name, 2);
@@ -176,6 +201,13 @@ int main(int argc, char** argv) {
         Report(name == tiff ? "600 windows of the GeoTIFF" : "600 windows of the pyramid",
                Compare([&] { InTurn(name); }, [&] { InTwoThreads(name); }),
                name == tiff ? "" : "1.7");
+    std::printf("%-44s %12s %12s\n", "", "NUM_THREADS=1", "2");
+    for (const int side : {2048, 4096}) {
+        LargeWindows one(pyramid, side, "1"), two(pyramid, side, "2");
+        const std::string what =
+            "8 windows of " + std::to_string(side / 256 * side / 256) + " tiles";
+        Report(what.c_str(), Compare([&] { one.Read(); }, [&] { two.Read(); }), "1.6");
+    }
     fs::remove(tiff);
     fs::remove(pyramid);
     return 0;

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <climits>
 #include <cstring>
+#include <mutex>
 #include <optional>
 #include <span>
 
@@ -63,7 +64,7 @@ CPLErr Band::IReadBlock(int blockX, int blockY, void* data) {
                 static_cast<std::size_t>(nBlockXSize) * static_cast<std::size_t>(nBlockYSize));
             return CE_None;
         }
-        TileReader& tiles = owner.File().tiles;
+        WindowReader& tiles = owner.File().tiles;
         const zelm::Rectangle tile = tiles.TileAt(owner.Level(), blockX, blockY);
         const auto size = static_cast<GSpacing>(GDALGetDataTypeSizeBytes(eDataType));
         const int band = static_cast<int>(index);
@@ -154,11 +155,16 @@ std::vector<unsigned char> Band::GatherTile(int blockX, int blockY, const zelm::
     return samples;
 }
 
+bool Band::HasDirtyBlock(int blockX, int blockY) {
+    const LockedBlock block(TryGetLockedBlockRef(blockX, blockY));
+    return block && block->GetDirty();
+}
+
 // Its samples are in the file with those of its tile.
 void Band::WaitingBlock::Settle() const { block->MarkClean(); }
 
 CPLErr Band::IWriteBlock(int blockX, int blockY, void* data) {
-    TileReader& tiles = owner.File().tiles;
+    WindowReader& tiles = owner.File().tiles;
     const zelm::Rectangle tile = tiles.TileAt(owner.Level(), blockX, blockY);
     Creation* const creation = owner.UnderCreation();
     const auto write = [&] {
@@ -204,7 +210,7 @@ CPLErr Band::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, voi
             planned.emplace(owner.File(), owner.Level(), RectangleOf(x, y, width, height),
                             std::span(&nBand, 1));
         if (mode == GF_Read && bufferWidth == width && bufferHeight == height &&
-            owner.ReadsDirectly(x, y, width, height)) {
+            owner.ReadsDirectly(x, y, width, height, std::span(&nBand, 1))) {
             const int band = static_cast<int>(index);
             const Target target{data, bufferType, pixelSpace, lineSpace, 0};
             if (owner.File().tiles.Read(owner.Level(), RectangleOf(x, y, width, height), &band, 1,
@@ -252,6 +258,7 @@ std::uint64_t Band::GetNoDataValueAsUInt64(int* success) {
 CPLErr Band::SetNoDataValue(double value) {
     return Reporting(CE_Failure, [&] {
         if (owner.IsOverview()) return MainBand()->SetNoDataValue(value);
+        if (!owner.MayChange()) return CE_Failure;
         InvalidateMaskBand();
         return CompanionBand::SetNoDataValue(value);
     });
@@ -260,6 +267,7 @@ CPLErr Band::SetNoDataValue(double value) {
 CPLErr Band::SetNoDataValueAsInt64(std::int64_t value) {
     return Reporting(CE_Failure, [&] {
         if (owner.IsOverview()) return MainBand()->SetNoDataValueAsInt64(value);
+        if (!owner.MayChange()) return CE_Failure;
         InvalidateMaskBand();
         return CompanionBand::SetNoDataValueAsInt64(value);
     });
@@ -268,6 +276,7 @@ CPLErr Band::SetNoDataValueAsInt64(std::int64_t value) {
 CPLErr Band::SetNoDataValueAsUInt64(std::uint64_t value) {
     return Reporting(CE_Failure, [&] {
         if (owner.IsOverview()) return MainBand()->SetNoDataValueAsUInt64(value);
+        if (!owner.MayChange()) return CE_Failure;
         InvalidateMaskBand();
         return CompanionBand::SetNoDataValueAsUInt64(value);
     });
@@ -276,6 +285,7 @@ CPLErr Band::SetNoDataValueAsUInt64(std::uint64_t value) {
 CPLErr Band::DeleteNoDataValue() {
     return Reporting(CE_Failure, [&] {
         if (owner.IsOverview()) return MainBand()->DeleteNoDataValue();
+        if (!owner.MayChange()) return CE_Failure;
         InvalidateMaskBand();
         return CompanionBand::DeleteNoDataValue();
     });
@@ -301,19 +311,23 @@ bool Band::MaskIsBesideTheFile() {
 
 CPLErr Band::CreateMaskBand(int flags) {
     return Reporting(CE_Failure, [&] {
+        if (!owner.MayChange()) return CE_Failure;
         return owner.NamedAsSpool([&] { return GDALPamRasterBand::CreateMaskBand(flags); });
     });
 }
 
 GDALRasterBand* Band::GetMaskBand() {
     return Reporting<GDALRasterBand*>(nullptr, [&]() -> GDALRasterBand* {
+        const std::lock_guard lock(owner.File().late);
         if (MaskIsBesideTheFile()) {
             if (!levelMask)
                 levelMask = std::make_unique<LevelMask>(*this, *MainBand(),
                                                         owner.Level() - owner.Main().Level());
             return levelMask.get();
         }
-        if (!UsesOwnMask()) return CompanionBand::GetMaskBand();
+        // GDAL's own mask of pixels that are all valid serves one thread; ours comes out the same.
+        const bool ours = UsesOwnMask() || (owner.IsShared() && nMaskFlags == GMF_ALL_VALID);
+        if (!ours) return CompanionBand::GetMaskBand();
         if (!ownMask) ownMask = std::make_unique<MaskBand>(*this);
         return ownMask.get();
     });
@@ -323,9 +337,16 @@ GDALRasterBand* Band::GetMaskBand() {
 // as a mask of its own, it would be copied into a mask file with every translation.
 int Band::GetMaskFlags() {
     return Reporting<int>(GMF_ALL_VALID, [&]() -> int {
+        const std::lock_guard lock(owner.File().late);
         if (MaskIsBesideTheFile()) return MainBand()->GetMaskFlags();
         return UsesOwnMask() ? GMF_NODATA : CompanionBand::GetMaskFlags();
     });
+}
+
+bool Band::MaskIsOurs() {
+    const int flags = GetMaskFlags();
+    if (UsesOwnMask() || flags == GMF_ALL_VALID) return true;
+    return (flags & GMF_ALPHA) != 0 && eDataType == GDT_Byte;
 }
 
 // --- levels ---
@@ -381,6 +402,7 @@ GDALColorInterp Band::GetColorInterpretation() {
 GDALColorTable* Band::GetColorTable() {
     return Reporting<GDALColorTable*>(nullptr, [&]() -> GDALColorTable* {
         if (owner.IsOverview()) return MainBand()->GetColorTable();
+        const std::lock_guard lock(owner.File().late);
         GDALColorTable* const stored = owner.File().archive.ColorTable(index);
         return stored ? stored : CompanionBand::GetColorTable();
     });
@@ -388,6 +410,7 @@ GDALColorTable* Band::GetColorTable() {
 
 CPLErr Band::SetColorTable(GDALColorTable* table) {
     return Reporting(CE_Failure, [&] {
+        if (!owner.MayChange()) return CE_Failure;
         if (!StoresInFile() || owner.IsOverview()) return KeepColorTable(table);
         if (owner.File().archive.StoreColorTable(index, table)) return CE_None;
         ReportError(CE_Failure, CPLE_FileIO, "the color table was not stored");

@@ -5,6 +5,8 @@
 // are when pixels change, or when others are wanted than they are; the sidecar then tells how many
 // of them, from the first, no longer count, so that those stored later do. Pixels and colours are
 // in Band.cpp, the records in BandRecords.cpp.
+//
+// One thread at a time; any number of them where the dataset is shared.
 #ifndef ZMC_GDAL_BAND_H
 #define ZMC_GDAL_BAND_H
 
@@ -15,11 +17,12 @@
 #include <vector>
 
 #include "gdal/Dataset.h"
+#include "gdal/SharedBlocks.h"
 #include "host/build/FullStatistics.h"
 
 namespace zmcgdal {
 
-class Band final : public CompanionBand {
+class Band final : public SharedBlocks<CompanionBand> {
 public:
     // `number` counts from 1, as GDAL does.
     Band(Dataset& dataset, int number);
@@ -40,6 +43,8 @@ public:
 
     GDALRasterBand* GetMaskBand() override;
     int GetMaskFlags() override;
+    // Whether no object of GDAL's own has to be asked for the mask's pixels.
+    bool MaskIsOurs();
     CPLErr CreateMaskBand(int flags) override;
 
     int GetOverviewCount() override;
@@ -65,6 +70,8 @@ public:
     // is not written yet.
     void KeepFull(const zmchost::FullStatistics& full, Archive& inFile);
     void TakeRenewed(const zmchost::FullStatistics& full);
+    // Whether that block waits in GDAL's cache to be written.
+    bool HasDirtyBlock(int blockX, int blockY);
     // Whether pixels were written since the dataset was opened.
     bool IsEdited() const { return edited; }
 

@@ -1,6 +1,7 @@
 #include <algorithm>
 #include <cmath>
 #include <cstdlib>
+#include <mutex>
 #include <string>
 
 #include "gdal/Band.h"
@@ -145,11 +146,13 @@ void Band::LetRecordsAge() {
 
 const StoredStatistics* Band::Stored() {
     if (owner.IsOverview()) return nullptr;
+    const std::lock_guard lock(owner.File().late);
     const StoredStatistics* const newest = owner.File().archive.Statistics(index);
     return newest && newest->place >= OldRecords().statistics ? newest : nullptr;
 }
 
 const StoredHistogram* Band::CurrentHistogram() {
+    const std::lock_guard lock(owner.File().late);
     const StoredHistogram* const newest = owner.File().archive.Histogram(index, owner.Level());
     return newest && newest->place >= OldRecords().histograms ? newest : nullptr;
 }
@@ -185,9 +188,12 @@ char** Band::GetMetadataDomainList() {
 
 char** Band::GetMetadata(const char* domain) {
     return Reporting<char**>(nullptr, [&]() -> char** {
+        const std::lock_guard lock(owner.File().late);
         if (TellsStructure(domain)) return structure.List();
         if (!IsDefaultDomain(domain) || StatisticsItems().Count() == 0)
             return CompanionBand::GetMetadata(domain);
+        // Another thread may hold what it was given.
+        if (owner.IsShared() && merged.Count() > 0) return merged.List();
         merged = CPLStringList(CSLDuplicate(CompanionBand::GetMetadata(domain)));
         for (int i = 0; i < statistics.Count(); ++i) {
             char* name = nullptr;
@@ -201,6 +207,7 @@ char** Band::GetMetadata(const char* domain) {
 
 const char* Band::GetMetadataItem(const char* name, const char* domain) {
     return Reporting<const char*>(nullptr, [&]() -> const char* {
+        const std::lock_guard lock(owner.File().late);
         if (TellsStructure(domain)) return structure.FetchNameValue(name);
         if (IsDefaultDomain(domain) && STARTS_WITH_CI(name, "STATISTICS_"))
             if (const char* const value = StatisticsItems().FetchNameValue(name)) return value;
@@ -223,6 +230,9 @@ void Band::TakeStatisticsOver() {
 
 CPLErr Band::SetMetadataItem(const char* name, const char* value, const char* domain) {
     return Reporting(CE_Failure, [&] {
+        // As GDAL does when it has computed statistics.
+        if (owner.IsShared() && IsDefaultDomain(domain) && STARTS_WITH_CI(name, "STATISTICS_"))
+            return CE_None;
         if (IsDefaultDomain(domain) && IsStatisticItem(name)) {
             const char* const shown = GetMetadataItem(name, domain);
             if (shown && value && EQUAL(shown, value)) return CE_None;
@@ -235,7 +245,8 @@ CPLErr Band::SetMetadataItem(const char* name, const char* value, const char* do
 // Those who add an item give back all that they were shown.
 CPLErr Band::SetMetadata(char** items, const char* domain) {
     return Reporting(CE_Failure, [&] {
-        if (!IsDefaultDomain(domain) || !Stored()) return CompanionBand::SetMetadata(items, domain);
+        if (!IsDefaultDomain(domain) || !Stored() || owner.IsShared())
+            return CompanionBand::SetMetadata(items, domain);
         CPLStringList kept(CSLDuplicate(items));
         const CPLStringList& shown = StatisticsItems();
         const bool same =
@@ -291,12 +302,12 @@ CPLErr Band::GetStatistics(int approximate, int force, double* minimum, double* 
 // What it stores on the way, and cannot, is no reason to keep the result back.
 CPLErr Band::ComputeStatistics(int approximate, double* minimum, double* maximum, double* mean,
                                double* deviation, GDALProgressFunc progress, void* progressData) {
-    computing = true;
+    if (!owner.IsShared()) computing = true;
     const CPLErr result = Reporting(CE_Failure, [&] {
         return CompanionBand::ComputeStatistics(approximate, minimum, maximum, mean, deviation,
                                                 progress, progressData);
     });
-    computing = false;
+    if (!owner.IsShared()) computing = false;
     return result;
 }
 
@@ -336,6 +347,7 @@ void Band::KeepDigits(const StoredStatistics& given, Archive& inFile) {
 
 CPLErr Band::SetStatistics(double minimum, double maximum, double mean, double deviation) {
     return Reporting(CE_Failure, [&] {
+        if (owner.IsShared()) return CE_None;
         const StoredStatistics given{kAllFour, minimum, maximum, mean, deviation, 0};
         if (owner.IsOverview()) return KeepInMemory(given);
         statisticsFetched = false;
@@ -385,6 +397,7 @@ CPLErr Band::KeepHistogram(double lower, double upper, int bucketCount, GUIntBig
 
 CPLErr Band::SetDefaultHistogram(double lower, double upper, int bucketCount, GUIntBig* counts) {
     return Reporting(CE_Failure, [&] {
+        if (!owner.MayChange()) return CE_Failure;
         if (!StoresInFile() || bucketCount <= 0)
             return KeepHistogram(lower, upper, bucketCount, counts);
         StoredHistogram histogram{index, owner.Level(), lower, upper, {}, 0};

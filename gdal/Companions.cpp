@@ -17,13 +17,25 @@ void CompanionBand::Load() const {
     if (poDS) static_cast<CompanionDataset*>(poDS)->Load();
 }
 
+bool CompanionDataset::MayChange() const {
+    Load();
+    if (shared)
+        CPLError(CE_Failure, CPLE_NoWriteAccess, "%s: threads share it, nothing of it is changed",
+                 GetDescription());
+    return !shared;
+}
+
+bool CompanionBand::MayChange() const {
+    return !poDS || static_cast<CompanionDataset*>(poDS)->MayChange();
+}
+
 const OGRSpatialReference* CompanionDataset::GetSpatialRef() const {
     Load();
     return GDALPamDataset::GetSpatialRef();
 }
 
 CPLErr CompanionDataset::SetSpatialRef(const OGRSpatialReference* reference) {
-    Load();
+    if (!MayChange()) return CE_Failure;
     return GDALPamDataset::SetSpatialRef(reference);
 }
 
@@ -33,7 +45,7 @@ CPLErr CompanionDataset::GetGeoTransform(double* transform) {
 }
 
 CPLErr CompanionDataset::SetGeoTransform(double* transform) {
-    Load();
+    if (!MayChange()) return CE_Failure;
     return GDALPamDataset::SetGeoTransform(transform);
 }
 
@@ -54,7 +66,7 @@ const GDAL_GCP* CompanionDataset::GetGCPs() {
 
 CPLErr CompanionDataset::SetGCPs(int count, const GDAL_GCP* points,
                                  const OGRSpatialReference* reference) {
-    Load();
+    if (!MayChange()) return CE_Failure;
     return GDALPamDataset::SetGCPs(count, points, reference);
 }
 
@@ -64,12 +76,12 @@ char** CompanionDataset::GetMetadataDomainList() {
 }
 
 CPLErr CompanionDataset::SetMetadata(char** items, const char* domain) {
-    Load();
+    if (!MayChange()) return CE_Failure;
     return GDALPamDataset::SetMetadata(items, domain);
 }
 
 CPLErr CompanionDataset::SetMetadataItem(const char* name, const char* value, const char* domain) {
-    Load();
+    if (!MayChange()) return CE_Failure;
     return GDALPamDataset::SetMetadataItem(name, value, domain);
 }
 
@@ -89,7 +101,7 @@ char** CompanionDataset::GetFileList() {
 }
 
 void CompanionDataset::ClearStatistics() {
-    Load();
+    if (!MayChange()) return;
     return GDALPamDataset::ClearStatistics();
 }
 
@@ -99,22 +111,22 @@ const char* CompanionBand::GetDescription() const {
 }
 
 void CompanionBand::SetDescription(const char* text) {
-    Load();
+    if (!MayChange()) return;
     return GDALPamRasterBand::SetDescription(text);
 }
 
 CPLErr CompanionBand::SetNoDataValue(double value) {
-    Load();
+    if (!MayChange()) return CE_Failure;
     return GDALPamRasterBand::SetNoDataValue(value);
 }
 
 CPLErr CompanionBand::SetNoDataValueAsInt64(std::int64_t value) {
-    Load();
+    if (!MayChange()) return CE_Failure;
     return GDALPamRasterBand::SetNoDataValueAsInt64(value);
 }
 
 CPLErr CompanionBand::SetNoDataValueAsUInt64(std::uint64_t value) {
-    Load();
+    if (!MayChange()) return CE_Failure;
     return GDALPamRasterBand::SetNoDataValueAsUInt64(value);
 }
 
@@ -134,12 +146,12 @@ std::uint64_t CompanionBand::GetNoDataValueAsUInt64(int* success) {
 }
 
 CPLErr CompanionBand::DeleteNoDataValue() {
-    Load();
+    if (!MayChange()) return CE_Failure;
     return GDALPamRasterBand::DeleteNoDataValue();
 }
 
 CPLErr CompanionBand::SetColorTable(GDALColorTable* table) {
-    Load();
+    if (!MayChange()) return CE_Failure;
     return GDALPamRasterBand::SetColorTable(table);
 }
 
@@ -149,7 +161,7 @@ GDALColorTable* CompanionBand::GetColorTable() {
 }
 
 CPLErr CompanionBand::SetColorInterpretation(GDALColorInterp interpretation) {
-    Load();
+    if (!MayChange()) return CE_Failure;
     return GDALPamRasterBand::SetColorInterpretation(interpretation);
 }
 
@@ -164,7 +176,7 @@ const char* CompanionBand::GetUnitType() {
 }
 
 CPLErr CompanionBand::SetUnitType(const char* unit) {
-    Load();
+    if (!MayChange()) return CE_Failure;
     return GDALPamRasterBand::SetUnitType(unit);
 }
 
@@ -174,7 +186,7 @@ char** CompanionBand::GetCategoryNames() {
 }
 
 CPLErr CompanionBand::SetCategoryNames(char** names) {
-    Load();
+    if (!MayChange()) return CE_Failure;
     return GDALPamRasterBand::SetCategoryNames(names);
 }
 
@@ -184,7 +196,7 @@ double CompanionBand::GetOffset(int* success) {
 }
 
 CPLErr CompanionBand::SetOffset(double offset) {
-    Load();
+    if (!MayChange()) return CE_Failure;
     return GDALPamRasterBand::SetOffset(offset);
 }
 
@@ -194,7 +206,7 @@ double CompanionBand::GetScale(int* success) {
 }
 
 CPLErr CompanionBand::SetScale(double scale) {
-    Load();
+    if (!MayChange()) return CE_Failure;
     return GDALPamRasterBand::SetScale(scale);
 }
 
@@ -204,12 +216,12 @@ char** CompanionBand::GetMetadataDomainList() {
 }
 
 CPLErr CompanionBand::SetMetadata(char** items, const char* domain) {
-    Load();
+    if (!MayChange()) return CE_Failure;
     return GDALPamRasterBand::SetMetadata(items, domain);
 }
 
 CPLErr CompanionBand::SetMetadataItem(const char* name, const char* value, const char* domain) {
-    Load();
+    if (!MayChange()) return CE_Failure;
     return GDALPamRasterBand::SetMetadataItem(name, value, domain);
 }
 
@@ -227,6 +239,11 @@ CPLErr CompanionBand::GetHistogram(double lower, double upper, int buckets, GUIn
                                    int includeOutside, int approximate, GDALProgressFunc progress,
                                    void* progressData) {
     Load();
+    // GDAL's sidecar keeps what was computed.
+    if (poDS && static_cast<CompanionDataset*>(poDS)->IsShared())
+        // NOLINTNEXTLINE(bugprone-parent-virtual-call): for this reason.
+        return GDALRasterBand::GetHistogram(lower, upper, buckets, counts, includeOutside,
+                                            approximate, progress, progressData);
     return GDALPamRasterBand::GetHistogram(lower, upper, buckets, counts, includeOutside,
                                            approximate, progress, progressData);
 }
@@ -241,7 +258,7 @@ CPLErr CompanionBand::GetDefaultHistogram(double* lower, double* upper, int* buc
 
 CPLErr CompanionBand::SetDefaultHistogram(double lower, double upper, int buckets,
                                           GUIntBig* counts) {
-    Load();
+    if (!MayChange()) return CE_Failure;
     return GDALPamRasterBand::SetDefaultHistogram(lower, upper, buckets, counts);
 }
 
@@ -251,7 +268,7 @@ GDALRasterAttributeTable* CompanionBand::GetDefaultRAT() {
 }
 
 CPLErr CompanionBand::SetDefaultRAT(const GDALRasterAttributeTable* table) {
-    Load();
+    if (!MayChange()) return CE_Failure;
     return GDALPamRasterBand::SetDefaultRAT(table);
 }
 

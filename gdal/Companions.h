@@ -4,6 +4,9 @@
 // Behind a network every companion that is looked for costs requests, where most readers want the
 // pixels alone. Everything that GDAL answers from the sidecar, or keeps there, passes through here
 // first, so that nobody sees a dataset without it.
+//
+// One thread at a time. Of a shared dataset, whose sidecar was looked for when it was opened, any
+// number of threads may ask; what is computed of its pixels is kept nowhere.
 #ifndef ZMC_GDAL_COMPANIONS_H
 #define ZMC_GDAL_COMPANIONS_H
 
@@ -19,6 +22,10 @@ class CompanionDataset : public GDALPamDataset {
 public:
     // Does what was put off. What it throws goes to GDAL as a failure.
     void Load() const;
+    // Whether threads share this dataset (Dataset::Share): then nothing of it changes any more.
+    bool IsShared() const { return shared; }
+    // The same as Load; false, reported to GDAL, where the dataset is shared.
+    bool MayChange() const;
 
     using GDALDataset::SetGCPs;
     const OGRSpatialReference* GetSpatialRef() const override;
@@ -41,8 +48,10 @@ public:
 protected:
     // `look` is called by the first Load.
     void PutOff(std::function<void()> look) { waiting = std::move(look); }
+    void SetShared() { shared = true; }
 
 private:
+    bool shared = false;
     mutable std::function<void()> waiting;  // empty once it was done
 };
 
@@ -90,6 +99,7 @@ public:
 
 private:
     void Load() const;
+    bool MayChange() const;
 };
 
 }  // namespace zmcgdal

@@ -132,7 +132,8 @@ OpenFile::OpenFile(const std::string& fileName, std::shared_ptr<zelm::files::Byt
       raster(fileName, source, info.header, options.keepCopies),
       pixels(fileName, raster.WithoutDocument(), info.header, false),
       tiles(raster.Remote() ? pixels : raster, info,
-            GdalTypeOf(info.header.pixelType, options.signedByteAs), options.missingAsZeros),
+            {GdalTypeOf(info.header.pixelType, options.signedByteAs), options.missingAsZeros,
+             options.threads, options.shared}),
       archive(raster, info.HasMetadataDocument(), limits),
       renewsStatistics(options.statistics) {
     if (raster.Remote()) raster.Remote()->SetDocument(info.MetaDocumentOffset());
@@ -260,6 +261,38 @@ void Dataset::AddOverviews() {
     overviewsMade = true;
 }
 
+// GDAL's objects for what stands beside a file, or follows from several bands, serve one thread.
+bool Dataset::IsAllOurs() {
+    if (eAccess == GA_Update || creation || kept || main || file->raster.Remote()) return false;
+    if (oOvManager.HaveMaskFile()) return false;
+    if (Overviews().empty() && GetRasterBand(1)->GetOverviewCount() > 0) return false;
+    for (int number = 1; number <= nBands; ++number)
+        if (!static_cast<Band*>(GetRasterBand(number))->MaskIsOurs()) return false;
+    return true;
+}
+
+// All that is made at the first use of it otherwise, but for what has a lock.
+void Dataset::Prepare() {
+    DescribeFile();
+    for (int number = 1; number <= nBands; ++number) BandOf(number);
+    GetGCPs();
+    for (const auto& coarser : Overviews()) coarser->Prepare();
+    SetShared();
+#if GDAL_VERSION_NUM >= GDAL_COMPUTE_VERSION(3, 10, 0)
+    nOpenFlags = GDAL_OF_RASTER | GDAL_OF_THREAD_SAFE;
+    for (const OGRSpatialReference* const told : {GetSpatialRef(), GetGCPSpatialRef()})
+        if (told && !main)
+            const_cast<OGRSpatialReference*>(told)->AssignAndSetThreadSafe(
+                OGRSpatialReference(*told));
+#endif
+}
+
+bool Dataset::Share() {
+    if (!IsAllOurs()) return false;
+    Prepare();
+    return true;
+}
+
 void Dataset::DescribeFile() {
     const zmchost::PyramidHeader& header = file->info.header;
     const auto set = [&](const char* name, const std::string& value) {
@@ -297,6 +330,7 @@ CPLErr Dataset::NamedAsSpool(const std::function<CPLErr()>& make) {
 
 CPLErr Dataset::CreateMaskBand(int flags) {
     return Reporting(CE_Failure, [&] {
+        if (!MayChange()) return CE_Failure;
         return NamedAsSpool([&] { return GDALPamDataset::CreateMaskBand(flags); });
     });
 }
@@ -428,6 +462,7 @@ CPLErr Dataset::TrySaveXML() {
 
 void Dataset::ClearStatistics() {
     Reported([&] {
+        if (!MayChange()) return;
         if (creation || main) return GDALPamDataset::ClearStatistics();
         for (int number = 1; number <= nBands; ++number)
             static_cast<Band*>(GetRasterBand(number))->ForgetStatistics();
@@ -470,10 +505,30 @@ std::string Dataset::SidecarText() {
     return text ? text.get() : "";
 }
 
-bool Dataset::ReadsDirectly(int x, int y, int width, int height) const {
-    // Blocks may wait in the cache to be written.
-    const bool quiet = eAccess != GA_Update || (creation && creation->IsSealed());
+// Whether no block of the window waits in the cache to be written.
+bool Dataset::IsWritten(const zelm::Rectangle& window, std::span<const int> bandNumbers) {
+    const std::uint32_t side = file->info.header.tileSize;
+    const auto lastColumn = static_cast<std::uint32_t>((window.Right() - 1) / side);
+    const auto lastRow = static_cast<std::uint32_t>((window.Bottom() - 1) / side);
+    return std::all_of(bandNumbers.begin(), bandNumbers.end(), [&](int number) {
+        auto* const band = static_cast<Band*>(BandOf(number));
+        for (std::uint32_t row = window.y / side; row <= lastRow; ++row)
+            for (std::uint32_t column = window.x / side; column <= lastColumn; ++column)
+                if (band->HasDirtyBlock(static_cast<int>(column), static_cast<int>(row)))
+                    return false;
+        return true;
+    });
+}
+
+bool Dataset::ReadsDirectly(int x, int y, int width, int height, std::span<const int> bandNumbers) {
+    const zelm::Rectangle window = RectangleOf(x, y, width, height);
+    const bool together =
+        !creation && file->tiles.ThreadsFor(window, static_cast<int>(bandNumbers.size())) > 1;
+    const bool quiet = eAccess != GA_Update || (creation && creation->IsSealed()) ||
+                       (together && IsWritten(window, bandNumbers));
     if (!quiet || bForceCachedIO) return false;
+    // Threads need no lock for this.
+    if (IsShared()) return true;
     // Blocks of such tiles would fill the cache.
     if (!file->tiles.IsHeld(file->tiles.TileAt(level, 0, 0))) return true;
     // In 64 bits: a raster may have as many columns as an int can tell.
@@ -496,6 +551,7 @@ CPLStringList* Dataset::OwnDomain(const char* domain) {
 
 char** Dataset::GetMetadataDomainList() {
     return Reporting<char**>(nullptr, [&] {
+        const std::lock_guard lock(file->late);
         return BuildMetadataDomainList(CompanionDataset::GetMetadataDomainList(), TRUE,
                                        kStructureDomain, kOwnDomain, nullptr);
     });
@@ -503,6 +559,7 @@ char** Dataset::GetMetadataDomainList() {
 
 char** Dataset::GetMetadata(const char* domain) {
     return Reporting<char**>(nullptr, [&] {
+        const std::lock_guard lock(file->late);
         if (CPLStringList* const own = OwnDomain(domain)) return own->List();
         return kept ? ScaledDomain(domain) : CompanionDataset::GetMetadata(domain);
     });
@@ -510,6 +567,7 @@ char** Dataset::GetMetadata(const char* domain) {
 
 const char* Dataset::GetMetadataItem(const char* name, const char* domain) {
     return Reporting<const char*>(nullptr, [&] {
+        const std::lock_guard lock(file->late);
         if (CPLStringList* const own = OwnDomain(domain)) return own->FetchNameValue(name);
         if (kept) return CSLFetchNameValue(ScaledDomain(domain), name);
         return CompanionDataset::GetMetadataItem(name, domain);
@@ -559,6 +617,7 @@ int Dataset::GetGCPCount() {
 const GDAL_GCP* Dataset::GetGCPs() {
     return Reporting<const GDAL_GCP*>(nullptr, [&]() -> const GDAL_GCP* {
         if (!main) return CompanionDataset::GetGCPs();
+        if (IsShared()) return points.data();
         const GDAL_GCP* const given = main->GetGCPs();
         points.assign(given, given + main->GetGCPCount());
         for (GDAL_GCP& point : points) {
@@ -576,8 +635,10 @@ const OGRSpatialReference* Dataset::GetGCPSpatialRef() const {
 }
 
 char** Dataset::GetFileList() {
-    return Reporting<char**>(
-        nullptr, [&] { return kept ? kept->GetFileList() : CompanionDataset::GetFileList(); });
+    return Reporting<char**>(nullptr, [&] {
+        const std::lock_guard lock(file->late);
+        return kept ? kept->GetFileList() : CompanionDataset::GetFileList();
+    });
 }
 
 CPLErr Dataset::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, void* data,
@@ -624,7 +685,8 @@ CPLErr Dataset::ReadOrWrite(GDALRWFlag mode, int x, int y, int width, int height
         planned.emplace(*file, level, RectangleOf(x, y, width, height),
                         std::span(bandMap, static_cast<std::size_t>(bandCount)));
     if (mode == GF_Read && bufferWidth == width && bufferHeight == height &&
-        ReadsDirectly(x, y, width, height)) {
+        ReadsDirectly(x, y, width, height,
+                      std::span(bandMap, static_cast<std::size_t>(bandCount)))) {
         std::vector<int> bands(bandMap, bandMap + bandCount);
         for (int& band : bands) --band;
         const Target target{data, bufferType, pixelSpace, lineSpace, bandSpace};
@@ -677,6 +739,7 @@ CPLErr Dataset::IBuildOverviews(const char* resampling, int overviewCount, const
         return CE_Failure;
     }
     return Reporting(CE_Failure, [&] {
+        if (!MayChange()) return CE_Failure;
         if (creation) return creation->ChooseLevels(*this, resampling, overviewCount, factors);
         if (file->info.bytesMissing > 0) {
             CPLError(CE_Failure, CPLE_NotSupported,

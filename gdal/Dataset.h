@@ -5,6 +5,9 @@
 // descriptions and the like live in the sidecar file (.aux.xml), which is written only after
 // something has been set, or inside of the file (host/file/EmbeddedItems.h), for what the sidecar
 // does not tell.
+//
+// One thread at a time uses a dataset with all that belongs to it, and large windows are read by
+// more of its own (WindowReader.h). One that is shared (Share) is used by any number.
 #ifndef ZMC_GDAL_DATASET_H
 #define ZMC_GDAL_DATASET_H
 
@@ -13,6 +16,7 @@
 
 #include <functional>
 #include <memory>
+#include <mutex>
 #include <span>
 #include <string>
 #include <utility>
@@ -22,7 +26,7 @@
 #include "gdal/Companions.h"
 #include "gdal/LazyRaster.h"
 #include "gdal/Options.h"
-#include "gdal/TileReader.h"
+#include "gdal/WindowReader.h"
 #include "host/file/Limits.h"
 #include "host/file/PyramidFileInfo.h"
 
@@ -61,10 +65,13 @@ public:
     const zmchost::Limits limits = zmchost::Limits::Current();
     LazyRaster raster;
     LazyRaster pixels;  // without its metadata document if it lies behind a network, else the same
-    TileReader tiles;
+    WindowReader tiles;
     Archive archive;
     const bool renewsStatistics;  // OpenOptions::statistics
     bool isPlanned = false;       // a PlannedRead lives
+    // Held while something is made or looked up that threads of a shared dataset may ask for at
+    // once and that is not made when it is opened; never while pixels are read.
+    std::recursive_mutex late;
 };
 
 // As long as it lives, that window is what is read of a file behind a network. One within another
@@ -89,6 +96,14 @@ public:
     // shows what it knows of all its pixels. Throws zmchost::Error if there is no such overview.
     static std::unique_ptr<Dataset> FromOverview(std::unique_ptr<Dataset> raster, int overview);
     ~Dataset() override;
+
+    // Lets any number of threads read this dataset, its bands, levels and masks at once, and ask
+    // what they know. No lock is held while pixels are read, but for windows that GDAL puts
+    // together from its blocks, which are those of another size than their buffer; changes are
+    // refused. From GDAL 3.10 on GDAL is told. False, and nothing is different, where that cannot
+    // be: the dataset can be written to, lies behind a network, or needs objects of GDAL's own for
+    // what stands beside it. Its file was opened with OpenOptions::shared.
+    bool Share();
 
     // Shows no overviews.
     void StandAlone() { overviewsMade = true; }
@@ -133,8 +148,9 @@ public:
     void ForgetChanges() { nPamFlags &= ~GPF_DIRTY; }
 
     // True if pixels of this window are better read past GDAL's block cache: it is not a sliver of
-    // the tiles that it touches, or these are very large; and no block waits to be written.
-    bool ReadsDirectly(int x, int y, int width, int height) const;
+    // the tiles that it touches, or these are very large; and no block waits to be written. Of a
+    // file that is open for update only windows that several threads read are. Bands count from 1.
+    bool ReadsDirectly(int x, int y, int width, int height, std::span<const int> bandNumbers);
 
     // Tells whoever opens the file from now on that its records may be of other pixels than it
     // has: on the disk before the first pixel is written, until FlushCache has written all. A
@@ -200,6 +216,9 @@ private:
     Dataset(std::shared_ptr<OpenFile> openFile, std::uint32_t levelShown, GDALAccess access,
             Dataset* mainDataset);
     void AddBands();
+    bool IsAllOurs();
+    void Prepare();
+    bool IsWritten(const zelm::Rectangle& window, std::span<const int> bandNumbers);
     void IgnoreCompanions();
     void TakeEmbedded(char** siblings);
     void AddOverviews();

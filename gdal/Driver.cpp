@@ -79,13 +79,24 @@ std::unique_ptr<Dataset> Show(std::shared_ptr<OpenFile> file, const std::string&
     WarnIfIncomplete(*dataset, layout, options.missingAsZeros);
     if (options.overview) dataset = Dataset::FromOverview(std::move(dataset), *options.overview);
     if (options.alone) dataset->StandAlone();
+    if (options.shared) dataset->Share();
     return dataset;
+}
+
+// Where it is asked for and the dataset cannot do it, GDAL opens one for each thread.
+bool IsToBeShared([[maybe_unused]] const GDALOpenInfo& info) {
+#if GDAL_VERSION_NUM >= GDAL_COMPUTE_VERSION(3, 10, 0)
+    return (info.nOpenFlags & GDAL_OF_THREAD_SAFE) != 0;
+#else
+    return false;
+#endif
 }
 
 std::unique_ptr<Dataset> OpenDataset(GDALOpenInfo& info) {
     const std::string name = info.pszFilename;
     if (!IsVirtualName(name)) PutInOrder(name, info.eAccess);
-    const OpenOptions options = OpenOptionsFrom(info.papszOpenOptions);
+    OpenOptions options = OpenOptionsFrom(info.papszOpenOptions);
+    options.shared = IsToBeShared(info);
     return Show(std::make_shared<OpenFile>(name, info.eAccess, options), name, info, options);
 }
 

@@ -24,14 +24,18 @@ public:
 
     // The first one that was caught; empty if there was none.
     const std::string& Text() const { return text; }
+    // Its number; CPLE_None if there was none.
+    CPLErrorNum Number() const { return number; }
 
 private:
     const CPLErr least;
     std::string text;
+    CPLErrorNum number = CPLE_None;
 
-    static void CPL_STDCALL Take(CPLErr kind, CPLErrorNum, const char* message) {
+    static void CPL_STDCALL Take(CPLErr kind, CPLErrorNum what, const char* message) {
         auto* const self = static_cast<ErrorCatcher*>(CPLGetErrorHandlerUserData());
         if (kind < self->least || !self->text.empty()) return;
+        self->number = what;
         try {
             self->text = message;
         } catch (const std::bad_alloc&) {

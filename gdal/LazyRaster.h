@@ -4,6 +4,9 @@
 // module reads the file's statistics as well. What it refuses then fails the read that asked. The
 // bytes come from the source that the header came from, so that a file that takes the name in
 // between is not met; and what the module finds in it has to be what the header said.
+//
+// One thread at a time, but for the name, the size and the network. Several may each have one of
+// the same file (Again).
 #ifndef ZMC_GDAL_LAZYRASTER_H
 #define ZMC_GDAL_LAZYRASTER_H
 
@@ -84,6 +87,10 @@ public:
     std::shared_ptr<zelm::files::ByteSource> WithoutDocument() const {
         if (!remote) return source;
         return std::make_shared<ClippedSource>(remote, header.tileDataEnd);
+    }
+    // The raster once more, with a reader of its own, as far as its tiles reach.
+    LazyRaster Again() const {
+        return {name, std::make_shared<ClippedSource>(source, header.tileDataEnd), header, false};
     }
     // Null where the file lies behind no network.
     RemoteSource* Remote() const { return remote.get(); }

@@ -36,7 +36,7 @@ void VisitSampleType(GDALDataType type, Visitor&& visit) {
 
 }  // namespace
 
-MaskBand::MaskBand(Band& maskedBand) : band(maskedBand) {
+MaskBand::MaskBand(Band& maskedBand) : band(maskedBand), number(maskedBand.GetBand()) {
     poDS = band.GetDataset();
     nBand = 0;
     nRasterXSize = band.GetXSize();
@@ -57,7 +57,7 @@ CPLErr MaskBand::ReadMask(int x, int y, int width, int height, unsigned char* ou
     const GDALDataType type = band.GetRasterDataType();
     const auto sampleSize = static_cast<std::size_t>(GDALGetDataTypeSizeBytes(type));
     const auto count = static_cast<std::size_t>(width) * static_cast<std::size_t>(height);
-    pixels.resize(count * sampleSize);
+    std::vector<unsigned char> pixels(count * sampleSize);
     GDALRasterIOExtraArg extra;
     INIT_RASTERIO_EXTRA_ARG(extra);
     const CPLErr result = band.RasterIO(GF_Read, x, y, width, height, pixels.data(), width, height,
@@ -88,7 +88,7 @@ CPLErr MaskBand::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height,
     return Reporting(CE_Failure, [&] {
         const bool plain = mode == GF_Read && bufferWidth == width && bufferHeight == height &&
                            bufferType == GDT_Byte && pixelSpace == 1 && lineSpace >= 0;
-        if (!plain || !band.Owner().ReadsDirectly(x, y, width, height))
+        if (!plain || !band.Owner().ReadsDirectly(x, y, width, height, std::span(&number, 1)))
             return GDALRasterBand::IRasterIO(mode, x, y, width, height, data, bufferWidth,
                                              bufferHeight, bufferType, pixelSpace, lineSpace,
                                              extra);

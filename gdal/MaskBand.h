@@ -5,6 +5,8 @@
 // those go by a band's place in the request and by the interleave word of the file, which for tiles
 // of several bands is not the layout that they are delivered in, and because they know no-data
 // values as doubles only, which cannot tell neighbours among large 64-bit integers.
+//
+// Any number of threads where the band's dataset is shared.
 #ifndef ZMC_GDAL_MASKBAND_H
 #define ZMC_GDAL_MASKBAND_H
 
@@ -16,7 +18,7 @@
 
 namespace zmcgdal {
 
-class MaskBand final : public GDALRasterBand {
+class MaskBand final : public SharedBlocks<GDALRasterBand> {
 public:
     explicit MaskBand(Band& maskedBand);
 
@@ -35,7 +37,7 @@ protected:
 
 private:
     Band& band;
-    std::vector<unsigned char> pixels;
+    const int number;  // of the band, from 1
 
     // Reads a window of the band and judges it; `stride` bytes lie between the lines of `out`.
     CPLErr ReadMask(int x, int y, int width, int height, unsigned char* out, std::size_t stride);

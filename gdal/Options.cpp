@@ -11,6 +11,7 @@
 
 #include "host/base/Error.h"
 #include "host/base/ScaledNumber.h"
+#include "host/base/Threads.h"
 
 namespace zmcgdal {
 
@@ -25,6 +26,7 @@ const char* const kOpenOptionsXml = R"(<OpenOptionList>
     <Value>ZEROS</Value>
   </Option>
   <Option name='STATISTICS' type='boolean' default='NO' description='Whether closing renews the statistics and histograms of bands whose pixels were changed'/>
+  <Option name='NUM_THREADS' type='string' default='1' description='Threads that read a large window together: a number or ALL_CPUS. The default is that of the configuration option GDAL_NUM_THREADS, if that is set'/>
   <Option name='OVERVIEW_LEVEL' type='string' description='Number of the overview, from 0, to show in place of the raster; "2 only" without the coarser ones, NONE for the raster without any'/>
   <Option name='REMOTE_CACHE' type='string' default='64M' description='Bytes of a file behind a network that are kept, in bytes or with K, M or G'/>
 </OpenOptionList>)";
@@ -119,6 +121,15 @@ bool TakeCount(CSLConstList options, const char* name, const char* automatic, Nu
     return true;
 }
 
+std::uint32_t ThreadsFrom(CSLConstList options) {
+    const char* const value =
+        CSLFetchNameValueDef(options, "NUM_THREADS", CPLGetConfigOption("GDAL_NUM_THREADS", "1"));
+    const auto count = EQUAL(value, "ALL_CPUS") ? zmchost::AvailableThreads() : ParseCount(value);
+    if (!count) CPLError(CE_Warning, CPLE_IllegalArg, "Invalid value for NUM_THREADS: %s", value);
+    return static_cast<std::uint32_t>(
+        std::clamp<std::uint64_t>(count.value_or(1), 1, zmchost::kMaxThreads));
+}
+
 // Words of GDAL's own: "2", "2 only", "NONE" for the raster without overviews.
 void TakeOverview(const std::string& word, OpenOptions& parsed) {
     int number = 0;
@@ -137,6 +148,7 @@ OpenOptions OpenOptionsFrom(CSLConstList options) {
     parsed.keepCopies = CPLFetchBool(options, "KEEP_COPIES", false);
     parsed.missingAsZeros = EQUAL(CSLFetchNameValueDef(options, "MISSING", "FAIL"), "ZEROS") != 0;
     parsed.statistics = CPLFetchBool(options, "STATISTICS", false);
+    parsed.threads = ThreadsFrom(options);
     TakeOverview(CSLFetchNameValueDef(options, "OVERVIEW_LEVEL", ""), parsed);
     if (const char* const cache = CSLFetchNameValue(options, "REMOTE_CACHE")) {
         const auto size = ParseSize(cache);

@@ -27,8 +27,12 @@ struct OpenOptions {
     std::optional<int> overview;
     bool alone = false;  // without coarser overviews
     std::uint64_t remoteBytes = kRemoteBytes;
+    std::uint32_t threads = 1;  // that read a large window
+    bool shared = false;        // threads are to read one dataset at once (Dataset::Share)
 };
 
+// Where NUM_THREADS is not among them, GDAL's configuration option GDAL_NUM_THREADS tells it. A
+// number of threads that cannot be understood is a warning of GDAL's, and counts for one.
 OpenOptions OpenOptionsFrom(CSLConstList options);
 
 // Names of GDAL's overview methods and of this project's, in any case.

@@ -138,7 +138,7 @@ zelm::files::Identity RemoteSource::DoIdentify() const {
 std::shared_ptr<RemoteSource> ClippedSource::RemoteOf(
     const std::shared_ptr<zelm::files::ByteSource>& source) {
     const auto* const clipped = dynamic_cast<ClippedSource*>(source.get());
-    return clipped ? clipped->source : std::dynamic_pointer_cast<RemoteSource>(source);
+    return std::dynamic_pointer_cast<RemoteSource>(clipped ? clipped->source : source);
 }
 
 Transfer ClippedSource::DoReadAt(std::uint64_t offset, void* buffer, std::size_t size) {

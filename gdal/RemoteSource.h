@@ -69,10 +69,11 @@ private:
     std::string trouble;
 };
 
-// A remote source that ends at `end` at the latest, for reading.
+// Another source that ends at `end` at the latest, for reading. Any thread, if it may call that
+// one.
 class ClippedSource final : public zelm::files::ByteSource {
 public:
-    ClippedSource(std::shared_ptr<RemoteSource> whole, std::uint64_t endOffset)
+    ClippedSource(std::shared_ptr<zelm::files::ByteSource> whole, std::uint64_t endOffset)
         : source(std::move(whole)), end(endOffset) {}
 
     // The remote source that a source is, or a part of; else null.
@@ -85,7 +86,7 @@ protected:
     zelm::files::Identity DoIdentify() const override;
 
 private:
-    const std::shared_ptr<RemoteSource> source;
+    const std::shared_ptr<zelm::files::ByteSource> source;
     const std::uint64_t end;
 };
 

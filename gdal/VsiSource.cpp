@@ -1,6 +1,7 @@
 #include "gdal/VsiSource.h"
 
 #include <cpl_error.h>
+#include <cpl_vsi_virtual.h>
 
 #include <atomic>
 #include <cerrno>
@@ -33,6 +34,8 @@ const char* AccessFor(OpenMode mode) {
     if (mode == OpenMode::Create) return "w+b";
     return mode == OpenMode::Update ? "r+b" : "rb";
 }
+
+VSIVirtualHandle& HandleOf(VSILFILE* file) { return *reinterpret_cast<VSIVirtualHandle*>(file); }
 
 // Null where the file has to be read from its beginning on.
 std::shared_ptr<ByteSource> OpenRemote(const std::string& name, std::uint64_t bytes) {
@@ -74,7 +77,11 @@ std::shared_ptr<VsiSource> VsiSource::Open(const std::string& name, OpenMode mod
 }
 
 VsiSource::VsiSource(std::string fileName, VSILFILE* opened, bool isWritable)
-    : name(std::move(fileName)), writable(isWritable), number(NextNumber()), handle(opened) {}
+    : name(std::move(fileName)),
+      writable(isWritable),
+      readsAnywhere(!isWritable && HandleOf(opened).HasPRead()),
+      number(NextNumber()),
+      handle(opened) {}
 
 VsiSource::~VsiSource() { VSIFCloseL(handle); }
 
@@ -98,8 +105,14 @@ Transfer VsiSource::ReadHere(std::uint64_t offset, void* buffer, std::size_t siz
 }
 
 Transfer VsiSource::DoReadAt(std::uint64_t offset, void* buffer, std::size_t size) {
+    if (ReadPast(offset, buffer, size)) return {size};
     const std::lock_guard lock(mutex);
     return ReadHere(offset, buffer, size);
+}
+
+// What is not whole is asked for again by the handle's position, which tells the end of a file.
+bool VsiSource::ReadPast(std::uint64_t offset, void* buffer, std::size_t size) const {
+    return readsAnywhere && HandleOf(handle).PRead(buffer, size, offset) == size;
 }
 
 // A request for several ranges answers for all or none; those that it did not fill are read singly.

@@ -2,8 +2,9 @@
 // archive, behind a URL.
 //
 // A handle of GDAL has a position and serves one thread at a time, so transfers go on one after the
-// other, behind a lock; any thread may call. Several ranges at once are one request where the file
-// system has such (VSIFReadMultiRangeL). It stays the file that was opened as far as the file
+// other, behind a lock, except reads of files that are open for reading in file systems which can
+// read at any place (PRead); any thread may call. Several ranges at once are one request where the
+// file system has such (VSIFReadMultiRangeL). It stays the file that was opened as far as the file
 // system sees to that: those that look a name up at each request have no such thing.
 #ifndef ZMC_GDAL_VSISOURCE_H
 #define ZMC_GDAL_VSISOURCE_H
@@ -54,15 +55,18 @@ protected:
 
 private:
     VsiSource(std::string fileName, VSILFILE* opened, bool isWritable);
+    // Without the lock. False where it is to be read with it.
+    bool ReadPast(std::uint64_t offset, void* buffer, std::size_t size) const;
     // With the lock held.
     zelm::files::Transfer ReadHere(std::uint64_t offset, void* buffer, std::size_t size) const;
     int SizeHere(std::uint64_t& size) const;
 
     const std::string name;
     const bool writable;
+    const bool readsAnywhere;
     const std::uint64_t number;
-    mutable std::mutex mutex;  // guards what follows, and the position of the handle
     VSILFILE* const handle;
+    mutable std::mutex mutex;  // guards what follows, and the position of the handle
     std::int64_t changes = 0;
 };
 

@@ -1,0 +1,169 @@
+#include "gdal/JobCrew.h"
+
+#include <cpl_error.h>
+
+#include <atomic>
+#include <exception>
+#include <mutex>
+#include <optional>
+#include <string>
+#include <thread>
+#include <utility>
+#include <vector>
+
+#include "gdal/ErrorCatcher.h"
+#include "gdal/Reporting.h"
+
+namespace zmcgdal {
+namespace {
+
+struct Failed {
+    std::uint64_t job = 0;
+    CPLErrorNum number = CPLE_AppDefined;
+    std::string text;
+};
+
+// Nothing if the job was done. What GDAL is told of it stays here.
+std::optional<Failed> Try(const Worker& worker, std::uint64_t job) {
+    const ErrorCatcher errors(CE_Failure);
+    if (Reporting(false, [&] { return worker(job); })) return std::nullopt;
+    if (errors.Text().empty()) return Failed{job, CPLE_AppDefined, "it failed"};
+    return Failed{job, errors.Number(), errors.Text()};
+}
+
+class Crew {
+public:
+    Crew(std::uint64_t jobCount, const MakeWorker& make, const ShareDone& share)
+        : jobs(jobCount), makeWorker(make), shareDone(share) {}
+
+    bool Run(std::uint32_t threads);
+
+private:
+    const std::uint64_t jobs;
+    const MakeWorker& makeWorker;
+    const ShareDone& shareDone;
+    std::atomic<std::uint64_t> next{0};
+    std::atomic<std::uint64_t> done{0};
+    std::atomic<bool> ended{false};
+    std::uint64_t told = 0;  // jobs; the caller's alone, as is the next
+    bool cancelled = false;
+    std::mutex mutex;                 // guards what follows
+    std::vector<std::uint64_t> left;  // jobs that a thread had no memory for
+    std::optional<Failed> first;      // of the failures, by the number of the job
+
+    std::optional<std::uint64_t> Take();
+    void Keep(Failed&& failed);
+    void Help() noexcept;
+    void WorkWith(const Worker& worker);
+    void Lead(const Worker& worker);
+    void DoLeft(const Worker& worker);
+    void Tell();
+};
+
+std::optional<std::uint64_t> Crew::Take() {
+    if (ended) return std::nullopt;
+    const std::uint64_t job = next++;
+    return job < jobs ? std::optional(job) : std::nullopt;
+}
+
+void Crew::Keep(Failed&& failed) {
+    const std::lock_guard lock(mutex);
+    if (!first || failed.job < first->job) first = std::move(failed);
+    ended = true;
+}
+
+// There is room for one job of each thread.
+void Crew::WorkWith(const Worker& worker) {
+    while (const auto job = Take()) {
+        std::optional<Failed> failed = Try(worker, *job);
+        if (failed && failed->number != CPLE_OutOfMemory) return Keep(std::move(*failed));
+        if (failed) {
+            const std::lock_guard lock(mutex);
+            left.push_back(*job);
+            return;
+        }
+        ++done;
+    }
+}
+
+// Whoever cannot begin leaves all jobs to the others.
+void Crew::Help() noexcept {
+    try {
+        WorkWith(makeWorker());
+    } catch (const std::exception&) {
+        return;
+    }
+}
+
+void Crew::Tell() {
+    const std::uint64_t now = done;
+    if (cancelled || !shareDone || now == told) return;
+    told = now;
+    if (shareDone(static_cast<double>(now) / static_cast<double>(jobs))) return;
+    cancelled = true;
+    ended = true;
+}
+
+void Crew::Lead(const Worker& worker) {
+    while (const auto job = Take()) {
+        if (std::optional<Failed> failed = Try(worker, *job)) return Keep(std::move(*failed));
+        ++done;
+        Tell();
+    }
+}
+
+void Crew::DoLeft(const Worker& worker) {
+    for (const std::uint64_t job : left) {
+        if (ended) return;
+        if (std::optional<Failed> failed = Try(worker, job)) return Keep(std::move(*failed));
+        ++done;
+        Tell();
+    }
+}
+
+// Joins its threads when it goes, whatever happened.
+class Helpers {
+public:
+    // As many as can be had.
+    Helpers(std::uint32_t count, const std::function<void()>& help) {
+        try {
+            threads.reserve(count);
+            while (threads.size() < count) threads.emplace_back(help);
+        } catch (const std::exception&) {
+            return;
+        }
+    }
+    ~Helpers() {
+        for (std::thread& thread : threads) thread.join();
+    }
+    Helpers(const Helpers&) = delete;
+    Helpers& operator=(const Helpers&) = delete;
+
+private:
+    std::vector<std::thread> threads;
+};
+
+bool Crew::Run(std::uint32_t threads) {
+    left.reserve(threads);
+    const Worker own = makeWorker();
+    {
+        const Helpers helpers(threads - 1, [this] { Help(); });
+        Lead(own);
+    }
+    DoLeft(own);
+    Tell();
+    if (cancelled)
+        CPLError(CE_Failure, CPLE_UserInterrupt, "cancelled");
+    else if (first)
+        CPLError(CE_Failure, first->number, "%s", first->text.c_str());
+    return !cancelled && !first;
+}
+
+}  // namespace
+
+bool RunJobs(std::uint64_t jobs, std::uint32_t threads, const MakeWorker& makeWorker,
+             const ShareDone& shareDone) {
+    return Crew(jobs, makeWorker, shareDone).Run(threads);
+}
+
+}  // namespace zmcgdal
