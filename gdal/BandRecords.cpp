@@ -114,7 +114,7 @@ void Band::SetOldRecords(const RecordCounts& counts) {
 
 // A sidecar without any is not written for this.
 void Band::DropSidecarStatistics() {
-    char** const items = CompanionBand::GetMetadata("");
+    const Items items = CompanionBand::GetMetadata("");
     if (HasStatistics(items)) CompanionBand::SetMetadata(WithoutStatistics(items).List(), "");
 }
 
@@ -183,8 +183,8 @@ char** Band::GetMetadataDomainList() {
     });
 }
 
-char** Band::GetMetadata(const char* domain) {
-    return Reporting<char**>(nullptr, [&]() -> char** {
+Items Band::GetMetadata(const char* domain) {
+    return Reporting<Items>(nullptr, [&]() -> Items {
         if (TellsStructure(domain)) return structure.List();
         if (!IsDefaultDomain(domain) || StatisticsItems().Count() == 0)
             return CompanionBand::GetMetadata(domain);
@@ -233,7 +233,7 @@ CPLErr Band::SetMetadataItem(const char* name, const char* value, const char* do
 }
 
 // Those who add an item give back all that they were shown.
-CPLErr Band::SetMetadata(char** items, const char* domain) {
+CPLErr Band::SetMetadata(Items items, const char* domain) {
     return Reporting(CE_Failure, [&] {
         if (!IsDefaultDomain(domain) || !Stored()) return CompanionBand::SetMetadata(items, domain);
         CPLStringList kept(CSLDuplicate(items));
