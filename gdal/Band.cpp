@@ -224,7 +224,7 @@ CPLErr Band::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, voi
 }
 
 CPLErr Band::AdviseRead(int x, int y, int width, int height, int bufferWidth, int bufferHeight,
-                        GDALDataType bufferType, char** options) {
+                        GDALDataType bufferType, Items options) {
     return owner.AdviseRead(x, y, width, height, bufferWidth, bufferHeight, bufferType, 1, &nBand,
                             options);
 }

@@ -76,10 +76,10 @@ public:
     bool IsEdited() const { return edited; }
 
     char** GetMetadataDomainList() override;
-    char** GetMetadata(const char* domain = "") override;
+    Items GetMetadata(const char* domain = "") override;
     const char* GetMetadataItem(const char* name, const char* domain = "") override;
 
-    CPLErr SetMetadata(char** items, const char* domain = "") override;
+    CPLErr SetMetadata(Items items, const char* domain = "") override;
     CPLErr SetMetadataItem(const char* name, const char* value, const char* domain = "") override;
 
     double GetMinimum(int* success = nullptr) override;
@@ -96,7 +96,7 @@ public:
                                GUIntBig* counts) override;
 
     CPLErr AdviseRead(int x, int y, int width, int height, int bufferWidth, int bufferHeight,
-                      GDALDataType bufferType, char** options) override;
+                      GDALDataType bufferType, Items options) override;
 
 protected:
     CPLErr IReadBlock(int blockX, int blockY, void* data) override;

@@ -115,7 +115,7 @@ void Band::SetOldRecords(const RecordCounts& counts) {
 
 // A sidecar without any is not written for this.
 void Band::DropSidecarStatistics() {
-    char** const items = CompanionBand::GetMetadata("");
+    const Items items = CompanionBand::GetMetadata("");
     if (HasStatistics(items)) CompanionBand::SetMetadata(WithoutStatistics(items).List(), "");
 }
 
@@ -186,8 +186,8 @@ char** Band::GetMetadataDomainList() {
     });
 }
 
-char** Band::GetMetadata(const char* domain) {
-    return Reporting<char**>(nullptr, [&]() -> char** {
+Items Band::GetMetadata(const char* domain) {
+    return Reporting<Items>(nullptr, [&]() -> Items {
         const std::lock_guard lock(owner.File().late);
         if (TellsStructure(domain)) return structure.List();
         if (!IsDefaultDomain(domain) || StatisticsItems().Count() == 0)
@@ -243,7 +243,7 @@ CPLErr Band::SetMetadataItem(const char* name, const char* value, const char* do
 }
 
 // Those who add an item give back all that they were shown.
-CPLErr Band::SetMetadata(char** items, const char* domain) {
+CPLErr Band::SetMetadata(Items items, const char* domain) {
     return Reporting(CE_Failure, [&] {
         if (!IsDefaultDomain(domain) || !Stored() || owner.IsShared())
             return CompanionBand::SetMetadata(items, domain);

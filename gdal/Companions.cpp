@@ -39,14 +39,14 @@ CPLErr CompanionDataset::SetSpatialRef(const OGRSpatialReference* reference) {
     return GDALPamDataset::SetSpatialRef(reference);
 }
 
-CPLErr CompanionDataset::GetGeoTransform(double* transform) {
+CPLErr CompanionDataset::ReadTransform(double* transform) const {
     Load();
-    return GDALPamDataset::GetGeoTransform(transform);
+    return PlacedDataset::ReadTransform(transform);
 }
 
-CPLErr CompanionDataset::SetGeoTransform(double* transform) {
+CPLErr CompanionDataset::StoreTransform(const double* transform) {
     if (!MayChange()) return CE_Failure;
-    return GDALPamDataset::SetGeoTransform(transform);
+    return PlacedDataset::StoreTransform(transform);
 }
 
 int CompanionDataset::GetGCPCount() {
@@ -75,7 +75,7 @@ char** CompanionDataset::GetMetadataDomainList() {
     return GDALPamDataset::GetMetadataDomainList();
 }
 
-CPLErr CompanionDataset::SetMetadata(char** items, const char* domain) {
+CPLErr CompanionDataset::SetMetadata(Items items, const char* domain) {
     if (!MayChange()) return CE_Failure;
     return GDALPamDataset::SetMetadata(items, domain);
 }
@@ -85,7 +85,7 @@ CPLErr CompanionDataset::SetMetadataItem(const char* name, const char* value, co
     return GDALPamDataset::SetMetadataItem(name, value, domain);
 }
 
-char** CompanionDataset::GetMetadata(const char* domain) {
+Items CompanionDataset::GetMetadata(const char* domain) {
     Load();
     return GDALPamDataset::GetMetadata(domain);
 }
@@ -215,7 +215,7 @@ char** CompanionBand::GetMetadataDomainList() {
     return GDALPamRasterBand::GetMetadataDomainList();
 }
 
-CPLErr CompanionBand::SetMetadata(char** items, const char* domain) {
+CPLErr CompanionBand::SetMetadata(Items items, const char* domain) {
     if (!MayChange()) return CE_Failure;
     return GDALPamRasterBand::SetMetadata(items, domain);
 }
@@ -225,7 +225,7 @@ CPLErr CompanionBand::SetMetadataItem(const char* name, const char* value, const
     return GDALPamRasterBand::SetMetadataItem(name, value, domain);
 }
 
-char** CompanionBand::GetMetadata(const char* domain) {
+Items CompanionBand::GetMetadata(const char* domain) {
     Load();
     return GDALPamRasterBand::GetMetadata(domain);
 }

@@ -16,9 +16,11 @@
 #include <functional>
 #include <utility>
 
+#include "gdal/Versions.h"
+
 namespace zmcgdal {
 
-class CompanionDataset : public GDALPamDataset {
+class CompanionDataset : public PlacedDataset {
 public:
     // Does what was put off. What it throws goes to GDAL as a failure.
     void Load() const;
@@ -30,17 +32,17 @@ public:
     using GDALDataset::SetGCPs;
     const OGRSpatialReference* GetSpatialRef() const override;
     CPLErr SetSpatialRef(const OGRSpatialReference* reference) override;
-    CPLErr GetGeoTransform(double* transform) override;
-    CPLErr SetGeoTransform(double* transform) override;
+    CPLErr ReadTransform(double* transform) const override;
+    CPLErr StoreTransform(const double* transform) override;
     int GetGCPCount() override;
     const OGRSpatialReference* GetGCPSpatialRef() const override;
     const GDAL_GCP* GetGCPs() override;
     CPLErr SetGCPs(int count, const GDAL_GCP* points,
                    const OGRSpatialReference* reference) override;
     char** GetMetadataDomainList() override;
-    CPLErr SetMetadata(char** items, const char* domain = "") override;
+    CPLErr SetMetadata(Items items, const char* domain = "") override;
     CPLErr SetMetadataItem(const char* name, const char* value, const char* domain = "") override;
-    char** GetMetadata(const char* domain = "") override;
+    Items GetMetadata(const char* domain = "") override;
     const char* GetMetadataItem(const char* name, const char* domain = "") override;
     char** GetFileList() override;
     void ClearStatistics() override;
@@ -80,9 +82,9 @@ public:
     double GetScale(int* success = nullptr) override;
     CPLErr SetScale(double scale) override;
     char** GetMetadataDomainList() override;
-    CPLErr SetMetadata(char** items, const char* domain = "") override;
+    CPLErr SetMetadata(Items items, const char* domain = "") override;
     CPLErr SetMetadataItem(const char* name, const char* value, const char* domain = "") override;
-    char** GetMetadata(const char* domain = "") override;
+    Items GetMetadata(const char* domain = "") override;
     const char* GetMetadataItem(const char* name, const char* domain = "") override;
     CPLErr GetHistogram(double lower, double upper, int buckets, GUIntBig* counts,
                         int includeOutside, int approximate, GDALProgressFunc progress,

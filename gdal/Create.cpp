@@ -188,7 +188,7 @@ bool RefuseLent(const char* target) {
 
 }  // namespace
 
-GDALDataset* CreateCopy(const char* target, GDALDataset* source, int strict, char** options,
+GDALDataset* CreateCopy(const char* target, GDALDataset* source, int strict, Items options,
                         GDALProgressFunc progress, void* progressData) {
     return Reporting<GDALDataset*>(nullptr, [&]() -> GDALDataset* {
         if (RefuseLent(target)) return nullptr;
@@ -199,7 +199,7 @@ GDALDataset* CreateCopy(const char* target, GDALDataset* source, int strict, cha
 }
 
 GDALDataset* CreateNew(const char* target, int width, int height, int bands, GDALDataType type,
-                       char** options) {
+                       Items options) {
     return Reporting<GDALDataset*>(nullptr, [&]() -> GDALDataset* {
         if (RefuseLent(target)) return nullptr;
         auto parsed = ParseCreationOptions(options);

@@ -15,6 +15,7 @@
 #include <vector>
 
 #include "gdal/Options.h"
+#include "gdal/Versions.h"
 #include "host/build/BuildFile.h"
 
 namespace zmcgdal {
@@ -22,10 +23,10 @@ namespace zmcgdal {
 class Dataset;
 
 // Entries of the driver.
-GDALDataset* CreateCopy(const char* target, GDALDataset* source, int strict, char** options,
+GDALDataset* CreateCopy(const char* target, GDALDataset* source, int strict, Items options,
                         GDALProgressFunc progress, void* progressData);
 GDALDataset* CreateNew(const char* target, int width, int height, int bands, GDALDataType type,
-                       char** options);
+                       Items options);
 
 // What a dataset under creation knows beside its spool.
 class Creation {

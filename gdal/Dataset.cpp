@@ -110,10 +110,8 @@ void DropOtherFiles(CPLXMLNode& root) {
     }
 }
 
-// Flushes answer nothing before GDAL 3.7.
 template <class Work>
 auto ReportingFlush(Work&& work) {
-    using Flushed = decltype(work());
     if constexpr (std::is_void_v<Flushed>)
         Reported(work);
     else
@@ -346,7 +344,7 @@ void Dataset::LoadSidecarLater(const char* fileName) {
     });
 }
 
-void Dataset::LoadSidecar(const char* fileName, char** siblings) {
+void Dataset::LoadSidecar(const char* fileName, Items siblings) {
     SetDescription(fileName);
     std::string base = fileName;
     if (!IsVirtualName(base)) {
@@ -477,7 +475,7 @@ bool Dataset::MayHaveMasks() {
 
 // GDAL takes what it is given last, so the sidecar is read once more, behind the items of the file.
 // A sidecar that was made of them has all of them that are still wanted.
-void Dataset::TakeEmbedded(char** siblings) {
+void Dataset::TakeEmbedded(Items siblings) {
     if (CompanionDataset::GetMetadataItem(kEmbeddedItem, kEmbeddedDomain)) return;
     const std::string items =
         zmchost::ReadEmbeddedItems(*file->source, file->raster.Name(), file->info.header);
@@ -557,8 +555,8 @@ char** Dataset::GetMetadataDomainList() {
     });
 }
 
-char** Dataset::GetMetadata(const char* domain) {
-    return Reporting<char**>(nullptr, [&] {
+Items Dataset::GetMetadata(const char* domain) {
+    return Reporting<Items>(nullptr, [&]() -> Items {
         const std::lock_guard lock(file->late);
         if (CPLStringList* const own = OwnDomain(domain)) return own->List();
         return kept ? ScaledDomain(domain) : CompanionDataset::GetMetadata(domain);
@@ -579,7 +577,7 @@ double Dataset::Factor() const {
 }
 
 // What counts in pixels of the raster counts in those of the level.
-char** Dataset::ScaledDomain(const char* domain) {
+Items Dataset::ScaledDomain(const char* domain) {
     constexpr const char* kDivided[] = {"LINE_OFF",   "SAMP_OFF",    "LINE_SCALE",
                                         "SAMP_SCALE", "LINE_OFFSET", "PIXEL_OFFSET"};
     constexpr const char* kMultiplied[] = {"LINE_STEP", "PIXEL_STEP"};
@@ -594,10 +592,10 @@ char** Dataset::ScaledDomain(const char* domain) {
     return scaled.List();
 }
 
-CPLErr Dataset::GetGeoTransform(double* transform) {
+CPLErr Dataset::ReadTransform(double* transform) const {
     return Reporting(CE_Failure, [&] {
-        if (!main) return CompanionDataset::GetGeoTransform(transform);
-        const CPLErr result = main->GetGeoTransform(transform);
+        if (!main) return CompanionDataset::ReadTransform(transform);
+        const CPLErr result = main->ReadTransform(transform);
         for (const int i : {1, 2, 4, 5})
             if (result == CE_None) transform[i] *= Factor();
         return result;
@@ -712,7 +710,7 @@ bool Dataset::HasBands(std::span<const int> numbers) const {
 
 // GDAL looks at what it is asked for only where it does this itself.
 CPLErr Dataset::AdviseRead(int x, int y, int width, int height, int bufferWidth, int bufferHeight,
-                           GDALDataType, int bandCount, int* bandMap, char**) {
+                           GDALDataType, int bandCount, int* bandMap, Items) {
     return Reporting(CE_Failure, [&] {
         if (!file->raster.Remote()) return CE_None;
         std::vector<int> bands;
@@ -757,7 +755,7 @@ CPLErr Dataset::IBuildOverviews(const char* resampling, int overviewCount, const
 }
 
 // The sidecar of a raster that there is not yet waits for it.
-Dataset::Flushed Dataset::FlushCache(bool atClosing) {
+Flushed Dataset::FlushCache(bool atClosing) {
     return ReportingFlush([&] {
         // NOLINTNEXTLINE(bugprone-parent-virtual-call): the pixels alone, and the sidecar then.
         if (creation) return GDALDataset::FlushCache(atClosing);

@@ -135,7 +135,7 @@ public:
 
     // Reads the sidecar, and looks for other companions, of a file of that name. Those that are
     // staged for it (SidecarStage.h) are given their names first if it is open for update.
-    void LoadSidecar(const char* fileName, char** siblings);
+    void LoadSidecar(const char* fileName, Items siblings);
     // The same, when something is first asked for that may stand in them. GDAL's list of the folder
     // is what GDAL has asked the server for, or asks it for then.
     void LoadSidecarLater(const char* fileName);
@@ -180,16 +180,14 @@ public:
     void CloseMask() { oOvManager.CloseDependentDatasets(); }
 
     char** GetMetadataDomainList() override;
-    char** GetMetadata(const char* domain = "") override;
+    Items GetMetadata(const char* domain = "") override;
     const char* GetMetadataItem(const char* name, const char* domain = "") override;
 
-    // Nothing before GDAL 3.7, an error from then on.
-    using Flushed = decltype(std::declval<GDALPamDataset&>().FlushCache(false));
     Flushed FlushCache(bool atClosing) override;
 
     // Of a coarser level, those of the finest with pixels 2, 4, 8 ... times as large: each covers
     // just so many, and what is over at the right and at the bottom belongs to none.
-    CPLErr GetGeoTransform(double* transform) override;
+    CPLErr ReadTransform(double* transform) const override;
     const OGRSpatialReference* GetSpatialRef() const override;
     int GetGCPCount() override;
     const GDAL_GCP* GetGCPs() override;
@@ -202,8 +200,7 @@ public:
                      GDALRasterIOExtraArg* extra) override;
     // Fetches a window of a file behind a network ahead, on this thread; else nothing.
     CPLErr AdviseRead(int x, int y, int width, int height, int bufferWidth, int bufferHeight,
-                      GDALDataType bufferType, int bandCount, int* bandMap,
-                      char** options) override;
+                      GDALDataType bufferType, int bandCount, int* bandMap, Items options) override;
     CPLErr IBuildOverviews(const char* resampling, int overviewCount, const int* factors,
                            int bandCount, const int* bands, GDALProgressFunc progress,
                            void* progressData, CSLConstList options) override;
@@ -220,7 +217,7 @@ private:
     void Prepare();
     bool IsWritten(const zelm::Rectangle& window, std::span<const int> bandNumbers);
     void IgnoreCompanions();
-    void TakeEmbedded(char** siblings);
+    void TakeEmbedded(Items siblings);
     void AddOverviews();
     void DescribeFile();
     void LoadNote();
@@ -232,7 +229,7 @@ private:
     CPLStringList* OwnDomain(const char* domain);
     // How many pixels of the finest level one of this covers along a side.
     double Factor() const;
-    char** ScaledDomain(const char* domain);
+    Items ScaledDomain(const char* domain);
     CPLErr ReadOrWrite(GDALRWFlag mode, int x, int y, int width, int height, void* data,
                        int bufferWidth, int bufferHeight, GDALDataType bufferType, int bandCount,
                        int* bandMap, GSpacing pixelSpace, GSpacing lineSpace, GSpacing bandSpace,

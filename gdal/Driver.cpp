@@ -71,7 +71,7 @@ std::unique_ptr<Dataset> Show(std::shared_ptr<OpenFile> file, const std::string&
     const bool isRemote = file->raster.Remote();
     auto dataset = Dataset::FromFile(std::move(file), info.eAccess);
     // A look for each companion is cheaper than a list of the whole folder, unless that is there.
-    char** const siblings = info.AreSiblingFilesLoaded() ? info.GetSiblingFiles() : nullptr;
+    const Items siblings = info.AreSiblingFilesLoaded() ? info.GetSiblingFiles() : nullptr;
     if (isRemote)
         dataset->LoadSidecarLater(name.c_str());
     else

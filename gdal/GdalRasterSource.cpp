@@ -99,7 +99,8 @@ void GdalRasterSource::ChooseType(bool signedByte) {
         throw zmchost::Error(
             Name(), kSource,
             std::string("no pyramid holds samples of type ") + GDALGetDataTypeName(type));
-    bufferType = GdalTypeOf(pixelType, SignedByteAs::FlaggedByte);
+    const bool flagged = isSigned && type == GDT_Byte;
+    bufferType = GdalTypeOf(pixelType, flagged ? SignedByteAs::FlaggedByte : SignedByteAs::Own);
 }
 
 std::vector<std::string> GdalRasterSource::Losses() const {

@@ -16,7 +16,7 @@
 namespace zmcgdal {
 
 const char* const kOpenOptionsXml = R"(<OpenOptionList>
-  <Option name='INT8_AS' type='string-select' default='INT16' description='How signed bytes are shown before GDAL 3.7'>
+  <Option name='INT8_AS' type='string-select' description='How signed bytes are shown, if not as Int8, or as Int16 before GDAL 3.7'>
     <Value>INT16</Value>
     <Value>SIGNEDBYTE</Value>
   </Option>
@@ -143,8 +143,9 @@ void TakeOverview(const std::string& word, OpenOptions& parsed) {
 
 OpenOptions OpenOptionsFrom(CSLConstList options) {
     OpenOptions parsed;
-    if (EQUAL(CSLFetchNameValueDef(options, "INT8_AS", "INT16"), "SIGNEDBYTE"))
-        parsed.signedByteAs = SignedByteAs::FlaggedByte;
+    const char* const signedByteAs = CSLFetchNameValueDef(options, "INT8_AS", "");
+    if (EQUAL(signedByteAs, "INT16")) parsed.signedByteAs = SignedByteAs::Int16;
+    if (EQUAL(signedByteAs, "SIGNEDBYTE")) parsed.signedByteAs = SignedByteAs::FlaggedByte;
     parsed.keepCopies = CPLFetchBool(options, "KEEP_COPIES", false);
     parsed.missingAsZeros = EQUAL(CSLFetchNameValueDef(options, "MISSING", "FAIL"), "ZEROS") != 0;
     parsed.statistics = CPLFetchBool(options, "STATISTICS", false);

@@ -19,7 +19,7 @@ extern const char* const kOpenOptionsXml;
 extern const char* const kCreationOptionsXml;
 
 struct OpenOptions {
-    SignedByteAs signedByteAs = SignedByteAs::Int16;
+    SignedByteAs signedByteAs = SignedByteAs::Own;
     bool keepCopies = false;      // zmchost::Raster::KeepCopies
     bool missingAsZeros = false;  // pixels that an incomplete file does not have
     bool statistics = false;      // are renewed when a dataset whose pixels were edited is closed

@@ -3,8 +3,8 @@
 namespace zmcgdal {
 
 GDALDataType GdalTypeOf(std::uint32_t pixelType, SignedByteAs signedByteAs) {
-    if (pixelType == zelm::PixelTypeCode::Char && signedByteAs == SignedByteAs::FlaggedByte)
-        return GDT_Byte;
+    if (pixelType == zelm::PixelTypeCode::Char && signedByteAs != SignedByteAs::Own)
+        return signedByteAs == SignedByteAs::Int16 ? GDT_Int16 : GDT_Byte;
     GDALDataType type = GDT_Unknown;
     zelm::VisitElementType(pixelType,
                            [&]<class T>(std::type_identity<T>) { type = GdalTypeOf<T>(); });

@@ -1,8 +1,8 @@
 // Pixel types of pyramids as data types of GDAL, and back.
 //
-// The one type without a counterpart before GDAL 3.7 is the signed byte: it is shown as Int16,
-// whose values convert rightly everywhere, or, when asked for, as Byte with the flag SIGNEDBYTE,
-// which keeps the bits but is taken for unsigned by conversions.
+// The one type without a counterpart before GDAL 3.7 is the signed byte: there, or when asked for,
+// it is shown as Int16, whose values convert rightly everywhere. Also when asked for, it is Byte
+// with the flag SIGNEDBYTE, which keeps the bits but is taken for unsigned by conversions.
 #ifndef ZMC_GDAL_SAMPLETYPE_H
 #define ZMC_GDAL_SAMPLETYPE_H
 
@@ -16,7 +16,8 @@
 
 namespace zmcgdal {
 
-enum class SignedByteAs { Int16, FlaggedByte };
+// `Own`: as Int8 where GDAL has it.
+enum class SignedByteAs { Own, Int16, FlaggedByte };
 
 template <class T>
 constexpr GDALDataType GdalTypeOf() {

@@ -44,7 +44,7 @@ Json SystemOf(const GDALDataset& dataset) {
 
 Json TransformOf(GDALDataset& dataset) {
     double numbers[6];
-    if (dataset.GetGeoTransform(numbers) != CE_None) return nullptr;
+    if (GDALGetGeoTransform(GDALDataset::ToHandle(&dataset), numbers) != CE_None) return nullptr;
     Json list = Json::array();
     for (const double number : numbers) list.push_back(JsonNumber(number));
     return list;

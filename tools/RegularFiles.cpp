@@ -3,9 +3,9 @@
 #include <cpl_vsi_virtual.h>
 
 #include <cerrno>
-#include <memory>
 #include <new>
 
+#include "gdal/FileVersions.h"
 #include "platform/FileSystem.h"
 
 namespace zmctools {
@@ -22,12 +22,12 @@ int Refusal(const char* name) noexcept {
 
 // Hands all that concerns files, folders and how they are written on to the file system that GDAL
 // had before. What belongs to files on a network alone, such as addresses, stays as good as absent.
-class RegularFiles final : public VSIFilesystemHandler {
+class RegularFiles final : public zmcgdal::ForwardedFiles {
 public:
-    explicit RegularFiles(VSIFilesystemHandler* before) : plain(before) {}
+    explicit RegularFiles(VSIFilesystemHandler* before) : ForwardedFiles(before) {}
 
-    VSIVirtualHandle* Open(const char* name, const char* access, bool setsError,
-                           CSLConstList options) override {
+    zmcgdal::OpenedFile Open(const char* name, const char* access, bool setsError,
+                             CSLConstList options) override {
         const int refusal = Refusal(name);
         if (refusal == 0) return plain->Open(name, access, setsError, options);
         errno = refusal;
@@ -42,9 +42,7 @@ public:
     int Rmdir(const char* name) override { return plain->Rmdir(name); }
     int RmdirRecursive(const char* name) override { return plain->RmdirRecursive(name); }
     char** ReadDirEx(const char* name, int most) override { return plain->ReadDirEx(name, most); }
-    char** ReadDir(const char* name) override { return plain->ReadDir(name); }
     char** SiblingFiles(const char* name) override { return plain->SiblingFiles(name); }
-    int Rename(const char* from, const char* to) override { return plain->Rename(from, to); }
     int IsCaseSensitive(const char* name) override { return plain->IsCaseSensitive(name); }
     GIntBig GetDiskFreeSpace(const char* name) override { return plain->GetDiskFreeSpace(name); }
     int SupportsSparseFiles(const char* name) override { return plain->SupportsSparseFiles(name); }
@@ -65,7 +63,6 @@ public:
     VSIDIR* OpenDir(const char* name, int depth, const char* const* options) override {
         return plain->OpenDir(name, depth, options);
     }
-    bool IsLocal(const char* name) override { return plain->IsLocal(name); }
     bool SupportsSequentialWrite(const char* name, bool mayBeCopied) override {
         return plain->SupportsSequentialWrite(name, mayBeCopied);
     }
@@ -73,9 +70,6 @@ public:
         return plain->SupportsRandomWrite(name, mayBeCopied);
     }
     bool SupportsRead(const char* name) override { return plain->SupportsRead(name); }
-
-private:
-    std::unique_ptr<VSIFilesystemHandler> plain;
 };
 
 }  // namespace

@@ -118,14 +118,15 @@ TEST_F(DriverTest, RegistersOnce) {
 }
 
 TEST_F(DriverTest, EveryElementTypeHasADataTypeAndComesBack) {
-#define ZMC_X(type, name, code)                                             \
-    EXPECT_NE(GdalTypeOf(code, SignedByteAs::Int16), GDT_Unknown) << #name; \
+#define ZMC_X(type, name, code)                                           \
+    EXPECT_NE(GdalTypeOf(code, SignedByteAs::Own), GDT_Unknown) << #name; \
     EXPECT_EQ(PixelTypeFor(GdalTypeOf(code, SignedByteAs::FlaggedByte), code == 99), code) << #name;
     ZMC_ELEMENT_TYPES(ZMC_X)
 #undef ZMC_X
     EXPECT_EQ(PixelTypeFor(GDT_Byte, true), zelm::PixelTypeCode::Char);
     EXPECT_EQ(PixelTypeFor(GDT_Unknown, false), 0u);
-    EXPECT_EQ(GdalTypeOf(7, SignedByteAs::Int16), GDT_Unknown);
+    EXPECT_EQ(GdalTypeOf(7, SignedByteAs::Own), GDT_Unknown);
+    EXPECT_EQ(GdalTypeOf(zelm::PixelTypeCode::Char, SignedByteAs::Int16), GDT_Int16);
 }
 
 // What GDAL prints and checks is told apart from what is done.

@@ -211,7 +211,7 @@ TEST_P(SecondPixelType, IsReadIntoBuffersOfTheSamplesThatAreRead) {
             const DatasetPtr dataset = Open(name, flags);
             ASSERT_TRUE(dataset);
             EXPECT_EQ(dataset->GetRasterBand(1)->GetRasterDataType(),
-                      GdalTypeOf(read, SignedByteAs::Int16));
+                      GdalTypeOf(read, SignedByteAs::Own));
             EXPECT_EQ(ReadAll(*dataset, 1), 7);
         }
         const DatasetPtr dataset = Open(name, GDAL_OF_UPDATE);

@@ -104,9 +104,8 @@ class Levels(FolderTest):
 class SignedBytes(FolderTest):
     def test_sixteen_bits_are_cut_to_eight(self):
         array = samples(gdal.GDT_Byte, 300, 300, 2)
-        path = self.copy(memory_dataset(array, gdal.GDT_Byte, ["PIXELTYPE=SIGNEDBYTE"]),
-                         options=["PIXELTYPE=SIGNEDBYTE"])
-        dataset = gdal.OpenEx(path, gdal.OF_UPDATE)
+        path = self.copy(memory_dataset(array, gdal.GDT_Byte), options=["PIXELTYPE=SIGNEDBYTE"])
+        dataset = gdal.OpenEx(path, gdal.OF_UPDATE, open_options=["INT8_AS=INT16"])
         band = dataset.GetRasterBand(2)
         self.assertEqual(band.DataType, gdal.GDT_Int16)
         band.WriteArray(np.array([[-100, 200, -300, 5]], np.int16), 3, 7)

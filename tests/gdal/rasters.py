@@ -16,6 +16,10 @@ TYPES = {
     gdal.GDT_Int64: np.int64, gdal.GDT_Float32: np.float32, gdal.GDT_Float64: np.float64,
     gdal.GDT_CFloat32: np.complex64, gdal.GDT_CFloat64: np.complex128,
 }
+# How the driver shows signed bytes: GDAL has a type for them from 3.7 on.
+SIGNED_BYTE = getattr(gdal, "GDT_Int8", gdal.GDT_Int16)
+if hasattr(gdal, "GDT_Int8"):
+    TYPES[gdal.GDT_Int8] = np.int8
 COMPLEX = (gdal.GDT_CFloat32, gdal.GDT_CFloat64)
 
 

@@ -6,7 +6,8 @@ import unittest
 import numpy as np
 from osgeo import gdal, osr
 
-from rasters import COMPLEX, DRIVER, TYPES, FolderTest, halve, memory_dataset, place, samples
+from rasters import (COMPLEX, DRIVER, SIGNED_BYTE, TYPES, FolderTest, halve, memory_dataset, place,
+                     samples)
 
 
 def osr_text(code):
@@ -72,11 +73,14 @@ class Reading(FolderTest):
         name = self.copy(memory_dataset(array, gdal.GDT_Byte), options=["PIXELTYPE=SIGNEDBYTE"])
         signed = array.view(np.int8)
         wide = gdal.Open(name)
-        self.assertEqual(wide.GetRasterBand(1).DataType, gdal.GDT_Int16)
+        self.assertEqual(wide.GetRasterBand(1).DataType, SIGNED_BYTE)
         np.testing.assert_array_equal(wide.ReadAsArray(), signed.astype(np.int16))
         np.testing.assert_array_equal(wide.GetRasterBand(2).ReadAsArray(), signed[1])
         self.assertEqual(wide.GetMetadataItem("PIXEL_TYPE", "ZMCPYRAMID"), "Char")
         self.assertEqual(wide.GetRasterBand(1).GetMinimum(), signed[0].min())
+        asked = gdal.OpenEx(name, open_options=["INT8_AS=INT16"])
+        self.assertEqual(asked.GetRasterBand(1).DataType, gdal.GDT_Int16)
+        np.testing.assert_array_equal(asked.ReadAsArray(), signed.astype(np.int16))
         flagged = gdal.OpenEx(name, open_options=["INT8_AS=SIGNEDBYTE"])
         band = flagged.GetRasterBand(1)
         self.assertEqual(band.DataType, gdal.GDT_Byte)

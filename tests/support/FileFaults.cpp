@@ -336,7 +336,7 @@ ZMC_EXPORT int close(int file) {
 
 ZMC_EXPORT int fclose(std::FILE* stream) {
     static const auto next = Next<int (*)(std::FILE*)>("fclose");
-    const bool fails = stream && CallFails(zmctest::kCloseCall, fileno(stream));
+    const bool fails = CallFails(zmctest::kCloseCall, fileno(stream));
     const int error = errno;
     const int result = next(stream);
     if (!fails) return result;
