@@ -65,6 +65,9 @@ public:
     // is not written yet.
     void KeepFull(const zmchost::FullStatistics& full, Archive& inFile);
     void TakeRenewed(const zmchost::FullStatistics& full);
+    // Of a dataset under creation: writes each block that nobody wrote, with what it holds (no
+    // data, or zeros). No block waits in GDAL's cache. Throws zmchost::Error where that fails.
+    void WriteUnwritten();
     // Whether pixels were written since the dataset was opened.
     bool IsEdited() const { return edited; }
 

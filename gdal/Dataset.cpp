@@ -282,14 +282,17 @@ void Dataset::DescribeFile() {
 // A mask that another raster has left beside the target's name is none of this one's.
 void Dataset::BeginCreation(std::unique_ptr<Creation> state) {
     creation = std::move(state);
-    oOvManager.Initialize(this, creation->SpoolName().c_str());
-    oOvManager.HaveMaskFile(nullptr, creation->SpoolName().c_str());
+    oOvManager.Initialize(this, creation->DraftName().c_str());
+    oOvManager.HaveMaskFile(nullptr, creation->DraftName().c_str());
 }
 
-CPLErr Dataset::NamedAsSpool(const std::function<CPLErr()>& make) {
+// Nothing of the file before is remembered but in GDAL's cache.
+void Dataset::Reopen(std::shared_ptr<OpenFile> draft) { file = std::move(draft); }
+
+CPLErr Dataset::NamedAsDraft(const std::function<CPLErr()>& make) {
     if (!creation) return make();
     const std::string name = GetDescription();
-    SetDescription(creation->SpoolName().c_str());
+    SetDescription(creation->DraftName().c_str());
     const CPLErr made = make();
     SetDescription(name.c_str());
     return made;
@@ -297,7 +300,7 @@ CPLErr Dataset::NamedAsSpool(const std::function<CPLErr()>& make) {
 
 CPLErr Dataset::CreateMaskBand(int flags) {
     return Reporting(CE_Failure, [&] {
-        return NamedAsSpool([&] { return GDALPamDataset::CreateMaskBand(flags); });
+        return NamedAsDraft([&] { return GDALPamDataset::CreateMaskBand(flags); });
     });
 }
 

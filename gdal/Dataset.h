@@ -157,9 +157,11 @@ public:
     // Makes this dataset the place where pixels of a new file are gathered; see gdal/Create.h.
     void BeginCreation(std::unique_ptr<Creation> state);
     Creation* UnderCreation() { return creation.get(); }
-    // Runs `make`, which makes a mask of the whole dataset: beside the spool, as long as there is
+    // Its file was laid out anew, for the same raster with other levels.
+    void Reopen(std::shared_ptr<OpenFile> draft);
+    // Runs `make`, which makes a mask of the whole dataset: beside the draft, as long as there is
     // no target.
-    CPLErr NamedAsSpool(const std::function<CPLErr()>& make);
+    CPLErr NamedAsDraft(const std::function<CPLErr()>& make);
     // Ends the use of the mask, so that its file can be moved.
     void CloseMask() { oOvManager.CloseDependentDatasets(); }
 

@@ -218,6 +218,26 @@ TEST_F(DriverFaults, NewFileWithoutSomeOfItsBlocksIsNotMade) {
     EXPECT_TRUE(std::filesystem::is_empty(folder.String()));
 }
 
+TEST_F(DriverFaults, NewFileIsNotMadeWhereClosingItMeetsAFullDisk) {
+    std::size_t points = 0;
+    for (bool met = true; met; ++points) {
+        DatasetPtr dataset(
+            Driver("ZMCPyramid").Create(name.c_str(), 3 * kSide, 3 * kSide, 1, GDT_Byte, nullptr));
+        ASSERT_TRUE(dataset);
+        Fill(*dataset, 1, 7);
+        dataset->FlushCache(false);
+        FileFaults faults({folder.String(), zmctest::kWriteCall | zmctest::kResizeCall, points + 1,
+                           false, FileFaultAction::Error, ENOSPC});
+        CPLErrorReset();
+        dataset.reset();
+        met = faults.Failed() != 0;
+        EXPECT_EQ(CPLGetLastErrorType() == CE_Failure, met) << points;
+        EXPECT_EQ(std::filesystem::is_empty(folder.String()), met) << points;
+    }
+    // Blocks that nobody wrote, two levels of four and one tile, and the documents.
+    EXPECT_GT(points, 8u + 5u);
+}
+
 TEST_F(DriverFaults, NewFileIsMadeOnceItsBlocksAreWritten) {
     DatasetPtr dataset(
         Driver("ZMCPyramid").Create(name.c_str(), kSide, kSide, 1, GDT_Byte, nullptr));
