@@ -210,6 +210,12 @@ private:
     void RenewEdited();
     void EndEditing();
     bool SidecarIsWhole() const;
+    // True if whole tiles of this window go into a new file at once (TileWriter.h).
+    bool WritesDirectly(int x, int y, int width, int height, std::span<const int> numbers,
+                        const GDALRasterIOExtraArg& extra) const;
+    // Writes them so, and the rest of the window through GDAL's block cache.
+    CPLErr WriteTiles(const zelm::Rectangle& window, const Target& from, int* bandMap,
+                      GDALRasterIOExtraArg* extra);
     bool HasWindow(int x, int y, int width, int height) const;
     bool HasBands(std::span<const int> numbers) const;
     CPLStringList* OwnDomain(const char* domain);

@@ -218,6 +218,30 @@ TEST_F(DriverFaults, NewFileWithoutSomeOfItsBlocksIsNotMade) {
     EXPECT_TRUE(std::filesystem::is_empty(folder.String()));
 }
 
+TEST_F(DriverFaults, WindowsOfAllBandsAnswerForTheirTiles) {
+    constexpr int kLarge = 600;
+    Samples samples(std::size_t{kLarge} * kLarge * 2, 7);
+    const auto write = [&](GDALDataset& dataset) {
+        return dataset.RasterIO(GF_Write, 0, 0, kLarge, kLarge, samples.data(), kLarge, kLarge,
+                                GDT_Byte, 2, nullptr, 0, 0, 0, nullptr);
+    };
+    for (const bool again : {false, true}) {
+        DatasetPtr dataset(
+            Driver("ZMCPyramid").Create(name.c_str(), kLarge, kLarge, 2, GDT_Byte, nullptr));
+        ASSERT_TRUE(dataset);
+        {
+            const FileFaults faults(
+                {folder.String(), zmctest::kWriteCall, 4, false, FileFaultAction::Error, ENOSPC});
+            EXPECT_EQ(write(*dataset), CE_Failure);
+            EXPECT_EQ(faults.Failed(), 1u);
+        }
+        EXPECT_EQ(again ? write(*dataset) : CE_None, CE_None);
+        dataset.reset();
+        EXPECT_EQ(std::filesystem::exists(name), again);
+    }
+    EXPECT_TRUE(Holds(Read(*Open(), 2), 7));
+}
+
 TEST_F(DriverFaults, NewFileIsNotMadeWhereClosingItMeetsAFullDisk) {
     std::size_t points = 0;
     for (bool met = true; met; ++points) {

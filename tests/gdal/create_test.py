@@ -172,6 +172,63 @@ class ChosenLevels(FolderTest):
                 self.levels_of(factors, flush)
 
 
+class Windows(FolderTest):
+    """Windows of all bands, whose whole tiles do not go through the block cache."""
+
+    def test_of_any_place_layout_and_type_hold_what_was_written_last(self):
+        random = np.random.default_rng(8)
+        for bands, data_type in ((1, gdal.GDT_Byte), (3, gdal.GDT_Byte), (2, gdal.GDT_Int16),
+                                 (3, gdal.GDT_Float64), (10, gdal.GDT_UInt16)):
+            expected = np.zeros((bands, 700, 900), np.float64)
+            dataset = gdal.GetDriverByName(DRIVER).Create(self.path("new.pyr"), 900, 700, bands,
+                                                          data_type)
+            for step in range(40):
+                x, y = random.integers(0, 890), random.integers(0, 690)
+                if step % 3 == 0:
+                    x, y = x // 256 * 256, y // 256 * 256
+                width, height = (int(random.integers(1, 901 - x)), int(random.integers(1, 701 - y)))
+                kind = (np.uint8, np.int16, np.float32)[step % 3]
+                window = random.integers(0, 120, (bands, height, width)).astype(kind)
+                expected[:, y:y + height, x:x + width] = window
+                if step % 5 == 0:
+                    band = int(random.integers(0, bands))
+                    dataset.GetRasterBand(band + 1).WriteArray(window[band], int(x), int(y))
+                    rest = [b for b in range(bands) if b != band]
+                    for other in rest:
+                        dataset.GetRasterBand(other + 1).WriteArray(window[other], int(x), int(y))
+                elif step % 2 or bands == 1:
+                    dataset.WriteArray(window, int(x), int(y))
+                else:
+                    dataset.WriteArray(np.moveaxis(window, 0, 2), int(x), int(y),
+                                       interleave="pixel")
+                if step % 7 == 0:
+                    np.testing.assert_array_equal(
+                        dataset.ReadAsArray().reshape(expected.shape), expected)
+            del dataset
+            made = gdal.Open(self.path("new.pyr"))
+            np.testing.assert_array_equal(made.ReadAsArray().reshape(expected.shape), expected)
+            del made
+            os.remove(self.path("new.pyr"))
+
+    def test_of_other_bands_or_another_order_of_them(self):
+        array = samples(gdal.GDT_Byte, 600, 700, 3)
+        dataset = gdal.GetDriverByName(DRIVER).Create(self.path("new.pyr"), 700, 600, 3)
+        dataset.WriteRaster(0, 0, 700, 600, array.tobytes(), band_list=[3, 1, 2])
+        dataset.WriteRaster(0, 0, 512, 512, array[:2, :512, :512].tobytes(), band_list=[1, 2])
+        del dataset
+        expected = array[[1, 2, 0]]
+        expected[:2, :512, :512] = array[:2, :512, :512]
+        np.testing.assert_array_equal(gdal.Open(self.path("new.pyr")).ReadAsArray(), expected)
+
+    def test_that_are_stretched(self):
+        dataset = gdal.GetDriverByName(DRIVER).Create(self.path("new.pyr"), 600, 512, 2)
+        small = np.arange(2 * 16 * 16, dtype=np.uint8).reshape(2, 16, 16)
+        dataset.WriteRaster(0, 0, 512, 512, small.tobytes(), 16, 16)
+        del dataset
+        made = gdal.Open(self.path("new.pyr")).ReadAsArray(0, 0, 512, 512)
+        np.testing.assert_array_equal(made, small.repeat(32, 1).repeat(32, 2))
+
+
 # Writes a raster row by row of blocks, and says when it closes it.
 WRITER = """
 import sys

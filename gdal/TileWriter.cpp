@@ -1,0 +1,105 @@
+#include "gdal/TileWriter.h"
+
+#include <algorithm>
+#include <cstring>
+
+#include "format/TileWalk.h"
+#include "gdal/Band.h"
+#include "gdal/Create.h"
+#include "gdal/Reporting.h"
+
+namespace zmcgdal {
+
+using zelm::Rectangle;
+
+namespace {
+
+// The whole tiles of [start, start + extent) along one side, as first and end.
+std::pair<std::uint32_t, std::uint32_t> WholeAlong(std::uint32_t start, std::uint32_t extent,
+                                                   std::uint32_t limit, std::uint32_t side) {
+    const std::uint64_t first = (std::uint64_t{start} + side - 1) / side * side;
+    const std::uint32_t end = start + extent;
+    const std::uint64_t last = end == limit ? end : end / side * side;
+    if (first >= last) return {start, start};
+    return {static_cast<std::uint32_t>(first), static_cast<std::uint32_t>(last)};
+}
+
+}  // namespace
+
+Rectangle WholeTiles(const zelm::LevelGeometry& level, const Rectangle& window) {
+    const auto [left, right] = WholeAlong(window.x, window.width, level.samples, level.tileSize);
+    const auto [top, bottom] = WholeAlong(window.y, window.height, level.lines, level.tileSize);
+    return {left, top, right - left, bottom - top};
+}
+
+std::array<Rectangle, 4> Around(const Rectangle& window, const Rectangle& part) {
+    const std::uint32_t right = part.x + part.width, bottom = part.y + part.height;
+    return {{{window.x, window.y, window.width, part.y - window.y},
+             {window.x, bottom, window.width, window.y + window.height - bottom},
+             {window.x, part.y, part.x - window.x, part.height},
+             {right, part.y, window.x + window.width - right, part.height}}};
+}
+
+TileWriter::TileWriter(Dataset& underCreation)
+    : dataset(underCreation),
+      bands(underCreation.GetRasterCount()),
+      type(underCreation.File().tiles.Type()),
+      sampleSize(GDALGetDataTypeSizeBytes(type)) {}
+
+bool TileWriter::Write(const Rectangle& tiles, const Target& from) {
+    const zelm::LevelGeometry grid = dataset.File().info.header.Geometry(dataset.Level());
+    bool written = true;
+    zelm::VisitTiles(grid, tiles, [&](const zelm::TilePart& part) {
+        const auto* const samples = static_cast<const unsigned char*>(from.data) +
+                                    (part.tile.y - tiles.y) * from.lineSpace +
+                                    (part.tile.x - tiles.x) * from.pixelSpace;
+        written = WriteTile(part.tile, samples, from) && written;
+    });
+    return written;
+}
+
+bool TileWriter::WriteTile(const Rectangle& tile, const void* samples, const Target& from) {
+    OpenFile& file = dataset.File();
+    Creation& creation = *dataset.UnderCreation();
+    const auto side = file.info.header.tileSize;
+    const auto blockX = static_cast<int>(tile.x / side), blockY = static_cast<int>(tile.y / side);
+    const std::size_t block =
+        static_cast<std::size_t>(blockY) * file.info.header.Geometry(dataset.Level()).tilesAcross +
+        static_cast<std::size_t>(blockX);
+    const bool done = Reported(
+        [&] {
+            Gather(tile, static_cast<const unsigned char*>(samples), from);
+            DropBlocks(blockX, blockY);
+            file.tiles.Forget();
+            zmchost::Raster& raster = file.raster.Get();
+            raster.Write(dataset.Level(), tile, raster.AllBands(), scratch.data());
+        },
+        CPLE_FileIO);
+    for (std::size_t band = 0; band < static_cast<std::size_t>(bands); ++band)
+        done ? creation.MarkWritten(block, band) : creation.MarkLost(block, band);
+    return done;
+}
+
+// Lines of all bands as they lie are copied at once, others sample by sample.
+void TileWriter::Gather(const Rectangle& tile, const unsigned char* samples, const Target& from) {
+    const GSpacing pixel = sampleSize * bands;
+    scratch.resize(tile.Pixels() * static_cast<std::size_t>(pixel));
+    const bool alike = from.type == type && from.pixelSpace == pixel &&
+                       (bands == 1 || from.bandSpace == sampleSize);
+    unsigned char* line = scratch.data();
+    for (std::uint32_t y = 0; y < tile.height; ++y, samples += from.lineSpace) {
+        for (int band = 0; band < bands && !alike; ++band)
+            GDALCopyWords64(samples + band * from.bandSpace, from.type,
+                            static_cast<int>(from.pixelSpace), line + band * sampleSize, type,
+                            static_cast<int>(pixel), tile.width);
+        if (alike) std::memcpy(line, samples, tile.width * static_cast<std::size_t>(pixel));
+        line += tile.width * static_cast<std::size_t>(pixel);
+    }
+}
+
+void TileWriter::DropBlocks(int blockX, int blockY) {
+    for (int number = 1; number <= bands; ++number)
+        dataset.GetRasterBand(number)->FlushBlock(blockX, blockY, FALSE);
+}
+
+}  // namespace zmcgdal
