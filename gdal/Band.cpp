@@ -175,6 +175,7 @@ CPLErr Band::IWriteBlock(int blockX, int blockY, void* data) {
         for (const WaitingBlock& other : waiting) other.Settle();
         for (const std::uint32_t band : bands)
             if (creation) creation->MarkWritten(BlockNumber(blockX, blockY), band);
+        if (creation) creation->NoteBytes(samples.size());
     };
     if (Reported(write, CPLE_FileIO)) return CE_None;
     if (creation) creation->MarkLost(BlockNumber(blockX, blockY), index);

@@ -12,6 +12,7 @@
 
 #include <gdal_priv.h>
 
+#include <cstdint>
 #include <memory>
 #include <string>
 #include <vector>
@@ -42,6 +43,14 @@ public:
     void MarkWritten(std::size_t block, std::size_t band) {
         written[block * bands + band] = true;
         lost[block * bands + band] = false;
+    }
+    // The draft has so many bytes more: now and then the disk is set on to them, so that closing
+    // does not wait for all of it.
+    void NoteBytes(std::uint64_t bytes) {
+        unflushed += bytes;
+        if (unflushed < kFlushedAtOnce) return;
+        unflushed = 0;
+        draft->BeginFlush();
     }
     // The draft did not take a block: without it there will be no target.
     void MarkLost(std::size_t block, std::size_t band) noexcept {
@@ -75,6 +84,8 @@ private:
     std::size_t bands;
     std::vector<bool> written;  // by block and band
     std::vector<bool> lost;     // likewise
+    static constexpr std::uint64_t kFlushedAtOnce = std::uint64_t{16} << 20;
+    std::uint64_t unflushed = 0;
     bool sealed = false;
 
     // Puts what was set into the finished file of that path, which has no name yet.

@@ -73,6 +73,7 @@ bool TileWriter::WriteTile(const Rectangle& tile, const void* samples, const Tar
             file.tiles.Forget();
             zmchost::Raster& raster = file.raster.Get();
             raster.Write(dataset.Level(), tile, raster.AllBands(), scratch.data());
+            creation.NoteBytes(scratch.size());
         },
         CPLE_FileIO);
     for (std::size_t band = 0; band < static_cast<std::size_t>(bands); ++band)

@@ -324,6 +324,7 @@ void BuildRun::Reopen() {
                                    header.fileSize))
         throw Error(name, "build it", "pixels of level 0 are missing");
     file->Reserve(header.tileDataEnd + MetadataBound());
+    file->BeginFlush();
 }
 
 void BuildRun::Prepare() {
