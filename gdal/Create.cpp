@@ -284,10 +284,11 @@ CPLErr Creation::ChooseLevels(Dataset& dataset, const char* resampling, int coun
     chosen.resampling = method;
     chosen.levels = coarsest;
     if (!Reported([&] { Check(dataset, chosen); })) return CE_Failure;
-    options.build = std::move(chosen);
     const bool fits = dataset.File().info.header.levelMax == coarsest;
-    const bool settled = fits || !IsUntouched() || Reported([&] { LayOutAnew(dataset); });
-    return settled ? CE_None : CE_Failure;
+    if (!fits && IsUntouched() && !Reported([&] { LayOutAnew(dataset, chosen); }))
+        return CE_Failure;
+    options.build = std::move(chosen);
+    return CE_None;
 }
 
 // Blocks in GDAL's cache are no matter of the file's yet.
@@ -298,10 +299,10 @@ bool Creation::IsUntouched() const {
     return none(written) && none(lost);
 }
 
-void Creation::LayOutAnew(Dataset& dataset) {
+void Creation::LayOutAnew(Dataset& dataset, const zmchost::BuildOptions& build) {
     GdalRasterSource source(dataset, options.signedByte);
     Naming(target, [&] {
-        zmchost::PyramidBuilder(SharedModule()).LayOut(source, *draft, target, options.build);
+        zmchost::PyramidBuilder(SharedModule()).LayOut(source, *draft, target, build);
         dataset.Reopen(OpenDraft(*draft, options));
     });
 }

@@ -74,7 +74,7 @@ public:
 private:
     void KeepMask(Dataset& dataset) const;
     bool IsUntouched() const;
-    void LayOutAnew(Dataset& dataset);
+    void LayOutAnew(Dataset& dataset, const zmchost::BuildOptions& build);
     void MakeTarget(Dataset& dataset);
     void CompleteDraft(Dataset& dataset, zmchost::RasterSource& source);
 

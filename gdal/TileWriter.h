@@ -37,6 +37,8 @@ public:
 private:
     bool WriteTile(const zelm::Rectangle& tile, const void* samples, const Target& from);
     void Gather(const zelm::Rectangle& tile, const unsigned char* samples, const Target& from);
+    void GatherLine(std::uint32_t width, const unsigned char* samples, const Target& from,
+                    unsigned char* line) const;
     void DropBlocks(int blockX, int blockY);
 
     Dataset& dataset;

@@ -218,6 +218,18 @@ TEST_F(DriverFaults, NewFileWithoutSomeOfItsBlocksIsNotMade) {
     EXPECT_TRUE(std::filesystem::is_empty(folder.String()));
 }
 
+TEST_F(DriverFaults, RasterThatTheDiskHasNoRoomForIsRefusedWhenItIsCreated) {
+    const std::string place = folder / "disk";
+    std::filesystem::create_directory(place);
+    const zmctest::SmallDisk disk(place, "size=512k");
+    if (!disk.IsMounted()) GTEST_SKIP() << "no right to mount a disk here";
+    CPLErrorReset();
+    EXPECT_FALSE(DatasetPtr(
+        Driver("ZMCPyramid").Create((place + "/a.pyr").c_str(), 1000, 1000, 1, GDT_Byte, nullptr)));
+    EXPECT_NE(std::string(CPLGetLastErrorMsg()).find("bytes of disk space"), std::string::npos);
+    EXPECT_TRUE(std::filesystem::is_empty(place));
+}
+
 TEST_F(DriverFaults, WindowsOfAllBandsAnswerForTheirTiles) {
     constexpr int kLarge = 600;
     Samples samples(std::size_t{kLarge} * kLarge * 2, 7);
