@@ -66,6 +66,7 @@ set(ZMC_PUBLIC_HEADERS
     # The host's side: pyramids built, read with errors, looked into, and put in order.
     host/base/Error.h
     host/file/Limits.h
+    host/build/BuildFile.h
     host/build/FullStatistics.h
     host/build/PyramidBuilder.h
     host/file/PyramidFileInfo.h

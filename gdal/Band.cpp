@@ -81,9 +81,10 @@ CPLErr Band::IReadBlock(int blockX, int blockY, void* data) {
     });
 }
 
+// GDAL counts the blocks of a band when it first looks for one.
 std::size_t Band::BlockNumber(int blockX, int blockY) const {
-    return static_cast<std::size_t>(blockY) * static_cast<std::size_t>(nBlocksPerRow) +
-           static_cast<std::size_t>(blockX);
+    const std::size_t across = owner.File().info.header.Geometry(owner.Level()).tilesAcross;
+    return static_cast<std::size_t>(blockY) * across + static_cast<std::size_t>(blockX);
 }
 
 // Blocks that nobody wrote hold the no-data value, to its last digit, or zeros.
@@ -180,10 +181,31 @@ CPLErr Band::IWriteBlock(int blockX, int blockY, void* data) {
         for (const WaitingBlock& other : waiting) other.Settle();
         for (const std::uint32_t band : bands)
             if (creation) creation->MarkWritten(BlockNumber(blockX, blockY), band);
+        if (creation) creation->NoteBytes(samples.size());
     };
     if (Reported(write, CPLE_FileIO)) return CE_None;
     if (creation) creation->MarkLost(BlockNumber(blockX, blockY), index);
     return CE_Failure;
+}
+
+void Band::WriteUnwritten() {
+    const Creation& creation = *owner.UnderCreation();
+    if (!InitBlockInfo()) throw std::bad_alloc();  // which GDAL does when a block is asked for
+    const std::size_t size = static_cast<std::size_t>(GDALGetDataTypeSizeBytes(eDataType));
+    const std::size_t samples =
+        static_cast<std::size_t>(nBlockXSize) * static_cast<std::size_t>(nBlockYSize);
+    std::vector<unsigned char> block;
+    for (int y = 0; y < nBlocksPerColumn; ++y)
+        for (int x = 0; x < nBlocksPerRow; ++x) {
+            if (creation.IsWritten(BlockNumber(x, y), index)) continue;
+            if (block.empty()) {
+                block.resize(samples * size);
+                FillUnwritten(block.data(), size, samples);
+            }
+            if (IWriteBlock(x, y, block.data()) != CE_None)
+                throw zmchost::Error(owner.GetDescription(), "build it",
+                                     "some of its blocks could not be written");
+        }
 }
 
 CPLErr Band::IRasterIO(GDALRWFlag mode, int x, int y, int width, int height, void* data,
@@ -312,7 +334,7 @@ bool Band::MaskIsBesideTheFile() {
 CPLErr Band::CreateMaskBand(int flags) {
     return Reporting(CE_Failure, [&] {
         if (!owner.MayChange()) return CE_Failure;
-        return owner.NamedAsSpool([&] { return GDALPamRasterBand::CreateMaskBand(flags); });
+        return owner.NamedAsDraft([&] { return GDALPamRasterBand::CreateMaskBand(flags); });
     });
 }
 

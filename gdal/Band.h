@@ -72,6 +72,9 @@ public:
     void TakeRenewed(const zmchost::FullStatistics& full);
     // Whether that block waits in GDAL's cache to be written.
     bool HasDirtyBlock(int blockX, int blockY);
+    // Of a dataset under creation: writes each block that nobody wrote, with what it holds (no
+    // data, or zeros). No block waits in GDAL's cache. Throws zmchost::Error where that fails.
+    void WriteUnwritten();
     // Whether pixels were written since the dataset was opened.
     bool IsEdited() const { return edited; }
 

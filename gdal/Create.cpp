@@ -103,18 +103,25 @@ void CopyFile(const std::string& from, const std::string& target) {
     FailToWrite(target);
 }
 
-// The builder knows a file by the name of its spool.
-void BuildElsewhere(zmchost::RasterSource& pixels, const std::string& target,
-                    const zmchost::BuildOptions& options) {
-    const zmchost::BuildFile spool(TemporaryName(), true);
+// The builder knows a file by its temporary name.
+template <class Work>
+auto Naming(const std::string& target, Work&& work) {
     try {
-        zmchost::PyramidBuilder(SharedModule()).Build(pixels, spool.Path(), options);
-        CopyFile(spool.Path(), target);
+        return work();
     } catch (const zmchost::Cancelled& error) {
         throw zmchost::Cancelled(target, error.Operation());
     } catch (const zmchost::Error& error) {
         throw zmchost::Error(target, error.Operation(), error.Reason());
     }
+}
+
+void BuildElsewhere(zmchost::RasterSource& pixels, const std::string& target,
+                    const zmchost::BuildOptions& options) {
+    const zmchost::BuildFile built(TemporaryName(), true);
+    Naming(target, [&] {
+        zmchost::PyramidBuilder(SharedModule()).Build(pixels, built.Path(), options);
+        CopyFile(built.Path(), target);
+    });
 }
 
 void Build(zmchost::RasterSource& pixels, const std::string& target,
@@ -160,18 +167,39 @@ zelm::RasterProps PropsOf(const char* target, int width, int height, int bands,
     return props;
 }
 
-GDALDataset* OpenSpool(const std::string& target, const zmchost::Raster& raster,
-                       CreationOptions options, std::unique_ptr<zmchost::BuildFile> spool) {
+// A raster that has no pixels yet.
+class Outline final : public zmchost::RasterSource {
+public:
+    Outline(std::string targetName, zelm::RasterProps rasterProps)
+        : name(std::move(targetName)), props(std::move(rasterProps)) {}
+
+    std::string Name() const override { return name; }
+    zelm::RasterProps Props() const override { return props; }
+    void Read(const zmchost::Window&, std::span<const std::uint32_t>, void*) override {
+        throw zmchost::Error(name, "read its pixels", "it has none yet");
+    }
+
+private:
+    std::string name;
+    zelm::RasterProps props;
+};
+
+std::shared_ptr<OpenFile> OpenDraft(const zmchost::BuildFile& draft,
+                                    const CreationOptions& options) {
     OpenOptions open;
     if (options.signedByte) open.signedByteAs = SignedByteAs::FlaggedByte;
-    const std::size_t blocks = std::size_t{raster.TilesAcross()} * raster.TilesDown();
-    auto file = std::make_shared<OpenFile>(spool->Path(), GA_Update, open);
-    auto dataset = Dataset::FromFile(std::move(file), GA_Update);
+    return std::make_shared<OpenFile>(draft.Path(), GA_Update, open);
+}
+
+GDALDataset* ShowDraft(const std::string& target, CreationOptions options,
+                       std::unique_ptr<zmchost::BuildFile> draft) {
+    auto dataset = Dataset::FromFile(OpenDraft(*draft, options), GA_Update);
     dataset->SetDescription(target.c_str());
-    auto creation = std::make_unique<Creation>(target, std::move(options), std::move(spool), blocks,
-                                               std::size_t{raster.Bands()});
-    creation->Check(*dataset);
-    dataset->BeginCreation(std::move(creation));
+    const zelm::LevelGeometry grid = dataset->File().info.header.Geometry(0);
+    const std::size_t blocks = std::size_t{grid.tilesAcross} * grid.tilesDown;
+    dataset->BeginCreation(
+        std::make_unique<Creation>(target, std::move(options), std::move(draft), blocks,
+                                   static_cast<std::size_t>(dataset->GetRasterCount())));
     return dataset.release();
 }
 
@@ -209,20 +237,22 @@ GDALDataset* CreateNew(const char* target, int width, int height, int bands, GDA
         const std::uint32_t pixelType = changes ? 0 : PixelTypeFor(type, parsed->signedByte);
         const zelm::RasterProps props = PropsOf(target, width, height, bands, pixelType);
         CheckWritable(target);
-        auto spool = std::make_unique<zmchost::BuildFile>(
+        Outline outline(target, props);
+        const zmchost::PyramidBuilder builder(SharedModule());
+        builder.Check(outline, target, parsed->build);
+        auto draft = std::make_unique<zmchost::BuildFile>(
             IsVirtualName(target) ? TemporaryName() : target, true);
-        const zmchost::Raster raster =
-            zmchost::Raster::Create(SharedModule(), spool->Path(), props, 0);
-        return OpenSpool(target, raster, std::move(*parsed), std::move(spool));
+        Naming(target, [&] { builder.LayOut(outline, *draft, target, parsed->build); });
+        return ShowDraft(target, std::move(*parsed), std::move(draft));
     });
 }
 
 Creation::Creation(std::string targetName, CreationOptions creationOptions,
-                   std::unique_ptr<zmchost::BuildFile> spoolFile, std::size_t blockCount,
+                   std::unique_ptr<zmchost::BuildFile> draftFile, std::size_t blockCount,
                    std::size_t bandCount)
     : target(std::move(targetName)),
       options(std::move(creationOptions)),
-      spool(std::move(spoolFile)),
+      draft(std::move(draftFile)),
       bands(bandCount),
       written(blockCount * bandCount),
       lost(written.size()) {}
@@ -254,19 +284,38 @@ CPLErr Creation::ChooseLevels(Dataset& dataset, const char* resampling, int coun
     chosen.resampling = method;
     chosen.levels = coarsest;
     if (!Reported([&] { Check(dataset, chosen); })) return CE_Failure;
+    const bool fits = dataset.File().info.header.levelMax == coarsest;
+    if (!fits && IsUntouched() && !Reported([&] { LayOutAnew(dataset, chosen); }))
+        return CE_Failure;
     options.build = std::move(chosen);
     return CE_None;
 }
 
+// Blocks in GDAL's cache are no matter of the file's yet.
+bool Creation::IsUntouched() const {
+    const auto none = [](const std::vector<bool>& blocks) {
+        return std::find(blocks.begin(), blocks.end(), true) == blocks.end();
+    };
+    return none(written) && none(lost);
+}
+
+void Creation::LayOutAnew(Dataset& dataset, const zmchost::BuildOptions& build) {
+    GdalRasterSource source(dataset, options.signedByte);
+    Naming(target, [&] {
+        zmchost::PyramidBuilder(SharedModule()).LayOut(source, *draft, target, build);
+        dataset.Reopen(OpenDraft(*draft, options));
+    });
+}
+
 // What there is of a mask by the end of a creation that failed.
 Creation::~Creation() {
-    Reported([&] { VSIUnlink((SpoolName() + kMaskEnding).c_str()); });
+    Reported([&] { VSIUnlink((DraftName() + kMaskEnding).c_str()); });
 }
 
 // A target whose mask cannot be kept goes again.
 void Creation::KeepMask(Dataset& dataset) const {
     Unfinished made(target);
-    const std::string mask = SpoolName() + kMaskEnding;
+    const std::string mask = DraftName() + kMaskEnding;
     ErrorCatcher errors(CE_Failure);
     dataset.CloseMask();
     if (!errors.Text().empty())
@@ -290,15 +339,13 @@ bool Creation::Finish(Dataset& dataset) {
     const bool built = Reported([&] {
         if (std::find(lost.begin(), lost.end(), true) != lost.end())
             throw zmchost::Error(target, "build it", "some of its blocks could not be written");
-        GdalRasterSource source(dataset, options.signedByte);
-        AcceptLosses(source, false);
         options.build.takeStatistics = [&](const auto& stored) { statistics = stored; };
         if (options.embed)
             options.build.beforeNaming = [&](const std::string& made) {
                 keepStatistics(made);
                 Embed(dataset, made);
             };
-        Build(source, target, options.build);
+        MakeTarget(dataset);
     });
     if (!built || !Reported([&] { KeepMask(dataset); })) return false;
     // The palettes are in the file now.
@@ -308,6 +355,29 @@ bool Creation::Finish(Dataset& dataset) {
     });
     if (options.embed) dataset.ForgetChanges();
     return true;
+}
+
+void Creation::MakeTarget(Dataset& dataset) {
+    GdalRasterSource source(dataset, options.signedByte);
+    AcceptLosses(source, false);
+    const std::uint32_t laidOut = dataset.File().info.header.levelMax;
+    if (options.build.levels.value_or(laidOut) == laidOut)
+        CompleteDraft(dataset, source);
+    else
+        Build(source, target, options.build);
+}
+
+void Creation::CompleteDraft(Dataset& dataset, zmchost::RasterSource& source) {
+    for (int number = 1; number <= dataset.GetRasterCount(); ++number)
+        static_cast<Band*>(dataset.GetRasterBand(number))->WriteUnwritten();
+    sealed = true;
+    Naming(target, [&] {
+        zmchost::PyramidBuilder(SharedModule()).Complete(source, *draft, target, options.build);
+    });
+    if (IsVirtualName(target))
+        CopyFile(draft->Path(), target);
+    else
+        draft->Commit();
 }
 
 void Creation::Embed(Dataset& dataset, const std::string& made) const {

@@ -23,6 +23,7 @@
 #include "gdal/Reporting.h"
 #include "gdal/Sidecar.h"
 #include "gdal/SidecarStage.h"
+#include "gdal/TileWriter.h"
 #include "gdal/VsiSource.h"
 #include "host/file/EmbeddedItems.h"
 #include "host/raster/LentFile.h"
@@ -313,14 +314,17 @@ void Dataset::DescribeFile() {
 // A mask that another raster has left beside the target's name is none of this one's.
 void Dataset::BeginCreation(std::unique_ptr<Creation> state) {
     creation = std::move(state);
-    oOvManager.Initialize(this, creation->SpoolName().c_str());
-    oOvManager.HaveMaskFile(nullptr, creation->SpoolName().c_str());
+    oOvManager.Initialize(this, creation->DraftName().c_str());
+    oOvManager.HaveMaskFile(nullptr, creation->DraftName().c_str());
 }
 
-CPLErr Dataset::NamedAsSpool(const std::function<CPLErr()>& make) {
+// Nothing of the file before is remembered but in GDAL's cache.
+void Dataset::Reopen(std::shared_ptr<OpenFile> draft) { file = std::move(draft); }
+
+CPLErr Dataset::NamedAsDraft(const std::function<CPLErr()>& make) {
     if (!creation) return make();
     const std::string name = GetDescription();
-    SetDescription(creation->SpoolName().c_str());
+    SetDescription(creation->DraftName().c_str());
     const CPLErr made = make();
     SetDescription(name.c_str());
     return made;
@@ -329,7 +333,7 @@ CPLErr Dataset::NamedAsSpool(const std::function<CPLErr()>& make) {
 CPLErr Dataset::CreateMaskBand(int flags) {
     return Reporting(CE_Failure, [&] {
         if (!MayChange()) return CE_Failure;
-        return NamedAsSpool([&] { return GDALPamDataset::CreateMaskBand(flags); });
+        return NamedAsDraft([&] { return GDALPamDataset::CreateMaskBand(flags); });
     });
 }
 
@@ -662,6 +666,11 @@ CPLErr Dataset::ReadOrWrite(GDALRWFlag mode, int x, int y, int width, int height
                             int bandCount, int* bandMap, GSpacing pixelSpace, GSpacing lineSpace,
                             GSpacing bandSpace, GDALRasterIOExtraArg* extra) {
     if (mode == GF_Write) file->CheckBlock(level);
+    if (mode == GF_Write && bufferWidth == width && bufferHeight == height &&
+        WritesDirectly(x, y, width, height, std::span(bandMap, static_cast<std::size_t>(bandCount)),
+                       *extra))
+        return WriteTiles(RectangleOf(x, y, width, height),
+                          {data, bufferType, pixelSpace, lineSpace, bandSpace}, bandMap, extra);
     const bool reduced = mode == GF_Read && bufferWidth < width && bufferHeight < height;
     if (reduced && !Overviews().empty()) {
         Shown shown(x, y, width, height, *extra);
@@ -696,6 +705,41 @@ CPLErr Dataset::ReadOrWrite(GDALRWFlag mode, int x, int y, int width, int height
     return GDALPamDataset::IRasterIO(mode, x, y, width, height, data, bufferWidth, bufferHeight,
                                      bufferType, bandCount, bandMap, pixelSpace, lineSpace,
                                      bandSpace, extra);
+}
+
+// GDAL tells whoever wants to know of progress by itself.
+bool Dataset::WritesDirectly(int x, int y, int width, int height, std::span<const int> numbers,
+                             const GDALRasterIOExtraArg& extra) const {
+    if (!creation || bForceCachedIO || extra.pfnProgress) return false;
+    if (!file->tiles.IsHeld(file->tiles.TileAt(level, 0, 0))) return false;
+    if (IsWidened(file->info.header.pixelType, file->tiles.Type())) return false;
+    if (static_cast<int>(numbers.size()) != nBands) return false;
+    for (int number = 1; number <= nBands; ++number)
+        if (numbers[static_cast<std::size_t>(number - 1)] != number) return false;
+    return WholeTiles(file->info.header.Geometry(level), RectangleOf(x, y, width, height))
+               .Pixels() != 0;
+}
+
+CPLErr Dataset::WriteTiles(const zelm::Rectangle& window, const Target& from, int* bandMap,
+                           GDALRasterIOExtraArg* extra) {
+    const auto at = [&](const zelm::Rectangle& part) {
+        Target moved = from;
+        moved.data = static_cast<unsigned char*>(from.data) + (part.y - window.y) * from.lineSpace +
+                     (part.x - window.x) * from.pixelSpace;
+        return moved;
+    };
+    const zelm::Rectangle tiles = WholeTiles(file->info.header.Geometry(level), window);
+    CPLErr result = TileWriter(*this).Write(tiles, at(tiles)) ? CE_None : CE_Failure;
+    for (const zelm::Rectangle& part : Around(window, tiles)) {
+        if (part.Pixels() == 0) continue;
+        const auto width = static_cast<int>(part.width), height = static_cast<int>(part.height);
+        const CPLErr written = GDALPamDataset::IRasterIO(
+            GF_Write, static_cast<int>(part.x), static_cast<int>(part.y), width, height,
+            at(part).data, width, height, from.type, nBands, bandMap, from.pixelSpace,
+            from.lineSpace, from.bandSpace, extra);
+        result = std::max(result, written);
+    }
+    return result;
 }
 
 bool Dataset::HasWindow(int x, int y, int width, int height) const {

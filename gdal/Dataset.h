@@ -173,9 +173,11 @@ public:
     // Makes this dataset the place where pixels of a new file are gathered; see gdal/Create.h.
     void BeginCreation(std::unique_ptr<Creation> state);
     Creation* UnderCreation() { return creation.get(); }
-    // Runs `make`, which makes a mask of the whole dataset: beside the spool, as long as there is
+    // Its file was laid out anew, for the same raster with other levels.
+    void Reopen(std::shared_ptr<OpenFile> draft);
+    // Runs `make`, which makes a mask of the whole dataset: beside the draft, as long as there is
     // no target.
-    CPLErr NamedAsSpool(const std::function<CPLErr()>& make);
+    CPLErr NamedAsDraft(const std::function<CPLErr()>& make);
     // Ends the use of the mask, so that its file can be moved.
     void CloseMask() { oOvManager.CloseDependentDatasets(); }
 
@@ -224,6 +226,12 @@ private:
     void RenewEdited();
     void EndEditing();
     bool SidecarIsWhole() const;
+    // True if whole tiles of this window go into a new file at once (TileWriter.h).
+    bool WritesDirectly(int x, int y, int width, int height, std::span<const int> numbers,
+                        const GDALRasterIOExtraArg& extra) const;
+    // Writes them so, and the rest of the window through GDAL's block cache.
+    CPLErr WriteTiles(const zelm::Rectangle& window, const Target& from, int* bandMap,
+                      GDALRasterIOExtraArg* extra);
     bool HasWindow(int x, int y, int width, int height) const;
     bool HasBands(std::span<const int> numbers) const;
     CPLStringList* OwnDomain(const char* domain);

@@ -66,6 +66,9 @@ bool RemoveEntry(const std::string& path) noexcept;
 // Waits until a file's bytes, or a folder's names, have reached the disk.
 bool SyncFile(const std::string& path) noexcept;
 bool SyncFolder(const std::string& folder) noexcept;
+// Sets the system on to writing a file's bytes to the disk and does not wait for it, so that
+// SyncFile has less to wait for. Nothing is told, and systems without the service do nothing.
+void BeginSync(const std::string& path) noexcept;
 
 // Bytes that this process can still write in a folder.
 std::optional<std::uint64_t> FreeSpace(const std::string& folder) noexcept;

@@ -13,6 +13,7 @@
 #include <string>
 
 #include "platform/FileLock.h"
+#include "platform/FileSystem.h"
 
 namespace zmchost {
 
@@ -32,6 +33,8 @@ public:
     // Takes them, once the file has its beginning; the module would not tell that they ran out.
     void Reserve(std::uint64_t size) const;
 
+    // Lets the disk begin with what the file has; Flush waits for less then.
+    void BeginFlush() const { platform::BeginSync(path); }
     // Waits until the file is on the disk, giving back what was reserved and not used.
     void Flush() const;
     // Gives the file its name. A target that came into being meanwhile is refused as at the start.

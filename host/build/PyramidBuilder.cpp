@@ -18,6 +18,7 @@
 #include "host/build/LevelCascade.h"
 #include "host/build/PixelWork.h"
 #include "host/build/TileStore.h"
+#include "host/file/PresentTiles.h"
 #include "host/raster/Raster.h"
 
 namespace zmchost {
@@ -37,6 +38,10 @@ public:
              const BuildOptions& buildOptions);
 
     BuildReport Run();
+    // The first step of it alone, into a file that is given, and all steps behind the pixels of
+    // level 0, which that file has by then, but for its name.
+    void LayOut(BuildFile& given);
+    BuildReport Complete(BuildFile& laidOut);
 
 private:
     // A strip on its way through the pipeline, and what it completes.
@@ -55,6 +60,10 @@ private:
     void Plan();
 
     void LayOut();
+    void Reopen();
+    void Prepare();
+    void Finish();
+    void MakeReport();
     void Fill();
     void WalkPass(const Pass& pass);
     void WalkColumn(const Pass& pass, const Column& column, StripStore& store);
@@ -87,12 +96,16 @@ private:
     std::uint32_t pixelBytes = 0;
     std::vector<Pass> passes;
 
+    // Pixels are not the source's: level 0 of the file has them already.
+    bool inPlace = false;
+
     MemoryMeter meter;
-    std::optional<BuildFile> file;
+    BuildFile* file = nullptr;
     std::optional<Raster> raster;
     std::unique_ptr<PixelWork> work;
     std::optional<TileStore> tiles;
     BuildProgress progress;
+    std::chrono::steady_clock::time_point start = std::chrono::steady_clock::now();
     BuildReport report;
 };
 
@@ -232,18 +245,40 @@ void BuildRun::Plan() {
 }
 
 BuildReport BuildRun::Run() {
-    const auto start = std::chrono::steady_clock::now();
-    file.emplace(name, options.overwrite);
+    BuildFile made(name, options.overwrite);
+    LayOut(made);
+    Finish();
+    made.Commit();
+    MakeReport();
+    return std::move(report);
+}
+
+void BuildRun::LayOut(BuildFile& given) {
+    file = &given;
     LayOut();
+}
+
+BuildReport BuildRun::Complete(BuildFile& laidOut) {
+    file = &laidOut;
+    inPlace = true;
+    Reopen();
+    Finish();
+    MakeReport();
+    return std::move(report);
+}
+
+void BuildRun::Finish() {
+    Prepare();
     RunWithThreads(threads, [this] { Fill(); });
     StoreRecords();
     Check();
-    if (options.beforeNaming) {
-        options.beforeNaming(file->Path());
-        // It may have put something in.
-        report.fileSize = PyramidHeader::Read(file->Path()).fileSize;
-    }
-    file->Commit();
+    if (!options.beforeNaming) return;
+    options.beforeNaming(file->Path());
+    // It may have put something in.
+    report.fileSize = PyramidHeader::Read(file->Path()).fileSize;
+}
+
+void BuildRun::MakeReport() {
     report.width = props.samples;
     report.height = props.lines;
     report.bands = props.bands;
@@ -252,7 +287,6 @@ BuildReport BuildRun::Run() {
     report.peakMemory = meter.Peak();
     report.seconds =
         std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
-    return std::move(report);
 }
 
 // Room for the documents, generously: 21 bytes for a count, and the tags of a record.
@@ -275,6 +309,25 @@ void BuildRun::LayOut() {
     if (raster->Header().tileOrdering != report.tileOrdering)
         throw Error(name, "lay it out", "the module chose another tile ordering");
     file->Reserve(raster->Header().tileDataEnd + MetadataBound());
+}
+
+// What the layout did not know yet, as the colours of palettes, takes room too.
+void BuildRun::Reopen() {
+    raster.emplace(Raster::Open(module, file->Path()));
+    const PyramidHeader& header = raster->Header();
+    if (header.width != props.samples || header.height != props.lines ||
+        header.bandCount != props.bands || header.pixelType != props.pixelType ||
+        header.levelMin != 0 || header.levelMax != maxLevel ||
+        header.tileOrdering != report.tileOrdering)
+        throw Error(name, "build it", "its file is laid out for another raster");
+    if (!PresentTiles(header).Have(0, {0, 0, props.samples, props.lines}, raster->AllBands(),
+                                   header.fileSize))
+        throw Error(name, "build it", "pixels of level 0 are missing");
+    file->Reserve(header.tileDataEnd + MetadataBound());
+    file->BeginFlush();
+}
+
+void BuildRun::Prepare() {
     work = MakePixelWork(*raster, WorkSetup());
     meter.Add(work->StatisticsMemory());
     if (hidden) meter.Add(HiddenSamples::WorkMemory(weights.masked.size()));
@@ -285,6 +338,7 @@ void BuildRun::LayOut() {
 void BuildRun::Fill() {
     progress.total = std::uint64_t{props.samples} * props.lines;
     if (work->NeedsSecondWalk()) progress.total *= 2;
+    if (inPlace && maxLevel == 0 && !options.statistics) return;
     for (const Pass& pass : passes) WalkPass(pass);
     if (work->NeedsSecondWalk()) CountLevel0();
 }
@@ -326,7 +380,7 @@ void BuildRun::WalkColumn(const Pass& pass, const Column& column, StripStore& st
         return job;
     };
     const auto write = [&](Job* job) {
-        if (pass.baseLevel == 0) WriteStrip(pass, column, *job->base);
+        if (pass.baseLevel == 0 && !inPlace) WriteStrip(pass, column, *job->base);
         for (const StripStore::Loan& strip : job->finished) WriteStrip(pass, column, *strip);
         const std::uint32_t lines = job->base->lines;
         *job = Job();
@@ -342,7 +396,7 @@ void BuildRun::WalkColumn(const Pass& pass, const Column& column, StripStore& st
 void BuildRun::ReadStrip(const Pass& pass, const Column& column, Strip& strip) {
     const Window window{column.readBegin, strip.firstLine, strip.width, strip.lines};
     std::byte* const pixels = strip.Row(strip.firstLine);
-    if (pass.baseLevel == 0)
+    if (pass.baseLevel == 0 && !inPlace)
         source.Read(window, bands, pixels);
     else
         tiles->Read(pass.baseLevel, window, pixels);
@@ -453,6 +507,16 @@ void BuildRun::Advance(std::uint64_t pixels) {
 void PyramidBuilder::Check(RasterSource& source, const std::string& target,
                            const BuildOptions& options) const {
     const BuildRun run(module, source, target, options);
+}
+
+void PyramidBuilder::LayOut(RasterSource& source, BuildFile& file, const std::string& target,
+                            const BuildOptions& options) const {
+    BuildRun(module, source, target, options).LayOut(file);
+}
+
+BuildReport PyramidBuilder::Complete(RasterSource& source, BuildFile& file,
+                                     const std::string& target, const BuildOptions& options) const {
+    return BuildRun(module, source, target, options).Complete(file);
 }
 
 BuildReport PyramidBuilder::Build(RasterSource& source, const std::string& target,

@@ -13,6 +13,11 @@
 //
 // The file is built under a temporary name, flushed, opened again and checked, and only then
 // renamed: whatever happens, the target's name shows the old file or the new one, whole.
+//
+// Pixels that come in no order are not read from a source: LayOut makes the file with all its
+// levels, whoever has the pixels writes them into level 0 of it, each tile at its final place, and
+// Complete does the rest in the same file. The result is that of Build, bit for bit, and the disk
+// never holds more than it.
 #ifndef ZMC_HOST_BUILD_PYRAMIDBUILDER_H
 #define ZMC_HOST_BUILD_PYRAMIDBUILDER_H
 
@@ -23,6 +28,7 @@
 #include <vector>
 
 #include "host/base/Error.h"
+#include "host/build/BuildFile.h"
 #include "host/build/FullStatistics.h"
 #include "host/raster/Module.h"
 #include "host/raster/RasterSource.h"
@@ -92,6 +98,19 @@ public:
     // is then what it was, and no temporary file stays. Builds may run on several threads.
     BuildReport Build(RasterSource& source, const std::string& target,
                       const BuildOptions& options = {}) const;
+
+    // Lays `file` out, anew if it was before, for a source that tells all but pixels, and takes the
+    // room on the disk for all of it. `target` stands for the file in messages. Throws Error.
+    void LayOut(RasterSource& source, BuildFile& file, const std::string& target,
+                const BuildOptions& options) const;
+
+    // Makes all of the file that is not pixels of level 0, which were all written since it was laid
+    // out: what Build does but for BuildFile::Commit, which is left to the caller. The source is
+    // not read; its weights, palettes and no-data values, and the options, are those of Build, and
+    // lead to the same size, bands, type, ordering and levels as when the file was laid out. Throws
+    // as Build does; the file is of no use then.
+    BuildReport Complete(RasterSource& source, BuildFile& file, const std::string& target,
+                         const BuildOptions& options) const;
 
     // Throws Error where Build would refuse the options before it touches anything.
     void Check(RasterSource& source, const std::string& target, const BuildOptions& options) const;

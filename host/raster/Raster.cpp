@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cstring>
+#include <functional>
 #include <sstream>
 
 #include "core/PixelVocabulary.h"
@@ -403,19 +404,28 @@ void Raster::Read(std::uint32_t level, const Window& window, std::span<const std
     });
 }
 
+// The module's buffers can be written to, which it does where the mask says so alone.
 void Raster::WriteTile(std::uint32_t level, const Window& window,
-                       std::vector<unsigned char>& pixels) {
-    const zelm::Array<int> list = BandList(AllBands());
-    std::vector<unsigned char> mask(pixels.size() / SampleSize());
+                       std::span<const std::uint32_t> bands, const void* pixels) {
+    const zelm::Array<int> list = BandList(bands);
+    const std::size_t samples = std::size_t{window.width} * window.height * bands.size();
+    if (cleanMask.size() < samples) cleanMask.resize(samples);
     bool written = false;
     Visit([&]<class T>(zelm::RasterReader<T>& typed) {
         written = typed.WriteTile(static_cast<std::int32_t>(window.x),
                                   static_cast<std::int32_t>(window.y), window.width, window.height,
                                   list, static_cast<std::int32_t>(level),
-                                  static_cast<T*>(static_cast<void*>(pixels.data())), mask.data());
+                                  static_cast<T*>(const_cast<void*>(pixels)), cleanMask.data());
     });
     CheckDisk("write " + Describe(window));
     if (!written) throw Error(name, "write " + Describe(window), "the module refuses");
+}
+
+// Whether samples of these bands fill all that a tile has in the file, or whole planes of it.
+bool Raster::FillsTiles(std::span<const std::uint32_t> bands) const {
+    const bool rises =
+        std::adjacent_find(bands.begin(), bands.end(), std::greater_equal<>()) == bands.end();
+    return rises && (bands.size() == Bands() || header->IsPlanar());
 }
 
 void Raster::MergeTile(std::uint32_t level, const Window& tile, const Window& window,
@@ -436,7 +446,7 @@ void Raster::MergeTile(std::uint32_t level, const Window& tile, const Window& wi
                 from += size;
             }
     }
-    WriteTile(level, tile, whole);
+    WriteTile(level, tile, AllBands(), whole.data());
 }
 
 void Raster::Write(std::uint32_t level, const Window& window, std::span<const std::uint32_t> bands,
@@ -445,8 +455,12 @@ void Raster::Write(std::uint32_t level, const Window& window, std::span<const st
     CheckWritable("write pixels");
     if (window.width == 0 || window.height == 0 || bands.empty()) return;
     const std::size_t count = std::size_t{window.width} * window.height;
-    const auto* const given = static_cast<const unsigned char*>(pixels);
-    std::vector<unsigned char> samples(given, given + count * bands.size() * SampleSize());
+    const auto* given = static_cast<const unsigned char*>(pixels);
+    std::vector<unsigned char> samples;
+    if (mask || !header) {
+        samples.assign(given, given + count * bands.size() * SampleSize());
+        given = samples.data();
+    }
     if (mask)
         zelm::VisitElementType(props.pixelType, [&]<class T>(std::type_identity<T>) {
             StampSamples(props, bands, count, mask,
@@ -463,8 +477,12 @@ void Raster::Write(std::uint32_t level, const Window& window, std::span<const st
         return;
     }
     const OwnChange change{*file, file->AcceptedSize()};
+    const bool fills = FillsTiles(bands);
     zelm::VisitTiles(Geometry(level), window, [&](const zelm::TilePart& part) {
-        MergeTile(level, part.tile, window, bands, samples.data());
+        if (fills && part.tile == window)
+            WriteTile(level, window, bands, given);
+        else
+            MergeTile(level, part.tile, window, bands, given);
     });
 }
 

@@ -212,7 +212,9 @@ private:
                     std::span<const std::uint32_t> bands);
     void ReadTile(std::uint32_t level, const Window& window, std::span<const std::uint32_t> bands,
                   void* pixels) const;
-    void WriteTile(std::uint32_t level, const Window& window, std::vector<unsigned char>& pixels);
+    void WriteTile(std::uint32_t level, const Window& window, std::span<const std::uint32_t> bands,
+                   const void* pixels);
+    bool FillsTiles(std::span<const std::uint32_t> bands) const;
     void ReadTiles(std::uint32_t level, const Window& window, std::span<const std::uint32_t> bands,
                    unsigned char* pixels) const;
     void MergeTile(std::uint32_t level, const Window& tile, const Window& window,
@@ -233,6 +235,7 @@ private:
     std::uint32_t maxLevel = 0;
     std::string recoveryNote;
     bool keepsCopies = false;
+    std::vector<unsigned char> cleanMask;  // zeros, as many as a tile had samples that was written
     mutable std::shared_ptr<const DocumentRecords> records;  // null: to be read
     // Until when records are kept that are not settled.
     mutable std::chrono::steady_clock::time_point recordsExpire;

@@ -1,8 +1,8 @@
 // ValueCounter<T>: how often every value of one band occurs, for types of 8 and 16 bits.
 //
-// One pass gives statistics and histogram, and costs less than sums and bins would. The table has
-// 8 bytes per value of the type: 2 KiB or 512 KiB for each object. Used by one thread at a time;
-// the counters of several threads are merged, in any order.
+// One pass gives statistics and histogram, and costs less than sums and bins would. The tables have
+// 8 bytes per value of the type: 4 KiB for bytes, which have two, or 512 KiB for each object. Used
+// by one thread at a time; the counters of several threads are merged, in any order.
 #ifndef ZMC_HOST_STATISTICS_VALUECOUNTER_H
 #define ZMC_HOST_STATISTICS_VALUECOUNTER_H
 
@@ -28,18 +28,25 @@ class ValueCounter {
 
 public:
     static constexpr std::size_t kValues = std::size_t{1} << (8 * sizeof(T));
-    static constexpr std::size_t kBytes = kValues * sizeof(std::uint64_t);
+    // Neighbours of one value wait for each other's count: those of bytes, which have small tables,
+    // go to two in turn.
+    static constexpr std::size_t kTables = sizeof(T) == 1 ? 2 : 1;
+    static constexpr std::size_t kBytes = kTables * kValues * sizeof(std::uint64_t);
 
-    ValueCounter() : counts(kValues) {}
+    ValueCounter() : counts(kTables * kValues) {}
 
     // As HistogramAccumulator::AddRow.
     void AddRow(const T* row, const unsigned char* mask, std::uint32_t band, std::uint32_t bands,
                 std::uint32_t width) {
         std::uint64_t* const table = counts.data();
+        std::uint64_t* const other = table + (kTables - 1) * kValues;
         const T* sample = row + band;
         if (!mask) {
-            for (std::uint32_t i = 0; i < width; ++i, sample += bands)
-                ++table[static_cast<Index>(*sample)];
+            for (std::uint32_t i = 1; i < width; i += 2, sample += 2 * std::size_t{bands}) {
+                ++table[static_cast<Index>(sample[0])];
+                ++other[static_cast<Index>(sample[bands])];
+            }
+            if (width % 2 != 0) ++table[static_cast<Index>(*sample)];
             return;
         }
         const unsigned char* marked = mask + band;
@@ -48,10 +55,10 @@ public:
     }
 
     void Merge(const ValueCounter& other) {
-        for (std::size_t i = 0; i < kValues; ++i) counts[i] += other.counts[i];
+        for (std::size_t i = 0; i < counts.size(); ++i) counts[i] += other.counts[i];
     }
 
-    std::uint64_t Count(T value) const { return counts[static_cast<Index>(value)]; }
+    std::uint64_t Count(T value) const { return CountAt(static_cast<Index>(value)); }
 
     // Statistics and histogram of all that was seen, as the accumulators would have found them.
     // Without a valid sample the histogram is that of a constant band of 0, with no counts.
@@ -72,10 +79,14 @@ private:
     template <class Accumulator>
     void AddTo(Accumulator& accumulator) const {
         for (std::size_t i = 0; i < kValues; ++i)
-            accumulator.AddRepeated(static_cast<T>(static_cast<Index>(i)), counts[i]);
+            accumulator.AddRepeated(static_cast<T>(static_cast<Index>(i)), CountAt(i));
     }
 
-    std::vector<std::uint64_t> counts;  // by the value's bits
+    std::uint64_t CountAt(std::size_t place) const {
+        return kTables == 1 ? counts[place] : counts[place] + counts[place + kValues];
+    }
+
+    std::vector<std::uint64_t> counts;  // by the value's bits, table after table
 };
 
 }  // namespace zmchost

@@ -127,6 +127,15 @@ bool SyncFile(const std::string& path) noexcept { return Sync(path, O_RDONLY); }
 
 bool SyncFolder(const std::string& folder) noexcept { return Sync(folder, O_RDONLY | O_DIRECTORY); }
 
+void BeginSync(const std::string& path) noexcept {
+#if defined(__linux__)
+    const Descriptor file(path, O_RDONLY);
+    if (file) ::sync_file_range(file.value, 0, 0, SYNC_FILE_RANGE_WRITE);
+#else
+    static_cast<void>(path);
+#endif
+}
+
 std::optional<std::uint64_t> FreeSpace(const std::string& folder) noexcept {
     struct statvfs info {};
     if (::statvfs(folder.c_str(), &info) != 0) return std::nullopt;

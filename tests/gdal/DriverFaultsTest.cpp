@@ -218,6 +218,62 @@ TEST_F(DriverFaults, NewFileWithoutSomeOfItsBlocksIsNotMade) {
     EXPECT_TRUE(std::filesystem::is_empty(folder.String()));
 }
 
+TEST_F(DriverFaults, RasterThatTheDiskHasNoRoomForIsRefusedWhenItIsCreated) {
+    const std::string place = folder / "disk";
+    std::filesystem::create_directory(place);
+    const zmctest::SmallDisk disk(place, "size=512k");
+    if (!disk.IsMounted()) GTEST_SKIP() << "no right to mount a disk here";
+    CPLErrorReset();
+    EXPECT_FALSE(DatasetPtr(
+        Driver("ZMCPyramid").Create((place + "/a.pyr").c_str(), 1000, 1000, 1, GDT_Byte, nullptr)));
+    EXPECT_NE(std::string(CPLGetLastErrorMsg()).find("bytes of disk space"), std::string::npos);
+    EXPECT_TRUE(std::filesystem::is_empty(place));
+}
+
+TEST_F(DriverFaults, WindowsOfAllBandsAnswerForTheirTiles) {
+    constexpr int kLarge = 600;
+    Samples samples(std::size_t{kLarge} * kLarge * 2, 7);
+    const auto write = [&](GDALDataset& dataset) {
+        return dataset.RasterIO(GF_Write, 0, 0, kLarge, kLarge, samples.data(), kLarge, kLarge,
+                                GDT_Byte, 2, nullptr, 0, 0, 0, nullptr);
+    };
+    for (const bool again : {false, true}) {
+        DatasetPtr dataset(
+            Driver("ZMCPyramid").Create(name.c_str(), kLarge, kLarge, 2, GDT_Byte, nullptr));
+        ASSERT_TRUE(dataset);
+        {
+            const FileFaults faults(
+                {folder.String(), zmctest::kWriteCall, 4, false, FileFaultAction::Error, ENOSPC});
+            EXPECT_EQ(write(*dataset), CE_Failure);
+            EXPECT_EQ(faults.Failed(), 1u);
+        }
+        EXPECT_EQ(again ? write(*dataset) : CE_None, CE_None);
+        dataset.reset();
+        EXPECT_EQ(std::filesystem::exists(name), again);
+    }
+    EXPECT_TRUE(Holds(Read(*Open(), 2), 7));
+}
+
+TEST_F(DriverFaults, NewFileIsNotMadeWhereClosingItMeetsAFullDisk) {
+    std::size_t points = 0;
+    for (bool met = true; met; ++points) {
+        DatasetPtr dataset(
+            Driver("ZMCPyramid").Create(name.c_str(), 3 * kSide, 3 * kSide, 1, GDT_Byte, nullptr));
+        ASSERT_TRUE(dataset);
+        Fill(*dataset, 1, 7);
+        dataset->FlushCache(false);
+        FileFaults faults({folder.String(), zmctest::kWriteCall | zmctest::kResizeCall, points + 1,
+                           false, FileFaultAction::Error, ENOSPC});
+        CPLErrorReset();
+        dataset.reset();
+        met = faults.Failed() != 0;
+        EXPECT_EQ(CPLGetLastErrorType() == CE_Failure, met) << points;
+        EXPECT_EQ(std::filesystem::is_empty(folder.String()), met) << points;
+    }
+    // Blocks that nobody wrote, two levels of four and one tile, and the documents.
+    EXPECT_GT(points, 8u + 5u);
+}
+
 TEST_F(DriverFaults, NewFileIsMadeOnceItsBlocksAreWritten) {
     DatasetPtr dataset(
         Driver("ZMCPyramid").Create(name.c_str(), kSide, kSide, 1, GDT_Byte, nullptr));
