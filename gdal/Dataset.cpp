@@ -524,10 +524,12 @@ bool Dataset::IsWritten(const zelm::Rectangle& window, std::span<const int> band
 
 bool Dataset::ReadsDirectly(int x, int y, int width, int height, std::span<const int> bandNumbers) {
     const zelm::Rectangle window = RectangleOf(x, y, width, height);
-    const bool together =
-        !creation && file->tiles.ThreadsFor(window, static_cast<int>(bandNumbers.size())) > 1;
+    const auto readTogether = [&] {
+        return !creation &&
+               file->tiles.ThreadsFor(window, static_cast<int>(bandNumbers.size())) > 1;
+    };
     const bool quiet = eAccess != GA_Update || (creation && creation->IsSealed()) ||
-                       (together && IsWritten(window, bandNumbers));
+                       (readTogether() && IsWritten(window, bandNumbers));
     if (!quiet || bForceCachedIO) return false;
     // Threads need no lock for this.
     if (IsShared()) return true;

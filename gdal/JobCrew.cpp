@@ -90,7 +90,7 @@ void Crew::WorkWith(const Worker& worker) {
 void Crew::Help() noexcept {
     try {
         WorkWith(makeWorker());
-    } catch (const std::exception&) {
+    } catch (...) {
         return;
     }
 }

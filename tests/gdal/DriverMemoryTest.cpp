@@ -3,6 +3,7 @@
 #include <gdal_priv.h>
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <vector>
 
 #include "gdal/Band.h"
@@ -204,6 +205,43 @@ TEST_F(DriverMemory, CallsFailWithAnError) {
         });
         EXPECT_GT(points, 0u);
     }
+}
+
+// A window that several threads are to read: whoever has no memory leaves its part to the others,
+// and where the one that asked has none for several, it reads alone.
+TEST_F(DriverMemory, LargeWindowsAreReadByThoseWhoHaveMemory) {
+    constexpr int kLarge = 1024;  // 16 tiles
+    const std::vector<unsigned char> whole(std::size_t{kLarge} * kLarge * 2, 3);
+    const DatasetPtr source(Driver("MEM").Create("", kLarge, kLarge, 2, GDT_Byte, nullptr));
+    for (int band = 1; band <= 2; ++band) source->GetRasterBand(band)->Fill(3);
+    ASSERT_TRUE(
+        DatasetPtr(Driver("ZMCPyramid")
+                       .CreateCopy(name.c_str(), source.get(), FALSE, nullptr, nullptr, nullptr)));
+    OpenOptions options;
+    options.threads = 2;
+    std::vector<unsigned char> pixels(whole.size());
+    const auto read = [&](GDALDataset& dataset) {
+        return dataset.RasterIO(GF_Read, 0, 0, kLarge, kLarge, pixels.data(), kLarge, kLarge,
+                                GDT_Byte, 2, nullptr, 0, 0, 0, nullptr) == CE_None;
+    };
+    int goneOn = 0;
+    zmctest::ForEachAllocationFailing([&](AllocationFaults& faults) {
+        faults.Disarm();
+        const auto dataset =
+            Dataset::FromFile(std::make_shared<OpenFile>(name, GA_ReadOnly, options), GA_ReadOnly);
+        EXPECT_GT(dataset->File().tiles.ThreadsFor({0, 0, kLarge, kLarge}, 2), 1u);
+        std::fill(pixels.begin(), pixels.end(), std::uint8_t{0});
+        CPLErrorReset();
+        faults.Rearm();
+        bool done = false;
+        EXPECT_NO_THROW(done = read(*dataset));
+        faults.Disarm();
+        if (done && faults.Failed() != 0) ++goneOn;
+        EXPECT_TRUE(done ? pixels == whole : CPLGetLastErrorType() == CE_Failure)
+            << CPLGetLastErrorMsg();
+        EXPECT_TRUE(read(*dataset) && pixels == whole);
+    });
+    EXPECT_GT(goneOn, 0);
 }
 
 // New files: whatever runs out, there is a whole one or an error. Every 13th allocation of the

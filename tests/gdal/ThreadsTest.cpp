@@ -435,8 +435,8 @@ TEST_F(Threads, ChangeNothingOfASharedDataset) {
         EXPECT_EQ(band.SetColorTable(nullptr), CE_Failure);
         band.SetDescription("text");
         EXPECT_STREQ(band.GetDescription(), "");
-        GUIntBig counts[] = {1, 2};
-        EXPECT_EQ(band.SetDefaultHistogram(0, 2, 2, counts), CE_Failure);
+        GUIntBig counts[] = {1, 2, 3};
+        EXPECT_EQ(band.SetDefaultHistogram(0, 3, 3, counts), CE_Failure);
         const int factor = 2;
         EXPECT_EQ(shared->BuildOverviews("NEAREST", 1, &factor, 0, nullptr, nullptr, nullptr),
                   CE_Failure);
