@@ -17,6 +17,8 @@ from dask.distributed import Client, LocalCluster
 from osgeo import gdal
 from rasterio.errors import NotGeoreferencedWarning
 
+gdal.UseExceptions()
+
 TILE = 256
 
 

@@ -63,7 +63,8 @@ bool FitsMask(GDALRasterBand& band) {
 }  // namespace
 
 bool IsSignedByte(GDALRasterBand& band) {
-    const char* const word = band.GetMetadataItem("PIXELTYPE", "IMAGE_STRUCTURE");
+    // GDAL warns of a question for the item alone from 3.7 on.
+    const char* const word = CSLFetchNameValue(band.GetMetadata("IMAGE_STRUCTURE"), "PIXELTYPE");
     return band.GetRasterDataType() == GDT_Byte && word && EQUAL(word, "SIGNEDBYTE");
 }
 

@@ -15,6 +15,7 @@ from server import Server
 PAGE = os.path.join(os.path.dirname(__file__), "..", "..", "docs", "gdal.md")
 ENDINGS = {"GTiff": ".tif", "COG": ".tif", DRIVER: ".pyr"}
 VERSION = int(gdal.VersionInfo()) // 10000 % 100  # the minor one
+NEWER = VERSION >= 10  # versions between 3.6 and 3.10 have not been looked at
 
 
 def bytes_of(height=600, width=700, bands=1):
@@ -59,6 +60,13 @@ class SideBySide(FolderTest):
     def left(self):
         """What stands in the folder, the raster without its ending."""
         return [re.sub(r"^raster\.(tif|pyr)", "raster", name) for name in self.files()]
+
+    def edit(self, name):
+        """Later versions of GDAL ask for a word before they break the layout of a COG."""
+        try:
+            return gdal.Open(name, gdal.GA_Update)
+        except RuntimeError:
+            return gdal.OpenEx(name, gdal.OF_UPDATE, open_options=["IGNORE_COG_LAYOUT_BREAK=YES"])
 
     def refuses(self, call):
         try:
@@ -140,7 +148,7 @@ class Making(SideBySide):
                 gdal.UseExceptions()
                 resource.setrlimit(resource.RLIMIT_FSIZE, before)
             return self.left()
-        self.compare(look, ["raster"], [], [])
+        self.compare(look, [] if NEWER else ["raster"], [], [])
 
     def test_an_old_target_of_a_copy_that_fails(self):
         def look():
@@ -187,7 +195,7 @@ class Levels(SideBySide):
 
     def test_renewed_in_the_file(self):
         def look():
-            dataset = gdal.Open(self.make(bytes_of(1024, 1024)), gdal.GA_Update)
+            dataset = self.edit(self.make(bytes_of(1024, 1024)))
             dataset.GetRasterBand(1).Fill(9)
             dataset.BuildOverviews("AVERAGE", [2, 4])
             del dataset
@@ -210,14 +218,13 @@ class Levels(SideBySide):
         exact = array[0].astype(np.int64).reshape(300, 2, 350, 2).sum((1, 3)) / 4
 
         def look():
-            dataset = gdal.Open(self.make(memory_dataset(array, gdal.GDT_Int32),
-                                          tiff_options=["RESAMPLING=AVERAGE"] * (
-                                              self.driver == "COG")), gdal.GA_Update)
+            dataset = self.edit(self.make(memory_dataset(array, gdal.GDT_Int32), tiff_options=[
+                "RESAMPLING=AVERAGE"] * (self.driver == "COG")))
             if self.driver == "GTiff":
                 dataset.BuildOverviews("AVERAGE", [2])
             level = dataset.GetRasterBand(1).GetOverview(0).ReadAsArray().astype(np.int64)
             return bool(np.abs(level - exact).max() <= 0.5)
-        self.compare(look, False, False, True)
+        self.compare(look, NEWER, NEWER, True)
 
     def test_transparent_pixels(self):
         """Averages of what can be seen: its value, and nothing of what cannot."""
@@ -228,8 +235,8 @@ class Levels(SideBySide):
         def look():
             source = memory_dataset(array, gdal.GDT_Byte)
             source.GetRasterBand(2).SetColorInterpretation(gdal.GCI_AlphaBand)
-            dataset = gdal.Open(self.make(source, tiff_options=["RESAMPLING=AVERAGE"] * (
-                self.driver == "COG")), gdal.GA_Update)
+            dataset = self.edit(self.make(source, tiff_options=["RESAMPLING=AVERAGE"] * (
+                self.driver == "COG")))
             if self.driver == "GTiff":
                 dataset.BuildOverviews("AVERAGE", [2])
             return sorted(np.unique(dataset.GetRasterBand(1).GetOverview(0).ReadAsArray()))
@@ -242,7 +249,8 @@ class Pixels(SideBySide):
             changed = {}
             for kind in [*TYPES, gdal.GDT_CInt16, gdal.GDT_CInt32]:
                 source = gdal.GetDriverByName("MEM").Create("", 70, 60, 1, kind)
-                read = gdal.Open(self.make(source)).GetRasterBand(1).DataType
+                dataset = gdal.Open(self.make(source))
+                read = dataset.GetRasterBand(1).DataType
                 if read != kind:
                     changed[gdal.GetDataTypeName(kind)] = gdal.GetDataTypeName(read)
             return changed
@@ -250,7 +258,7 @@ class Pixels(SideBySide):
 
     def test_written_in_place(self):
         def look():
-            dataset = gdal.Open(self.make(bytes_of()), gdal.GA_Update)
+            dataset = self.edit(self.make(bytes_of()))
             dataset.GetRasterBand(1).Fill(7)
             del dataset
             return int(gdal.Open(self.target()).ReadAsArray().max())
@@ -262,7 +270,7 @@ class Pixels(SideBySide):
 
     def test_less_than_a_byte(self):
         self.compare(lambda: os.path.getsize(self.make(
-            zeros(1024), tiff_options=["NBITS=1", "COMPRESS=NONE"])) < 200000, True, False, False)
+            zeros(1024), tiff_options=["NBITS=1", "COMPRESS=NONE"])) < 200000, True, NEWER, False)
 
     def test_sparse(self):
         self.compare(lambda: os.path.getsize(self.make(
@@ -316,8 +324,7 @@ class Records(SideBySide):
     def test_statistics_of_pixels_that_have_changed(self):
         def look():
             for change in (lambda band: band.ComputeStatistics(False), lambda band: band.Fill(7)):
-                dataset = gdal.Open(self.target() if self.files() else self.make(bytes_of()),
-                                    gdal.GA_Update)
+                dataset = self.edit(self.target() if self.files() else self.make(bytes_of()))
                 change(dataset.GetRasterBand(1))
                 del dataset
             dataset = gdal.Open(self.target())
