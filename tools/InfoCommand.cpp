@@ -1,6 +1,7 @@
 #include <algorithm>
 #include <cstdio>
 #include <limits>
+#include <span>
 
 #include "core/PixelVocabulary.h"
 #include "host/file/PyramidFileInfo.h"
@@ -74,27 +75,42 @@ Json StatisticsOf(const zmchost::Raster& raster) {
     return list;
 }
 
-template <class T>
-Json HistogramsOf(const zmchost::Raster& raster) {
-    Json list = Json::array();
-    for (const auto& record : raster.Histograms<T>()) {
-        Json counts = Json::array();
-        for (std::uint32_t i = 0; record.counts.data && i < record.counts.shape.elements; ++i)
-            counts.push_back(JsonNumber(record.counts.data[i]));
-        list.push_back({{"band", record.band + 1},
-                        {"level", record.level},
-                        {"binCount", record.binCount},
-                        {"binSize", JsonNumber(record.binSize)},
-                        {"minimum", JsonNumber(record.minimum)},
-                        {"maximum", JsonNumber(record.maximum)},
-                        {"counts", counts}});
-    }
+// A program gets all there is. People are shown no more of 65,536 colours than a line, and bars in
+// place of counts, on a terminal.
+enum class Detail { All, Readable };
+
+constexpr std::size_t kColorsOnALine = 64;
+
+template <class Counts>
+Json CountsOf(const Counts& counts) {
+    Json::array_t list;
+    list.reserve(counts.size());
+    for (const auto count : counts) list.push_back(JsonNumber(count));
     return list;
 }
 
-// Of 65,536 colours people are shown no more than a line.
-constexpr std::size_t kColorsOnALine = 64;
-constexpr std::size_t kAllColors = std::numeric_limits<std::size_t>::max();
+template <class T>
+Json HistogramsOf(const zmchost::Raster& raster, Detail detail) {
+    Json list = Json::array();
+    const bool draws = platform::IsTerminal(platform::StandardStream::Output);
+    const auto records = raster.Records<T>();
+    for (const auto& record : records->Histograms()) {
+        Json entry = {{"band", record.band + 1},
+                      {"level", record.level},
+                      {"binCount", record.binCount},
+                      {"binSize", JsonNumber(record.binSize)},
+                      {"minimum", JsonNumber(record.minimum)},
+                      {"maximum", JsonNumber(record.maximum)}};
+        const std::span counts(record.counts.data,
+                               record.counts.data ? record.counts.shape.elements : 0);
+        if (detail == Detail::All)
+            entry["counts"] = CountsOf(counts);
+        else if (draws)
+            entry["bars"] = DrawBars({counts.begin(), counts.end()});
+        list.push_back(std::move(entry));
+    }
+    return list;
+}
 
 Json ColorsOf(const zelm::ColorList& palette, std::size_t most) {
     Json::array_t colors;
@@ -109,16 +125,18 @@ Json ColorsOf(const zelm::ColorList& palette, std::size_t most) {
     return colors;
 }
 
-// With no more than so many colours of each, and their true number where that may be more.
+// With their true number where not all are there.
 template <class T>
-Json PalettesOf(const zmchost::Raster& raster, std::size_t most) {
+Json PalettesOf(const zmchost::Raster& raster, Detail detail) {
     Json list = Json::array();
+    const bool all = detail == Detail::All;
+    const std::size_t most = all ? std::numeric_limits<std::size_t>::max() : kColorsOnALine;
     const auto records = raster.Records<T>();
     for (std::uint32_t band = 0; band < raster.Bands(); ++band) {
         const zelm::ColorList* const palette = records->BandPalette(band);
         if (!palette) continue;
         Json entry = {{"band", band + 1}, {"colors", ColorsOf(*palette, most)}};
-        if (most != kAllColors) entry["count"] = palette->Colors().size();
+        if (!all) entry["count"] = palette->Colors().size();
         list.push_back(std::move(entry));
     }
     return list;
@@ -147,7 +165,7 @@ Json DescribeLayout(const std::string& file, const zmchost::PyramidFileInfo& inf
             {"palettes", Json::array()}};
 }
 
-Json Describe(const std::string& file, std::size_t mostColors) {
+Json Describe(const std::string& file, Detail detail) {
     const zmchost::PyramidFileInfo info = ReadLayout(file);
     // Of a type without a reader the header is all that can be told.
     if (zelm::CheckedPixelType(info.header.pixelType) == 0 || !info.HasMetadataDocument())
@@ -161,8 +179,8 @@ Json Describe(const std::string& file, std::size_t mostColors) {
     }
     zelm::VisitElementType(raster.PixelType(), [&]<class T>(std::type_identity<T>) {
         document["statistics"] = StatisticsOf<T>(raster);
-        document["histograms"] = HistogramsOf<T>(raster);
-        document["palettes"] = PalettesOf<T>(raster, mostColors);
+        document["histograms"] = HistogramsOf<T>(raster, detail);
+        document["palettes"] = PalettesOf<T>(raster, detail);
     });
     return document;
 }
@@ -202,12 +220,10 @@ void PrintHistograms(const Json& document) {
                     Text(histogram["band"]).c_str(), Text(histogram["level"]).c_str(),
                     Text(histogram["binCount"]).c_str(), Text(histogram["binSize"]).c_str(),
                     Text(histogram["minimum"]).c_str(), Text(histogram["maximum"]).c_str());
-        if (!platform::IsTerminal(platform::StandardStream::Output)) continue;
-        std::vector<double> counts;
-        for (const Json& count : histogram["counts"])
-            counts.push_back(count.is_string() ? std::stod(count.get<std::string>())
-                                               : count.get<double>());
-        for (const std::string& row : DrawBars(counts)) std::printf("  %s\n", row.c_str());
+        const auto bars = histogram.find("bars");
+        if (bars == histogram.end()) continue;
+        for (const Json& row : *bars)
+            std::printf("  %s\n", row.get_ref<const std::string&>().c_str());
     }
 }
 
@@ -244,7 +260,7 @@ void Print(const Json& document) {
 }
 
 ExitStatus InfoCommand::Run() {
-    Json document = zmctools::Describe(file, json ? kAllColors : kColorsOnALine);
+    Json document = zmctools::Describe(file, json ? Detail::All : Detail::Readable);
     document.update(PlaceOf(file));
     if (json)
         PrintDocument(document);

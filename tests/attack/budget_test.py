@@ -188,6 +188,15 @@ class KnownFiles(AttackTest):
                     draft.records = [text]
                 self.assertHarmless(draft)
 
+    def test_a_histogram_of_a_million_bins(self):
+        draft = plain()
+        draft.records = [hostile.element("HISTOGRAMS", "".join((
+            hostile.element("HIST_BAND", 0), hostile.element("HIST_LEVEL", 0),
+            hostile.element("HIST_BINCOUNT", many(1 << 20)), hostile.element("HIST_BINSIZE", 1),
+            hostile.element("HIST_MIN", 0), hostile.element("HIST_MAX", 1),
+            hostile.element("HIST_COUNTS", "|".join("0" * many(1 << 20))))))]
+        self.assertHarmless(draft)
+
     def test_a_document_that_is_a_hole(self):
         for start in (b"", b"<DATASET>"):
             with self.subTest(start):
