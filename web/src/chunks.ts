@@ -63,10 +63,9 @@ export class ChunkReader {
     this.broken ??= reason;
     this.cache.clear();
     this.cached = 0;
-    for (const chunk of this.pending.values()) chunk.reject(this.broken);
-    for (const request of new Set([...this.pending.values()].map((chunk) => chunk.request)))
-      request?.abort.abort(reason);
-    this.pending.clear();
+    const chunks = [...this.pending.values()];
+    for (const chunk of chunks) chunk.reject(this.broken);
+    for (const { request } of chunks) request?.abort.abort(reason);
     this.queue = [];
     this.fresh = [];
   }
