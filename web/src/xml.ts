@@ -37,7 +37,7 @@ const REFERENCE = /&(?:#(\d+)|#x([\da-fA-F]+)|(lt|gt|amp|quot|apos));/y;
 const VALUE = /[ \t\r\n]*=[ \t\r\n]*(?:"([^"<]*)"|'([^'<]*)')/y;
 const FORBIDDEN = /[\0-\x08\x0B\x0C\x0E-\x1F\uFFFE\uFFFF]/;
 const DECLARATION =
-  /^<\?xml[ \t\r\n]+version[ \t\r\n]*=[ \t\r\n]*(?:"1\.[01]"|'1\.[01]')(?:[ \t\r\n]+encoding[ \t\r\n]*=[ \t\r\n]*(?:"([A-Za-z][\w.-]*)"|'([A-Za-z][\w.-]*)'))?(?:[ \t\r\n]+standalone[ \t\r\n]*=[ \t\r\n]*(?:"(?:yes|no)"|'(?:yes|no)'))?[ \t\r\n]*\?>/;
+  /^<\?xml[ \t\r\n]+version[ \t\r\n]*=[ \t\r\n]*(?:"1\.[ -!#-~]*"|'1\.[ -&(-~]*')(?:[ \t\r\n]+encoding[ \t\r\n]*=[ \t\r\n]*(?:"([A-Za-z][\w.-]*)"|'([A-Za-z][\w.-]*)'))?(?:[ \t\r\n]+standalone[ \t\r\n]*=[ \t\r\n]*(?:"(?:yes|no)"|'(?:yes|no)'))?[ \t\r\n]*\?>/;
 const NAMED: Record<string, string> = { lt: "<", gt: ">", amp: "&", quot: '"', apos: "'" };
 const ENCODINGS: Record<string, string> = {
   "UTF-8": "utf-8",
@@ -112,8 +112,8 @@ class Parser {
     if (this.source.startsWith("</", next)) return this.endTag();
     if (this.source.startsWith("<![CDATA[", next)) {
       this.takeNode();
-      const text = this.until("]]>", 9);
-      if (text) this.listener.text(text);
+      // A section is a piece even if it is empty.
+      this.listener.text(lineEnds(this.until("]]>", 9), 0));
     } else this.markup();
   }
 

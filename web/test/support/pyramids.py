@@ -77,7 +77,7 @@ def judge(text):
         band = dataset.GetRasterBand(1) if dataset.RasterCount else None
         return [dataset.RasterXSize, dataset.RasterYSize, dataset.RasterCount,
                 gdal.GetDataTypeName(band.DataType) if band else None,
-                band.GetOverviewCount() if band else None, band.GetBlockSize()[0] if band else None]
+                band.GetBlockSize()[0] if band else None]
     except RuntimeError as error:
         return str(error)
     finally:

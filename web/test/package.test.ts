@@ -1,0 +1,56 @@
+// What is packed: its size, its parts, and that they can be used as they are.
+import assert from "node:assert/strict";
+import { spawnSync } from "node:child_process";
+import { readdirSync, readFileSync } from "node:fs";
+import { test } from "node:test";
+import { gzipSync } from "node:zlib";
+
+const MOST = 12000; // bytes of the reader, compressed
+
+test("the reader has less than 12 kB compressed, and no module besides", () => {
+  const module = readFileSync("dist/index.js");
+  const compressed = gzipSync(module, { level: 9 }).length;
+  assert.ok(compressed < MOST, `${compressed} bytes`);
+  assert.doesNotMatch(module.toString(), /\bimport\b[^(]*from|\brequire\(|\bprocess\.|\bdocument\./);
+});
+
+test("every entry has its module and its types, and nothing is needed at run time", () => {
+  const { exports, dependencies } = JSON.parse(readFileSync("package.json", "utf8")) as {
+    exports: Record<string, { types: string; default: string }>;
+    dependencies?: object;
+  };
+  assert.equal(dependencies, undefined);
+  for (const { types, default: module } of Object.values(exports)) {
+    assert.ok(readFileSync(types).length > 0);
+    assert.ok(readFileSync(module).length > 0);
+  }
+});
+
+test("npm packs the entries, their types and the examples, and nothing else", () => {
+  const npm = spawnSync("npm", ["pack", "--dry-run", "--json", "--ignore-scripts", "--offline"], { encoding: "utf8" });
+  assert.equal(npm.status, 0, npm.stderr);
+  const answer = JSON.parse(npm.stdout) as
+    { files: { path: string }[] }[] | Record<string, { files: { path: string }[] }>;
+  const [{ files }] = Object.values(answer) as [{ files: { path: string }[] }];
+  const paths = files.map(({ path }) => path).sort();
+  assert.ok(paths.includes("dist/index.js") && paths.includes("dist/index.d.ts") && paths.includes("README.md"));
+  for (const path of paths)
+    assert.match(path, /^(dist\/[\w.]+\.(js|d\.ts)|examples\/[\w.]+|package\.json|README\.md)$/);
+});
+
+test("the lock file names no registry", () => {
+  assert.doesNotMatch(readFileSync("package-lock.json", "utf8"), /"resolved"|https?:\/\/registry/);
+});
+
+test("all that is exported is documented", () => {
+  for (const name of readdirSync("src")) {
+    const lines = readFileSync(`src/${name}`, "utf8").split("\n");
+    lines.forEach((line, i) => {
+      if (!/^export (?!type \{|\{|\*|default)/.test(line)) return;
+      if (["chunks.ts", "layout.ts", "types.ts", "header.ts", "xml.ts", "numbers.ts", "metadata.ts"].includes(name))
+        if (/^export (const|class|function)/.test(line)) return; // not for others
+      if (name === "types.ts" && line.includes("TypeInfo")) return;
+      assert.match(lines[i - 1] as string, /\*\/$/, `${name}:${i + 1}: ${line}`);
+    });
+  }
+});
