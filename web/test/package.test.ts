@@ -43,14 +43,23 @@ test("the lock file names no registry", () => {
 });
 
 test("all that is exported is documented", () => {
-  for (const name of readdirSync("src")) {
-    const lines = readFileSync(`src/${name}`, "utf8").split("\n");
-    lines.forEach((line, i) => {
-      if (!/^export (?!type \{|\{|\*|default)/.test(line)) return;
-      if (["chunks.ts", "layout.ts", "types.ts", "header.ts", "xml.ts", "numbers.ts", "metadata.ts"].includes(name))
-        if (/^export (const|class|function)/.test(line)) return; // not for others
-      if (name === "types.ts" && line.includes("TypeInfo")) return;
-      assert.match(lines[i - 1] as string, /\*\/$/, `${name}:${i + 1}: ${line}`);
-    });
+  const sources = readdirSync("src").map((name) => readFileSync(`src/${name}`, "utf8"));
+  const lists = sources.join("\n").matchAll(/^export (?:type )?\{([^}]*)\} from/gm);
+  const names = [...lists].flatMap(([, list]) => (list as string).match(/\w+(?=\s*(,|$))/g) ?? []);
+  const direct = ["node", "openlayers", "openseadragon"].flatMap((name) => {
+    const text = readFileSync(`src/${name}.ts`, "utf8");
+    return [...text.matchAll(/^export (?:async )?(?:class|interface|function|const|type) (\w+)/gm)].map(
+      ([, each]) => each,
+    );
+  });
+  assert.ok(names.length > 20 && direct.length > 5);
+  for (const name of [...names, ...direct]) {
+    const declared = new RegExp(`(.*)\\nexport (?:async )?(?:class|interface|function|const|type) ${name}\\b`);
+    const found = sources.map((text) => declared.exec(text)?.[1]).filter((line) => line !== undefined);
+    assert.deepEqual(
+      found.map((line) => line.endsWith("*/")),
+      [true],
+      `${name}`,
+    );
   }
 });

@@ -39,7 +39,7 @@ export function documentOf(header: object): string {
 }
 
 /** The first bytes of a file with that header document, and `behind` behind them. */
-export function fileOf(document: string | Uint8Array, behind: Uint8Array | string = ""): Uint8Array {
+export function fileOf(document: string | Uint8Array, behind: Uint8Array | string = ""): Uint8Array<ArrayBuffer> {
   const text = Buffer.from(document);
   const front = Buffer.alloc(20);
   front.write("KOBT", "latin1");
@@ -68,7 +68,7 @@ export class Pyramids {
     return join(this.folder, `${name}.pyr`);
   }
 
-  bytes(name: string): Uint8Array {
+  bytes(name: string): Uint8Array<ArrayBuffer> {
     return Uint8Array.from(readFileSync(this.path(name)));
   }
 
