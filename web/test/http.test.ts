@@ -1,5 +1,6 @@
 // What is asked of a server, and what becomes of answers that are wrong, late or of another file.
 import assert from "node:assert/strict";
+import { readFileSync } from "node:fs";
 import { after, afterEach, before, beforeEach, test } from "node:test";
 
 import {
@@ -261,6 +262,20 @@ test("requests ask for the file that was opened, by its tag or else by its date"
   assert.deepEqual(server.validators, [undefined, '"1"', undefined, server.modified, undefined, undefined]);
 });
 
+test("a page of another origin says no If-Range, which it would have to ask for first", async () => {
+  const world = globalThis as { location?: { href: string } };
+  try {
+    for (const href of ["http://elsewhere.example/page.html", new URL("page.html", url).href]) {
+      world.location = { href };
+      const pyramid = await open();
+      await pyramid.readTile(0, 0, 1);
+    }
+  } finally {
+    delete world.location;
+  }
+  assert.deepEqual(server.validators, [undefined, undefined, undefined, '"1"']);
+});
+
 const CHANGES: Record<string, () => void> = {
   tag: () => void (server.etag = '"2"'),
   "weak tag": () => void (server.etag = 'W/"2"'),
@@ -406,6 +421,37 @@ test("a closed pyramid reads nothing more, and what was under way ends", async (
   await assert.rejects(pyramid.readTile(0, 0, 1), /closed/);
   await wait(20);
   assert.equal(server.ended, 1);
+});
+
+test("the page of the guide, which is the example, shows the bands of the finest level that fits", async () => {
+  const page = readFileSync("examples/page.html", "utf8");
+  assert.ok(readFileSync("guide.md", "utf8").includes(page));
+  const code = /<script type="module">\s*import .*\n([^]*)<\/script>/.exec(page)?.[1] ?? "";
+  const canvas = { getContext: () => ({ putImageData: (picture: Picture) => void (shown = picture) }) };
+  interface Picture {
+    width: number;
+    height: number;
+    data: Uint8ClampedArray;
+  }
+  let shown: Picture | undefined;
+  class ImageData implements Picture {
+    readonly data: Uint8ClampedArray;
+    constructor(
+      readonly width: number,
+      readonly height: number,
+    ) {
+      this.data = new Uint8ClampedArray(4 * width * height);
+    }
+  }
+  const AsyncFunction = (async () => undefined).constructor as new (
+    ...texts: string[]
+  ) => (...rest: unknown[]) => Promise<void>;
+  const run = new AsyncFunction("Pyramid", "location", "document", "ImageData", code);
+  await run(Pyramid, { href: url }, { getElementById: () => canvas }, ImageData);
+  const expected = pyramids.expected("blocked", 0);
+  assert.deepEqual([shown?.width, shown?.height], [320, 256]);
+  for (const [i, value] of expected.entries())
+    assert.deepEqual([...(shown as Picture).data.subarray(4 * i, 4 * i + 4)], [value, value, value, 255]);
 });
 
 test("headers and what fetches are the caller's", async () => {
