@@ -121,14 +121,14 @@ export class ChunkReader {
     chunk.waiters++;
     return new Promise((resolve, reject) => {
       const leave = (): void => {
-        signal?.removeEventListener("abort", stop);
+        forget();
         if (--chunk.waiters === 0 && !chunk.settled) this.abandon(chunk);
       };
       const stop = (): void => {
         leave();
         reject(signal?.reason);
       };
-      signal?.addEventListener("abort", stop, { once: true });
+      const forget = onAbort(signal, stop);
       chunk.promise.then(
         (bytes) => {
           if (signal?.aborted) return;
@@ -215,6 +215,24 @@ export class ChunkReader {
       this.cached -= length;
     }
   }
+}
+
+const stops = new WeakMap<AbortSignal, Set<() => void>>();
+
+/**
+ * Calls `stop` when `signal` aborts, unless the answer has been called before. A signal may serve thousands of reads,
+ * so it hears of one of them alone.
+ */
+export function onAbort(signal: AbortSignal | undefined, stop: () => void): () => void {
+  if (!signal) return () => undefined;
+  const known = stops.get(signal);
+  const all = known ?? new Set();
+  if (!known) {
+    stops.set(signal, all);
+    signal.addEventListener("abort", () => [...all].forEach((each) => each()), { once: true });
+  }
+  all.add(stop);
+  return () => all.delete(stop);
 }
 
 /** Bytes as an array of its own alignment, so that samples of any size can be looked at in place. */

@@ -1,5 +1,5 @@
 // Pyramid: an open pyramid file, and the pixels of its levels.
-import { asBytes, type ChunkOptions, ChunkReader } from "./chunks.js";
+import { asBytes, type ChunkOptions, ChunkReader, onAbort } from "./chunks.js";
 import { FormatError, LimitError, PyramidError } from "./errors.js";
 import { decodeFront, FRONT_BYTES, type Header, parseHeader } from "./header.js";
 import { Layout, type Level, type Place, type Rectangle } from "./layout.js";
@@ -235,14 +235,24 @@ export class Pyramid {
     const interleave = options.interleave ?? "pixel";
     const answer = { level: level.level, x, y, width, height, bands, interleave, pixelType };
     const target = new ArrayBuffer(bytes);
+    // With the first part that fails, nobody waits for the others any more.
+    const own = new AbortController();
+    const { signal } = options;
+    signal?.throwIfAborted();
+    const forget = onAbort(signal, () => own.abort(signal?.reason));
     const copies = tiles.map(async ({ tile, runs, order }) => {
-      const read = await Promise.all(
-        runs.map(({ offset, length }) => this.chunks.read(offset, length, options.signal)),
-      );
-      this.copy(read, order, tile, target, answer);
+      const read = runs.map(({ offset, length }) => this.chunks.read(offset, length, own.signal));
+      this.copy(await Promise.all(read), order, tile, target, answer);
     });
-    await Promise.all(copies);
-    options.signal?.throwIfAborted();
+    try {
+      await Promise.all(copies);
+    } catch (error) {
+      own.abort();
+      throw error;
+    } finally {
+      forget();
+    }
+    signal?.throwIfAborted();
     const missing = tiles.some(({ runs }) => runs.some(({ offset, length }) => offset + length > this.chunks.size));
     return { ...answer, missing, data: new TYPES[pixelType].array(target) as SampleArrays[T] };
   }

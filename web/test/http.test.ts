@@ -221,6 +221,31 @@ test("a request that is shared goes on until all who wait for it have gone", asy
   assert.equal(server.log.length, 2);
 });
 
+test("one signal may serve many tiles and many reads", async () => {
+  const warnings: Error[] = [];
+  const hear = (warning: Error): void => void warnings.push(warning);
+  process.on("warning", hear);
+  const pyramid = await open();
+  const { signal } = new AbortController();
+  const whole = { x: 0, y: 0, width: 320, height: 256 };
+  await Promise.all(Array.from({ length: 30 }, () => pyramid.readWindow(0, whole, { signal })));
+  await wait(10);
+  process.off("warning", hear);
+  assert.deepEqual(warnings, []);
+});
+
+test("a window of which a part fails ends the rest of its requests", async () => {
+  const pyramid = await open({ maxRequests: 2, maxRequestBytes: 1, retries: 0 });
+  server.hold();
+  const window = pyramid.readWindow(0, { x: 0, y: 64, width: 320, height: 64 });
+  await server.requests(3);
+  server.statuses.push(404);
+  server.release();
+  await assert.rejects(window, is(HttpError, "404"));
+  await wait(20);
+  assert.ok(server.log.length < 6, `${server.log.length} requests`);
+});
+
 test("what is aborted before it is asked for is never asked for", async () => {
   const pyramid = await open({ maxRequests: 1, maxRequestBytes: 1 });
   const abort = new AbortController();

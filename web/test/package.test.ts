@@ -1,7 +1,9 @@
 // What is packed: its size, its parts, and that they can be used as they are.
 import assert from "node:assert/strict";
 import { spawnSync } from "node:child_process";
-import { readdirSync, readFileSync } from "node:fs";
+import { mkdirSync, mkdtempSync, readdirSync, readFileSync, rmSync, writeFileSync } from "node:fs";
+import { tmpdir } from "node:os";
+import { join } from "node:path";
 import { test } from "node:test";
 import { gzipSync } from "node:zlib";
 
@@ -36,6 +38,46 @@ test("npm packs the entries, their types and the examples, and nothing else", ()
   assert.ok(paths.includes("dist/index.js") && paths.includes("dist/index.d.ts") && paths.includes("README.md"));
   for (const path of paths)
     assert.match(path, /^(dist\/[\w.]+\.(js|d\.ts)|examples\/[\w.]+|package\.json|README\.md)$/);
+});
+
+test("a project of others uses what is packed, in JavaScript and with its types alone", () => {
+  const folder = mkdtempSync(join(tmpdir(), "zmcraster-web-"));
+  try {
+    const run = (command: string, ...rest: string[]): string => {
+      const { status, stdout, stderr } = spawnSync(command, rest, { cwd: folder, encoding: "utf8" });
+      assert.equal(status, 0, `${command}: ${stdout}${stderr}`);
+      return stdout;
+    };
+    const npm = ["pack", "--ignore-scripts", "--offline", "--pack-destination", folder];
+    assert.equal(spawnSync("npm", npm, { encoding: "utf8" }).status, 0);
+    const home = join(folder, "node_modules/zmcraster-web");
+    mkdirSync(home, { recursive: true });
+    const packed = readdirSync(folder).find((name) => name.endsWith(".tgz")) as string;
+    run("tar", "-xzf", packed, "--strip-components=1", "-C", home);
+    writeFileSync(join(folder, "package.json"), '{ "type": "module" }');
+    const use = 'import { FormatError, Pyramid } from "zmcraster-web";\n';
+    const body = "const error = await Pyramid.open(new Uint8Array(3)).catch((reason) => reason);\n";
+    writeFileSync(join(folder, "use.js"), `${use}${body}console.log(error instanceof FormatError);\n`);
+    assert.equal(run(process.execPath, "use.js"), "true\n");
+    const typed =
+      "const { data } = await (await Pyramid.open('x')).readTile<'UInt64'>(0, 0, 0);\nconst first: bigint = data[0]!;\n";
+    writeFileSync(join(folder, "use.ts"), `${use}${typed}console.log(first, FormatError);\n`);
+    const tsc = [
+      "--noEmit",
+      "--strict",
+      "--target",
+      "es2022",
+      "--module",
+      "nodenext",
+      "--lib",
+      "es2022,dom",
+      "--types",
+      "",
+    ];
+    run(join(process.cwd(), "node_modules/.bin/tsc"), ...tsc, "use.ts");
+  } finally {
+    rmSync(folder, { recursive: true, force: true });
+  }
 });
 
 test("the lock file names no registry", () => {
