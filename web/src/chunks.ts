@@ -29,16 +29,17 @@ interface Chunk {
 
 interface Request {
   chunks: Chunk[];
+  waiters: number; // of all its chunks
   end: number;
-  abort: AbortController;
+  abort: AbortController | undefined; // once it is under way
 }
 
 export class ChunkReader {
   private readonly cache = new Map<string, Uint8Array>(); // in the order of use, the oldest first
   private cached = 0;
   private readonly pending = new Map<string, Chunk>();
-  private fresh: Chunk[] = [];
-  private queue: Request[] = [];
+  private readonly fresh = new Set<Chunk>();
+  private readonly queue = new Set<Request>();
   private running = 0;
   private broken: unknown;
 
@@ -65,9 +66,9 @@ export class ChunkReader {
     this.cached = 0;
     const chunks = [...this.pending.values()];
     for (const chunk of chunks) chunk.reject(this.broken);
-    for (const { request } of chunks) request?.abort.abort(reason);
-    this.queue = [];
-    this.fresh = [];
+    for (const { request } of chunks) request?.abort?.abort(reason);
+    this.queue.clear();
+    this.fresh.clear();
   }
 
   /**
@@ -108,7 +109,7 @@ export class ChunkReader {
     // Where all have gone, nobody hears of a failure.
     chunk.promise.catch(() => undefined);
     this.pending.set(key, chunk);
-    if (this.fresh.push(chunk) === 1) queueMicrotask(() => this.send());
+    if (this.fresh.add(chunk).size === 1) queueMicrotask(() => this.send());
     return chunk;
   }
 
@@ -119,10 +120,13 @@ export class ChunkReader {
 
   private wait(chunk: Chunk, signal: AbortSignal | undefined): Promise<Uint8Array> {
     chunk.waiters++;
+    if (chunk.request) chunk.request.waiters++;
     return new Promise((resolve, reject) => {
       const leave = (): void => {
         forget();
-        if (--chunk.waiters === 0 && !chunk.settled) this.abandon(chunk);
+        chunk.waiters--;
+        if (chunk.request) chunk.request.waiters--;
+        if ((chunk.request ?? chunk).waiters === 0 && !chunk.settled) this.abandon(chunk);
       };
       const stop = (): void => {
         leave();
@@ -144,40 +148,43 @@ export class ChunkReader {
     });
   }
 
-  // Nobody wants it any more: it is not asked for, and a request ends with the last of its chunks.
+  // Nobody wants it any more, nor what would come along with it.
   private abandon(chunk: Chunk): void {
     const { request } = chunk;
-    if (request && request.chunks.some((each) => each.waiters > 0)) return;
     for (const each of request?.chunks ?? [chunk]) this.settle(each);
-    this.fresh = this.fresh.filter((each) => each !== chunk);
-    this.queue = this.queue.filter((each) => each !== request);
-    request?.abort.abort();
+    this.fresh.delete(chunk);
+    if (!request) return;
+    this.queue.delete(request);
+    request.abort?.abort();
   }
 
   // Puts all new chunks into requests.
   private send(): void {
     const { maxGap = 2 ** 14, maxRequestBytes = 2 ** 22 } = this.options;
-    const chunks = this.fresh.sort((a, b) => a.offset - b.offset);
-    this.fresh = [];
+    const chunks = [...this.fresh].sort((a, b) => a.offset - b.offset);
+    this.fresh.clear();
     let request: Request | undefined;
     for (const chunk of chunks) {
       const end = chunk.offset + chunk.length;
       const start = request?.chunks[0]?.offset ?? 0;
       if (!request || chunk.offset - request.end > maxGap || Math.max(end, request.end) - start > maxRequestBytes) {
-        request = { chunks: [], end: 0, abort: new AbortController() };
-        this.queue.push(request);
+        request = { chunks: [], waiters: 0, end: 0, abort: undefined };
+        this.queue.add(request);
       }
       chunk.request = request;
       request.chunks.push(chunk);
+      request.waiters += chunk.waiters;
       request.end = Math.max(request.end, end);
     }
     this.start();
   }
 
   private start(): void {
-    while (this.queue.length && this.running < (this.options.maxRequests ?? 6)) {
+    for (const request of this.queue) {
+      if (this.running >= (this.options.maxRequests ?? 6)) return;
+      this.queue.delete(request);
       this.running++;
-      void this.run(this.queue.shift() as Request).finally(() => {
+      void this.run(request).finally(() => {
         this.running--;
         this.start();
       });
@@ -187,8 +194,9 @@ export class ChunkReader {
   private async run(request: Request): Promise<void> {
     const offset = (request.chunks[0] as Chunk).offset;
     const length = Math.min(request.end, this.size) - offset;
+    const { signal } = (request.abort = new AbortController());
     try {
-      const bytes = asBytes(await this.source.read(offset, length, request.abort.signal));
+      const bytes = asBytes(await this.source.read(offset, length, signal));
       if (bytes.length > length || (bytes.length < length && this.size !== Infinity))
         throw new SourceError(`the source gave ${bytes.length} bytes in place of ${length}`);
       const alone = request.chunks.length === 1;

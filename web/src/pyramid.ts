@@ -56,6 +56,8 @@ export interface Pixels<T extends SampleArray = SampleArray> {
 /** The first bytes of a file that are asked for: they hold the header of every usual file. */
 const HEAD_BYTES = 16384;
 const MAX_DOCUMENT_BYTES = 2 ** 28;
+/** Tiles of one read, and bands of tiles where those are apart: each takes memory, however small it is. */
+const MAX_RUNS = 65536;
 
 function sourceOf(from: string | URL | Blob | ArrayBuffer | Uint8Array | Source, options: OpenOptions): Source {
   if (typeof from === "string" || from instanceof URL) return new HttpSource(from, options);
@@ -263,6 +265,10 @@ export class Pyramid {
     const tiles: TileRuns[] = [];
     let bytes = 0;
     if (!order.length) return tiles;
+    const over = (first: number, extent: number): number =>
+      Math.floor((first + extent - 1) / side) - Math.floor(first / side) + 1;
+    const count = over(x, width) * over(y, height) * (this.layout.planar ? order.length : 1);
+    if (count > MAX_RUNS) throw new LimitError(`it would take ${count} tiles, beyond the limit of ${MAX_RUNS}`);
     for (let row = Math.floor(y / side); row * side < y + height; ++row)
       for (let column = Math.floor(x / side); column * side < x + width; ++column) {
         const runs = this.layout.places(level, column, row, order);

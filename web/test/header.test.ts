@@ -284,6 +284,26 @@ test("what claims more than its bytes opens and is refused where memory would be
   await assert.rejects(pyramid.readTile(0, 0, 0, { bands: [0] }), LimitError);
 });
 
+test("tiles of one pixel are refused where they are too many, and let go of in time", async () => {
+  const header = headerOf({ PIXEL_WIDTH: 2 ** 14, PIXEL_HEIGHT: 2 ** 14, TILESIZE: 1 });
+  const head = fileOf(documentOf(header));
+  const read = (offset: number, length: number, signal?: AbortSignal): Promise<Uint8Array> =>
+    new Promise((resolve, reject) => {
+      if (offset === 0) return resolve(Uint8Array.from(Buffer.concat([head, Buffer.alloc(length)])).slice(0, length));
+      signal?.addEventListener("abort", () => reject(signal.reason));
+    });
+  for (const maxGap of [16384, -1]) {
+    const pyramid = await Pyramid.open({ size: head.length + 2 ** 28, read }, { maxGap });
+    const started = performance.now();
+    await assert.rejects(pyramid.readWindow(0, { x: 0, y: 0, width: 2 ** 14, height: 2 ** 14 }), LimitError);
+    const abort = new AbortController();
+    const window = pyramid.readWindow(0, { x: 0, y: 99, width: 2 ** 14, height: 4 }, { signal: abort.signal });
+    setTimeout(() => abort.abort(), 1);
+    await assert.rejects(window, { name: "AbortError" });
+    assert.ok(performance.now() - started < 10000, `${performance.now() - started} ms`);
+  }
+});
+
 test("a million elements in a header are read within seconds, and one more is refused", async () => {
   const started = performance.now();
   const many = (count: number) => fileOf(within("<A/>".repeat(count)));
