@@ -398,7 +398,7 @@ CPLErr Band::KeepColorTable(GDALColorTable* table) {
                     "the color table is in the file: open it for update");
         return CE_Failure;
     }
-    const CPLErr kept = GDALPamRasterBand::SetColorTable(table);
+    const CPLErr kept = CompanionBand::SetColorTable(table);
     return kept == CE_None ? owner.SaveSidecarNow() : kept;
 }
 

@@ -375,7 +375,7 @@ void Dataset::LoadSidecar(const char* fileName, Items siblings) {
 // --- what the sidecar tells of records ---
 
 void Dataset::LoadNote() {
-    const char* const note = GDALPamDataset::GetMetadataItem(kEditing, kOwnDomain);
+    const char* const note = CompanionDataset::GetMetadataItem(kEditing, kOwnDomain);
     const CPLStringList counts(CSLTokenizeString(note ? note : ""));
     const auto count = [&](int place) {
         const char* const text = place < counts.Count() ? counts[place] : "0";
@@ -389,7 +389,7 @@ void Dataset::NoteEditing() {
     editing = true;
     const RecordCounts now = file->archive.Counts();
     const std::string note = std::to_string(now.statistics) + " " + std::to_string(now.histograms);
-    GDALPamDataset::SetMetadataItem(kEditing, note.c_str(), kOwnDomain);
+    CompanionDataset::SetMetadataItem(kEditing, note.c_str(), kOwnDomain);
     if (SaveSidecarNow(CE_Warning) != CE_None)
         ReportError(CE_Warning, CPLE_FileIO,
                     "its statistics cannot be marked as those of pixels that have changed");
@@ -411,12 +411,12 @@ void Dataset::EndEditing() {
     const bool left = inDoubt.statistics != 0 || inDoubt.histograms != 0;
     const std::string note =
         std::to_string(inDoubt.statistics) + " " + std::to_string(inDoubt.histograms);
-    GDALPamDataset::SetMetadataItem(kEditing, left ? note.c_str() : nullptr, kOwnDomain);
+    CompanionDataset::SetMetadataItem(kEditing, left ? note.c_str() : nullptr, kOwnDomain);
 }
 
 void Dataset::SettleRecords() {
     inDoubt = {};
-    if (!editing) GDALPamDataset::SetMetadataItem(kEditing, nullptr, kOwnDomain);
+    if (!editing) CompanionDataset::SetMetadataItem(kEditing, nullptr, kOwnDomain);
 }
 
 CPLErr Dataset::SaveSidecarNow(CPLErr kind) {
@@ -465,7 +465,7 @@ CPLErr Dataset::TrySaveXML() {
 void Dataset::ClearStatistics() {
     Reported([&] {
         if (!MayChange()) return;
-        if (creation || main) return GDALPamDataset::ClearStatistics();
+        if (creation || main) return CompanionDataset::ClearStatistics();
         for (int number = 1; number <= nBands; ++number)
             static_cast<Band*>(GetRasterBand(number))->ForgetStatistics();
         SaveSidecarNow();

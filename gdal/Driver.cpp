@@ -111,7 +111,7 @@ std::unique_ptr<Dataset> OpenUrl(GDALOpenInfo& info) {
     } catch (const FetchError&) {
         return nullptr;
     }
-    char start[64];
+    char start[64] = {};
     if (!zmchost::LooksLikePyramid({start, source->ReadAt(0, start, sizeof start)})) return nullptr;
     return Show(std::make_shared<OpenFile>(name, source, options), name, info, options);
 }
