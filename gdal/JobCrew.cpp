@@ -23,12 +23,17 @@ struct Failed {
     std::string text;
 };
 
-// Nothing if the job was done. What GDAL is told of it stays here.
-std::optional<Failed> Try(const Worker& worker, std::uint64_t job) {
-    const ErrorCatcher errors(CE_Failure);
-    if (Reporting(false, [&] { return worker(job); })) return std::nullopt;
-    if (errors.Text().empty()) return Failed{job, CPLE_AppDefined, "it failed"};
-    return Failed{job, errors.Number(), errors.Text()};
+// Nothing if the job was done. What GDAL is told of it stays here. Without memory for the reason
+// that is the reason: a text so short lies in the string itself.
+std::optional<Failed> Try(const Worker& worker, std::uint64_t job) noexcept {
+    try {
+        const ErrorCatcher errors(CE_Failure);
+        if (Reporting(false, [&] { return worker(job); })) return std::nullopt;
+        if (errors.Text().empty()) return Failed{job, CPLE_AppDefined, "it failed"};
+        return Failed{job, errors.Number(), errors.Text()};
+    } catch (...) {
+        return Failed{job, CPLE_OutOfMemory, "out of memory"};
+    }
 }
 
 class Crew {

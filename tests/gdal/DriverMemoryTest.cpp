@@ -4,10 +4,15 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <atomic>
+#include <memory>
+#include <set>
+#include <thread>
 #include <vector>
 
 #include "gdal/Band.h"
 #include "gdal/Dataset.h"
+#include "gdal/JobCrew.h"
 #include "tests/gdal/GdalTest.h"
 #include "tests/support/AllocationFaults.h"
 #include "tests/support/ScratchDirectory.h"
@@ -242,6 +247,29 @@ TEST_F(DriverMemory, LargeWindowsAreReadByThoseWhoHaveMemory) {
         EXPECT_TRUE(read(*dataset) && pixels == whole);
     });
     EXPECT_GT(goneOn, 0);
+}
+
+// The thread that has met it cannot even keep the reason.
+TEST_F(DriverMemory, JobsOfThreadsWithoutMemoryAreDoneByTheCaller) {
+    const auto caller = std::this_thread::get_id();
+    std::atomic<bool> failed{false};
+    std::set<std::uint64_t> done;  // by the caller alone
+    const auto makeWorker = [&]() -> Worker {
+        auto faults = std::make_shared<std::unique_ptr<AllocationFaults>>();
+        return [&, faults](std::uint64_t job) {
+            if (std::this_thread::get_id() == caller) {
+                while (!failed) std::this_thread::yield();
+                done.insert(job);
+                return true;
+            }
+            CPLError(CE_Failure, CPLE_FileIO, "a reason longer than what lies in a text itself");
+            *faults = std::make_unique<AllocationFaults>(1, zmctest::FaultMode::FromThenOn);
+            failed = true;
+            return false;
+        };
+    };
+    EXPECT_TRUE(RunJobs(4, 2, makeWorker, {}));
+    EXPECT_EQ(done.size(), 4u);
 }
 
 // New files: whatever runs out, there is a whole one or an error. Every 13th allocation of the
