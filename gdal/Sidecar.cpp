@@ -1,10 +1,8 @@
 #include "gdal/Sidecar.h"
 
 #include <cpl_string.h>
-#include <gdal_alg.h>
 
 #include <algorithm>
-#include <memory>
 #include <string>
 
 #include "gdal/Band.h"
@@ -68,26 +66,11 @@ void Save(GDALDataset& dataset, const std::string& name, const std::string& oper
     if (!errors.Text().empty()) throw zmchost::Error(name, operation, errors.Text());
 }
 
-// With some versions of libtiff GDAL does not notice that a disk was full: what stands there is
-// read once more, in which it does.
-void Reread(const std::string& file, const std::string& name, const std::string& operation) {
-    const ErrorCatcher errors(CE_Failure);
-    const std::unique_ptr<GDALDataset> saved(GDALDataset::Open(file.c_str(), GDAL_OF_RASTER));
-    if (saved)
-        GDALChecksumImage(saved->GetRasterBand(1), 0, 0, saved->GetRasterXSize(),
-                          saved->GetRasterYSize());
-    if (!saved || !errors.Text().empty()) throw zmchost::Error(name, operation, errors.Text());
-}
-
 void SaveMask(Dataset& dataset, const std::string& name) {
     GDALRasterBand& first = *dataset.GetRasterBand(1);
     if ((first.GetMaskFlags() & GMF_PER_DATASET) == 0) return;
-    const std::string file = name + kMaskEnding;
-    GDALDataset* const mask = first.GetMaskBand()->GetDataset();
-    if (!mask) return;
-    Save(*mask, name, "keep its mask in " + file);
-    // An alpha band is a mask of the dataset too, and no file.
-    if (mask != &dataset) Reread(mask->GetDescription(), name, "keep its mask in " + file);
+    if (GDALDataset* const mask = first.GetMaskBand()->GetDataset())
+        Save(*mask, name, "keep its mask in " + name + kMaskEnding);
 }
 
 }  // namespace
