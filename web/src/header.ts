@@ -49,21 +49,21 @@ export function decodeFront(start: Uint8Array, fileSize: number | undefined, max
 }
 
 // Each piece of a text is taken for a whole value, as the module takes it: of two the last counts.
-const NUMBERS: Record<string, string> = {
-  VERSION_MAJOR: "versionMajor",
-  VERSION_MINOR: "versionMinor",
-  BANDS: "bands",
-  PIXEL_WIDTH: "width",
-  PIXEL_HEIGHT: "height",
-  TILESIZE: "tileSize",
-  LEVELMIN: "levelMin",
-  LEVELMAX: "levelMax",
-};
-const WORDS: Record<string, string> = {
-  INTERLEAVE: "interleave",
-  BUILD_METHOD: "tileOrdering",
-  PIXEL_TYPE: "pixelType",
-};
+const NUMBERS = new Map([
+  ["VERSION_MAJOR", "versionMajor"],
+  ["VERSION_MINOR", "versionMinor"],
+  ["BANDS", "bands"],
+  ["PIXEL_WIDTH", "width"],
+  ["PIXEL_HEIGHT", "height"],
+  ["TILESIZE", "tileSize"],
+  ["LEVELMIN", "levelMin"],
+  ["LEVELMAX", "levelMax"],
+]);
+const WORDS = new Map([
+  ["INTERLEAVE", "interleave"],
+  ["BUILD_METHOD", "tileOrdering"],
+  ["PIXEL_TYPE", "pixelType"],
+]);
 
 const wordOf = (text: string): string => /^[ \t\n\v\f\r]*([^ \t\n\v\f\r]*)/.exec(text)?.[1] ?? "";
 const oneOf = <T extends string>(word: string, words: readonly T[], other: T): T =>
@@ -73,15 +73,15 @@ function readValues(document: Uint8Array): { numbers: Record<string, number>; wo
   const numbers: Record<string, number> = {};
   const words: Record<string, string> = { interleave: "BIP", tileOrdering: "", pixelType: "" };
   const stack: string[] = [];
-  for (const key of Object.values(NUMBERS)) numbers[key] = 0;
+  for (const key of NUMBERS.values()) numbers[key] = 0;
   parseDocument(document, {
     open: (name) => stack.push(name),
     close: () => stack.pop(),
     text: (piece) => {
       const name = stack[stack.length - 1] as string;
       if (!name.startsWith("HEADER_")) return;
-      const number = NUMBERS[name.slice(7)];
-      const word = WORDS[name.slice(7)];
+      const number = NUMBERS.get(name.slice(7));
+      const word = WORDS.get(name.slice(7));
       if (number) numbers[number] = readInteger(piece);
       if (word) words[word] = wordOf(piece);
     },

@@ -242,6 +242,14 @@ test("headers that were changed at random are taken as the module takes them", a
   assert.ok(taken > MUTATIONS / 8 && taken < MUTATIONS / 2, `${taken} were taken`);
 });
 
+test("elements named as what every object has come into no header", async () => {
+  const document = within("<HEADER_constructor>1</HEADER_constructor><HEADER___proto__>2</HEADER___proto__>");
+  const { header } = await Pyramid.open(fileOf(document));
+  const { header: plain } = await Pyramid.open(fileOf(text));
+  assert.deepEqual(header, plain);
+  assert.deepEqual(Object.keys(header), Object.keys(plain));
+});
+
 test("a front that is damaged is refused", async () => {
   const whole = fileOf(text);
   for (let size = 0; size < whole.length; ++size) {
