@@ -20,7 +20,8 @@ struct Number {
     std::uint64_t magnitude = 0;  // likewise
 
     Number() = default;
-    explicit Number(double value) : real(value) {}
+    // Whole where `value` is, below 2^64.
+    explicit Number(double value);
     template <std::integral T>
     explicit Number(T value)
         : real(static_cast<double>(value)),

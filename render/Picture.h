@@ -25,6 +25,8 @@ struct Picture {
 
 // The same with 8 bits a channel, floor(255 v / 65535 + 0.5); as it is if it has them.
 Picture WithEightBits(Picture picture);
+// The same with 16 bits, 257 v; as it is if it has them.
+Picture WithSixteenBits(Picture picture);
 // The same with red, green and blue, whether it had them or was grey.
 Picture WithColours(Picture picture);
 

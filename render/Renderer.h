@@ -16,6 +16,7 @@
 #ifndef ZMC_RENDER_RENDERER_H
 #define ZMC_RENDER_RENDERER_H
 
+#include <array>
 #include <cstdint>
 #include <memory>
 #include <span>
@@ -54,6 +55,8 @@ public:
     // The bands whose samples are wanted, from 0, each once, in this order.
     std::span<const std::uint32_t> Bands() const;
     std::uint32_t PixelType() const;
+    // Channels of a picture that is opaque: 1 or 3.
+    std::uint32_t Colours() const;
     // Pixels that have to be known around those that are shown: 0, or 1 with hillshade.
     std::uint32_t Halo() const;
     // The bounds in use, one for each band that is shown but alpha, or one for an expression; none
@@ -64,8 +67,8 @@ public:
     std::span<const std::array<unsigned char, 3>> LegendColours() const;
     const Style& Settings() const;
 
-    // The picture of these samples: 1 or 3 channels, and alpha where a pixel is not opaque or the
-    // style shows a band of alpha. Throws std::bad_alloc.
+    // The picture of these samples: 1 or 3 channels, and alpha where any pixel is not opaque.
+    // Throws std::bad_alloc.
     Picture Render(const Samples& samples) const;
 
 private:

@@ -1,0 +1,36 @@
+#include "render/Tone.h"
+
+#include <algorithm>
+#include <cmath>
+
+namespace zmcrender {
+
+Tone::Tone(double exponent) : gamma(exponent) {
+    if (IsLinear()) return;
+    for (std::size_t level = 1; level < 256; ++level)
+        start[level] = std::pow((static_cast<double>(level) - 0.5) / 255, gamma);
+    start[256] = 2;
+    for (std::size_t i = 0; i < cell.size(); ++i) {
+        const double t = static_cast<double>(i) / kCells;
+        const auto above = std::upper_bound(start.begin() + 1, start.end() - 1, t);
+        cell[i] = static_cast<std::uint16_t>(above - start.begin() - 1);
+    }
+}
+
+void Tone::Level(double t, std::uint8_t& level) const {
+    if (IsLinear()) {
+        level = static_cast<std::uint8_t>(255 * t + 0.5);
+        return;
+    }
+    const auto at = static_cast<std::size_t>(t * kCells);
+    const auto above =
+        std::upper_bound(start.begin() + cell[at] + 1, start.begin() + cell[at + 1] + 1, t);
+    level = static_cast<std::uint8_t>(above - start.begin() - 1);
+}
+
+void Tone::Level(double t, std::uint16_t& level) const {
+    const double bent = IsLinear() ? t : std::pow(t, 1 / gamma);
+    level = static_cast<std::uint16_t>(65535 * bent + 0.5);
+}
+
+}  // namespace zmcrender
