@@ -11,7 +11,7 @@ struct Entry {
 };
 
 constexpr Entry kMaps[] = {
-#include "Colormaps.inc"
+#include <Colormaps.inc>
 };
 
 constexpr unsigned Digit(char c) {

@@ -20,7 +20,7 @@
 
 namespace zmcrender {
 
-inline constexpr double kSuitingSlope = 0.7;
+inline constexpr double kSuitingSlope = 0.5;
 
 struct Slope {
     double right = 0;  // p

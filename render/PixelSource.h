@@ -35,6 +35,9 @@ public:
     virtual void ReadMask(std::uint32_t, const zmchost::Window&, unsigned char*) {}
 };
 
+// All of level 0, as far as the levels tell of it.
+zmchost::Window WholeOf(const PixelSource& source);
+
 // An open raster, which is borrowed.
 class RasterPixels final : public PixelSource {
 public:

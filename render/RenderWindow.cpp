@@ -90,6 +90,15 @@ void EachStrip(const Renderer& renderer, PixelSource& source, std::uint32_t leve
 
 }  // namespace
 
+Window WholeOf(const PixelSource& source) {
+    const std::uint32_t level = source.MinLevel();
+    const auto whole = [level](std::uint32_t extent) {
+        return static_cast<std::uint32_t>(
+            std::min<std::uint64_t>(std::uint64_t{extent} << (level & 31u), 0xffffffffu));
+    };
+    return {0, 0, whole(source.Width(level)), whole(source.Height(level))};
+}
+
 std::uint32_t LevelFor(const PixelSource& source, const Window& window, std::uint32_t width,
                        std::uint32_t height) {
     std::uint32_t found = source.MinLevel();

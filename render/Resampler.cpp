@@ -133,7 +133,9 @@ void Resampler::Accumulate(const std::vector<float>& part, float weight) {
 template <class Level>
 void Resampler::EmitAs(Level* levels) {
     constexpr auto most = static_cast<float>(std::numeric_limits<Level>::max());
-    const auto level = [most](float value) { return static_cast<Level>(std::min(value, most) + 0.5f); };
+    const auto level = [most](float value) {
+        return static_cast<Level>(std::min(value, most) + 0.5f);
+    };
     for (const float* from = sum.data(); from != sum.data() + sum.size();) {
         const float alpha = from[colours];
         // Sums of weights that come to 1 but for their rounding.

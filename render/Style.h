@@ -21,8 +21,9 @@
 //                 are not; a number: it is, in all bands, in place of the raster's
 //     expression  arithmetic of bands: "(b4-b3)/(b4+b3)" (Expression.h). It takes the place of
 //     bands complex     "magnitude" (default), "real", "imaginary" or "phase" (radians, -pi to pi)
-//     hillshade   "1" or "true": one band as lit heights; "0" or "false" (default). With a colormap
-//                 the heights' colours are lit
+//     hillshade   "1" or "true": one band as lit heights (Hillshade.h), floor(255 t + 0.5) with t
+//                 for the light; "0" or "false" (default). With a colormap the heights' colours
+//                 are multiplied by 0.3 + 0.7 t
 //     azimuth     where the light comes from, degrees clockwise from the top; default 315
 //     altitude    of the light above the horizon, 0 to 90 degrees; default 45
 //     zfactor     by which heights are multiplied before they are compared with the width of a
@@ -64,8 +65,15 @@ namespace zmcrender {
 // What stands in it of a value is cut and has no control characters.
 class StyleError : public std::runtime_error {
 public:
-    StyleError(const std::string& key, const std::string& reason)
-        : std::runtime_error(key + ": " + reason) {}
+    StyleError(const std::string& keyName, const std::string& reasonText)
+        : std::runtime_error(keyName + ": " + reasonText), key(keyName), reason(reasonText) {}
+
+    const std::string& Key() const { return key; }
+    const std::string& Reason() const { return reason; }
+
+private:
+    std::string key;
+    std::string reason;
 };
 
 // Bounds of what t is counted from and to.
