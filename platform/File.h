@@ -26,6 +26,8 @@ struct FileIdentity {
     std::uint64_t size = 0;     // bytes
     std::int64_t modified = 0;  // last write or change of size, in nanoseconds since 1970
     std::int64_t changed = 0;   // the same, or last change of its names or rights
+
+    bool operator==(const FileIdentity&) const = default;
 };
 
 class File {
@@ -38,6 +40,8 @@ public:
 
     // Opens the file of that zero-terminated UTF-16 name; null if that cannot be done.
     static std::unique_ptr<File> Open(const char16_t* name, Mode mode, int* error = nullptr);
+    // The same of a file that the system has open under that number, which is taken over.
+    static std::unique_ptr<File> Take(int descriptor, Mode mode, int* error = nullptr);
     ~File();
     File(const File&) = delete;
     File& operator=(const File&) = delete;
@@ -57,6 +61,9 @@ public:
     bool TellSize(std::uint64_t& size, int* error = nullptr) const;
     // What the open file is now; false, with `identity` as it was, if the system does not tell.
     bool TellIdentity(FileIdentity& identity) const;
+    // The system's number of the open file for libraries that take one: the caller's own, to be
+    // closed by whoever it is given to. Below 0 if there is none to be had.
+    int Duplicate() const;
     // Makes the file end there; what lay beyond is gone. False, with nothing changed, on failure.
     bool Truncate(std::uint64_t size, int* error = nullptr);
     // Waits until what was written has reached the disk; false if that failed.

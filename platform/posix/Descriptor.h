@@ -14,16 +14,20 @@ namespace platform {
 // The lowest number that is not one of the standard streams.
 inline constexpr int kFirstDataDescriptor = 3;
 
-// As open, with a mode of 0666, O_CLOEXEC, and a number that is no standard stream's even where
-// those are closed; -1 with errno on failure.
-inline int OpenForData(const char* path, int flags) {
-    const int opened = Uninterrupted([&] { return ::open(path, flags | O_CLOEXEC, 0666); });
+// The same open file under a number that is no standard stream's, even where those are closed; -1
+// with errno on failure, and for a descriptor below 0.
+inline int AwayFromStreams(int opened) {
     if (opened < 0 || opened >= kFirstDataDescriptor) return opened;
     const int moved = ::fcntl(opened, F_DUPFD_CLOEXEC, kFirstDataDescriptor);
     const int kept = errno;
     ::close(opened);
     errno = kept;
     return moved;
+}
+
+// As open, with a mode of 0666, O_CLOEXEC, and such a number.
+inline int OpenForData(const char* path, int flags) {
+    return AwayFromStreams(Uninterrupted([&] { return ::open(path, flags | O_CLOEXEC, 0666); }));
 }
 
 }  // namespace platform

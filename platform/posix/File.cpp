@@ -13,6 +13,7 @@
 
 #include "platform/TextConversion.h"
 #include "platform/posix/Descriptor.h"
+#include "platform/posix/FileParts.h"
 #include "platform/posix/Uninterrupted.h"
 
 namespace platform {
@@ -95,7 +96,9 @@ std::int64_t Nanoseconds(const struct timespec& time) {
     return std::int64_t{time.tv_sec} * 1'000'000'000 + time.tv_nsec;
 }
 
-FileIdentity IdentityOf(const struct stat& status) {
+}  // namespace
+
+FileIdentity IdentityFrom(const struct stat& status) {
     FileIdentity identity;
     identity.device = status.st_dev;
     identity.number = status.st_ino;
@@ -105,13 +108,18 @@ FileIdentity IdentityOf(const struct stat& status) {
     return identity;
 }
 
-}  // namespace
+std::unique_ptr<File> TakeForReading(int descriptor, int* error) {
+    return File::Take(descriptor, File::Mode::Read, error);
+}
 
 std::unique_ptr<File> File::Open(const char16_t* name, Mode mode, int* error) {
     Tell(error, name ? ENOMEM : EINVAL);
     const std::unique_ptr<char[]> narrow = NarrowName(name);
     if (!narrow) return nullptr;
-    const int descriptor = OpenForData(narrow.get(), OpenFlags(mode));
+    return Take(OpenForData(narrow.get(), OpenFlags(mode)), mode, error);
+}
+
+std::unique_ptr<File> File::Take(int descriptor, Mode mode, int* error) {
     if (!Told(error, descriptor)) return nullptr;
     std::unique_ptr<File> file(new (std::nothrow) File(descriptor));
     if (!file) {
@@ -162,9 +170,11 @@ bool File::TellSize(std::uint64_t& size, int* error) const {
 bool File::TellIdentity(FileIdentity& identity) const {
     struct stat status;
     if (fstat(descriptor, &status) != 0) return false;
-    identity = IdentityOf(status);
+    identity = IdentityFrom(status);
     return true;
 }
+
+int File::Duplicate() const { return ::fcntl(descriptor, F_DUPFD_CLOEXEC, kFirstDataDescriptor); }
 
 bool File::Truncate(std::uint64_t size, int* error) {
     Tell(error, EFBIG);
@@ -181,7 +191,7 @@ bool TellIdentity(const char16_t* name, FileIdentity& identity) {
     const std::unique_ptr<char[]> narrow = NarrowName(name);
     struct stat status;
     if (!narrow || stat(narrow.get(), &status) != 0) return false;
-    identity = IdentityOf(status);
+    identity = IdentityFrom(status);
     return true;
 }
 
