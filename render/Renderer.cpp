@@ -314,7 +314,7 @@ Picture Renderer::Plan::Render(const Samples& samples) const {
 }
 
 Renderer::Renderer(const RasterFacts& facts, const Style& style, PixelSource& source) {
-    if (zelm::PixelSize(facts.pixelType) == 0 || facts.bands.empty())
+    if (zelm::CheckedPixelType(facts.pixelType) == 0 || facts.bands.empty())
         throw StyleError("bands", "the raster has no samples that can be shown");
     plan = std::make_unique<const Plan>(facts, style, source);
 }
