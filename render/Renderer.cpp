@@ -131,8 +131,7 @@ private:
         } else if (given.size() == shown || withAlpha) {
             bounds.assign(given.begin(), given.begin() + static_cast<std::ptrdiff_t>(shown));
         } else {
-            throw StyleError("stretch", "it has " + std::to_string(given.size()) + " pairs for " +
-                                            std::to_string(shown) + " bands");
+            throw StyleError("stretch", "it needs one pair, or as many as there are bands");
         }
     }
 

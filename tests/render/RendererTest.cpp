@@ -288,7 +288,7 @@ TEST(Renderer, RefusesWhatDoesNotGoTogether) {
     EXPECT_EQ(Refusal(source, facts, {{"hillshade", "1"}, {"colormap", "palette"}}),
               "hillshade: it is not for a palette");
     EXPECT_EQ(Refusal(source, facts, {{"stretch", "0,1;0,1"}}),
-              "stretch: it has 2 pairs for 3 bands");
+              "stretch: it needs one pair, or as many as there are bands");
     EXPECT_EQ(Refusal(source, facts, {{"expression", "b1"}, {"stretch", "0,1;0,1"}}),
               "stretch: an expression has one pair");
 }
