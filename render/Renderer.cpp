@@ -245,15 +245,17 @@ private:
                     const std::vector<std::uint8_t>& present, Level* opacity) const {
         constexpr Level opaque = std::numeric_limits<Level>::max();
         constexpr Level unit = opaque / 255;
-        if (alpha.channel)
-            alpha.channel->Levels(line.Band(alpha.place), opacity, 1);
+        if (alpha.channel) alpha.channel->Levels(line.Band(alpha.place), opacity, 1);
+        if (!alpha.channel)
+            for (std::size_t i = 0; i < line.count; ++i)
+                opacity[i] = static_cast<Level>(present[i] * unit);
         else
-            std::fill_n(opacity, line.count, opaque);
-        for (std::size_t i = 0; i < line.count; ++i) {
-            if (present[i] != 255)
-                opacity[i] = static_cast<Level>(opacity[i] * (present[i] * unit) / opaque);
-            if (shown && shown[i] == 0) opacity[i] = 0;
-        }
+            for (std::size_t i = 0; i < line.count; ++i)
+                opacity[i] =
+                    static_cast<Level>(std::uint64_t{opacity[i]} * present[i] * unit / opaque);
+        if (!shown) return;
+        for (std::size_t i = 0; i < line.count; ++i)
+            if (shown[i] == 0) opacity[i] = 0;
     }
 };
 
