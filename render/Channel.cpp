@@ -74,8 +74,9 @@ public:
         Fill(line, levels, step, wide);
     }
     void MarkPresent(const SampleLine& line, unsigned char* present) const override {
-        Each(line, [&](std::size_t i, const T& sample) {
-            present[i] = static_cast<unsigned char>(present[i] | (rule.Marks(sample) ? 0 : 255));
+        Each(line, [present, marks = rule](std::size_t i, const T& sample) {
+            const unsigned there = marks.Marks(sample) ? 0u : 255u;
+            present[i] = static_cast<unsigned char>(present[i] | there);
         });
     }
     void Values(const SampleLine& line, double* values) const override {
@@ -120,11 +121,17 @@ private:
         return 0;
     }
 
+    // Usual distances are told to the compiler, which makes vector code of some.
     template <class Take>
     static void Each(const SampleLine& line, Take&& take) {
         const auto* const samples = reinterpret_cast<const T*>(line.at);
-        const std::size_t stride = line.stride / sizeof(T);
-        for (std::size_t i = 0; i < line.count; ++i) take(i, samples[i * stride]);
+        const std::size_t stride = line.stride / sizeof(T), count = line.count;
+        if (stride == 1)
+            for (std::size_t i = 0; i < count; ++i) take(i, samples[i]);
+        else if (stride == 3)
+            for (std::size_t i = 0; i < count; ++i) take(i, samples[3 * i]);
+        else
+            for (std::size_t i = 0; i < count; ++i) take(i, samples[i * stride]);
     }
 
     template <class Level>
@@ -146,6 +153,12 @@ private:
         const Level* const entries = table.data();
         if constexpr (kTabled)
             Each(line, [&](std::size_t i, T sample) { levels[i * step] = entries[Place(sample)]; });
+        else if (tone->IsLinear())
+            Each(line, [levels, step, as = part, marks = rule, place = ramp](std::size_t i,
+                                                                             const T& sample) {
+                const auto level = Tone::Straight<Level>(place(Shown(sample, as)));
+                levels[i * step] = marks.Marks(sample) ? Level{0} : level;
+            });
         else
             Each(line, [&](std::size_t i, const T& sample) {
                 levels[i * step] = LevelOf<Level>(sample);

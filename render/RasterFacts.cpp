@@ -146,7 +146,7 @@ std::optional<Number> PercentileOf(const HistogramFacts& histogram, double perce
     double total = 0;
     for (const std::uint64_t count : histogram.counts) total += static_cast<double>(count);
     if (total == 0) return std::nullopt;
-    const double target = percent / 100 * total;
+    const double target = percent * total / 100;
     double before = 0, offset = 0;
     for (std::size_t i = 0; i < histogram.counts.size(); ++i) {
         const auto count = static_cast<double>(histogram.counts[i]);

@@ -57,8 +57,8 @@ RasterFacts FactsOf(const zmchost::Raster& raster);
 // palette; else 1.
 std::vector<std::uint32_t> UsualBands(const RasterFacts& facts);
 
-// The value below which `percent` per cent of the counted samples lie. With target = percent / 100
-// times the number of samples and i the first bin with counts where the sum up to it, itself
+// The value below which `percent` per cent of the counted samples lie. With target = percent times
+// the number of samples / 100 and i the first bin with counts where the sum up to it, itself
 // included, is at least target: in reals
 //     minimum + (i + f) binSize, f = (target - sum before i) / counts[i]
 // in integers minimum + i binSize + min(floor(f binSize), binSize - 1): in bins of one value, that

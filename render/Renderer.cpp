@@ -131,8 +131,7 @@ private:
         } else if (given.size() == shown || withAlpha) {
             bounds.assign(given.begin(), given.begin() + static_cast<std::ptrdiff_t>(shown));
         } else {
-            throw StyleError("stretch", "it has " + std::to_string(given.size()) + " pairs for " +
-                                            std::to_string(shown) + " bands");
+            throw StyleError("stretch", "it needs one pair, or as many as there are bands");
         }
     }
 
@@ -246,15 +245,17 @@ private:
                     const std::vector<std::uint8_t>& present, Level* opacity) const {
         constexpr Level opaque = std::numeric_limits<Level>::max();
         constexpr Level unit = opaque / 255;
-        if (alpha.channel)
-            alpha.channel->Levels(line.Band(alpha.place), opacity, 1);
+        if (alpha.channel) alpha.channel->Levels(line.Band(alpha.place), opacity, 1);
+        if (!alpha.channel)
+            for (std::size_t i = 0; i < line.count; ++i)
+                opacity[i] = static_cast<Level>(present[i] * unit);
         else
-            std::fill_n(opacity, line.count, opaque);
-        for (std::size_t i = 0; i < line.count; ++i) {
-            if (present[i] != 255)
-                opacity[i] = static_cast<Level>(opacity[i] * (present[i] * unit) / opaque);
-            if (shown && shown[i] == 0) opacity[i] = 0;
-        }
+            for (std::size_t i = 0; i < line.count; ++i)
+                opacity[i] =
+                    static_cast<Level>(std::uint64_t{opacity[i]} * present[i] * unit / opaque);
+        if (!shown) return;
+        for (std::size_t i = 0; i < line.count; ++i)
+            if (shown[i] == 0) opacity[i] = 0;
     }
 };
 
@@ -314,7 +315,7 @@ Picture Renderer::Plan::Render(const Samples& samples) const {
 }
 
 Renderer::Renderer(const RasterFacts& facts, const Style& style, PixelSource& source) {
-    if (zelm::PixelSize(facts.pixelType) == 0 || facts.bands.empty())
+    if (zelm::CheckedPixelType(facts.pixelType) == 0 || facts.bands.empty())
         throw StyleError("bands", "the raster has no samples that can be shown");
     plan = std::make_unique<const Plan>(facts, style, source);
 }

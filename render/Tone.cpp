@@ -17,15 +17,10 @@ Tone::Tone(double exponent) : gamma(exponent) {
     }
 }
 
-void Tone::Level(double t, std::uint8_t& level) const {
-    if (IsLinear()) {
-        level = static_cast<std::uint8_t>(255 * t + 0.5);
-        return;
-    }
-    const auto at = static_cast<std::size_t>(t * kCells);
+std::uint8_t Tone::Searched(double t, std::size_t at) const {
     const auto above =
         std::upper_bound(start.begin() + cell[at] + 1, start.begin() + cell[at + 1] + 1, t);
-    level = static_cast<std::uint8_t>(above - start.begin() - 1);
+    return static_cast<std::uint8_t>(above - start.begin() - 1);
 }
 
 void Tone::Level(double t, std::uint16_t& level) const {

@@ -275,7 +275,9 @@ ExitStatus PreviewCommand::Run() try {
         zmcrender::RenderWindow(renderer, pixels, area, shape.width, shape.height);
     if (legend) picture = zmcrender::WithLegend(std::move(picture), renderer);
     view->CheckUnchanged();
-    Write(draft, zmcrender::Encode(picture, format, kept));
+    const auto bytes = zmcrender::Encode(picture, format, kept);
+    CheckInterrupt(target);
+    Write(draft, bytes);
     Report(picture, area, renderer);
     return ExitStatus::Done;
 } catch (const zmcrender::StyleError& error) {
