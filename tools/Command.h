@@ -6,13 +6,16 @@
 #include <memory>
 #include <vector>
 
-#include "tools/JsonNumbers.h"
+#include "describe/Description.h"
+#include "describe/JsonNumbers.h"
 #include "tools/Message.h"
 #include "tools/OptionTable.h"
 
 namespace zmctools {
 
-inline constexpr int kSchema = 1;
+using zmcdescribe::Json;
+using zmcdescribe::JsonNumber;
+using zmcdescribe::kSchema;
 
 class Command {
 public:

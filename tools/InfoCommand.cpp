@@ -1,11 +1,10 @@
-#include <algorithm>
 #include <cstdio>
-#include <limits>
-#include <span>
+#include <string>
+#include <vector>
 
 #include "core/PixelVocabulary.h"
+#include "describe/Description.h"
 #include "host/file/PyramidFileInfo.h"
-#include "host/file/StoredRecords.h"
 #include "platform/Terminal.h"
 #include "tools/Command.h"
 #include "tools/HistogramBars.h"
@@ -38,150 +37,50 @@ void InfoCommand::Describe(OptionTable& table) {
         "into each other, and have no offset. Histograms are drawn on a terminal.");
 }
 
-Json LevelsOf(const zmchost::PyramidFileInfo& info) {
-    Json levels = Json::array();
-    const bool woven = info.header.IsPlanar();
-    for (const zmchost::PyramidLevelInfo& level : info.levels)
-        levels.push_back({{"level", level.level},
-                          {"width", level.width},
-                          {"height", level.height},
-                          {"tilesAcross", level.tilesAcross},
-                          {"tilesDown", level.tilesDown},
-                          {"offset", woven ? Json() : JsonNumber(level.offset)},
-                          {"bytes", JsonNumber(level.bytes)}});
-    return levels;
-}
-
-template <class T>
-Json StatisticsOf(const zmchost::Raster& raster) {
-    Json list = Json::array();
-    for (std::uint32_t band = 0; band < raster.Bands(); ++band) {
-        if (!raster.HasStatistics(band)) continue;
-        const auto record = raster.Statistics<T>(band);
-        const auto value = [&](std::uint32_t flag, const auto& field) {
-            return (record.flags & flag) != 0 ? JsonNumber(field) : Json();
-        };
-        namespace Flag = zelm::StatsFlag;
-        list.push_back(
-            {{"band", band + 1},
-             {"minimum", value(Flag::Minimum, record.minimum)},
-             {"maximum", value(Flag::Maximum, record.maximum)},
-             {"mean", value(Flag::Mean, record.mean)},
-             {"standardDeviation", value(Flag::StandardDeviation, record.standardDeviation)},
-             {"sum", value(Flag::Sum, record.sum)},
-             {"sumOfSquares", value(Flag::SumOfSquares, record.sumOfSquares)},
-             {"rootMeanSquare", value(Flag::RootMeanSquare, record.rootMeanSquare)}});
-    }
-    return list;
-}
-
-// A program gets all there is. People are shown no more of 65,536 colours than a line, and bars in
-// place of counts, on a terminal.
+// A program gets all there is. People are shown no more of 65,536 colours than a line, with their
+// true number, and bars in place of counts, on a terminal.
 enum class Detail { All, Readable };
 
 constexpr std::size_t kColorsOnALine = 64;
 
-template <class Counts>
-Json CountsOf(const Counts& counts) {
-    Json::array_t list;
-    list.reserve(counts.size());
-    for (const auto count : counts) list.push_back(JsonNumber(count));
-    return list;
+// Those beyond 2^53 stand as texts.
+std::vector<double> HeightsOf(const Json& counts) {
+    std::vector<double> heights;
+    for (const Json& count : counts)
+        heights.push_back(count.is_string() ? std::stod(count.get<std::string>())
+                                            : count.get<double>());
+    return heights;
 }
 
-template <class T>
-Json HistogramsOf(const zmchost::Raster& raster, Detail detail) {
-    Json list = Json::array();
+void MakeReadable(Json& document) {
     const bool draws = platform::IsTerminal(platform::StandardStream::Output);
-    const auto records = raster.Records<T>();
-    for (const auto& record : records->Histograms()) {
-        Json entry = {{"band", record.band + 1},
-                      {"level", record.level},
-                      {"binCount", record.binCount},
-                      {"binSize", JsonNumber(record.binSize)},
-                      {"minimum", JsonNumber(record.minimum)},
-                      {"maximum", JsonNumber(record.maximum)}};
-        const std::span counts(record.counts.data,
-                               record.counts.data ? record.counts.shape.elements : 0);
-        if (detail == Detail::All)
-            entry["counts"] = CountsOf(counts);
-        else if (draws)
-            entry["bars"] = DrawBars({counts.begin(), counts.end()});
-        list.push_back(std::move(entry));
+    for (Json& histogram : document["histograms"]) {
+        if (draws) histogram["bars"] = DrawBars(HeightsOf(histogram["counts"]));
+        histogram.erase("counts");
     }
-    return list;
-}
-
-Json ColorsOf(const zelm::ColorList& palette, std::size_t most) {
-    Json::array_t colors;
-    colors.reserve(std::min(most, palette.Colors().size()));
-    for (const zelm::ColorList::Rgba color : palette.Colors()) {
-        if (colors.size() == most) break;
-        Json::array_t channels(4);
-        for (int i = 0; i < 4; ++i)
-            channels[static_cast<std::size_t>(i)] = zelm::ColorList::Channel(color, i);
-        colors.emplace_back(std::move(channels));
+    for (Json& palette : document["palettes"]) {
+        Json& colors = palette["colors"];
+        palette["count"] = colors.size();
+        if (colors.size() > kColorsOnALine)
+            colors.erase(colors.begin() + kColorsOnALine, colors.end());
     }
-    return colors;
-}
-
-// With their true number where not all are there.
-template <class T>
-Json PalettesOf(const zmchost::Raster& raster, Detail detail) {
-    Json list = Json::array();
-    const bool all = detail == Detail::All;
-    const std::size_t most = all ? std::numeric_limits<std::size_t>::max() : kColorsOnALine;
-    const auto records = raster.Records<T>();
-    for (std::uint32_t band = 0; band < raster.Bands(); ++band) {
-        const zelm::ColorList* const palette = records->BandPalette(band);
-        if (!palette) continue;
-        Json entry = {{"band", band + 1}, {"colors", ColorsOf(*palette, most)}};
-        if (!all) entry["count"] = palette->Colors().size();
-        list.push_back(std::move(entry));
-    }
-    return list;
-}
-
-Json DescribeLayout(const std::string& file, const zmchost::PyramidFileInfo& info) {
-    const zmchost::PyramidHeader& header = info.header;
-    return {{"schema", kSchema},
-            {"file", file},
-            {"width", header.width},
-            {"height", header.height},
-            {"bands", header.bandCount},
-            {"pixelType", zelm::PixelTypeName(header.pixelType)},
-            {"interleave", zelm::InterleaveName(header.interleave)},
-            {"tileOrdering", zelm::TileOrderName(header.tileOrdering)},
-            {"tileSize", header.tileSize},
-            {"version",
-             std::to_string(header.versionMajor) + '.' + std::to_string(header.versionMinor)},
-            {"levelMin", header.levelMin},
-            {"levelMax", header.levelMax},
-            {"complete", info.complete},
-            {"bytesMissing", JsonNumber(info.bytesMissing)},
-            {"levels", LevelsOf(info)},
-            {"statistics", Json::array()},
-            {"histograms", Json::array()},
-            {"palettes", Json::array()}};
 }
 
 Json Describe(const std::string& file, Detail detail) {
     const zmchost::PyramidFileInfo info = ReadLayout(file);
     // Of a type without a reader the header is all that can be told.
     if (zelm::CheckedPixelType(info.header.pixelType) == 0 || !info.HasMetadataDocument())
-        return DescribeLayout(file, info);
+        return zmcdescribe::DescribeLayout(file, info);
     const zmchost::Raster raster = OpenPyramid(file);
     // Of the file that is open now, should another have taken the name.
-    Json document = DescribeLayout(file, zmchost::DescribePyramidFile(raster.Header()));
+    Json document =
+        zmcdescribe::DescribeLayout(file, zmchost::DescribePyramidFile(raster.Header()));
     if (const std::string wrong = raster.DocumentFault(); !wrong.empty()) {
         Warn(file, wrong + "; statistics, histograms and palettes are not shown");
         return document;
     }
-    zelm::VisitElementType(raster.PixelType(), [&]<class T>(std::type_identity<T>) {
-        document["statistics"] = StatisticsOf<T>(raster);
-        document["histograms"] = HistogramsOf<T>(raster, detail);
-        document["palettes"] = PalettesOf<T>(raster, detail);
-    });
+    zmcdescribe::AddRecords(raster, document);
+    if (detail == Detail::Readable) MakeReadable(document);
     return document;
 }
 

@@ -1,12 +1,10 @@
 #include "tools/Place.h"
 
-#include <ogr_spatialref.h>
-
 #include <cstdio>
 #include <memory>
 
+#include "describe/Place.h"
 #include "gdal/Dataset.h"
-#include "gdal/NoDataValues.h"
 #include "host/base/Error.h"
 #include "tools/GdalWorld.h"
 #include "tools/Message.h"
@@ -25,41 +23,6 @@ std::unique_ptr<zmcgdal::Dataset> Open(const std::string& file) {
     } catch (const zmchost::Error&) {
         return nullptr;
     }
-}
-
-Json SystemOf(const GDALDataset& dataset) {
-    const OGRSpatialReference* const system = dataset.GetSpatialRef();
-    if (!system) return nullptr;
-    const char* const options[] = {"FORMAT=WKT2_2019", "MULTILINE=NO", nullptr};
-    char* text = nullptr;
-    system->exportToWkt(&text, options);
-    const std::unique_ptr<char, decltype(&CPLFree)> wkt(text, &CPLFree);
-    const char* const name = system->GetName();
-    const char* const authority = system->GetAuthorityName(nullptr);
-    const char* const code = system->GetAuthorityCode(nullptr);
-    return {{"name", name ? Json(name) : Json()},
-            {"authority", authority && code ? Json(std::string(authority) + ":" + code) : Json()},
-            {"wkt", text ? Json(text) : Json()}};
-}
-
-Json TransformOf(GDALDataset& dataset) {
-    double numbers[6];
-    if (GDALGetGeoTransform(GDALDataset::ToHandle(&dataset), numbers) != CE_None) return nullptr;
-    Json list = Json::array();
-    for (const double number : numbers) list.push_back(JsonNumber(number));
-    return list;
-}
-
-Json NoDataOf(GDALDataset& dataset) {
-    Json list = Json::array();
-    bool any = false;
-    for (int number = 1; number <= dataset.GetRasterCount(); ++number) {
-        list.push_back(zmcgdal::VisitNoData(
-            *dataset.GetRasterBand(number),
-            [](auto value, GDALDataType) { return value ? JsonNumber(*value) : Json(); }));
-        any |= !list.back().is_null();
-    }
-    return any ? list : Json();
 }
 
 // Text of a value as people read it.
@@ -103,14 +66,10 @@ void PrintNoData(const Json& values) {
 }  // namespace
 
 Json PlaceOf(const std::string& file) {
-    Json place = {{"crs", nullptr}, {"geoTransform", nullptr}, {"noData", nullptr}};
     SetSubject(file);
     TakeGdalError(file);
-    if (const auto dataset = Open(file)) {
-        place["crs"] = SystemOf(*dataset);
-        place["geoTransform"] = TransformOf(*dataset);
-        place["noData"] = NoDataOf(*dataset);
-    }
+    const auto dataset = Open(file);
+    Json place = zmcdescribe::DescribePlace(dataset.get());
     if (const std::string wrong = TakeGdalError(file); !wrong.empty()) Warn(file, wrong);
     return place;
 }

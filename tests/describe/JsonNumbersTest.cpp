@@ -1,10 +1,10 @@
-#include "tools/JsonNumbers.h"
+#include "describe/JsonNumbers.h"
 
 #include <gtest/gtest.h>
 
 #include <limits>
 
-namespace zmctools {
+namespace zmcdescribe {
 namespace {
 
 TEST(JsonNumbers, IntegersBeyondADoubleAreStrings) {
@@ -48,4 +48,4 @@ TEST(JsonNumbers, ComplexNumbersArePairs) {
 }
 
 }  // namespace
-}  // namespace zmctools
+}  // namespace zmcdescribe

@@ -1,8 +1,8 @@
 // Numbers in JSON documents, exact: what a reader that knows doubles only would change stands as a
 // string: integers beyond 2^53, "NaN", "Infinity" and "-Infinity". Complex numbers are a pair. Long
 // doubles are rounded to doubles, but for those beyond 2^53 that no double is.
-#ifndef ZMC_TOOLS_JSONNUMBERS_H
-#define ZMC_TOOLS_JSONNUMBERS_H
+#ifndef ZMC_DESCRIBE_JSONNUMBERS_H
+#define ZMC_DESCRIBE_JSONNUMBERS_H
 
 #include <cmath>
 #include <cstdio>
@@ -13,7 +13,7 @@
 
 #include "core/ElementTypes.h"
 
-namespace zmctools {
+namespace zmcdescribe {
 
 using Json = nlohmann::ordered_json;
 
@@ -52,6 +52,6 @@ Json JsonNumber(const T& value) {
     }
 }
 
-}  // namespace zmctools
+}  // namespace zmcdescribe
 
 #endif
