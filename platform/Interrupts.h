@@ -15,6 +15,10 @@ void CatchInterrupts();
 // Any thread may ask.
 bool IsInterrupted();
 
+// From now on writing to a connection that the other side has ended fails, and does not end the
+// process.
+void IgnoreBrokenPipes();
+
 }  // namespace platform
 
 #endif

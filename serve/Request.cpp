@@ -68,6 +68,7 @@ std::optional<std::string_view> Single(
 }  // namespace
 
 void Deadline::Check() const {
+    if (over && *over) throw Refusal::Busy("the server ends");
     if (Clock::now() >= end) throw Refusal::Busy("it takes longer than a request may", 10);
 }
 

@@ -6,6 +6,7 @@
 #ifndef ZMC_SERVE_REQUEST_H
 #define ZMC_SERVE_REQUEST_H
 
+#include <atomic>
 #include <chrono>
 #include <cstddef>
 #include <cstdint>
@@ -24,12 +25,15 @@ class Deadline {
 public:
     using Clock = std::chrono::steady_clock;
     Deadline() = default;  // never
-    explicit Deadline(Clock::duration left) : end(Clock::now() + left) {}
+    // Also as soon as `isOver`, which lives as long, is true.
+    explicit Deadline(Clock::duration left, const std::atomic<bool>* isOver = nullptr)
+        : end(Clock::now() + left), over(isOver) {}
     // Throws Refusal (503) once it has passed. Long work asks now and then.
     void Check() const;
 
 private:
     Clock::time_point end = Clock::time_point::max();
+    const std::atomic<bool>* over = nullptr;
 };
 
 class Request {

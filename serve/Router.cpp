@@ -63,8 +63,7 @@ const Route* Router::Find(const Request& request) const {
 Answer Router::Handle(const Request& request, Service& service) const try {
     if (auto answer = AnswerOfMethod(request)) return Finished(std::move(*answer));
     const Route* const route = Find(request);
-    if (!route) throw Refusal(404, "there is no such service; /api lists them");
-    return Finished(route->handle(request, service));
+    return Finished(route ? route->handle(request, service) : AnswerOfPage(request, service));
 } catch (...) {
     return Finished(AnswerOfException());
 }
@@ -72,8 +71,7 @@ Answer Router::Handle(const Request& request, Service& service) const try {
 std::optional<Answer> Router::HandleQuickly(const Request& request, Service& service) const try {
     if (auto answer = AnswerOfMethod(request)) return Finished(std::move(*answer));
     const Route* const route = Find(request);
-    if (!route) throw Refusal(404, "there is no such service; /api lists them");
-    if (!route->quick) return std::nullopt;
+    if (!route || !route->quick) return std::nullopt;
     auto answer = route->quick(request, service);
     if (answer) AddCommonHeaders(*answer);
     return answer;

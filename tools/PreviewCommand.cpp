@@ -9,6 +9,7 @@
 #include "render/Codec.h"
 #include "render/DatasetFacts.h"
 #include "render/Legend.h"
+#include "render/PictureSize.h"
 #include "render/Renderer.h"
 #include "tools/Arguments.h"
 #include "tools/Command.h"
@@ -84,21 +85,6 @@ constexpr StyleOption kStyleOptions[] = {
      "What heights are multiplied by for --hillshade (default auto: what suits them)"},
     {"depth", "8|16", "Bits of a channel; 16 only of PNG (default 8)"},
 };
-
-struct PictureSize {
-    std::uint32_t width = 0;
-    std::uint32_t height = 0;
-};
-
-// `longer` pixels on the longer side, and as many on the other as its shape asks for.
-PictureSize SizeOf(const zmchost::Window& window, std::uint32_t longer) {
-    const bool wide = window.width >= window.height;
-    const std::uint64_t side = wide ? window.width : window.height;
-    const std::uint64_t other = wide ? window.height : window.width;
-    const auto shorter =
-        static_cast<std::uint32_t>(std::max<std::uint64_t>((other * longer + side / 2) / side, 1));
-    return wide ? PictureSize{longer, shorter} : PictureSize{shorter, longer};
-}
 
 class PreviewCommand final : public Command {
 public:
@@ -268,7 +254,7 @@ ExitStatus PreviewCommand::Run() try {
     ViewPixels pixels(*view, mask ? &*mask : nullptr);
     const zmchost::Window whole = zmcrender::WholeOf(pixels);
     const zmchost::Window area = ParseWindow(window, whole.width, whole.height);
-    const PictureSize shape = SizeOf(area, LongerSide(area, format));
+    const auto shape = zmcrender::SizeOfPicture(area, LongerSide(area, format));
     zmchost::BuildFile draft(target, overwrite);
     const zmcrender::Renderer renderer(facts, style, pixels);
     zmcrender::Picture picture =

@@ -73,6 +73,7 @@ Program::Program() {
     Add(MakeInfoCommand());
     Add(MakeExportCommand());
     Add(MakePreviewCommand());
+    Add(MakeServeCommand());
     Add(MakeHashCommand());
     Add(MakeVerifyCommand());
     Add(MakeCompareCommand());

@@ -30,4 +30,10 @@ void CatchInterrupts() {
 
 bool IsInterrupted() { return interrupted != 0; }
 
+void IgnoreBrokenPipes() {
+    struct sigaction action = {};
+    action.sa_handler = SIG_IGN;
+    sigaction(SIGPIPE, &action, nullptr);
+}
+
 }  // namespace platform

@@ -1,0 +1,35 @@
+# zmc_embed_pages(folder source): writes a C++ source with the files of a folder, as serve/Pages.h
+# has them; none where there is no such folder. What is in it is looked at when the build is set up,
+# and again whenever one of them changes.
+function(zmc_embed_pages folder source)
+    set(types .html "text/html; charset=utf-8" .js "text/javascript; charset=utf-8"
+        .css "text/css; charset=utf-8" .svg image/svg+xml .png image/png .ico image/x-icon
+        .json application/json .webmanifest application/manifest+json .woff2 font/woff2
+        .wasm application/wasm .txt "text/plain; charset=utf-8" .map application/json)
+    file(GLOB_RECURSE files RELATIVE "${folder}" CONFIGURE_DEPENDS "${folder}/*")
+    list(SORT files)
+    set(number 0)
+    set(arrays "")
+    set(rows "")
+    foreach(file IN LISTS files)
+        set_property(DIRECTORY APPEND PROPERTY CMAKE_CONFIGURE_DEPENDS "${folder}/${file}")
+        file(READ "${folder}/${file}" digits HEX)
+        file(SHA256 "${folder}/${file}" hash)
+        string(SUBSTRING "${hash}" 0 32 version)
+        string(REGEX REPLACE "(..)" "0x\\1," bytes "${digits}")
+        get_filename_component(ending "${file}" LAST_EXT)
+        list(FIND types "${ending}" place)
+        set(type application/octet-stream)
+        if(place GREATER_EQUAL 0)
+            math(EXPR place "${place} + 1")
+            list(GET types ${place} type)
+        endif()
+        string(APPEND arrays "constexpr unsigned char kFile${number}[] = {${bytes}0};\n")
+        string(APPEND rows "    {\"${file}\", \"${type}\", Bytes(kFile${number}, sizeof kFile${number} - 1), \"${version}\"},\n")
+        math(EXPR number "${number} + 1")
+    endforeach()
+    set(ZMC_PAGE_ARRAYS "${arrays}")
+    set(ZMC_PAGE_ROWS "${rows}")
+    set(ZMC_PAGE_COUNT ${number})
+    configure_file("${ZMC_ROOT}/serve/Pages.cpp.in" "${source}" @ONLY)
+endfunction()
