@@ -53,7 +53,7 @@ struct Connection {
 struct Exchange {
     explicit Exchange(std::string_view line) : target(line) {}
 
-    enum class State { New, AtWork, Ready };
+    enum class State { New, Judged, AtWork, Ready };
 
     std::string target;
     std::string method = "-";
@@ -183,7 +183,8 @@ private:
 
     void Start(const platform::Listener& listener);
     MHD_Result Take(MHD_Connection* connection, Exchange& exchange);
-    MHD_Result TakeNew(MHD_Connection* connection, Exchange& exchange);
+    MHD_Result Judge(MHD_Connection* connection, Exchange& exchange);
+    MHD_Result TakeJudged(MHD_Connection* connection, Exchange& exchange);
     void FillIn(MHD_Connection* connection, Exchange& exchange) const;
     void Work(MHD_Connection* connection, Exchange& exchange);
     MHD_Result Send(MHD_Connection* connection, Exchange& exchange, Answer answer) const;
@@ -227,7 +228,9 @@ MHD_Result HttpServer::Server::Access(void* self, MHD_Connection* connection, co
 MHD_Result HttpServer::Server::Take(MHD_Connection* connection, Exchange& exchange) {
     switch (exchange.state.load()) {
         case Exchange::State::New:
-            return TakeNew(connection, exchange);
+            return Judge(connection, exchange);
+        case Exchange::State::Judged:
+            return TakeJudged(connection, exchange);
         case Exchange::State::AtWork:
             return MHD_YES;
         default:
@@ -252,17 +255,22 @@ void HttpServer::Server::FillIn(MHD_Connection* connection, Exchange& exchange) 
         if (SameWord(key, "If-None-Match")) value = WithoutCodings(value);
 }
 
-MHD_Result HttpServer::Server::TakeNew(MHD_Connection* connection, Exchange& exchange) {
+// The library calls once with the head, and again when the request is whole. An answer to the first
+// call ends the connection: where the next request would begin is not certain then.
+MHD_Result HttpServer::Server::Judge(MHD_Connection* connection, Exchange& exchange) {
     if (Connection* const held = ConnectionOf(connection)) held->inRequest = true;
     try {
         FillIn(connection, exchange);
     } catch (...) {
         Answer answer = AnswerOfException();
         answer.Set("Access-Control-Allow-Origin", "*");
-        // Where the next request begins is not certain.
-        answer.Set("Connection", "close");
         return Send(connection, exchange, std::move(answer));
     }
+    exchange.state = Exchange::State::Judged;
+    return MHD_YES;
+}
+
+MHD_Result HttpServer::Server::TakeJudged(MHD_Connection* connection, Exchange& exchange) {
     if (auto quick = service.router.HandleQuickly(exchange.request, service))
         return Send(connection, exchange, std::move(*quick));
     if (ending || !work->Reserve()) {
