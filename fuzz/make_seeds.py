@@ -443,7 +443,31 @@ def arguments_seeds():
             yield f"{kind}-{number}", bytes([kind]) + front + value
 
 
+def serve_seeds():
+    targets = (
+        b"/", b"/api", b"/healthz", b"/metrics", b"/files/a.pyr", b"/files/sub%2fm.pyr",
+        b"/files/..%2f..%2fetc%2fpasswd", b"/files/%2e%2e/a.pyr", b"/files/text.pyr",
+        b"/tiles/a.pyr/0/0/0.raw", b"/tiles/sub/m.pyr/0/0/0.npy?bands=9,1",
+        b"/tiles/a.pyr/0/0/0.png?bands=3,2,1&stretch=p2,98&gamma=1.5&nodata=0",
+        b"/tiles/a.pyr/0/0/0.webp?bands=1&colormap=-turbo&quality=20",
+        b"/tiles/a.pyr/0/0/0.jpg?hillshade=1&azimuth=30&altitude=60&zfactor=2&bands=2",
+        b"/tiles/a.pyr/0/0/0.png?expression=(b1-b2)/(b1%2bb2)&stretch=-1,1&depth=16",
+        b"/tiles/a.pyr/tile.json", b"/tiles/a.pyr/-1/4294967296/0x1.raw",
+        b"/preview/a.pyr.png?size=40&window=1,2,30,20&legend=1&bands=1&colormap=viridis",
+        b"/statistics/a.pyr", b"/histogram/sub/m.pyr?band=9", b"/info/a.pyr",
+        b"/point/a.pyr?x=89&y=69&level=0&bands=1", b"/profile/a.pyr?line=0,0.5,90,70&samples=9",
+        b"/window/a.pyr.npy?window=1,2,3,4&level=0&bands=2", b"/%00%ff?a=%", b"a")
+    headers = (
+        b"", b"\nRange: bytes=0-9\nIf-Range: \"x\"", b"\nRange: bytes=-5,9-",
+        b"\nAccept-Encoding: zstd;q=0.5, gzip", b"\nIf-None-Match: *",
+        b"\nIf-Modified-Since: Sun, 06 Nov 1994 08:49:37 GMT\nRange: bytes=99999999999999999999-",
+        b"\nIf-Match: W/\"a\", \"b\"\nIf-Unmodified-Since: Sunday, 06-Nov-94 08:49:37 GMT")
+    for number, target in enumerate(targets):
+        yield str(number), target + headers[number % len(headers)]
+
+
 TARGETS = {
+    "serve": serve_seeds,
     "driver": driver_seeds,
     "differential": host_seeds,
     "host": host_seeds,

@@ -125,11 +125,25 @@ MHD_Response* ResponseOfRange(const FileRange& range) {
     return made;
 }
 
+// Of 304: one without a length would be taken for that of what the client has.
+MHD_Response* ResponseOfNothing() {
+    const auto none = [](void*, std::uint64_t, char*, std::size_t) -> ssize_t {
+        return MHD_CONTENT_READER_END_OF_STREAM;
+    };
+    return MHD_create_response_from_callback(MHD_SIZE_UNKNOWN, 1, none, nullptr, nullptr);
+}
+
+MHD_Response* ResponseOfBody(Answer&& answer) {
+    if (answer.status == 304) return ResponseOfNothing();
+    if (const auto* const range = std::get_if<FileRange>(&answer.body))
+        return ResponseOfRange(*range);
+    return ResponseOfBytes(std::move(answer));
+}
+
 MHD_Response* ResponseOf(Answer&& answer) {
     const std::string type = answer.type;
     const Headers headers = answer.headers;
-    const auto* const range = std::get_if<FileRange>(&answer.body);
-    MHD_Response* const made = range ? ResponseOfRange(*range) : ResponseOfBytes(std::move(answer));
+    MHD_Response* const made = ResponseOfBody(std::move(answer));
     if (!made) return nullptr;
     if (!type.empty()) MHD_add_response_header(made, MHD_HTTP_HEADER_CONTENT_TYPE, type.c_str());
     for (const auto& [key, value] : headers)
@@ -244,7 +258,9 @@ void HttpServer::Server::FillIn(MHD_Connection* connection, Exchange& exchange) 
     const int count = MHD_get_connection_values(connection, MHD_HEADER_KIND, &TakeHeader, &request);
     if (count < 0 || request.headers.size() >= Request::kMostHeaders)
         throw Refusal(431, "the request has too many headers");
-    if (HasBody(request)) throw Refusal(413, "requests with a body are not taken");
+    if (HasBody(request) && request.method != Method::Other)
+        throw Refusal(413, "requests with a body are not taken");
+    if (HasBody(request)) throw Refusal(405, kOtherMethods).With("Allow", kMethods);
     request.deadline = Deadline(service.limits.time, &dropping);
     const std::string host = request.Header("Host").value_or("");
     request.baseUrl = !options.baseUrl.empty() ? options.baseUrl

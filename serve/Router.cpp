@@ -29,8 +29,8 @@ Answer Finished(Answer answer) {
 Answer OptionsAnswer() {
     Answer answer;
     answer.status = 204;
-    answer.Set("Allow", "GET, HEAD, OPTIONS");
-    answer.Set("Access-Control-Allow-Methods", "GET, HEAD, OPTIONS");
+    answer.Set("Allow", kMethods);
+    answer.Set("Access-Control-Allow-Methods", kMethods);
     answer.Set("Access-Control-Allow-Headers", "Range, If-Range, If-None-Match, If-Modified-Since");
     answer.Set("Access-Control-Max-Age", "86400");
     return answer;
@@ -40,9 +40,7 @@ Answer OptionsAnswer() {
 std::optional<Answer> AnswerOfMethod(const Request& request) {
     if (request.method == Method::Options) return OptionsAnswer();
     if (request.method != Method::Other) return std::nullopt;
-    Answer answer = TextAnswer(405, "only GET, HEAD and OPTIONS are answered");
-    answer.Set("Allow", "GET, HEAD, OPTIONS");
-    return answer;
+    return ToAnswer(Refusal(405, kOtherMethods).With("Allow", kMethods));
 }
 
 }  // namespace

@@ -17,6 +17,9 @@ namespace zmcserve {
 
 struct Service;
 
+inline constexpr const char* kMethods = "GET, HEAD, OPTIONS";
+inline constexpr const char* kOtherMethods = "only GET, HEAD and OPTIONS are answered";
+
 // GET and HEAD alone come here. May throw Refusal, zmchost::Error, zmcrender::StyleError and
 // std::bad_alloc.
 using Handler = Answer (*)(const Request& request, Service& service);
