@@ -83,6 +83,15 @@ int OpenBelow(const std::string& folder, const std::string& name, Links links, i
     return OpenByParts(root.Number(), name, flags);
 }
 
+// By one call where no link can lead out: of what is asked for with each request.
+bool TellAtOnce(const std::string& folder, const std::string& name, Links links,
+                struct stat& status) {
+    const std::string path = folder + '/' + name;
+    if (links == Links::Followed) return ::stat(path.c_str(), &status) == 0;
+    if (name.find('/') != name.npos) return false;
+    return ::lstat(path.c_str(), &status) == 0 && !S_ISLNK(status.st_mode);
+}
+
 bool Describe(int folder, const char* name, FolderEntry& entry, Links links,
               const std::string& root, const std::string& below) {
     struct stat status;
@@ -112,9 +121,12 @@ std::unique_ptr<File> OpenBeneath(const std::string& folder, const std::string& 
 
 bool TellIdentityBeneath(const std::string& folder, const std::string& name, Links links,
                          FileIdentity& identity, int* error) {
-    const Held opened(OpenBelow(folder, name, links, O_PATH));
     struct stat status;
-    const bool told = opened.Number() >= 0 && ::fstat(opened.Number(), &status) == 0;
+    bool told = TellAtOnce(folder, name, links, status);
+    if (!told) {
+        const Held opened(OpenBelow(folder, name, links, O_PATH));
+        told = opened.Number() >= 0 && ::fstat(opened.Number(), &status) == 0;
+    }
     if (error) *error = told ? 0 : errno;
     if (told) identity = IdentityFrom(status);
     return told;
