@@ -36,7 +36,8 @@ struct PixelLine {
     // One that begins `halo` pixels to the left, `line` lines below, and ends as far to the right.
     PixelLine Around(std::uint32_t halo, int line) const {
         PixelLine moved = *this;
-        moved.at = at - halo * pixelBytes + (line < 0 ? -lineBytes : lineBytes * (line > 0));
+        moved.at += line * static_cast<std::ptrdiff_t>(lineBytes) -
+                    static_cast<std::ptrdiff_t>(halo * pixelBytes);
         moved.count = count + 2 * halo;
         return moved;
     }

@@ -35,7 +35,7 @@ public:
     virtual void ReadMask(std::uint32_t, const zmchost::Window&, unsigned char*) {}
 };
 
-// All of level 0, as far as the levels tell of it.
+// All of level 0, as far as the levels tell of it; empty where they have all shrunk to nothing.
 zmchost::Window WholeOf(const PixelSource& source);
 
 // An open raster, which is borrowed.

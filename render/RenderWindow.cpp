@@ -51,9 +51,11 @@ bool IsSame(const Area& area, const Window& window, std::uint32_t width, std::ui
            area.y == window.y && area.width == width && area.height == height;
 }
 
+// What is held of a line: its samples, and some bytes for each pixel of levels on their way.
 std::uint64_t LineBytes(const Renderer& renderer, const PixelSource& source, const Window& window) {
-    return std::uint64_t{window.width} * renderer.Bands().size() *
-           zelm::PixelSize(source.PixelType());
+    constexpr std::uint64_t kLevels = 16;
+    const std::uint64_t samples = renderer.Bands().size() * zelm::PixelSize(source.PixelType());
+    return window.width * (samples + kLevels);
 }
 
 void CheckLine(const Renderer& renderer, const PixelSource& source, const Window& window) {

@@ -14,7 +14,7 @@ using zmchost::Window;
 constexpr std::uint64_t kMostSampled = std::uint64_t{1}
                                        << 20;  // pixels of a level that is read whole
 constexpr std::uint32_t kWindowsAcross = 8;
-constexpr std::uint32_t kWindowSide = 256;
+constexpr std::uint32_t kWindowSide = 128;
 
 // The window with the pixels around it that the level has.
 Window Around(const Window& window, std::uint32_t halo, std::uint32_t width, std::uint32_t height) {
@@ -108,7 +108,7 @@ SampledWindows WindowsToSample(const PixelSource& source) {
         if (std::uint64_t{width} * height <= kMostSampled) break;
     }
     if (width == 0 || height == 0) return sampled;
-    if (std::uint64_t{width} * height <= 4 * kMostSampled) {
+    if (std::uint64_t{width} * height <= kMostSampled) {
         sampled.windows.push_back({0, 0, width, height});
         return sampled;
     }

@@ -31,8 +31,7 @@ PixelLine LineOf(const Samples& samples, std::size_t bands, std::size_t sampleBy
 const unsigned char* ShownOf(const Samples& samples, std::uint32_t y);
 
 // The level and the windows by which a raster is looked at where its records do not tell enough:
-// all of the finest level of up to a million pixels; else, of the coarsest, all of it or 64 windows
-// spread over it.
+// all of the finest level of up to a million pixels; else 64 windows spread over the coarsest.
 struct SampledWindows {
     std::uint32_t level = 0;
     std::vector<zmchost::Window> windows;

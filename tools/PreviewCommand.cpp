@@ -253,6 +253,7 @@ ExitStatus PreviewCommand::Run() try {
     }
     ViewPixels pixels(*view, mask ? &*mask : nullptr);
     const zmchost::Window whole = zmcrender::WholeOf(pixels);
+    if (whole.IsEmpty()) throw Failure(file, "none of its levels has a pixel to show");
     const zmchost::Window area = ParseWindow(window, whole.width, whole.height);
     const auto shape = zmcrender::SizeOfPicture(area, LongerSide(area, format));
     zmchost::BuildFile draft(target, overwrite);

@@ -109,6 +109,20 @@ TEST(RenderWindow, ALevelThatIsTooLargeIsReadInStrips) {
     EXPECT_LE(source.mostRead * sizeof(double), std::uint64_t{32} << 20);
 }
 
+// Its records tell nothing, and there is no coarse level: a million of its samples have to do.
+TEST(RenderWindow, OfALargeLevelSomeWindowsTellTheBounds) {
+    constexpr std::uint32_t kWidth = 2000, kHeight = 1500;
+    std::vector<float> samples(std::size_t{kWidth} * kHeight);
+    for (std::size_t i = 0; i < samples.size(); ++i)
+        samples[i] = static_cast<float>(i % kWidth + i / kWidth);
+    MemoryPixels<float> source(kWidth, kHeight, 1, std::move(samples));
+    const Renderer renderer(source.Facts(), {}, source);
+    EXPECT_EQ(source.readLevels.size(), 64u);
+    EXPECT_LE(source.mostRead, 128u * 128u);
+    EXPECT_EQ(renderer.Bounds()[0], (Range{Number(0), Number(kWidth + kHeight - 2)}))
+        << "its corners are among them";
+}
+
 TEST(RenderWindow, StripsOfLitHeightsHaveNoSeams) {
     constexpr std::uint32_t kWidth = 2048, kHeight = 2500;
     std::vector<double> samples(std::size_t{kWidth} * kHeight);

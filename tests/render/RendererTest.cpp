@@ -4,6 +4,7 @@
 
 #include <cmath>
 #include <limits>
+#include <thread>
 #include <vector>
 
 #include "render/Colormaps.h"
@@ -291,6 +292,26 @@ TEST(Renderer, RefusesWhatDoesNotGoTogether) {
               "stretch: it needs one pair, or as many as there are bands");
     EXPECT_EQ(Refusal(source, facts, {{"expression", "b1"}, {"stretch", "0,1;0,1"}}),
               "stretch: an expression has one pair");
+}
+
+TEST(Renderer, ThreadsRenderAtOnce) {
+    MemoryPixels<float> source(16, 16, 2, {});
+    for (int i = 0; i < 512; ++i)
+        source.levels[0].samples.push_back(static_cast<float>(i * 37 % 101));
+    for (const Pairs& style : {Pairs{{"bands", "1"}, {"gamma", "3"}, {"colormap", "turbo"}},
+                               Pairs{{"expression", "b1/b2"}, {"stretch", "0,2"}}}) {
+        const Renderer renderer(source.Facts(), Styled(style), source);
+        const Samples samples{.data = source.levels[0].samples.data(), .width = 16, .height = 8};
+        const Bytes expected = renderer.Render(samples).bytes;
+        std::vector<Bytes> made(8);
+        std::vector<std::thread> threads;
+        for (Bytes& bytes : made)
+            threads.emplace_back([&] {
+                for (int i = 0; i < 50; ++i) bytes = renderer.Render(samples).bytes;
+            });
+        for (std::thread& thread : threads) thread.join();
+        for (const Bytes& bytes : made) EXPECT_EQ(bytes, expected);
+    }
 }
 
 TEST(Renderer, ARasterThatCannotBeShownIsRefused) {

@@ -1,5 +1,6 @@
 """Pictures of rasters, read back through GDAL and compared with the formula in numpy."""
 import os
+import re
 import signal
 import stat
 import subprocess
@@ -255,6 +256,19 @@ class Preview(ToolTest):
         self.assertRegex(done.stderr, r"^zmcraster: picture.pyr: cannot read [^\n]+ is incomplete,"
                                       r" [^\n]+\n$")
         self.assertEqual(self.files(), ["picture.pyr", "picture.tif"])
+
+    def test_a_pyramid_whose_levels_have_all_shrunk_to_nothing_is_refused(self):
+        self.pyramid()
+        with open(self.path("picture.pyr"), "rb") as file:
+            data = file.read()
+        for name in (b"MIN", b"MAX"):
+            data, count = re.subn(rb"(<HEADER_LEVEL" + name + rb">\s*)\d", rb"\g<1>9", data)
+            self.assertEqual(count, 1)
+        with open(self.path("empty.pyr"), "wb") as file:
+            file.write(data)
+        self.refused(1, "empty.pyr: none of its levels has a pixel to show", "preview", "empty.pyr",
+                     "out.png", "--quiet")
+        self.assertEqual(self.files(), ["empty.pyr", "picture.pyr", "picture.tif"])
 
     def test_a_preview_that_is_interrupted_leaves_no_picture(self):
         self.picture(width=6000, height=4000)
