@@ -3,7 +3,8 @@
 //     127.0.0.1 - - [22/Nov/2026:16:01:02 +0000] "GET /tiles/a.pyr/0/0/0.jpg HTTP/1.1" 200 5120
 //     1870
 //
-// which is the common log format with the time in microseconds behind it. What a client sent stands
+// which is the common log format with the time in microseconds behind it. The status is 0 where the
+// client went before there was an answer, or sent what is no HTTP. What a client sent stands
 // with `\xHH` in place of quotes, backslashes and all that is no printable ASCII character. Lines
 // that the reader of the log does not take in time are dropped and counted, so that nobody waits
 // for it. Any thread may call.

@@ -65,8 +65,6 @@ std::string Metrics::Text() const {
     One(text, "zmcraster_connections", "gauge", "Connections that are open.", connections);
     One(text, "zmcraster_waiting", "gauge", "Requests that wait for a worker.", waiting);
     One(text, "zmcraster_working", "gauge", "Requests that workers are at.", working);
-    One(text, "zmcraster_rasters_opened_total", "counter", "Files that were opened as rasters.",
-        rastersOpened);
     One(text, "zmcraster_log_lines_lost_total", "counter",
         "Lines of the access log that nobody took in time.", lostLogLines);
     return text;

@@ -23,7 +23,6 @@ public:
     Count connections{0};    // open now
     Count waiting{0};        // requests for a worker, now
     Count working{0};        // that a worker is at, now
-    Count rastersOpened{0};  // since the start
     Count lostLogLines{0};
 
     // In the text format of Prometheus, version 0.0.4.

@@ -82,9 +82,9 @@ void ServeCommand::Describe(OptionTable& table) {
         "  zmcraster serve /data --host 0.0.0.0 --access-log access.log\n"
         "\n"
         "Prints its address once it listens, and serves until it is interrupted. /api lists what "
-        "is "
+        "is\n"
         "served and how. Folders are listed anew at each request. Whoever reaches the port can "
-        "read "
+        "read\n"
         "all that is served, and so can every page that a browser on this machine shows.");
 }
 

@@ -5,7 +5,7 @@ import re
 from frame import ToolTest, geotiff, samples
 
 COMMANDS = ["build", "info", "export", "hash", "verify", "compare", "recover",
-            "preview"]
+            "preview", "serve"]
 
 
 class Help(ToolTest):
