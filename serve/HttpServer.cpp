@@ -116,9 +116,49 @@ MHD_Response* ResponseOfBytes(Answer&& answer) {
     return made;
 }
 
+// Short ranges are read and go out in one call with the head of the answer, which is quicker than
+// sendfile: that has the head sent by itself, and wakes the client for it. What they take together
+// is bounded, since slow clients may keep them for long; beyond that they are sent as long ones
+// are.
+constexpr std::uint64_t kShortRange = std::uint64_t{256} << 10;
+constexpr std::uint64_t kMostHeld = std::uint64_t{32} << 20;
+std::atomic<std::uint64_t> heldBytes{0};
+
+class Held {
+public:
+    explicit Held(std::uint64_t count) : size(count) { heldBytes += size; }
+    ~Held() { heldBytes -= size; }
+    Held(const Held&) = delete;
+    Held& operator=(const Held&) = delete;
+
+private:
+    const std::uint64_t size;
+};
+
+struct HeldRange {
+    explicit HeldRange(std::uint64_t size) : held(size), bytes(new char[size]) {}
+    const Held held;
+    const std::unique_ptr<char[]> bytes;
+};
+
+void FreeRange(void* held) { delete static_cast<HeldRange*>(held); }
+
+MHD_Response* ResponseOfShortRange(const FileRange& range) {
+    auto held = std::make_unique<HeldRange>(range.size);
+    if (range.file->ReadAt(range.offset, held->bytes.get(), range.size) != range.size)
+        throw Refusal::Busy("the file cannot be read, or was cut");
+    range.file->CheckUnchanged();
+    MHD_Response* const made = MHD_create_response_from_buffer_with_free_callback_cls(
+        range.size, held->bytes.get(), FreeRange, held.get());
+    if (made) static_cast<void>(held.release());
+    return made;
+}
+
 MHD_Response* ResponseOfRange(const FileRange& range) {
+    if (range.size <= kShortRange && heldBytes + range.size <= kMostHeld)
+        return ResponseOfShortRange(range);
     const int descriptor = range.file->Duplicate();
-    if (descriptor < 0) return nullptr;
+    if (descriptor < 0) throw Refusal::Busy("there are too many open files");
     MHD_Response* const made =
         MHD_create_response_from_fd_at_offset64(range.size, descriptor, range.offset);
     if (!made) platform::CloseDescriptor(descriptor);
@@ -318,10 +358,12 @@ MHD_Result HttpServer::Server::Send(MHD_Connection* connection, Exchange& exchan
     if (ending) answer.Set("Connection", "close");
     exchange.status = answer.status;
     exchange.bytes = exchange.request.method == Method::Head ? 0 : answer.Size();
-    MHD_Response* response = ResponseOf(std::move(answer));
-    if (!response) {
-        exchange.status = 503;
-        response = ResponseOf(ToAnswer(Refusal::Busy("there are too many open files")));
+    MHD_Response* response = nullptr;
+    try {
+        response = ResponseOf(std::move(answer));
+    } catch (const Refusal& refusal) {
+        exchange.status = refusal.Status();
+        response = ResponseOf(ToAnswer(refusal));
     }
     if (!response) return MHD_NO;
     const MHD_Result queued =

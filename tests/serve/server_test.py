@@ -263,6 +263,27 @@ class ServerTest(unittest.TestCase):
                 stream.close()
             resource.setrlimit(resource.RLIMIT_NOFILE, (soft, hard))
 
+    def test_clients_that_do_not_read_cost_little_and_others_are_answered(self):
+        data = pathlib.Path(self.path("a.pyr")).read_bytes()
+        head = b"GET /files/a.pyr HTTP/1.1\r\nHost: a\r\nRange: bytes=0-249999\r\n\r\n"
+        with Server(self.path("a.pyr"), "-q") as server:
+            streams = []
+            for _ in range(100):
+                stream = socket.socket()
+                stream.setsockopt(socket.SOL_SOCKET, socket.SO_RCVBUF, 4096)
+                stream.connect(("127.0.0.1", server.port))
+                stream.sendall(head * 30)
+                streams.append(stream)
+            for start in (0, 1000):
+                wanted = {"Range": f"bytes={start}-{start + 249999}"}
+                self.assertEqual(server.get("/files/a.pyr", wanted)[2], data[start:start + 250000])
+            with open(f"/proc/{server.process.pid}/status", encoding="ascii") as status:
+                held = [line for line in status if line.startswith("VmRSS")][0].split()[1]
+            if "ZMC_SANITIZED" not in os.environ:
+                self.assertLess(int(held), 128 << 10)
+            for stream in streams:
+                stream.close()
+
     def test_without_open_files_it_says_so_and_recovers(self):
         with Server(self.path("a.pyr"), files=64) as server:
             streams = [socket.create_connection(("127.0.0.1", server.port)) for _ in range(80)]
