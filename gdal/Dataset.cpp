@@ -111,12 +111,20 @@ void DropOtherFiles(CPLXMLNode& root) {
     }
 }
 
+// What a flush answers; where it answers nothing, that all is well.
 template <class Work>
-auto ReportingFlush(Work&& work) {
-    if constexpr (std::is_void_v<Flushed>)
-        Reported(work);
-    else
-        return Reporting<Flushed>(CE_Failure, work);
+CPLErr FlushResult(Work&& work) {
+    if constexpr (std::is_void_v<Flushed>) {
+        work();
+        return CE_None;
+    } else {
+        return work();
+    }
+}
+
+template <class Work>
+Flushed ReportingFlush(Work&& work) {
+    return static_cast<Flushed>(Reporting(CE_Failure, [&] { return FlushResult(work); }));
 }
 
 }  // namespace
@@ -192,14 +200,26 @@ Dataset::Dataset(std::shared_ptr<OpenFile> openFile, std::uint32_t levelShown, G
 }
 
 Dataset::~Dataset() {
-    // NOLINTNEXTLINE(bugprone-parent-virtual-call): the pixels, and the sidecar not yet.
-    const bool flushed = Reported([&] { GDALDataset::FlushCache(true); });
-    if (flushed && file->renewsStatistics) Reported([&] { RenewEdited(); });
-    Reported([&] { EndEditing(); });
-    // Without a raster there is nothing that a sidecar could belong to.
-    if (creation && !(flushed && creation->Finish(*this))) nPamFlags &= ~GPF_DIRTY;
-    Reported([&] { GDALPamDataset::FlushCache(true); });
+    Finish();
     CloseDependentDatasets();
+}
+
+CPLErr Dataset::Finish() {
+    if (std::exchange(finished, true)) return CE_None;
+    CPLErr pixels = CE_None;
+    const auto flush = [&] {
+        // NOLINTNEXTLINE(bugprone-parent-virtual-call): the pixels, and the sidecar not yet.
+        pixels = FlushResult([&] { return GDALDataset::FlushCache(true); });
+    };
+    bool done = Reported(flush);
+    if (done && file->renewsStatistics) Reported([&] { RenewEdited(); });
+    Reported([&] { EndEditing(); });
+    if (creation) done = done && creation->Finish(*this);
+    // Without a raster there is nothing that a sidecar could belong to.
+    if (creation && !done) ForgetChanges();
+    const CPLErr items = Reporting(
+        CE_Failure, [&] { return FlushResult([&] { return GDALPamDataset::FlushCache(true); }); });
+    return done ? std::max(pixels, items) : CE_Failure;
 }
 
 std::unique_ptr<Dataset> Dataset::FromFile(std::shared_ptr<OpenFile> file, GDALAccess access) {

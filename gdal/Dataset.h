@@ -210,6 +210,7 @@ public:
 protected:
     int CloseDependentDatasets() override;
     CPLErr TrySaveXML() override;
+    CPLErr Finish() final;
 
 private:
     Dataset(std::shared_ptr<OpenFile> openFile, std::uint32_t levelShown, GDALAccess access,
@@ -256,6 +257,7 @@ private:
     std::unique_ptr<Creation> creation;
     RecordCounts inDoubt;
     bool editing = false;  // the sidecar says so
+    bool finished = false;
     // As which a sidecar that cannot be written is reported; CE_None: by the dataset's access.
     CPLErr failureKind = CE_None;
 };
