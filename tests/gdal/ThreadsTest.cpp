@@ -395,11 +395,11 @@ TEST_F(Threads, AskASharedDatasetForAllThatItKnows) {
     ASSERT_TRUE(shared->Share());
     GDALRasterBand& band = *shared->GetRasterBand(1);
     AtOnce([&](std::uint32_t) {
-        char** const items = band.GetMetadata();
+        const Items items = band.GetMetadata();
         double mean = 0, place[6] = {};
         EXPECT_EQ(band.GetStatistics(FALSE, FALSE, nullptr, nullptr, &mean, nullptr), CE_None);
         EXPECT_GT(mean, 0);
-        EXPECT_EQ(shared->GetGeoTransform(place), CE_None);
+        EXPECT_EQ(GDALGetGeoTransform(GDALDataset::ToHandle(shared.get()), place), CE_None);
         EXPECT_EQ(place[3], 20);
         ASSERT_TRUE(band.GetColorTable());
         EXPECT_EQ(band.GetColorTable()->GetColorEntry(1)->c3, 3);
@@ -427,7 +427,7 @@ TEST_F(Threads, ChangeNothingOfASharedDataset) {
         ASSERT_TRUE(shared->Share());
         GDALRasterBand& band = *shared->GetRasterBand(1);
         double place[] = {10, 1, 0, 20, 0, -1};
-        EXPECT_EQ(shared->SetGeoTransform(place), CE_Failure);
+        EXPECT_EQ(GDALSetGeoTransform(GDALDataset::ToHandle(shared.get()), place), CE_Failure);
         EXPECT_EQ(shared->SetMetadataItem("KEY", "value"), CE_Failure);
         EXPECT_EQ(shared->CreateMaskBand(GMF_PER_DATASET), CE_Failure);
         EXPECT_EQ(band.SetNoDataValue(1), CE_Failure);
