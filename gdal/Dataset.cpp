@@ -122,11 +122,6 @@ CPLErr FlushResult(Work&& work) {
     }
 }
 
-template <class Work>
-Flushed ReportingFlush(Work&& work) {
-    return static_cast<Flushed>(Reporting(CE_Failure, [&] { return FlushResult(work); }));
-}
-
 }  // namespace
 
 OpenFile::OpenFile(const std::string& fileName, GDALAccess access, const OpenOptions& options)
@@ -820,16 +815,18 @@ CPLErr Dataset::IBuildOverviews(const char* resampling, int overviewCount, const
     });
 }
 
-// The sidecar of a raster that there is not yet waits for it.
+// The pixels first, by which the sidecar changes.
 Flushed Dataset::FlushCache(bool atClosing) {
-    return ReportingFlush([&] {
-        // NOLINTNEXTLINE(bugprone-parent-virtual-call): the pixels alone, and the sidecar then.
-        if (creation) return GDALDataset::FlushCache(atClosing);
-        // NOLINTNEXTLINE(bugprone-parent-virtual-call): likewise.
-        if (editing) GDALDataset::FlushCache(atClosing);
+    const CPLErr flushed = Reporting(CE_Failure, [&] {
+        // NOLINTNEXTLINE(bugprone-parent-virtual-call): them alone.
+        const CPLErr pixels = FlushResult([&] { return GDALDataset::FlushCache(atClosing); });
+        // The sidecar of a raster that there is not yet waits for it.
+        if (creation) return pixels;
         EndEditing();
-        return GDALPamDataset::FlushCache(atClosing);
+        const auto save = [&] { return GDALPamDataset::FlushCache(atClosing); };
+        return std::max(pixels, FlushResult(save));
     });
+    return static_cast<Flushed>(flushed);
 }
 
 int Dataset::CloseDependentDatasets() {
