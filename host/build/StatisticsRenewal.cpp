@@ -15,6 +15,7 @@
 #include "host/file/MetadataDocument.h"
 #include "host/file/StoredRecords.h"
 #include "host/journal/MetadataJournal.h"
+#include "host/raster/ArrayOf.h"
 #include "host/raster/Raster.h"
 #include "host/statistics/BandStatistics.h"
 #include "host/statistics/Histogram.h"
@@ -31,15 +32,6 @@ constexpr std::size_t kBandsAtOnce = 128;
 
 // Bytes of samples and masks that are held at once.
 constexpr std::uint64_t kPieceBytes = std::uint64_t{16} << 20;
-
-template <class Record>
-zelm::Array<Record> ArrayOf(const std::vector<Record>& records) {
-    zelm::Array<Record> array;
-    if (!array.SetShape(zelm::ArrayShape(static_cast<std::uint32_t>(records.size()))))
-        throw std::bad_alloc();
-    std::copy(records.begin(), records.end(), array.data);
-    return array;
-}
 
 template <class T>
 class Renewal {
