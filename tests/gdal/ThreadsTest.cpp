@@ -105,6 +105,31 @@ TEST(Jobs, TheFailureOfTheFirstIsToldOnceOnTheThreadThatAsked) {
     }
 }
 
+TEST(Jobs, WarningsAreToldOnceEachOnTheThreadThatAskedBeforeAFailure) {
+    const auto warn = [](std::uint64_t job) {
+        CPLError(CE_Warning, CPLE_NotSupported, "of %d", static_cast<int>(job % 3));
+    };
+    const Worker work = [&](std::uint64_t job) {
+        warn(job);
+        return true;
+    };
+    const Worker fail = [&](std::uint64_t job) -> bool {
+        warn(job);
+        throw zmchost::Error("a file", "be read", "of that");
+    };
+    for (const std::uint32_t threads : {1U, 4U}) {
+        const Told told;
+        CPLErrorReset();
+        EXPECT_TRUE(RunJobs(300, threads, [&] { return Alike(work); }, {}));
+        EXPECT_EQ(told.texts, (std::vector<std::string>{"of 0", "of 1", "of 2"}));
+        EXPECT_EQ(CPLGetLastErrorType(), CE_Warning);
+        EXPECT_EQ(CPLGetLastErrorNo(), CPLE_NotSupported);
+    }
+    const Told told;
+    EXPECT_FALSE(RunJobs(1, 1, [&] { return Alike(fail); }, {}));
+    EXPECT_EQ(told.texts, (std::vector<std::string>{"of 0", "a file: cannot be read: of that"}));
+}
+
 TEST(Jobs, FailuresWithoutAWordAndExceptionsAreFailures) {
     const Worker silent = [](std::uint64_t job) { return job != 5; };
     const Worker loud = [](std::uint64_t job) -> bool {
