@@ -335,8 +335,11 @@ class BlockByBlock(FolderTest):
     def test_closing_answers_that_a_file_cannot_be_made(self):
         dataset = self.create(30, 30, 1, gdal.GDT_Byte)
         os.mkdir(self.path("new.pyr"))
-        with self.assertRaisesRegex(RuntimeError, "cannot replace it: it is a folder"):
-            dataset.Close()
+        # Where closing throws, Python of 3.10 closes once more.
+        gdal.DontUseExceptions()
+        self.addCleanup(gdal.UseExceptions)
+        self.assertEqual(quiet(dataset.Close), gdal.CE_Failure)
+        self.assertIn("cannot replace it: it is a folder", gdal.GetLastErrorMsg())
 
     def test_options_that_do_not_fit_are_refused_at_once(self):
         for data_type, option in ((gdal.GDT_CFloat32, "RESAMPLING=MEDIAN"),
