@@ -32,7 +32,6 @@
 namespace zmcgdal {
 namespace {
 
-constexpr const char* kStructureDomain = "IMAGE_STRUCTURE";
 // The dataset's own item of the sidecar: how many records, of statistics and of histograms, there
 // were when pixels began to change.
 constexpr const char* kEditing = "EDITING";

@@ -34,6 +34,8 @@ namespace zmcgdal {
 
 class Creation;
 
+// Domain of metadata that tell how samples are stored, for all drivers.
+inline constexpr const char* kStructureDomain = "IMAGE_STRUCTURE";
 // Of metadata that describe the file; what the sidecar has in it is the driver's own.
 inline constexpr const char* kOwnDomain = "ZMCPYRAMID";
 

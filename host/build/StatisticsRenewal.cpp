@@ -241,8 +241,8 @@ void ReplaceDocument(zelm::files::ByteSource& source, const std::string& name, s
     if (!text.empty()) write(offset, text.substr(0, 1));
 }
 
-void Strip(zelm::files::ByteSource& source, const std::string& name, const PyramidHeader& header,
-           const std::string& text) {
+void StripRecords(zelm::files::ByteSource& source, const std::string& name,
+                  const PyramidHeader& header, const std::string& text) {
     if (text.empty()) return;
     // A byte order mark of UTF-8 may come first, and no other.
     constexpr std::string_view kFirst = "< \t\r\n\xEF";
@@ -333,7 +333,7 @@ std::vector<FullStatistics> RenewStatistics(const ModulePtr& module,
             if (dynamic_cast<zelm::files::FileSource*>(source.get())) copy.emplace(name);
             OldDocument old(*source, name, raster.Header().tileDataEnd);
             old.text = ReadMetadataText(*source, name, raster.Header());
-            Strip(*source, name, raster.Header(), old.text);
+            StripRecords(*source, name, raster.Header(), old.text);
             Raster stripped = Raster::Open(module, source, name);
             renewal.Store(stripped);
             old.Settle();
