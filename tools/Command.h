@@ -40,6 +40,7 @@ std::unique_ptr<Command> MakeExportCommand();
 std::unique_ptr<Command> MakeHashCommand();
 std::unique_ptr<Command> MakeVerifyCommand();
 std::unique_ptr<Command> MakeCompareCommand();
+std::unique_ptr<Command> MakePreviewCommand();
 std::unique_ptr<Command> MakeStatsCommand();
 std::unique_ptr<Command> MakeRecoverCommand();
 

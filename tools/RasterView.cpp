@@ -134,6 +134,9 @@ public:
             FailAsChanged(Name(), change);
     }
     std::uint32_t TileSide() const override { return raster.TileSide(); }
+    zmcrender::RasterFacts Facts() const override {
+        return remote ? zmcrender::FactsOf(OpenPyramid(Name())) : zmcrender::FactsOf(raster);
+    }
     void WarnOfMissing() override {
         if (!raster.IsComplete())
             Warn(Name(), IncompleteText(std::to_string(raster.Header().BytesMissing())) +
@@ -191,6 +194,10 @@ void RasterView::CheckLevel(std::uint32_t level) const {
                                     Visible(Name()) + " has the levels " +
                                     std::to_string(MinLevel()) + " to " +
                                     std::to_string(MaxLevel()));
+}
+
+zmcrender::RasterFacts RasterView::Facts() const {
+    return {Name(), PixelType(), std::vector<zmcrender::BandFacts>(Bands())};
 }
 
 bool IsPyramidFile(const std::string& name) {

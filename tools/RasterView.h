@@ -17,6 +17,7 @@
 #include "format/PyramidHeaderRecord.h"
 #include "host/file/PyramidFileInfo.h"
 #include "host/raster/Raster.h"
+#include "render/RasterFacts.h"
 #include "tools/TerminalProgress.h"
 
 namespace zmctools {
@@ -48,6 +49,8 @@ public:
     // pyramid, if it was written to; of others, which are looked up by name, if they or a file of
     // theirs were replaced as well. A file that takes the name of an open pyramid is not met.
     virtual void CheckUnchanged() const = 0;
+    // What is archived of a pyramid; of others type and number of the bands alone.
+    virtual zmcrender::RasterFacts Facts() const;
     // Side of the tiles that are moved at once.
     virtual std::uint32_t TileSide() const { return kUsualTile; }
     // After a walk that went well: pixels elsewhere in the file may be missing.

@@ -72,6 +72,7 @@ Program::Program() {
     Add(MakeBuildCommand());
     Add(MakeInfoCommand());
     Add(MakeExportCommand());
+    Add(MakePreviewCommand());
     Add(MakeHashCommand());
     Add(MakeVerifyCommand());
     Add(MakeCompareCommand());

@@ -52,11 +52,12 @@ READING = {
     "hash": ["hash", "FILE"],
     "compare": ["compare", "FILE", "GOOD"],
     "export": ["export", "FILE", "OUT.tif"],
+    "preview": ["preview", "FILE", "OUT.png"],
     "build": ["build", "FILE", "OUT.pyr", "--memory", "32M"],
 }
 # What the module says, by its contract, of a file that it opens all the same.
 WARNED = re.compile(r"\nWarning at file .*\n Message: .*\n")
-LONG = ("verify", "hash", "compare", "export", "build")  # with the pixels of a complete file
+LONG = ("verify", "hash", "compare", "export", "preview", "build")  # with the pixels of a complete file
 WRITING = {"recover": ["recover", "FILE"], "discard": ["recover", "FILE", "--discard"]}
 
 

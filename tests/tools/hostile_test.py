@@ -21,7 +21,8 @@ from pyramid import Pyramid
 READERS = (["info", "{}"], ["hash", "{}"], ["verify", "{}"], ["recover", "{}"],
            ["compare", "{}", "picture.pyr"], ["compare", "picture.pyr", "{}"],
            ["verify", "picture.pyr", "--against", "{}"], ["export", "{}", "out.png"],
-           ["build", "{}", "out.pyr"], ["export", "picture.pyr", "{}"])
+           ["build", "{}", "out.pyr"], ["export", "picture.pyr", "{}"],
+           ["preview", "{}", "out.png"])
 
 
 class NoFiles(ToolTest):
@@ -127,7 +128,7 @@ class Names(ToolTest):
         name = self.EVIL
         for words in (["info", name], ["hash", name], ["build", name, "x.pyr"],
                       ["export", name, "x.tif"], ["compare", name, name], ["verify", name],
-                      ["recover", name]):
+                      ["recover", name], ["preview", name, "x.png"]):
             self.assertEqual(self.check(self.run_tool(*words), 1),
                              f"zmcraster: {self.SHOWN}: there is no such file\n")
         self.pyramid()

@@ -4,7 +4,8 @@ import re
 
 from frame import ToolTest, geotiff, samples
 
-COMMANDS = ["build", "info", "export", "hash", "verify", "compare", "recover"]
+COMMANDS = ["build", "info", "export", "hash", "verify", "compare", "recover",
+            "preview"]
 
 
 class Help(ToolTest):
@@ -78,7 +79,8 @@ class Usage(ToolTest):
         for words in (["info", name], ["export", name, "a.tif"], ["hash", name], ["verify", name],
                       ["recover", name], ["compare", name, "a"], ["compare", "a", name],
                       ["verify", "a.pyr", "--against", name], ["build", name, "a.pyr"],
-                      ["build", "a.tif", name], ["export", "a.pyr", name]):
+                      ["build", "a.tif", name], ["export", "a.pyr", name],
+                      ["preview", name, "a.png"], ["preview", "a.pyr", name]):
             done = self.run_tool(*words)
             self.assertEqual((done.returncode, done.stdout), (2, ""), words)
             self.assertIn(name + ": names of lent sources are not taken here", done.stderr)
