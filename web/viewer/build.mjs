@@ -2,9 +2,12 @@
 // the browser run these and nothing else. With --tests, the tests in build/viewer too. Started from the folder above.
 import { build } from "esbuild";
 import { createHash } from "node:crypto";
-import { mkdirSync, readdirSync, readFileSync, rmSync, writeFileSync } from "node:fs";
+import { existsSync, mkdirSync, readdirSync, readFileSync, rmSync, writeFileSync } from "node:fs";
 
-const common = { bundle: true, target: "es2022", logLevel: "warning", legalComments: "none", charset: "utf8" };
+// In a folder of a build's own, where run-tests has copied it, or in the tree.
+const maps = existsSync("colormaps.txt") ? "./colormaps.txt" : "../render/colormaps.txt";
+const alias = { "colormaps.txt": maps };
+const common = { bundle: true, target: "es2022", logLevel: "warning", legalComments: "none", charset: "utf8", alias };
 const made = async (entry, options) => {
   const { outputFiles } = await build({ ...common, entryPoints: [entry], minify: true, write: false, ...options });
   return outputFiles[0].text.trim();

@@ -1,5 +1,5 @@
 // The colour maps, out of the one list that the program's own renderer reads too.
-import text from "../../../render/colormaps.txt";
+import text from "colormaps.txt";
 
 /** Red, green, blue and alpha of 256 colours, by the name of the map. */
 export const COLOR_MAPS: ReadonlyMap<string, Uint8Array> = new Map(

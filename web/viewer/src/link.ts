@@ -63,7 +63,8 @@ export function writeLink({ sides, view, swipe, line, background }: State): stri
 
 /** Numbers with commas between them, if they are as many as that. */
 function numbers(text: string | null, count: number): number[] | undefined {
-  const list = text?.split(",").map((each) => (each.trim() === "" ? NaN : Number(each)));
+  // A plus that was typed into an address comes as a blank.
+  const list = text?.split(",").map((each) => (each.trim() === "" ? NaN : Number(each.replace(/e /i, "e+"))));
   return list?.length === count && list.every(Number.isFinite) ? list : undefined;
 }
 

@@ -80,15 +80,25 @@ function fetch(variant: Variant, vector: string): string {
   ${vector} value = ${vector}(${parts.join(", ")});`;
 }
 
+// The built-in angle of two numbers is wrong for very large and very small ones on some processors.
 const PARTS = `
+float angle(vec2 both) {
+  vec2 size = abs(both);
+  float most = max(size.x, size.y);
+  float part = most == 0.0 ? 0.0 : atan(min(size.x, size.y) / most);
+  if (size.y > size.x) part = 1.5707963267948966 - part;
+  uvec2 negative = floatBitsToUint(both) >> 31;
+  if (negative.x != 0u) part = 3.141592653589793 - part;
+  return negative.y != 0u ? -part : part;
+}
 float partOf(vec2 both) {
   if (any(equal(floatBitsToUint(both) & uvec2(0x7f800000u), uvec2(0x7f800000u)))) return uintBitsToFloat(0x7fc00000u);
   if (omit && both.x == omitted) return uintBitsToFloat(0x7fc00000u);
   if (part == 1) return both.x;
   if (part == 2) return both.y;
-  if (part == 3) return atan(both.y, both.x);
+  if (part == 3) return angle(both);
   float most = max(abs(both.x), abs(both.y));
-  return most == 0.0 ? 0.0 : most * length(both / most);
+  return most == 0.0 ? 0.0 : min(most * length(both / most), 3.4e38);
 }`;
 
 /** The text of a program for pixels. Colours come out multiplied by alpha. */
