@@ -149,6 +149,10 @@ export class App implements Gestures {
     for (const side of before) side.close(this.sides.some(({ origin }) => origin === side.origin));
     this.view = state.view && { ...state.view, zoom: state.view.zoom * devicePixelRatio };
     this.line = state.line;
+    this.profile.drawing = false;
+    this.profile.clear();
+    this.map.classList.remove("drawing");
+    byId("draw-line").setAttribute("aria-pressed", String(this.line !== undefined));
     this.show();
     await Promise.all(opening);
     this.opened();
@@ -672,7 +676,8 @@ export class App implements Gestures {
     this.linkTimer = window.setTimeout(() => this.writeLink(), SETTLE);
   }
 
-  private writeLink(): void {
+  /** Writes the link at once. */
+  writeLink(): void {
     clearTimeout(this.linkTimer);
     if (!this.sides.length || this.target) return;
     const hash = `#${writeLink(this.state())}`;

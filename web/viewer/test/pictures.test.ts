@@ -57,7 +57,7 @@ before(async () => {
   }));
   pyramids.make(jobs);
   for (const type of TYPES) bench.put(`${type}.pyr`, pyramids.bytes(type));
-  page = await bench.open();
+  page = await bench.open("", { viewport: { width: 340, height: 300 } });
 });
 after(async () => {
   await bench.stop();

@@ -56,7 +56,7 @@ export class Bench {
 /** Once all that is in view has come. */
 export async function idle(page: Page): Promise<void> {
   await page.waitForFunction(() => "viewer" in globalThis);
-  await page.evaluate(() => viewer.idle());
+  await page.waitForFunction(() => viewer.idle().then(() => true));
 }
 
 /** Goes to another view by its link, without loading the page anew. */
@@ -77,9 +77,10 @@ export async function picture(page: Page): Promise<Picture> {
   return { width, height, pixels: Uint8Array.from(Buffer.from(text, "base64")) };
 }
 
-/** What the address tells, once it has been written. */
+/** What the address tells, once all is here. */
 export async function link(page: Page): Promise<URLSearchParams> {
-  await page.waitForTimeout(450);
+  await idle(page);
+  await page.evaluate(() => viewer.writeLink());
   return new URLSearchParams(new URL(page.url()).hash.slice(1));
 }
 
