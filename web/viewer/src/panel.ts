@@ -135,7 +135,7 @@ function named(name: string, raster: Raster, band: number, part: Part): Range | 
   if (name === "type") return rangeOfType(raster.type);
   if (!found) return undefined;
   if (name === "percent") return raster.percentiles(found, 2, 98);
-  if (name === "ends") return { minimum: found.minimum, maximum: found.maximum };
+  if (name === "ends") return raster.ends(band, part);
   const { mean, deviation } = found;
   if (name !== "deviations" || mean === undefined || deviation === undefined) return undefined;
   return { minimum: mean - 2 * deviation, maximum: mean + 2 * deviation };

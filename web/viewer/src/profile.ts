@@ -25,7 +25,7 @@ export async function readProfile(raster: Raster, line: Line, style: Style, sign
   if (!level) throw new RangeError("the pyramid has no pixels to show");
   const count = Math.min(Math.max(Math.ceil(length / level.scale) + 1, 2), MOST_POINTS);
   const bands = [...new Set(style.bands)];
-  const distances = Float64Array.from({ length: count }, (_, i) => (i / (count - 1)) * length);
+  const distances = Float64Array.from({ length: count }, (_, i) => (i * length) / (count - 1));
   const series = bands.map((band) => ({ band, values: new Float64Array(count).fill(NaN) }));
   const tiles = new Map<string, number[]>(); // the points of each tile
   const { tileSize } = pyramid.header;

@@ -161,10 +161,16 @@ export class Raster {
     const distribution = this.distribution(band, part);
     if (!distribution) return rangeOfType(this.type);
     if (distribution.archived) return this.percentiles(distribution, 2, 98);
+    return this.ends(band, part) ?? rangeOfType(this.type);
+  }
+
+  /** The least and the greatest value of a band, as far as they are known. Its distribution has to be. */
+  ends(band: number, part: Part): Range | undefined {
     const { minimum, maximum } = this.metadata.statistics(band) ?? {};
     if (minimum !== undefined && maximum !== undefined && !isComplex(this.type))
       return { minimum: Number(minimum), maximum: Number(maximum) };
-    return { minimum: distribution.minimum, maximum: distribution.maximum };
+    const found = this.distribution(band, part);
+    return found && { minimum: found.minimum, maximum: found.maximum };
   }
 
   percentiles(distribution: Distribution, low: number, high: number): Range {
