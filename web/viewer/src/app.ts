@@ -167,7 +167,10 @@ export class App implements Gestures {
       origin,
       this.renderer.gl,
       () => this.draw(),
-      () => this.show(),
+      () => {
+        this.readout.forget();
+        this.show();
+      },
     );
   }
 

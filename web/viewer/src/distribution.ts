@@ -1,7 +1,7 @@
 // How the values of a band are spread: what the file archives, or what its coarsest level shows.
 import type { Histogram } from "../../src/metadata.js";
-import type { SampleArray } from "../../src/types.js";
-import { type Part, partOf, type Range } from "./style.js";
+import type { PixelType, SampleArray } from "../../src/types.js";
+import { isComplex, isNone, isReal, type Part, partOf, type Range } from "./style.js";
 
 /** Counts in bins of one width. */
 export interface Distribution extends Range {
@@ -43,19 +43,19 @@ const BINS = 256;
 
 /** The distribution of some samples, without those that are not numbers or no data. */
 export function sampled(
+  type: PixelType,
   data: SampleArray,
-  step: { first: number; every: number; part: Part | undefined },
+  part: Part,
   noData: number | bigint | undefined,
-  whole: boolean,
 ): Distribution {
   const values: number[] = [];
-  for (let i = step.first; i < data.length; i += step.every) {
-    const raw = data[i] as number | bigint;
-    if (raw === noData) continue;
-    const value = step.part ? partOf(step.part, Number(raw), Number(data[i + 1])) : Number(raw);
+  const complex = isComplex(type);
+  for (let i = 0; i < data.length; i += complex ? 2 : 1) {
+    if (isNone(type, data, i, noData)) continue;
+    const value = complex ? partOf(part, Number(data[i]), Number(data[i + 1])) : Number(data[i]);
     if (Number.isFinite(value)) values.push(value);
   }
-  return spread(values, whole);
+  return spread(values, !isReal(type));
 }
 
 function spread(values: number[], whole: boolean): Distribution {

@@ -3,7 +3,7 @@ import type { Pixels } from "../../src/pyramid.js";
 import { h, s, short } from "./dom.js";
 import type { Line } from "./link.js";
 import type { Raster } from "./raster.js";
-import { isComplex, partOf, type Style } from "./style.js";
+import { isComplex, isNone, partOf, type Style } from "./style.js";
 
 const MOST_POINTS = 1024;
 const MOST_TILES = 256;
@@ -55,9 +55,11 @@ const suits = ({ pyramid }: Raster): number => Math.min(2 * MOST_POINTS, (MOST_T
 
 function sampleOf(raster: Raster, style: Style, tile: Pixels, [x, y]: [number, number], i: number): number {
   const at = ((y - tile.y) * tile.width + (x - tile.x)) * tile.bands.length + i;
-  const raw = tile.data[isComplex(raster.type) ? 2 * at : at] as number | bigint;
-  if (raw === raster.noData(tile.bands[i] as number, style.noData)) return NaN;
-  return isComplex(raster.type) ? partOf(style.part, Number(raw), Number(tile.data[2 * at + 1])) : Number(raw);
+  const complex = isComplex(raster.type);
+  const from = complex ? 2 * at : at;
+  if (isNone(raster.type, tile.data, from, raster.noData(tile.bands[i] as number, style.noData))) return NaN;
+  const raw = Number(tile.data[from]);
+  return complex ? partOf(style.part, raw, Number(tile.data[from + 1])) : raw;
 }
 
 const WIDTH = 560;

@@ -112,7 +112,9 @@ export class Raster {
     const text = choice === "file" ? this.told(band).noData : choice === "none" ? undefined : choice;
     if (text === undefined || text.trim() === "") return undefined;
     const value = Number(text);
-    if (!isWide(this.type)) return Number.isNaN(value) && !/nan/i.test(text) ? undefined : value;
+    // Not-a-number is no data without being told.
+    if (!isWide(this.type) && Number.isNaN(value)) return undefined;
+    if (!isWide(this.type)) return this.type.endsWith("Single") ? Math.fround(value) : value;
     if (/^\s*-?\d+\s*$/.test(text)) return BigInt(text);
     return Number.isInteger(value) ? BigInt(value) : undefined;
   }
@@ -138,11 +140,11 @@ export class Raster {
       const key = `${band} ${complex ? part : ""}`;
       if (this.distributions.has(key)) continue;
       const found = complex ? undefined : this.archivedOf(band);
-      this.distributions.set(key, found ?? (await this.sample(band, complex ? part : undefined, signal)));
+      this.distributions.set(key, found ?? (await this.sample(band, part, signal)));
     }
   }
 
-  private async sample(band: number, part: Part | undefined, signal: AbortSignal): Promise<Distribution> {
+  private async sample(band: number, part: Part, signal: AbortSignal): Promise<Distribution> {
     const level = this.pyramid.levels.filter(({ width, height }) => width > 0 && height > 0).at(-1);
     if (!level) throw new RangeError("the pyramid has no pixels to show");
     // Of a coarsest level that is large, its middle.
@@ -150,8 +152,7 @@ export class Raster {
     const [width, height] = [Math.min(level.width, most), Math.min(level.height, most)];
     const window = { x: (level.width - width) >> 1, y: (level.height - height) >> 1, width, height };
     const { data } = await this.pyramid.readWindow(level.level, window, { bands: [band], signal });
-    const every = part ? 2 : 1;
-    return sampled(data, { first: 0, every, part }, this.noData(band, "file"), !isReal(this.type));
+    return sampled(this.type, data, part, this.noData(band, "file"));
   }
 
   /** The stretch that a band opens with. Its distribution has to be known. */

@@ -62,6 +62,11 @@ export class Readout {
     return `${[...this.place.children].map((each) => each.textContent).join(", ")}. ${values.join(", ")}`;
   }
 
+  /** Takes names and units of the bands anew, which have changed. */
+  forget(): void {
+    this.raster = undefined;
+  }
+
   private begin(raster: Raster | undefined): void {
     this.raster = raster;
     this.at = "";

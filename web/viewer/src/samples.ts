@@ -1,7 +1,7 @@
 // How samples go to the graphics processor: as they are where it knows their type; those of 64 bits as 32-bit reals,
 // counted from a value near the stretch.
 import type { PixelType, SampleArray } from "../../src/types.js";
-import { isComplex, type Range } from "./style.js";
+import { isComplex, isNone, type Range } from "./style.js";
 
 export type Sampler = "usampler2D" | "isampler2D" | "sampler2D";
 
@@ -102,7 +102,7 @@ export function convert(type: PixelType, data: SampleArray, conversions: readonl
   const out = new Float32Array(samples.length);
   conversions.forEach(({ base, unit, noData }, i) => {
     for (let at = i * parts; at < samples.length; at += count) {
-      const missing = samples[at] === noData;
+      const missing = isNone(type, samples, at, noData);
       for (let part = 0; part < parts; ++part) {
         const value = ((samples[at + part] as number) - base) / unit;
         out[at + part] = missing || !Number.isFinite(value) ? NaN : Math.min(Math.max(value, -LARGE), LARGE);

@@ -59,7 +59,7 @@ const WORDS: Record<Sampler, Words> = {
     vector: "vec4",
     above: "(value - base) - rest",
     missing: "uvec4(equal(floatBitsToUint(value) & uvec4(0x7f800000u), uvec4(0x7f800000u)))",
-    index: "value.x > -1.0 && value.x < 65536.0 ? int(value.x) : -1",
+    index: "value.x >= 0.0 && value.x < 65536.0 && value.x == floor(value.x) ? int(value.x) : -1",
   },
 };
 
@@ -93,7 +93,7 @@ float angle(vec2 both) {
 }
 float partOf(vec2 both) {
   if (any(equal(floatBitsToUint(both) & uvec2(0x7f800000u), uvec2(0x7f800000u)))) return uintBitsToFloat(0x7fc00000u);
-  if (omit && both.x == omitted) return uintBitsToFloat(0x7fc00000u);
+  if (omit && both.x == omitted && both.y == 0.0) return uintBitsToFloat(0x7fc00000u);
   if (part == 1) return both.x;
   if (part == 2) return both.y;
   if (part == 3) return angle(both);

@@ -1,5 +1,5 @@
 // How samples look: which bands, the stretch, gamma, colours. The formulas are those of the program's own renderer.
-import type { PixelType } from "../../src/types.js";
+import type { PixelType, SampleArray } from "../../src/types.js";
 
 export type Part = "magnitude" | "real" | "imaginary" | "phase";
 export const PARTS: readonly Part[] = ["magnitude", "real", "imaginary", "phase"];
@@ -38,6 +38,11 @@ export const step = (value: number, range: Range, gamma: number): number =>
 export const isComplex = (type: PixelType): boolean => type.startsWith("Complex");
 export const isWide = (type: PixelType): boolean => type === "UInt64" || type === "Int64";
 export const isReal = (type: PixelType): boolean => type === "Single" || type === "Double" || isComplex(type);
+
+/** Whether the sample that begins there is the one for no data, which complex samples have with no imaginary part. */
+export function isNone(type: PixelType, data: SampleArray, at: number, noData: number | bigint | undefined): boolean {
+  return noData !== undefined && data[at] === noData && (!isComplex(type) || data[at + 1] === 0);
+}
 
 /** What is shown of a complex sample. */
 export function partOf(part: Part, real: number, imaginary: number): number {

@@ -254,6 +254,22 @@ test("no text of a file becomes a part of the page", async () => {
   assert.equal(await page.locator("img").count(), 0);
 });
 
+test("a sidecar that comes late names bands, and values without data, when it is there", async () => {
+  const sidecar = `<PAMDataset><PAMRasterBand band="1"><Description>depth</Description><NoDataValue>7</NoDataValue></PAMRasterBand></PAMDataset>`;
+  bench.put("late.pyr", pyramids.bytes("large"));
+  bench.put("late.pyr.aux.xml", new TextEncoder().encode(sidecar));
+  bench.site.judge = (path) => (path.endsWith(".aux.xml") ? "wait" : undefined);
+  await go(page, `file=late.pyr&${STYLE}&at=1024,512&zoom=1`);
+  const { width, height, pixels } = await picture(page);
+  const view = { x: 1024, y: 512, zoom: 1, level: 0 };
+  assertSame({ width, height, pixels }, await draw(pyramid, { width, height }, view, style), "before it");
+  bench.site.release();
+  await page.locator("#values dt", { hasText: "1 depth" }).waitFor({ state: "attached" });
+  await idle(page);
+  const later = await draw(pyramid, { width, height }, view, { ...style, noData: 7 });
+  assertSame(await picture(page), later, "with it");
+});
+
 test("a sidecar with a document type is not read, and one that is none changes nothing", async () => {
   bench.put("typed.pyr", pyramids.bytes("large"));
   const text = `<!DOCTYPE a [<!ENTITY b "c">]><PAMDataset><PAMRasterBand band="1"><Description>&b;</Description></PAMRasterBand></PAMDataset>`;

@@ -175,6 +175,14 @@ test("samples that are no numbers or infinite are transparent, and in some bands
 test("a value without data is transparent in every type that can have it", async () => {
   await compare("Byte.pyr", "&nodata=77", { bands: [0], ranges: [[0, 255]], noData: 77 });
   await compare("Char.pyr", "&nodata=-5", { bands: [0], ranges: [[-128, 127]], noData: -5 });
+  const real = Float32Array.from({ length: 4096 }, (_, i) => (i % 5) / 10);
+  bench.put("tenths.pyr", fileWith("Single", 64, 64, 1, real));
+  await compare("tenths.pyr", "&nodata=0.1", { bands: [0], ranges: [[0, 0.5]], noData: Math.fround(0.1) });
+  const complex = Float64Array.from({ length: 8192 }, (_, i) => (i % 2 ? i % 3 : 3 + (i % 7)));
+  bench.put("pairs.pyr", fileWith("ComplexDouble", 64, 64, 1, complex));
+  bench.put("pairs-32.pyr", fileWith("ComplexSingle", 64, 64, 1, Float32Array.from(complex)));
+  await compare("pairs.pyr", "&nodata=5", { bands: [0], ranges: [[0, 12]], noData: 5 });
+  await compare("pairs-32.pyr", "&nodata=5", { bands: [0], ranges: [[0, 12]], noData: 5 });
   await compare("Byte.pyr", "&nodata=77.5", { bands: [0], ranges: [[0, 255]] });
   const samples = BigInt64Array.from({ length: 4096 }, (_, i) => 2n ** 62n + BigInt(i % 50));
   bench.put("exact.pyr", fileWith("Int64", 64, 64, 1, samples));

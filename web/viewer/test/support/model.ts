@@ -25,7 +25,7 @@ type Sample = number | bigint | [number, number];
 function isMissing(sample: Sample, noData: number | bigint | undefined): boolean {
   if (typeof sample === "bigint") return sample === noData;
   const parts = typeof sample === "number" ? [sample] : sample;
-  return !parts.every(Number.isFinite) || parts[0] === noData;
+  return !parts.every(Number.isFinite) || (parts[0] === noData && (parts[1] ?? 0) === 0);
 }
 
 function valueOf(sample: Sample, part: ModelStyle["part"]): number | bigint {
