@@ -1,7 +1,7 @@
 // Pictures of a real browser, against what the samples make of the formulas.
 import assert from "node:assert/strict";
 import { spawnSync } from "node:child_process";
-import { existsSync, readFileSync } from "node:fs";
+import { existsSync, readFileSync, writeFileSync } from "node:fs";
 import { after, before, test } from "node:test";
 
 import type { Page } from "playwright-core";
@@ -56,6 +56,8 @@ before(async () => {
     header: headerOf({ ...SIZE, PIXEL_TYPE: type, BUILD_METHOD: ORDERINGS[i % 3] as "Blocked" }),
   }));
   pyramids.make(jobs);
+  pyramids.make([{ name: "archived", seed: 99, array: [3, 90, 120] }]);
+  bench.put("archived.pyr", pyramids.bytes("archived"));
   for (const type of TYPES) bench.put(`${type}.pyr`, pyramids.bytes(type));
   page = await bench.open("", { viewport: { width: 340, height: 300 } });
 });
@@ -270,45 +272,72 @@ async function decoded(path: string): Promise<Picture> {
     const { width, height, data } = context.getImageData(0, 0, bitmap.width, bitmap.height);
     return { width, height, list: [...data] };
   });
-  return { width, height, pixels: Uint8Array.from(list, (value, i) => (list[i | 3] === 0 ? 0 : value)) };
+  const opacity = (i: number): number => (i % 4 === 3 ? 1 : (list[i | 3] as number) / 255);
+  return { width, height, pixels: Uint8Array.from(list, (value, i) => Math.round(value * opacity(i))) };
 }
 
 const program = process.env["ZMCRASTER"] ?? "";
 const hasPreview = spawnSync(program, ["preview", "--help"]).status === 0;
 
-test(
-  "pictures are those of the program's own renderer",
-  { skip: !hasPreview && "the program has no preview" },
-  async () => {
-    for (const [type, options, more] of [
-      ["Byte", ["--bands", "1,2,3", "--stretch", "20,230;0,255;9,99"], "&bands=1,2,3&stretch=20,230;0,255;9,99"],
-      [
-        "UInt16",
-        ["--bands", "2", "--stretch", "1000,60000", "--gamma", "1.8"],
-        "&bands=2&stretch=1000,60000&gamma=1.8",
-      ],
-      [
-        "Int32",
-        ["--bands", "1", "--stretch", "-2e9,2e9", "--colormap", "viridis"],
-        "&bands=1&stretch=-2e9,2e9&colormap=viridis",
-      ],
-      ["Single", ["--bands", "3", "--stretch", "-10,1000"], "&bands=3&stretch=-10,1000"],
-      ["Int64", ["--bands", "3", "--stretch=-4e18,4e18"], "&bands=3&stretch=-4e18,4e18"],
-      ["ComplexSingle", ["--bands", "1", "--stretch", "0,1e6"], "&bands=1&stretch=0,1e6"],
-    ] as const) {
-      const target = `${pyramids.folder}/${type}.png`;
-      const made = spawnSync(program, ["preview", pyramids.path(type), target, "--size", "130", ...options]);
-      assert.equal(made.status, 0, `${made.stderr}`);
-      const expected = await decoded(target);
-      await go(page, `file=${type}.pyr&at=65,50&zoom=1${more}`);
-      const { width, pixels, height } = await picture(page);
-      const [left, top] = [Math.round(width / 2 - 65), Math.round(height / 2 - 50)];
-      const part = new Uint8Array(expected.pixels.length);
-      for (let row = 0; row < 100; ++row)
-        part.set(pixels.subarray(4 * ((top + row) * width + left), 4 * ((top + row) * width + left + 130)), 520 * row);
-      assertSame({ width: 130, height: 100, pixels: part }, expected, `${type} beside preview`);
-    }
-  },
-);
+// What preview is told, and what the link says for the same.
+const REFERENCES: [name: string, options: string[], link: string][] = [
+  ...TYPES.map((type): [string, string[], string] => {
+    const pair = STRETCHES[type].map(String).join(",").replaceAll("e+", "e");
+    return [type, ["--bands", "1", `--stretch=${pair}`], `bands=1&stretch=${pair}`];
+  }),
+  ["Byte", ["--bands", "1,2,3", "--stretch", "20,230;0,255;9,99"], "bands=1,2,3&stretch=20,230;0,255;9,99"],
+  [
+    "Byte",
+    ["--bands", "1,2,3,4", "--stretch", "0,255;0,255;0,255;0,255"],
+    "bands=1,2,3&stretch=0,255;0,255;0,255&alpha=4",
+  ],
+  ["UInt16", ["--bands", "2", "--stretch", "1000,60000", "--gamma", "1.8"], "bands=2&stretch=1000,60000&gamma=1.8"],
+  [
+    "Int32",
+    ["--bands", "1", "--stretch=-2e9,2e9", "--colormap", "viridis"],
+    "bands=1&stretch=-2e9,2e9&colormap=viridis",
+  ],
+  ["Int16", ["--bands", "3", "--stretch=5,5", "--colormap=-turbo"], "bands=3&stretch=5,5&colormap=-turbo"],
+  ["Char", ["--bands", "5", "--stretch=90,-90", "--nodata=-5"], "bands=5&stretch=90,-90&nodata=-5"],
+  ["Double", ["--bands", "1,2,3", "--stretch=-1,1"], "bands=1,2,3&stretch=-1,1;-1,1;-1,1"],
+  ["ComplexSingle", ["--bands", "2", "--stretch=-1,1", "--complex", "real"], "bands=2&stretch=-1,1&complex=real"],
+  [
+    "ComplexDouble",
+    ["--bands", "2", "--stretch=-1,9", "--complex", "imaginary"],
+    "bands=2&stretch=-1,9&complex=imaginary",
+  ],
+  ["phase", ["--stretch=-3.5,3.5", "--complex", "phase"], "bands=1&stretch=-3.5,3.5&complex=phase"],
+  ["palette", ["--colormap", "palette"], "bands=1&colormap=palette"],
+  ["archived", ["--bands", "1", "--stretch", "p2,98"], "bands=1"],
+  ["archived", ["--bands", "1,2,3"], ""],
+];
+
+/** The part of a picture that begins there. */
+function partOf({ width, pixels }: Picture, left: number, top: number, columns: number, rows: number): Picture {
+  const part = new Uint8Array(4 * columns * rows);
+  for (let row = 0; row < rows; ++row) {
+    const from = 4 * ((top + row) * width + left);
+    part.set(pixels.subarray(from, from + 4 * columns), 4 * columns * row);
+  }
+  return { width: columns, height: rows, pixels: part };
+}
+
+const skip = !hasPreview && "the program has no preview";
+test("pictures are those of the program's own renderer", { skip }, async () => {
+  for (const [i, [name, options, link]] of REFERENCES.entries()) {
+    const bytes = (bench.site.files.get(`${name}.pyr`) as { bytes: Uint8Array }).bytes;
+    const { width, height } = (await Pyramid.open(bytes)).header;
+    const [source, target] = [`${pyramids.folder}/reference.pyr`, `${pyramids.folder}/${i}.png`];
+    writeFileSync(source, bytes);
+    const made = spawnSync(program, ["preview", source, target, "--size", String(Math.max(width, height)), ...options]);
+    assert.equal(made.status, 0, `${name}: ${made.stderr}`);
+    const expected = await decoded(target);
+    const [x, y] = [Math.floor(width / 2), Math.floor(height / 2)];
+    await go(page, `file=${name}.pyr&at=${x},${y}&zoom=1&${link}`);
+    const actual = await picture(page);
+    const [left, top] = [Math.round(actual.width / 2 - x), Math.round(actual.height / 2 - y)];
+    assertSame(partOf(actual, left, top, width, height), expected, `${name} ${link} beside preview`);
+  }
+});
 
 test("no page complained", () => assert.deepEqual(bench.complaints, []));
