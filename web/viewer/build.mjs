@@ -28,16 +28,22 @@ const policy = [
   "trusted-types sidecar",
 ].join("; ");
 
+// Of the one library inside, and of the parts of it that have packages of their own.
+const licence = ["proj4/LICENSE.md", "mgrs/license.md", "wkt-parser/LICENSE.md"]
+  .map((name) => readFileSync(`node_modules/${name}`, "utf8").trim())
+  .join("\n\n");
+
 const page = readFileSync("viewer/index.html", "utf8")
   .replace("{policy}", () => policy)
   .replace("<!-- style -->", () => `<style>${style}</style>`)
-  .replace("<!-- script -->", () => `<script>${script}</script>`);
+  .replace("<!-- script -->", () => `<script>${script}</script>`)
+  .concat(`<!--\n${licence}\n-->\n`);
 mkdirSync("viewer/dist", { recursive: true });
 writeFileSync("viewer/dist/index.html", page);
 
 if (process.argv.includes("--tests")) {
   rmSync("build/viewer", { recursive: true, force: true });
-  const tests = readdirSync("viewer/test").filter((name) => name.endsWith(".test.ts"));
+  const tests = readdirSync("viewer/test").filter((name) => name.endsWith(".ts"));
   await build({
     ...common,
     format: "esm",

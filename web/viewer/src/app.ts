@@ -47,11 +47,10 @@ export class App implements Gestures {
   private pointer: Point | undefined;
   private byKeys = false;
   private frameAsked = false;
+  private stale = false; // the picture itself, not only what lies over it
   private linkTimer = 0;
   private push = false;
   private saidTimer = 0;
-  /** Milliseconds that the last picture took, from its first call until the graphics processor was done. */
-  lastDraw = 0;
 
   constructor() {
     this.renderer = new Renderer(byId<HTMLCanvasElement>("picture"));
@@ -494,12 +493,19 @@ export class App implements Gestures {
 
   /** Asks for a new picture. */
   draw(): void {
+    this.stale = true;
+    this.refresh();
+  }
+
+  // Asks for what lies over the picture to be brought up to date, which leaves the picture as it is.
+  private refresh(): void {
     if (this.frameAsked) return;
     this.frameAsked = true;
     requestAnimationFrame(() => {
       this.frameAsked = false;
       this.approach();
-      this.frame();
+      if (this.stale) this.frame();
+      else this.showOverlay();
       this.showProblem();
     });
   }
@@ -514,12 +520,17 @@ export class App implements Gestures {
 
   private frame(): void {
     const { placement, renderer } = this;
-    const layers = placement ? this.layers() : [];
-    renderer.draw(layers, placement ?? { left: 0, top: 0, scaleX: 1, scaleY: 1 }, !this.target);
+    this.stale = false;
+    renderer.draw(placement ? this.layers() : [], placement ?? NOWHERE, !this.target);
+    this.showOverlay();
+  }
+
+  private showOverlay(): void {
+    const { placement } = this;
     const main = this.sides[0]?.raster;
     this.overlay.showSplit(placement && main ? this.swipe : undefined);
     const page = placement && this.onPage(placement);
-    this.overlay.showLine(main && page ? this.line : undefined, page ?? { left: 0, top: 0, scaleX: 1, scaleY: 1 });
+    this.overlay.showLine(main && page ? this.line : undefined, page ?? NOWHERE);
     this.overlay.showCross(main && this.byKeys ? this.middle() : undefined);
     if (main && page) this.overlay.scale(main, page, this.middle());
     byId("zoom-level").textContent = main && this.view ? zoomText(this.view.zoom) : "";
@@ -552,12 +563,12 @@ export class App implements Gestures {
   point(at: Point | undefined): void {
     this.pointer = at;
     if (at) this.byKeys = false;
-    this.draw();
+    this.refresh();
   }
 
   private keyboard(on: boolean): void {
     this.byKeys = on;
-    this.draw();
+    this.refresh();
   }
 
   // --- the line
@@ -732,6 +743,8 @@ export class App implements Gestures {
     return performance.now() - start;
   }
 }
+
+const NOWHERE: Placement = { left: 0, top: 0, scaleX: 1, scaleY: 1 };
 
 const isSame = ({ url, file, name }: Origin, otherUrl?: string, otherName?: string): boolean =>
   otherUrl === undefined ? file !== undefined && name === otherName : url === otherUrl;

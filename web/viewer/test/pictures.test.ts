@@ -260,20 +260,21 @@ test("a resampled view shows samples of the level that is nearest to the pixels 
   await compare("UInt16.pyr", "", { bands: [1], ranges: [STRETCHES.UInt16] }, 3, 0);
 });
 
-/** A picture file as the browser decodes it. */
+/** A picture file as the browser decodes it, its colours multiplied by alpha. */
 async function decoded(path: string): Promise<Picture> {
   bench.site.files.set("reference.png", { bytes: Uint8Array.from(readFileSync(path)), type: "image/png" });
-  const { width, height, list } = await page.evaluate(async () => {
+  const { width, height, text } = await page.evaluate(async () => {
     const bitmap = await createImageBitmap(await (await fetch("reference.png")).blob());
-    const context = new OffscreenCanvas(bitmap.width, bitmap.height).getContext(
-      "2d",
-    ) as OffscreenCanvasRenderingContext2D;
+    const { width, height } = bitmap;
+    const context = new OffscreenCanvas(width, height).getContext("2d") as OffscreenCanvasRenderingContext2D;
     context.drawImage(bitmap, 0, 0);
-    const { width, height, data } = context.getImageData(0, 0, bitmap.width, bitmap.height);
-    return { width, height, list: [...data] };
+    const { data } = context.getImageData(0, 0, width, height);
+    let text = "";
+    for (let i = 0; i < data.length; ++i)
+      text += String.fromCharCode(i % 4 === 3 ? (data[i] as number) : Math.round(((data[i] as number) * (data[i | 3] as number)) / 255));
+    return { width, height, text: btoa(text) };
   });
-  const opacity = (i: number): number => (i % 4 === 3 ? 1 : (list[i | 3] as number) / 255);
-  return { width, height, pixels: Uint8Array.from(list, (value, i) => Math.round(value * opacity(i))) };
+  return { width, height, pixels: Uint8Array.from(Buffer.from(text, "base64")) };
 }
 
 const program = process.env["ZMCRASTER"] ?? "";
