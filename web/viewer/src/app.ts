@@ -57,6 +57,7 @@ export class App implements Gestures {
     this.profile = new ProfileCard(
       (line) => this.setLine(line),
       () => this.drawLine(false),
+      (text) => this.note(text),
     );
     this.listen();
     void this.apply(this.asked());
@@ -178,7 +179,7 @@ export class App implements Gestures {
     if (url === undefined && !file)
       side.error = new Error(`The link shows "${name}", a file on somebody's own disk. Choose it again to see it.`);
     else if (url !== undefined && !URL.canParse(url, document.baseURI)) side.error = new Error("This is no address.");
-    else await side.open(style, known?.raster);
+    else await side.open(style, known?.raster, known);
   }
 
   /** Opens a file on the side that is chosen, as it is usual for it. */
@@ -464,6 +465,7 @@ export class App implements Gestures {
     const { zoom, at } = this.target;
     this.target = undefined;
     this.view = zoomed(this.view, this.renderer.size, at, zoom / this.view.zoom, this.leastZoom());
+    this.remember(false);
   }
 
   // A part of the way to the zoom that is wanted, in each picture.

@@ -26,7 +26,11 @@ export class ProfileCard {
   private abort = new AbortController();
   private profile: Profile | undefined;
 
-  constructor(change: (line: Line) => void, close: () => void) {
+  constructor(
+    change: (line: Line) => void,
+    close: () => void,
+    private readonly tell: (text: string) => void,
+  ) {
     this.fields = ENDS.map(([, label]) =>
       h("input", { type: "number", step: "any", "aria-label": label, title: label, onchange: () => take() }),
     );
@@ -88,7 +92,12 @@ export class ProfileCard {
 
   private async copy(): Promise<void> {
     if (!this.profile) return;
-    await navigator.clipboard?.writeText(profileText(this.profile)).catch(() => undefined);
+    try {
+      await navigator.clipboard.writeText(profileText(this.profile));
+      this.tell("Values copied");
+    } catch {
+      this.tell("The browser does not let this page copy");
+    }
   }
 }
 

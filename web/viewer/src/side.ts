@@ -21,12 +21,16 @@ export class Side {
     private readonly restyled: () => void,
   ) {}
 
-  /** Opens the file, or takes it over from another side; does not reject: what fails stands in `error`. */
-  async open(wanted: Partial<Style>, shared?: Raster): Promise<void> {
+  /**
+   * Opens the file, or shares that of another side, or takes over all that a side had which is not shown any more.
+   * Does not reject: what fails stands in `error`.
+   */
+  async open(wanted: Partial<Style>, shared?: Raster, before?: Side): Promise<void> {
     const { signal } = this.abort;
     try {
       const raster = shared ?? (await Raster.open(this.origin, signal));
       if (signal.aborted) return void (shared ?? (await raster.close()));
+      if (before?.raster === raster) [this.store, before.store] = [before.store, undefined];
       await this.begin(raster, wanted);
       if (!shared) void this.takeSidecar(raster, wanted);
     } catch (error) {
@@ -37,15 +41,16 @@ export class Side {
   private async begin(raster: Raster, wanted: Partial<Style>): Promise<void> {
     const style = fitted(wanted, raster);
     await this.settle(raster, style);
-    this.store = new TileStore(this.gl, raster, this.changed);
+    this.store ??= new TileStore(this.gl, raster, this.changed);
     this.style = style;
     this.raster = raster;
   }
 
   // It may name values without data, the meaning of bands, and a place on the earth.
   private async takeSidecar(raster: Raster, wanted: Partial<Style>): Promise<void> {
+    const begun = this.style;
     if (!(await raster.readSidecar(this.abort.signal)) || this.abort.signal.aborted) return;
-    if (this.style && !wanted.bands) await this.restyle(fitted({ ...wanted }, raster));
+    if (this.style === begun && !wanted.bands) await this.restyle(fitted({ ...wanted }, raster));
     this.restyled();
   }
 

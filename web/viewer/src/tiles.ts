@@ -25,12 +25,13 @@ export interface Channel {
   component: number;
 }
 
-const TEXTURE_BYTES = 192 * 2 ** 20;
 /** Tiles of one picture: each takes a call, however small it is. */
 export const MOST_TILES = 3000;
 
 export class TileStore {
   readonly format: Format;
+  /** Bytes that textures may take. */
+  limit = 192 * 2 ** 20;
   private readonly kept = new Map<string, Tile>(); // in the order of use, the oldest first
   private readonly pending = new Map<string, AbortController>();
   private readonly failed = new Map<string, Error>();
@@ -73,7 +74,7 @@ export class TileStore {
 
   /** Whether so many tiles fit at once. */
   fits(tiles: number, groups: readonly number[]): boolean {
-    return tiles <= MOST_TILES && tiles * this.tileBytes(groups) <= TEXTURE_BYTES;
+    return tiles <= MOST_TILES && tiles * this.tileBytes(groups) <= this.limit;
   }
 
   /** Sees to it that samples which are converted suit a style; those that do not any more are read again. */
@@ -176,7 +177,7 @@ export class TileStore {
     this.kept.set(key, tile);
     this.bytes += tile.bytes;
     for (const [oldest, each] of this.kept) {
-      if (this.bytes <= TEXTURE_BYTES && this.kept.size <= 2 * MOST_TILES) break;
+      if (this.bytes <= this.limit && this.kept.size <= 2 * MOST_TILES) break;
       this.remove(oldest, each);
     }
   }

@@ -29,6 +29,7 @@ before(async () => {
   ]);
   for (const name of ["three", "one", "woven", "complex", "wide"]) bench.put(`${name}.pyr`, pyramids.bytes(name));
   page = await bench.open("", WIDE);
+  await page.context().grantPermissions(["clipboard-read", "clipboard-write"]);
 });
 after(async () => {
   await bench.stop();
@@ -267,6 +268,30 @@ test("the picture moves by drag, wheel, double click, pinch, buttons and keys", 
   assert.ok(Math.abs((pinched[2] as number) - 2) < 0.05, `${pinched}`);
 });
 
+test("a zoom arrives where it was meant to, also in small steps, and asks for no tiles on its way", async () => {
+  const moving = await bench.open("#file=three.pyr&at=300,200&zoom=0.25&bands=1", {
+    ...WIDE,
+    reducedMotion: "no-preference",
+  });
+  bench.site.requests("three.pyr");
+  await moving.locator("#map").focus();
+  for (const key of ["+", "+"]) await moving.keyboard.press(key);
+  assert.equal((await link(moving)).get("zoom"), "1");
+  // The tiles of the finest level that were not there; at most one request more for those of a place in between.
+  assert.ok(bench.site.requests("three.pyr") <= 2);
+  await moving.context().close();
+});
+
+test("the page works from a disk, without any server", async () => {
+  const local = await bench.open("", WIDE);
+  await local.goto(`file://${process.cwd()}/viewer/dist/index.html`);
+  await local.locator("input[type=file]").first().setInputFiles(pyramids.path("one"));
+  await local.getByRole("heading", { level: 1, name: "one.pyr" }).waitFor();
+  await idle(local);
+  assert.equal(await local.locator("#scale").isVisible(), true);
+  await local.context().close();
+});
+
 test("two sides are compared: settings of one file, or two files, with a slider between them", async () => {
   await go(page, "file=three.pyr&bands=1&stretch=0,255&at=300,200&zoom=1");
   await click("Compare");
@@ -315,7 +340,6 @@ test("two sides are compared: settings of one file, or two files, with a slider 
 
 test("a line is drawn by the pointer, by keys and by numbers, and its samples are a graph", async () => {
   const { Pyramid } = await import("zmcraster-web");
-  await page.context().grantPermissions(["clipboard-read", "clipboard-write"]);
   await go(page, "file=three.pyr&at=300,200&zoom=1");
   await click("Line");
   const box = (await page.locator("#map").boundingBox()) as { x: number; y: number; width: number; height: number };

@@ -110,7 +110,35 @@ test("requests for tiles that have left the view are ended", async () => {
   assertSame({ width, height, pixels }, await draw(pyramid, { width, height }, view, style), "the new place");
 });
 
-test("textures stay within their bound, and tiles seen before come without a request", async () => {
+test("textures stay within their bound: a view that would take more is drawn from a coarser level", async () => {
+  await go(page, `file=other.pyr`);
+  await go(page, `file=large.pyr&${STYLE}&at=1024,512&zoom=0.125`);
+  const limit = 11 * 65536;
+  const bytes = await page.evaluate(async (limit) => {
+    const [{ store }] = (viewer as unknown as { sides: [{ store: { limit: number; state: { bytes: number } } }] })
+      .sides;
+    store.limit = limit;
+    let most = 0;
+    for (const [x, y] of [
+      [256, 256],
+      [1800, 256],
+      [256, 900],
+      [1024, 512],
+    ]) {
+      location.hash = `file=large.pyr&bands=1&stretch=0,255&at=${x},${y}&zoom=1`;
+      await new Promise((resolve) => setTimeout(resolve, 20));
+      await viewer.idle();
+      most = Math.max(most, store.state.bytes);
+    }
+    return most;
+  }, limit);
+  assert.ok(bytes > limit / 2 && bytes <= limit, `${bytes}`);
+  const { width, height, pixels } = await picture(page);
+  const view = { x: 1024, y: 512, zoom: 1, level: 1 };
+  assertSame({ width, height, pixels }, await draw(pyramid, { width, height }, view, style), "the coarser level");
+});
+
+test("tiles seen before come without a request", async () => {
   await go(page, `file=large.pyr&${STYLE}&at=300,300&zoom=1`);
   await go(page, `file=large.pyr&${STYLE}&at=1500,700&zoom=1`);
   bench.site.log.length = 0;
@@ -213,6 +241,7 @@ test("records that are malformed are told, and the picture is shown without them
 });
 
 test("a file that is replaced while it is shown is told, never mixed, and shown anew when asked for", async () => {
+  await go(page, "file=other.pyr"); // so that nothing is left of what was seen before
   await go(page, `file=large.pyr&${STYLE}&at=1024,512&zoom=0.125`);
   bench.site.files.set("large.pyr", { bytes: pyramids.bytes("other"), etag: '"2"' });
   await go(page, `file=large.pyr&${STYLE}&at=1024,512&zoom=1`);

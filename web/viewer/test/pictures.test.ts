@@ -254,6 +254,32 @@ test("two sides meet where the slider is, and a raster of half the size fills th
   assertSame(both, { width, height, pixels: expected }, "two sides");
 });
 
+test("two rasters in one coordinate system lie over each other by their coordinates", async () => {
+  const samples = Uint8Array.from({ length: 40 * 30 }, (_, i) => (i * 7) % 253);
+  const place = (transform: string): Uint8Array =>
+    new TextEncoder().encode(
+      `<PAMDataset><SRS>LOCAL_CS["site"]</SRS><GeoTransform>${transform}</GeoTransform></PAMDataset>`,
+    );
+  bench.put("left.pyr", fileWith("Byte", 100, 80, 1, new Uint8Array(8000).fill(9)));
+  bench.put("left.pyr.aux.xml", place("1000,1,0,2000,0,-1"));
+  bench.put("right.pyr", fileWith("Byte", 40, 30, 1, samples));
+  bench.put("right.pyr.aux.xml", place("1010,2,0,1990,0,-2"));
+  await go(
+    page,
+    "file=left.pyr&at=50,40&zoom=2&bands=1&stretch=0,255&b.file=right.pyr&b.bands=1&b.stretch=0,255&swipe=0",
+  );
+  await page.waitForFunction(() => document.querySelectorAll("#controls dd").length > 0);
+  const actual = await picture(page);
+  const { width, height } = actual;
+  const pyramid = await Pyramid.open((bench.site.files.get("right.pyr") as { bytes: Uint8Array }).bytes);
+  const style = { bands: [0], ranges: [[0, 255]] as [number, number][] };
+  assertSame(
+    actual,
+    await draw(pyramid, { width, height }, { x: 20, y: 15, zoom: 4, level: 0 }, style),
+    "by coordinates",
+  );
+});
+
 test("a resampled view shows samples of the level that is nearest to the pixels of the screen", async () => {
   await compare("UInt16.pyr", "", { bands: [1], ranges: [STRETCHES.UInt16] }, 0.8, 0);
   await compare("UInt16.pyr", "", { bands: [1], ranges: [STRETCHES.UInt16] }, 0.6, 1);
@@ -271,7 +297,9 @@ async function decoded(path: string): Promise<Picture> {
     const { data } = context.getImageData(0, 0, width, height);
     let text = "";
     for (let i = 0; i < data.length; ++i)
-      text += String.fromCharCode(i % 4 === 3 ? (data[i] as number) : Math.round(((data[i] as number) * (data[i | 3] as number)) / 255));
+      text += String.fromCharCode(
+        i % 4 === 3 ? (data[i] as number) : Math.round(((data[i] as number) * (data[i | 3] as number)) / 255),
+      );
     return { width, height, text: btoa(text) };
   });
   return { width, height, pixels: Uint8Array.from(Buffer.from(text, "base64")) };

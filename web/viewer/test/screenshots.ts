@@ -13,7 +13,12 @@ const bench = new Bench();
 const EARTH = "file=earth.pyr&at=1024,512&zoom=0.53";
 const GEOID = "file=geoid.pyr&bands=1&colormap=viridis";
 
-async function shoot(name: string, link: string, options: BrowserContextOptions, point?: [number, number]): Promise<void> {
+async function shoot(
+  name: string,
+  link: string,
+  options: BrowserContextOptions,
+  point?: [number, number],
+): Promise<void> {
   const page = await bench.open(`#${link}`, options);
   if (point) await page.mouse.move(...point);
   await page.waitForTimeout(300);
