@@ -1,22 +1,11 @@
 // The viewer: the state of the view, and what changes it.
-import {
-  aligned,
-  fitting,
-  inside,
-  levelFor,
-  MOST_ZOOM,
-  type Placement,
-  placementOf,
-  type Size,
-  toPixel,
-  type View,
-  zoomed,
-} from "./camera.js";
+import { Address } from "./address.js";
+import { aligned, levelFor, type Placement, toPixel } from "./camera.js";
 import { type Point } from "./coordinates.js";
 import { byId, h } from "./dom.js";
 import { type Gestures, listen } from "./gestures.js";
 import { type Line, readLink, type State, writeLink } from "./link.js";
-import { messageOf } from "./messages.js";
+import { Notices } from "./notices.js";
 import { chosen, opener } from "./opener.js";
 import { listenToSplit, Overlay } from "./overlay.js";
 import { showPanel } from "./panel.js";
@@ -27,8 +16,8 @@ import { type Layer, Renderer } from "./renderer.js";
 import { Side } from "./side.js";
 import type { Style } from "./style.js";
 import { listenToTheme } from "./theme.js";
+import { Viewport } from "./viewport.js";
 
-const SETTLE = 350; // milliseconds without a change before the link is written
 const PAN = 80; // pixels of the page that an arrow key moves by
 
 export class App implements Gestures {
@@ -39,8 +28,14 @@ export class App implements Gestures {
   private readonly profile: ProfileCard;
   private sides: Side[] = [];
   private active: 0 | 1 = 0;
-  private view: View | undefined; // its zoom in pixels of the screen
-  private target: { zoom: number; at: Point } | undefined; // of a zoom on its way
+  private readonly viewport: Viewport;
+  private readonly notices = new Notices(
+    () => void this.retry(),
+    () => this.chooseFile(),
+  );
+  private readonly address = new Address(() =>
+    this.sides.length && !this.viewport.moving ? writeLink(this.state()) : undefined,
+  );
   private swipe: number | undefined;
   private line: Line | undefined;
   private plain = false;
@@ -48,16 +43,19 @@ export class App implements Gestures {
   private byKeys = false;
   private frameAsked = false;
   private stale = false; // the picture itself, not only what lies over it
-  private linkTimer = 0;
-  private push = false;
   private saidTimer = 0;
 
   constructor() {
     this.renderer = new Renderer(byId<HTMLCanvasElement>("picture"));
+    this.viewport = new Viewport(
+      () => this.sides[0]?.raster,
+      () => this.renderer.size,
+      () => this.moved(),
+    );
     this.profile = new ProfileCard(
       (line) => this.setLine(line),
       () => this.drawLine(false),
-      (text) => this.note(text),
+      (text) => this.notices.note(text),
     );
     this.listen();
     void this.apply(this.asked());
@@ -102,10 +100,10 @@ export class App implements Gestures {
     click("save", () => this.save());
     click("show-panel", () => this.togglePanel());
     click("help", () => byId<HTMLDialogElement>("help-dialog").showModal());
-    click("zoom-in", () => this.zoom(2, undefined, true));
-    click("zoom-out", () => this.zoom(0.5, undefined, true));
-    click("zoom-fit", () => this.fit());
-    click("zoom-one", () => this.zoomTo(1));
+    click("zoom-in", () => this.viewport.zoom(2, undefined, true));
+    click("zoom-out", () => this.viewport.zoom(0.5, undefined, true));
+    click("zoom-fit", () => this.viewport.fit());
+    click("zoom-one", () => this.viewport.zoomTo(1));
     for (const dialog of document.querySelectorAll("dialog"))
       dialog.addEventListener("click", (event) => {
         if (event.target === dialog || (event.target as Element).closest("[data-close]")) dialog.close();
@@ -132,11 +130,10 @@ export class App implements Gestures {
 
   /** Shows a state as a link tells it; files that are open already stay so. */
   private async apply(state: State): Promise<void> {
-    clearTimeout(this.linkTimer);
+    this.address.forget();
     this.plain = state.background === "plain";
     this.swipe = state.sides.length === 2 ? (state.swipe ?? 0.5) : undefined;
     this.active = 0;
-    this.target = undefined;
     const before = this.sides;
     const opening: Promise<void>[] = [];
     this.sides = state.sides.map(({ file, local, style = {} }) => {
@@ -147,7 +144,7 @@ export class App implements Gestures {
       return side;
     });
     for (const side of before) side.close(this.sides.some(({ origin }) => origin === side.origin));
-    this.view = state.view && { ...state.view, zoom: state.view.zoom * devicePixelRatio };
+    this.viewport.set(state.view && { ...state.view, zoom: state.view.zoom * devicePixelRatio });
     this.line = state.line;
     this.profile.drawing = false;
     this.profile.clear();
@@ -190,7 +187,10 @@ export class App implements Gestures {
     const side = this.newSide(origin);
     this.sides[index] = side;
     old?.close(this.sides.some(({ raster }) => raster !== undefined && raster === old.raster));
-    if (index === 0) [this.view, this.line] = [undefined, undefined];
+    if (index === 0) {
+      this.viewport.set(undefined);
+      this.line = undefined;
+    }
     this.profile.clear();
     this.show();
     await this.begin(side, {});
@@ -216,7 +216,7 @@ export class App implements Gestures {
 
   private opened(): void {
     const main = this.sides[0]?.raster;
-    if (main && !this.view) this.view = fitting(main, this.renderer.size);
+    if (main && !this.viewport.view) this.viewport.fit();
     this.show();
     this.remember(false);
     if (this.line) this.readLine();
@@ -225,8 +225,9 @@ export class App implements Gestures {
 
   // What was drawn last has to be drawn once more, or the page would show nothing.
   private warm(): void {
-    if (!this.placement) return;
-    this.renderer.warm(this.layers(), this.placement);
+    const { placement } = this.viewport;
+    if (!placement) return;
+    this.renderer.warm(this.layers(), placement);
     this.frame();
   }
 
@@ -253,7 +254,7 @@ export class App implements Gestures {
     }
     this.show();
     this.remember(true);
-    this.say(on ? "Two sides. The right one is chosen." : "One side.");
+    this.notices.say(on ? "Two sides. The right one is chosen." : "One side.");
   }
 
   // --- the page around the picture
@@ -276,7 +277,7 @@ export class App implements Gestures {
     const panel = byId("controls");
     if (side?.raster && side.style) this.showControls(panel, side);
     else panel.replaceChildren();
-    this.showProblem();
+    this.notices.show(this.sides);
     this.draw();
   }
 
@@ -318,47 +319,6 @@ export class App implements Gestures {
     if (structure && this.line) this.readLine();
   }
 
-  private showProblem(): void {
-    const broken = this.sides.find((side) => side.error ?? side.store?.lost);
-    const card = byId("problem");
-    card.hidden = !broken;
-    if (broken) {
-      const { title, detail, advice } = messageOf(broken.error ?? broken.store?.lost);
-      byId("problem-title").textContent = title;
-      byId("problem-name").textContent = broken.origin.name;
-      byId("problem-detail").textContent = detail;
-      byId("problem-advice").textContent = advice;
-      const lost = broken.origin.url === undefined && !broken.origin.file;
-      byId("problem-actions").replaceChildren(
-        ...(lost
-          ? []
-          : [h("button", { type: "button", class: "primary", onclick: () => void this.retry() }, "Try again")]),
-        h("button", { type: "button", onclick: () => this.chooseFile() }, "Open another file"),
-      );
-    }
-    this.showTiles();
-  }
-
-  // Tiles on their way, and those that could not be had.
-  private showTiles(): void {
-    const states = this.sides.map(({ store }) => store?.state).filter((state) => state !== undefined);
-    const opening = this.sides.some(({ raster, error }) => !raster && !error);
-    const busy = opening || states.some(({ pending }) => pending > 0);
-    byId("busy").hidden = !busy;
-    this.map.setAttribute("aria-busy", String(busy));
-    const failed = states.reduce((sum, state) => sum + state.failed, 0);
-    const toast = byId("failures");
-    const lost = this.sides.some(({ store }) => store?.lost);
-    toast.hidden = !failed || lost;
-    if (toast.hidden || toast.dataset["count"] === String(failed)) return;
-    toast.dataset["count"] = String(failed);
-    const reason = states.find((state) => state.reason)?.reason;
-    toast.replaceChildren(
-      h("span", {}, `${failed} ${failed === 1 ? "tile" : "tiles"} could not be had: ${messageOf(reason).detail}`),
-      h("button", { type: "button", onclick: () => void this.retry() }, "Try again"),
-    );
-  }
-
   private togglePanel(): void {
     const hide = this.panelShown();
     document.body.classList.toggle("no-panel", hide);
@@ -370,28 +330,14 @@ export class App implements Gestures {
     return getComputedStyle(byId("panel")).display !== "none";
   }
 
-  /** Says something to those who listen to the page. */
-  private say(text: string): void {
-    byId("live").textContent = text;
-  }
-
   private async copyLink(): Promise<void> {
     this.writeLink();
     try {
       await navigator.clipboard.writeText(location.href);
-      this.note("Link copied");
+      this.notices.note("Link copied");
     } catch {
-      this.note("The link is in the address bar");
+      this.notices.note("The link is in the address bar");
     }
-  }
-
-  private note(text: string): void {
-    const note = byId("note");
-    note.textContent = text;
-    note.hidden = false;
-    this.say(text);
-    clearTimeout(this.saidTimer);
-    this.saidTimer = window.setTimeout(() => (note.hidden = true), 2500);
   }
 
   private save(): void {
@@ -410,72 +356,19 @@ export class App implements Gestures {
     const { width, height } = this.map.getBoundingClientRect();
     const size = { width: Math.round(width * devicePixelRatio), height: Math.round(height * devicePixelRatio) };
     const before = this.renderer.size;
-    const whole = this.view && this.isFitting(before);
+    const whole = !this.viewport.view || this.viewport.isFitting(before);
     this.renderer.resize(size);
-    const main = this.sides[0]?.raster;
-    if (main && (whole || !this.view)) this.view = fitting(main, this.renderer.size);
+    if (whole) this.viewport.fit();
     byId("show-panel").setAttribute("aria-expanded", String(this.panelShown()));
     this.draw();
   }
 
-  private isFitting(screen: Size): boolean {
-    const main = this.sides[0]?.raster;
-    return main !== undefined && JSON.stringify(fitting(main, screen)) === JSON.stringify(this.view);
-  }
-
-  private leastZoom(): number {
-    const main = this.sides[0]?.raster;
-    return main ? Math.min(fitting(main, this.renderer.size).zoom / 4, 1) : MOST_ZOOM;
-  }
-
   pan(dx: number, dy: number): void {
-    const main = this.sides[0]?.raster;
-    if (!main || !this.view) return;
-    const by = devicePixelRatio / this.view.zoom;
-    this.view = inside({ ...this.view, x: this.view.x - dx * by, y: this.view.y - dy * by }, main);
-    this.moved();
+    this.viewport.pan(dx, dy);
   }
 
   zoom(factor: number, at: Point | undefined, smooth: boolean): void {
-    if (!this.view || !this.sides[0]?.raster) return;
-    const { width, height } = this.renderer.size;
-    const place = at ? { x: at.x * devicePixelRatio, y: at.y * devicePixelRatio } : { x: width / 2, y: height / 2 };
-    const still = matchMedia("(prefers-reduced-motion: reduce)").matches;
-    const aim = (this.target?.zoom ?? this.view.zoom) * factor;
-    const zoom = Math.min(Math.max(aim, this.leastZoom()), MOST_ZOOM);
-    this.target = { zoom, at: place };
-    if (!smooth || still) this.arrive();
-    this.moved();
-  }
-
-  zoomTo(zoom: number): void {
-    if (this.view) this.zoom(zoom / (this.target?.zoom ?? this.view.zoom), undefined, true);
-  }
-
-  fit(): void {
-    const main = this.sides[0]?.raster;
-    if (!main) return;
-    this.target = undefined;
-    this.view = fitting(main, this.renderer.size);
-    this.moved();
-  }
-
-  private arrive(): void {
-    if (!this.target || !this.view) return;
-    const { zoom, at } = this.target;
-    this.target = undefined;
-    this.view = zoomed(this.view, this.renderer.size, at, zoom / this.view.zoom, this.leastZoom());
-    this.remember(false);
-  }
-
-  // A part of the way to the zoom that is wanted, in each picture.
-  private approach(): void {
-    if (!this.target || !this.view) return;
-    const left = Math.log(this.target.zoom / this.view.zoom);
-    if (Math.abs(left) < 0.02) return this.arrive();
-    const factor = Math.exp(left * 0.4);
-    this.view = zoomed(this.view, this.renderer.size, this.target.at, factor, this.leastZoom());
-    this.draw();
+    this.viewport.zoom(factor, at, smooth);
   }
 
   private moved(): void {
@@ -485,10 +378,6 @@ export class App implements Gestures {
 
   settled(): void {
     this.remember(false);
-  }
-
-  private get placement(): Placement | undefined {
-    return this.view && placementOf(this.view, this.renderer.size);
   }
 
   // --- pictures
@@ -505,10 +394,10 @@ export class App implements Gestures {
     this.frameAsked = true;
     requestAnimationFrame(() => {
       this.frameAsked = false;
-      this.approach();
+      this.viewport.approach();
       if (this.stale) this.frame();
       else this.showOverlay();
-      this.showProblem();
+      this.notices.show(this.sides);
     });
   }
 
@@ -521,41 +410,32 @@ export class App implements Gestures {
   }
 
   private frame(): void {
-    const { placement, renderer } = this;
+    const { renderer } = this;
+    const { placement } = this.viewport;
     this.stale = false;
-    renderer.draw(placement ? this.layers() : [], placement ?? NOWHERE, !this.target);
+    renderer.draw(placement ? this.layers() : [], placement ?? NOWHERE, !this.viewport.moving);
     this.showOverlay();
   }
 
   private showOverlay(): void {
-    const { placement } = this;
+    const { placement } = this.viewport;
     const main = this.sides[0]?.raster;
     this.overlay.showSplit(placement && main ? this.swipe : undefined);
-    const page = placement && this.onPage(placement);
+    const { onPage: page, middle, view } = this.viewport;
     this.overlay.showLine(main && page ? this.line : undefined, page ?? NOWHERE);
-    this.overlay.showCross(main && this.byKeys ? this.middle() : undefined);
-    if (main && page) this.overlay.scale(main, page, this.middle());
-    byId("zoom-level").textContent = main && this.view ? zoomText(this.view.zoom) : "";
+    this.overlay.showCross(main && this.byKeys ? middle : undefined);
+    if (main && page) this.overlay.scale(main, page, middle);
+    byId("zoom-level").textContent = main && view ? zoomText(view.zoom) : "";
     this.showReadout();
   }
 
-  // The same in pixels of the page.
-  private onPage({ left, top, scaleX, scaleY }: Placement): Placement {
-    const by = devicePixelRatio;
-    return { left: left / by, top: top / by, scaleX: scaleX / by, scaleY: scaleY / by };
-  }
-
-  private middle(): Point {
-    const { width, height } = this.renderer.size;
-    return { x: width / devicePixelRatio / 2, y: height / devicePixelRatio / 2 };
-  }
-
   private showReadout(): void {
-    const { placement } = this;
-    const at = this.pointer ?? (this.byKeys ? this.middle() : undefined);
+    const { placement } = this.viewport;
+    const at = this.pointer ?? (this.byKeys ? this.viewport.middle : undefined);
     const right = at && this.swipe !== undefined && at.x * devicePixelRatio >= this.swipe * this.renderer.size.width;
     const side = this.sides[right ? 1 : 0];
     const layer = side?.layer(0, 1, this.sides[0]?.raster);
+    if (this.viewport.moving) return; // each place on the way would ask for a tile
     if (!placement || !at || !layer) return this.readout.show(side?.raster, undefined, undefined);
     const own = layer.raster === this.sides[0]?.raster ? placement : aligned(placement, layer.alignment);
     const point = toPixel(own, { x: at.x * devicePixelRatio, y: at.y * devicePixelRatio });
@@ -586,7 +466,7 @@ export class App implements Gestures {
     if (!on) this.setLine(undefined);
     else {
       this.profile.open(this.line);
-      this.say("Drag across the picture, or press Enter at the start and at the end of the line.");
+      this.notices.say("Drag across the picture, or press Enter at the start and at the end of the line.");
     }
   }
 
@@ -602,9 +482,8 @@ export class App implements Gestures {
   }
 
   private lineBetween(from: Point, to: Point): Line | undefined {
-    const { placement } = this;
-    if (!placement) return undefined;
-    const page = this.onPage(placement);
+    const page = this.viewport.onPage;
+    if (!page) return undefined;
     const [a, b] = [toPixel(page, from), toPixel(page, to)];
     return { x0: a.x, y0: a.y, x1: b.x, y1: b.y };
   }
@@ -631,23 +510,24 @@ export class App implements Gestures {
   key(event: KeyboardEvent): boolean {
     if (!this.sides[0]?.raster) return event.key.toLowerCase() === "o" && (this.chooseFile(), true);
     const step = event.shiftKey ? 1 / devicePixelRatio : PAN;
-    const one = event.shiftKey && this.view ? Math.max(this.view.zoom, 1) * step : step;
+    const { view } = this.viewport;
+    const one = event.shiftKey && view ? Math.max(view.zoom, 1) * step : step;
     const keys: Record<string, () => void> = {
-      ArrowLeft: () => this.pan(one, 0),
-      ArrowRight: () => this.pan(-one, 0),
-      ArrowUp: () => this.pan(0, one),
-      ArrowDown: () => this.pan(0, -one),
-      "+": () => this.zoom(2, undefined, true),
-      "=": () => this.zoom(2, undefined, true),
-      "-": () => this.zoom(0.5, undefined, true),
-      "0": () => this.fit(),
-      Home: () => this.fit(),
-      "1": () => this.zoomTo(1),
+      ArrowLeft: () => this.viewport.pan(one, 0),
+      ArrowRight: () => this.viewport.pan(-one, 0),
+      ArrowUp: () => this.viewport.pan(0, one),
+      ArrowDown: () => this.viewport.pan(0, -one),
+      "+": () => this.viewport.zoom(2, undefined, true),
+      "=": () => this.viewport.zoom(2, undefined, true),
+      "-": () => this.viewport.zoom(0.5, undefined, true),
+      "0": () => this.viewport.fit(),
+      Home: () => this.viewport.fit(),
+      "1": () => this.viewport.zoomTo(1),
       o: () => this.chooseFile(),
       c: () => this.compare(this.sides.length < 2),
       l: () => this.drawLine(!(this.profile.drawing || this.line)),
       b: () => this.togglePanel(),
-      v: () => this.say(this.readout.text),
+      v: () => this.notices.say(this.readout.text),
       "?": () => byId<HTMLDialogElement>("help-dialog").showModal(),
       Enter: () => this.mark(),
       Escape: () => this.drawLine(false),
@@ -664,17 +544,17 @@ export class App implements Gestures {
   // What is under the cross, once it has come to rest.
   private tellSoon(): void {
     clearTimeout(this.saidTimer);
-    this.saidTimer = window.setTimeout(() => this.say(this.readout.text), 600);
+    this.saidTimer = window.setTimeout(() => this.notices.say(this.readout.text), 600);
   }
 
   // The start of a line at the cross, then its end.
   private mark(): void {
-    const at = this.lineBetween(this.middle(), this.middle());
+    const at = this.lineBetween(this.viewport.middle, this.viewport.middle);
     if (!at) return;
     const start = this.profile.start;
     this.profile.start = start ? undefined : { x: at.x0, y: at.y0 };
     this.setLine(start ? { x0: start.x, y0: start.y, x1: at.x0, y1: at.y0 } : at);
-    this.say(start ? "The line ends here." : "The line starts here. Move on, and press Enter at its end.");
+    this.notices.say(start ? "The line ends here." : "The line starts here. Move on, and press Enter at its end.");
   }
 
   private setSwipe(share: number): void {
@@ -685,34 +565,24 @@ export class App implements Gestures {
 
   // --- the link
 
-  /** Sees to it that the address tells what is shown; as a step of its own to go back by, if it is one. */
   private remember(push: boolean): void {
-    this.push ||= push;
-    clearTimeout(this.linkTimer);
-    this.linkTimer = window.setTimeout(() => this.writeLink(), SETTLE);
+    this.address.remember(push);
   }
 
   /** Writes the link at once. */
   writeLink(): void {
-    clearTimeout(this.linkTimer);
-    if (!this.sides.length || this.target) return;
-    const hash = `#${writeLink(this.state())}`;
-    const push = this.push && hash !== location.hash;
-    this.push = false;
-    if (hash === location.hash && !location.search) return;
-    const url = `${location.pathname}${hash}`;
-    if (push) history.pushState(null, "", url);
-    else history.replaceState(null, "", url);
+    this.address.write();
   }
 
-  state(): State {
+  private state(): State {
+    const { view } = this.viewport;
     const sides = this.sides.map(({ origin, style }, i) => ({
       ...(origin.url === undefined ? { local: origin.name } : { file: origin.url }),
       style: style ?? readLink(location.hash).sides[i]?.style ?? {},
     }));
     return {
       sides,
-      ...(this.view && { view: { ...this.view, zoom: this.view.zoom / devicePixelRatio } }),
+      ...(view && { view: { ...view, zoom: view.zoom / devicePixelRatio } }),
       ...(this.swipe !== undefined && { swipe: this.swipe }),
       ...(this.line && { line: this.line }),
       ...(this.plain && { background: "plain" as const }),
@@ -725,7 +595,7 @@ export class App implements Gestures {
   async idle(): Promise<void> {
     const waits = (): boolean =>
       this.frameAsked ||
-      this.target !== undefined ||
+      this.viewport.moving ||
       this.sides.some(({ raster, error, store }) => (!raster && !error) || (store?.state.pending ?? 0) > 0);
     do await new Promise((resolve) => setTimeout(resolve, 10));
     while (waits());

@@ -84,12 +84,14 @@ export class TileStore {
     for (const band of shown) {
       const noData = this.raster.noData(band, style.noData);
       const range = style.ranges[band] ?? { minimum: 0, maximum: 1 };
-      const palette = style.colors === "palette" || band === style.alpha;
-      const [now, { type }] = [this.conversions.get(band), this.raster];
-      const next = palette ? { base: 0, unit: 1, noData } : conversionFor(type, range, noData, now);
-      if (now && now.base === next.base && now.unit === next.unit && Object.is(now.noData, next.noData)) continue;
+      const plain = style.colors === "palette" || band === style.alpha;
+      const now = this.conversions.get(band);
+      const next = plain ? { base: 0, unit: 1, noData } : conversionFor(this.raster.type, range, noData, now);
+      const { base, unit, noData: none } = this.conversion(band);
       this.conversions.set(band, next);
-      if (now) this.drop(this.channelOf(band).group);
+      // Bands that were not shown before may be in textures all the same, beside others.
+      if (base !== next.base || unit !== next.unit || !Object.is(none, next.noData))
+        this.drop(this.channelOf(band).group);
     }
   }
 

@@ -45,7 +45,7 @@ export class Bench {
       ...options,
     });
     const page = await context.newPage();
-    page.setDefaultTimeout(8000);
+    page.setDefaultTimeout(15000);
     page.on("pageerror", (error) => this.complaints.push(String(error)));
     await page.goto(`${this.base}/index.html${address}`);
     await idle(page);
