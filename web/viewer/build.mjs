@@ -1,5 +1,6 @@
-// Makes viewer/dist/index.html: the whole viewer in one file, with its script and style inside, and a policy that lets
-// the browser run these and nothing else. With --tests, the tests in build/viewer too. Started from the folder above.
+// Makes the viewer twice: viewer/dist/, a page with a script and a style, for servers; and viewer/single.html, the same in
+// one file, which can be opened from a disk too. A policy lets the browser run these and nothing else. With --tests,
+// the tests in build/viewer too. Started from the folder above.
 import { build } from "esbuild";
 import { createHash } from "node:crypto";
 import { existsSync, mkdirSync, readdirSync, readFileSync, rmSync, writeFileSync } from "node:fs";
@@ -16,30 +17,46 @@ const hash = (text) => `'sha256-${createHash("sha256").update(text).digest("base
 
 const script = await made("viewer/src/main.ts", { format: "iife" });
 const style = await made("viewer/style.css", {});
-const policy = [
-  "default-src 'none'",
-  `script-src ${hash(script)}`,
-  `style-src ${hash(style)}`,
-  "img-src data: blob:",
-  "connect-src *",
-  "base-uri 'none'",
-  "form-action 'none'",
-  "require-trusted-types-for 'script'",
-  "trusted-types sidecar",
-].join("; ");
+const policyOf = (script, style) =>
+  [
+    "default-src 'none'",
+    `script-src ${script}`,
+    `style-src ${style}`,
+    "img-src data: blob:",
+    "connect-src *",
+    "base-uri 'none'",
+    "form-action 'none'",
+    "require-trusted-types-for 'script'",
+    "trusted-types sidecar",
+  ].join("; ");
 
 // Of the one library inside, and of the parts of it that have packages of their own.
 const licence = ["proj4/LICENSE.md", "mgrs/license.md", "wkt-parser/LICENSE.md"]
   .map((name) => readFileSync(`node_modules/${name}`, "utf8").trim())
   .join("\n\n");
 
-const page = readFileSync("viewer/index.html", "utf8")
-  .replace("{policy}", () => policy)
-  .replace("<!-- style -->", () => `<style>${style}</style>`)
-  .replace("<!-- script -->", () => `<script>${script}</script>`)
-  .concat(`<!--\n${licence}\n-->\n`);
-mkdirSync("viewer/dist", { recursive: true });
-writeFileSync("viewer/dist/index.html", page);
+const page = (policy, styleElement, scriptElement) =>
+  readFileSync("viewer/index.html", "utf8")
+    .replace("{policy}", () => policy)
+    .replace("<!-- style -->", () => styleElement)
+    .replace("<!-- script -->", () => scriptElement)
+    .concat(`<!--\n${licence}\n-->\n`);
+rmSync("viewer/dist", { recursive: true, force: true });
+mkdirSync("viewer/dist");
+writeFileSync("viewer/dist/viewer.js", script);
+writeFileSync("viewer/dist/viewer.css", style);
+writeFileSync(
+  "viewer/dist/index.html",
+  page(
+    policyOf("'self'", "'self'"),
+    '<link rel="stylesheet" href="viewer.css" />',
+    '<script src="viewer.js"></script>',
+  ),
+);
+writeFileSync(
+  "viewer/single.html",
+  page(policyOf(hash(script), hash(style)), `<style>${style}</style>`, `<script>${script}</script>`),
+);
 
 if (process.argv.includes("--tests")) {
   rmSync("build/viewer", { recursive: true, force: true });

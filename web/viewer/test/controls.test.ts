@@ -282,9 +282,9 @@ test("a zoom arrives where it was meant to, also in small steps, and asks for no
   await moving.context().close();
 });
 
-test("the page works from a disk, without any server", async () => {
+test("the page in one file works from a disk, without any server", async () => {
   const local = await bench.open("", WIDE);
-  await local.goto(`file://${process.cwd()}/viewer/dist/index.html`);
+  await local.goto(`file://${process.cwd()}/viewer/single.html`);
   await local.locator("input[type=file]").first().setInputFiles(pyramids.path("one"));
   await local.getByRole("heading", { level: 1, name: "one.pyr" }).waitFor();
   await idle(local);

@@ -21,8 +21,12 @@ export class Bench {
   readonly complaints: string[] = [];
 
   async start(): Promise<void> {
-    const bytes = Uint8Array.from(readFileSync("viewer/dist/index.html"));
-    this.site.files.set("index.html", { bytes, type: "text/html" });
+    for (const [name, type] of [
+      ["index.html", "text/html"],
+      ["viewer.js", "text/javascript"],
+      ["viewer.css", "text/css"],
+    ] as const)
+      this.site.files.set(name, { bytes: Uint8Array.from(readFileSync(`viewer/dist/${name}`)), type });
     this.base = await this.site.start();
     const executablePath = process.env["CHROMIUM"] ?? "/usr/bin/chromium";
     this.browser = await chromium.launch({ executablePath, headless: true, args: ARGUMENTS });
