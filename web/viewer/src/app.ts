@@ -268,7 +268,10 @@ export class App implements Gestures {
     this.map.classList.toggle("chequers", !this.plain);
     document.title = main ? `${main.origin.name} – zmcraster` : "zmcraster";
     byId("title").textContent = [...new Set(this.sides.map(({ origin }) => origin.name))].join(" · ");
-    document.body.classList.toggle("bare", !this.sides.some(({ raster }) => raster));
+    document.body.classList.toggle(
+      "bare",
+      this.sides.every(({ error }) => error),
+    );
     for (const id of ["compare", "draw-line", "copy-link", "save", "zoom-in", "zoom-out", "zoom-fit", "zoom-one"])
       byId<HTMLButtonElement>(id).disabled = !shown;
     byId("compare").setAttribute("aria-pressed", String(this.sides.length === 2));
