@@ -67,7 +67,8 @@ inline constexpr int kAlphaBits = std::min(8 * static_cast<int>(sizeof(T)), 32);
 // Whether so little weight is left that what negative taps subtract would show.
 template <class Kernel, class Sum>
 bool IsThin(Sum weights, Sum largest) {
-    return weights < static_cast<Sum>(kWholeWeight<Kernel> / 4) * largest;
+    constexpr std::int64_t quarter = kWholeWeight<Kernel> / 4;
+    return weights < static_cast<Sum>(quarter) * largest;
 }
 
 // Sums over all taps, and over those of positive weight.
@@ -298,7 +299,7 @@ struct WeighingMethod {
 };
 
 template <class T, Resampling method, class Kernel>
-constexpr WeighingMethod<T> MethodOf() {
+constexpr WeighingMethod<T> MakeMethod() {
     WeighingMethod<T> values{Kernel::kReach,
                              {},
                              Computes(method),
@@ -307,6 +308,40 @@ constexpr WeighingMethod<T> MethodOf() {
     for (int tap = 0; tap < 2 * Kernel::kReach; ++tap)
         values.kernel[static_cast<std::size_t>(tap)] = Weight<Kernel>(tap);
     return values;
+}
+
+template <class T, Resampling method, class Kernel>
+constexpr WeighingMethod<T> kMethod = MakeMethod<T, method, Kernel>();
+
+// Null where samples are taken as they are, whatever they weigh.
+template <class T>
+const WeighingMethod<T>* MethodOf(Resampling method) {
+    switch (method) {
+#define ZMC_METHOD(name, Kernel) \
+    case Resampling::name:       \
+        return &kMethod<T, Resampling::name, Kernel>;
+        ZMC_METHOD(Average, BoxKernel)
+        ZMC_METHOD(Bilinear, BilinearKernel)
+        ZMC_METHOD(Cubic, CubicKernel)
+        ZMC_METHOD(Lanczos, LanczosKernel)
+        ZMC_METHOD(Gauss, GaussKernel)
+        ZMC_METHOD(CubicSpline, CubicSplineKernel)
+        default:
+            break;
+    }
+    if constexpr (!zelm::kIsComplex<T>) {
+        switch (method) {
+            ZMC_METHOD(Rms, BoxKernel)
+            ZMC_METHOD(Mode, BoxKernel)
+            ZMC_METHOD(Minimum, BoxKernel)
+            ZMC_METHOD(Maximum, BoxKernel)
+            ZMC_METHOD(Median, BoxKernel)
+            default:
+                break;
+        }
+    }
+#undef ZMC_METHOD
+    return nullptr;
 }
 
 // One call of WeighRow. Runs of cells whose taps weigh alike are left as they are.
@@ -345,7 +380,8 @@ private:
                                                        : nullptr;
     }
     std::uint32_t AlphaBand(std::size_t band) const {
-        return zelm::kIsComplex<T> ? BandWeighing::kNoBand : weighing.bands[band].alpha;
+        if constexpr (zelm::kIsComplex<T>) return BandWeighing::kNoBand;
+        return weighing.bands[band].alpha;
     }
     zelm::NoDataRule<T> Rule(std::size_t band) const {
         return noData ? noData[band] : zelm::NoDataRule<T>{};
@@ -526,38 +562,8 @@ template <class T>
 void WeighRow(Resampling method, std::uint32_t bands, std::uint32_t sourceWidth,
               const ReductionRows<T>& source, const zelm::NoDataRule<T>* noData,
               const Weighing& weighing, T* out, unsigned char* outMask) {
-    const auto run = [&]<Resampling chosen, class Kernel>(
-                         std::integral_constant<Resampling, chosen>, Kernel) {
-        static constexpr WeighingMethod<T> kMethod = MethodOf<T, chosen, Kernel>();
-        RowWeigher<T>(kMethod, bands, sourceWidth, source, noData, weighing, out, outMask).Run();
-    };
-    switch (method) {
-#define ZMC_METHOD(name, Kernel) \
-    case Resampling::name:       \
-        return run(std::integral_constant<Resampling, Resampling::name>(), Kernel());
-        ZMC_METHOD(Average, BoxKernel)
-        ZMC_METHOD(Bilinear, BilinearKernel)
-        ZMC_METHOD(Cubic, CubicKernel)
-        ZMC_METHOD(Lanczos, LanczosKernel)
-        ZMC_METHOD(Gauss, GaussKernel)
-        ZMC_METHOD(CubicSpline, CubicSplineKernel)
-        case Resampling::Nearest:
-            return;
-        default:
-            break;
-    }
-    if constexpr (!zelm::kIsComplex<T>) {
-        switch (method) {
-            ZMC_METHOD(Rms, BoxKernel)
-            ZMC_METHOD(Mode, BoxKernel)
-            ZMC_METHOD(Minimum, BoxKernel)
-            ZMC_METHOD(Maximum, BoxKernel)
-            ZMC_METHOD(Median, BoxKernel)
-            default:
-                return;
-        }
-    }
-#undef ZMC_METHOD
+    if (const WeighingMethod<T>* const chosen = MethodOf<T>(method))
+        RowWeigher<T>(*chosen, bands, sourceWidth, source, noData, weighing, out, outMask).Run();
 }
 
 #define ZMC_X(type, name, code)                                                                  \
