@@ -10,7 +10,7 @@
 namespace zelm {
 namespace {
 
-constexpr std::uint32_t kLevel = CoordSysLog::kErrorLevel;
+constexpr std::uint32_t kBindLevel = CoordSysLog::kErrorLevel;
 
 String ReadDirectory(const Environment& environment, const String& key) {
     String directory = environment.GetSetting(key);
@@ -48,8 +48,10 @@ int CoordSysFactory::Init() {
     String gdalDir = ReadDirectory(environment, EnvironmentKeys::kGdalDirectory);
     if (!gpCoordSysLogInstance) CoordSysLog::CreateInstance(peDir);
     CoordSysLog::LogMessage(
-        kLevel, u";-----------------------------------------------------------------------------");
-    CoordSysLog::LogMessage(kLevel, u"CoordSysFactory::Init - pedata directory (%s).", peDir.wide);
+        kBindLevel,
+        u";-----------------------------------------------------------------------------");
+    CoordSysLog::LogMessage(kBindLevel, u"CoordSysFactory::Init - pedata directory (%s).",
+                            peDir.wide);
     funcPtrs.LoadFuncPtrs(binDir);
     if (fp_Esri_Pe_Initialize) fp_Esri_Pe_Initialize(peDir, gdalDir);
     return 1;

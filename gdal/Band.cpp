@@ -30,10 +30,6 @@ void NarrowSamples(std::vector<unsigned char>& samples) {
     samples.resize(count);
 }
 
-void ReportSuccess(int* success, bool value) {
-    if (success) *success = value ? TRUE : FALSE;
-}
-
 }  // namespace
 
 Band::Band(Dataset& dataset, int number)

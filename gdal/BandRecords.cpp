@@ -13,8 +13,6 @@
 namespace zmcgdal {
 namespace {
 
-constexpr const char* kStructureDomain = "IMAGE_STRUCTURE";
-
 // Items of a band in our own domain of the sidecar: so many records of the file, from the first,
 // are not of the band's pixels of today, or do not count for another reason.
 constexpr const char* kOldStatistics = "OLD_STATISTICS";
@@ -40,10 +38,6 @@ std::string NumberText(double value) {
         if (CPLAtof(text.c_str()) == value) return text;
     }
     return CPLSPrintf("%.17g", value);
-}
-
-void ReportSuccess(int* success, bool value) {
-    if (success) *success = value ? TRUE : FALSE;
 }
 
 // As many digits as GDAL itself writes.

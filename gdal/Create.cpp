@@ -143,13 +143,8 @@ GDALDataset* CopyTo(const std::string& target, GDALDataset& source, bool strict,
     auto dataset = OpenForUpdate(target);
     if (CopySidecar(source, *dataset, strict) != CE_None) return nullptr;
     KeepStatistics(statistics, *dataset, dataset->File().archive);
-    if (options.embed) {
-        EmbedSidecar(*dataset, target);
-        dataset.reset();
-        dataset = OpenForUpdate(target);
-    } else {
-        SaveSidecar(*dataset, target);
-    }
+    (options.embed ? EmbedSidecar : SaveSidecar)(std::move(dataset), target);
+    dataset = OpenForUpdate(target);
     made.Keep();
     return dataset.release();
 }
@@ -316,12 +311,9 @@ Creation::~Creation() {
 void Creation::KeepMask(Dataset& dataset) const {
     Unfinished made(target);
     const std::string mask = DraftName() + kMaskEnding;
-    ErrorCatcher errors(CE_Failure);
-    dataset.CloseMask();
-    if (!errors.Text().empty())
-        throw zmchost::Error(target, "keep its mask in " + target + kMaskEnding, errors.Text());
     VSIStatBufL status;
     const bool exists = VSIStatL(mask.c_str(), &status) == 0;
+    if (exists) CloseMask(dataset, mask, target);
     if (exists && IsVirtualName(target))
         CopyFile(mask, target + kMaskEnding);
     else if (exists && VSIRename(mask.c_str(), (target + kMaskEnding).c_str()) != 0)

@@ -32,7 +32,6 @@
 namespace zmcgdal {
 namespace {
 
-constexpr const char* kStructureDomain = "IMAGE_STRUCTURE";
 // The dataset's own item of the sidecar: how many records, of statistics and of histograms, there
 // were when pixels began to change.
 constexpr const char* kEditing = "EDITING";
@@ -111,12 +110,15 @@ void DropOtherFiles(CPLXMLNode& root) {
     }
 }
 
+// What a flush answers; where it answers nothing, that all is well.
 template <class Work>
-auto ReportingFlush(Work&& work) {
-    if constexpr (std::is_void_v<Flushed>)
-        Reported(work);
-    else
-        return Reporting<Flushed>(CE_Failure, work);
+CPLErr FlushResult(Work&& work) {
+    if constexpr (std::is_void_v<Flushed>) {
+        work();
+        return CE_None;
+    } else {
+        return work();
+    }
 }
 
 }  // namespace
@@ -192,14 +194,26 @@ Dataset::Dataset(std::shared_ptr<OpenFile> openFile, std::uint32_t levelShown, G
 }
 
 Dataset::~Dataset() {
-    // NOLINTNEXTLINE(bugprone-parent-virtual-call): the pixels, and the sidecar not yet.
-    const bool flushed = Reported([&] { GDALDataset::FlushCache(true); });
-    if (flushed && file->renewsStatistics) Reported([&] { RenewEdited(); });
-    Reported([&] { EndEditing(); });
-    // Without a raster there is nothing that a sidecar could belong to.
-    if (creation && !(flushed && creation->Finish(*this))) nPamFlags &= ~GPF_DIRTY;
-    Reported([&] { GDALPamDataset::FlushCache(true); });
+    Finish();
     CloseDependentDatasets();
+}
+
+CPLErr Dataset::Finish() {
+    if (std::exchange(finished, true)) return CE_None;
+    CPLErr pixels = CE_None;
+    const auto flush = [&] {
+        // NOLINTNEXTLINE(bugprone-parent-virtual-call): the pixels, and the sidecar not yet.
+        pixels = FlushResult([&] { return GDALDataset::FlushCache(true); });
+    };
+    bool done = Reported(flush);
+    if (done && file->renewsStatistics) Reported([&] { RenewEdited(); });
+    Reported([&] { EndEditing(); });
+    if (creation) done = done && creation->Finish(*this);
+    // Without a raster there is nothing that a sidecar could belong to.
+    if (creation && !done) ForgetChanges();
+    const CPLErr items = Reporting(
+        CE_Failure, [&] { return FlushResult([&] { return GDALPamDataset::FlushCache(true); }); });
+    return done ? std::max(pixels, items) : CE_Failure;
 }
 
 std::unique_ptr<Dataset> Dataset::FromFile(std::shared_ptr<OpenFile> file, GDALAccess access) {
@@ -800,16 +814,18 @@ CPLErr Dataset::IBuildOverviews(const char* resampling, int overviewCount, const
     });
 }
 
-// The sidecar of a raster that there is not yet waits for it.
+// The pixels first, by which the sidecar changes.
 Flushed Dataset::FlushCache(bool atClosing) {
-    return ReportingFlush([&] {
-        // NOLINTNEXTLINE(bugprone-parent-virtual-call): the pixels alone, and the sidecar then.
-        if (creation) return GDALDataset::FlushCache(atClosing);
-        // NOLINTNEXTLINE(bugprone-parent-virtual-call): likewise.
-        if (editing) GDALDataset::FlushCache(atClosing);
+    const CPLErr flushed = Reporting(CE_Failure, [&] {
+        // NOLINTNEXTLINE(bugprone-parent-virtual-call): them alone.
+        const CPLErr pixels = FlushResult([&] { return GDALDataset::FlushCache(atClosing); });
+        // The sidecar of a raster that there is not yet waits for it.
+        if (creation) return pixels;
         EndEditing();
-        return GDALPamDataset::FlushCache(atClosing);
+        const auto save = [&] { return GDALPamDataset::FlushCache(atClosing); };
+        return std::max(pixels, FlushResult(save));
     });
+    return static_cast<Flushed>(flushed);
 }
 
 int Dataset::CloseDependentDatasets() {

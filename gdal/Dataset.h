@@ -34,6 +34,8 @@ namespace zmcgdal {
 
 class Creation;
 
+// Domain of metadata that tell how samples are stored, for all drivers.
+inline constexpr const char* kStructureDomain = "IMAGE_STRUCTURE";
 // Of metadata that describe the file; what the sidecar has in it is the driver's own.
 inline constexpr const char* kOwnDomain = "ZMCPYRAMID";
 
@@ -210,6 +212,7 @@ public:
 protected:
     int CloseDependentDatasets() override;
     CPLErr TrySaveXML() override;
+    CPLErr Finish() final;
 
 private:
     Dataset(std::shared_ptr<OpenFile> openFile, std::uint32_t levelShown, GDALAccess access,
@@ -256,6 +259,7 @@ private:
     std::unique_ptr<Creation> creation;
     RecordCounts inDoubt;
     bool editing = false;  // the sidecar says so
+    bool finished = false;
     // As which a sidecar that cannot be written is reported; CE_None: by the dataset's access.
     CPLErr failureKind = CE_None;
 };

@@ -2,6 +2,7 @@
 
 #include <cpl_error.h>
 
+#include <algorithm>
 #include <atomic>
 #include <exception>
 #include <mutex>
@@ -23,18 +24,10 @@ struct Failed {
     std::string text;
 };
 
-// Nothing if the job was done. What GDAL is told of it stays here. Without memory for the reason
-// that is the reason: a text so short lies in the string itself.
-std::optional<Failed> Try(const Worker& worker, std::uint64_t job) noexcept {
-    try {
-        const ErrorCatcher errors(CE_Failure);
-        if (Reporting(false, [&] { return worker(job); })) return std::nullopt;
-        if (errors.Text().empty()) return Failed{job, CPLE_AppDefined, "it failed"};
-        return Failed{job, errors.Number(), errors.Text()};
-    } catch (...) {
-        return Failed{job, CPLE_OutOfMemory, "out of memory"};
-    }
-}
+struct Warned {
+    std::uint64_t job = 0;  // the first that had it
+    CaughtWarning warning;
+};
 
 class Crew {
 public:
@@ -55,8 +48,12 @@ private:
     std::mutex mutex;                 // guards what follows
     std::vector<std::uint64_t> left;  // jobs that a thread had no memory for
     std::optional<Failed> first;      // of the failures, by the number of the job
+    std::vector<Warned> warned;       // no two texts alike
 
     std::optional<std::uint64_t> Take();
+    std::optional<Failed> Try(const Worker& worker, std::uint64_t job) noexcept;
+    void KeepWarnings(std::uint64_t job, std::vector<CaughtWarning> warnings);
+    void TellWarnings();
     void Keep(Failed&& failed);
     void Help() noexcept;
     void WorkWith(const Worker& worker);
@@ -69,6 +66,48 @@ std::optional<std::uint64_t> Crew::Take() {
     if (ended) return std::nullopt;
     const std::uint64_t job = next++;
     return job < jobs ? std::optional(job) : std::nullopt;
+}
+
+// Nothing if the job was done. What GDAL is told of it stays here. Without memory for the reason
+// that is the reason: a text so short lies in the string itself.
+std::optional<Failed> Crew::Try(const Worker& worker, std::uint64_t job) noexcept {
+    std::vector<CaughtWarning> warnings;
+    std::optional<Failed> failed;
+    try {
+        const ErrorCatcher errors(CE_Failure, &warnings);
+        if (!Reporting(false, [&] { return worker(job); }))
+            failed = errors.Text().empty() ? Failed{job, CPLE_AppDefined, "it failed"}
+                                           : Failed{job, errors.Number(), errors.Text()};
+    } catch (...) {
+        failed = Failed{job, CPLE_OutOfMemory, "out of memory"};
+    }
+    try {
+        KeepWarnings(job, std::move(warnings));
+    } catch (const std::bad_alloc&) {
+        return failed;  // warnings end no work
+    }
+    return failed;
+}
+
+void Crew::KeepWarnings(std::uint64_t job, std::vector<CaughtWarning> warnings) {
+    if (warnings.empty()) return;
+    const std::lock_guard lock(mutex);
+    for (CaughtWarning& warning : warnings) {
+        const auto same = std::find_if(warned.begin(), warned.end(), [&](const Warned& known) {
+            return known.warning.text == warning.text;
+        });
+        if (same == warned.end())
+            warned.push_back({job, std::move(warning)});
+        else
+            same->job = std::min(same->job, job);
+    }
+}
+
+void Crew::TellWarnings() {
+    std::stable_sort(warned.begin(), warned.end(),
+                     [](const Warned& a, const Warned& b) { return a.job < b.job; });
+    for (const Warned& each : warned)
+        CPLError(CE_Warning, each.warning.number, "%s", each.warning.text.c_str());
 }
 
 void Crew::Keep(Failed&& failed) {
@@ -157,6 +196,7 @@ bool Crew::Run(std::uint32_t threads) {
     }
     DoLeft(own);
     Tell();
+    TellWarnings();
     if (cancelled)
         CPLError(CE_Failure, CPLE_UserInterrupt, "cancelled");
     else if (first)

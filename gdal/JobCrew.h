@@ -2,8 +2,9 @@
 //
 // The thread that calls is one of them, and alone if no other can be had. Where a job fails, no
 // further one is begun, and GDAL is told once, on the thread that called: of the failed job with
-// the lowest number, which is the one that would have failed first without other threads. What a
-// thread has no memory for, the caller tries again by itself.
+// the lowest number, which is the one that would have failed first without other threads. Warnings
+// it is told there before, by the numbers of their jobs, each text once, as far as memory allows.
+// What a thread has no memory for, the caller tries again by itself.
 #ifndef ZMC_GDAL_JOBCREW_H
 #define ZMC_GDAL_JOBCREW_H
 

@@ -1,32 +1,26 @@
 #include "gdal/RemoteSource.h"
 
 #include <algorithm>
-#include <atomic>
 #include <cerrno>
 #include <cstring>
 #include <utility>
+
+#include "gdal/SourceNumber.h"
 
 namespace zmcgdal {
 namespace {
 
 using zelm::files::Transfer;
 
-constexpr std::uint64_t kNoVolume = ~std::uint64_t{0};
 constexpr std::uint64_t kLeastAhead = 65536;
 constexpr std::uint64_t kDocumentAtOnce = std::uint64_t{1} << 20;
 // Twice this is less than one answer of GDAL's HTTP client can hold.
 constexpr std::uint64_t kMostAtOnce = std::uint64_t{1} << 29;
 
-std::uint64_t NextNumber() {
-    // Apart from those of other kinds of sources.
-    static std::atomic<std::uint64_t> last{std::uint64_t{1} << 62};
-    return ++last;
-}
-
 }  // namespace
 
 RemoteSource::RemoteSource(std::unique_ptr<Fetcher> byFetcher, std::uint64_t storeBytes)
-    : number(NextNumber()),
+    : number(NextSourceNumber()),
       groupBytes(std::clamp<std::uint64_t>(storeBytes / 2, 1, kMostAtOnce)),
       fetcher(std::move(byFetcher)),
       front(fetcher->FetchFront()),

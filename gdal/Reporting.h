@@ -17,6 +17,11 @@
 
 namespace zmcgdal {
 
+// Tells a caller who asked for it whether a value is known.
+inline void ReportSuccess(int* success, bool value) {
+    if (success) *success = value ? TRUE : FALSE;
+}
+
 // Tells GDAL of the exception in hand.
 inline void ReportCaught(CPLErrorNum kind) noexcept {
     try {

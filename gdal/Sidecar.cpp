@@ -3,7 +3,10 @@
 #include <cpl_string.h>
 
 #include <algorithm>
+#include <memory>
 #include <string>
+#include <utility>
+#include <vector>
 
 #include "gdal/Band.h"
 #include "gdal/Dataset.h"
@@ -66,11 +69,34 @@ void Save(GDALDataset& dataset, const std::string& name, const std::string& oper
     if (!errors.Text().empty()) throw zmchost::Error(name, operation, errors.Text());
 }
 
-void SaveMask(Dataset& dataset, const std::string& name) {
-    GDALRasterBand& first = *dataset.GetRasterBand(1);
+std::string KeepingMask(const std::string& name) {
+    return "keep its mask in " + name + kMaskEnding;
+}
+
+// GDAL reports what cannot be read.
+void ReadAll(const std::string& file) {
+    const std::unique_ptr<GDALDataset> opened(
+        GDALDataset::Open(file.c_str(), GDAL_OF_RASTER | GDAL_OF_VERBOSE_ERROR));
+    if (!opened) return;
+    GDALRasterBand& band = *opened->GetRasterBand(1);
+    int width = 0, height = 0;
+    band.GetBlockSize(&width, &height);
+    std::vector<unsigned char> block(static_cast<std::size_t>(width) *
+                                     static_cast<std::size_t>(height));
+    for (int y = 0; y < (band.GetYSize() + height - 1) / height; ++y)
+        for (int x = 0; x < (band.GetXSize() + width - 1) / width; ++x)
+            if (band.ReadBlock(x, y, block.data()) != CE_None) return;
+}
+
+void SaveMask(std::unique_ptr<Dataset> dataset, const std::string& name) {
+    GDALRasterBand& first = *dataset->GetRasterBand(1);
     if ((first.GetMaskFlags() & GMF_PER_DATASET) == 0) return;
-    if (GDALDataset* const mask = first.GetMaskBand()->GetDataset())
-        Save(*mask, name, "keep its mask in " + name + kMaskEnding);
+    GDALDataset* const mask = first.GetMaskBand()->GetDataset();
+    // An alpha band is a mask of the dataset too, and no file.
+    if (!mask || mask == dataset.get()) return;
+    const std::string file = mask->GetDescription();
+    Save(*mask, name, KeepingMask(name));
+    CloseMask(*dataset, file, name);
 }
 
 }  // namespace
@@ -110,16 +136,23 @@ void KeepStatistics(const std::vector<zmchost::FullStatistics>& stored, Dataset&
             ->KeepFull(each, inFile);
 }
 
-void SaveSidecar(Dataset& dataset, const std::string& name) {
-    Save(dataset, name, "keep its metadata in " + name + kSidecarEnding);
-    SaveMask(dataset, name);
+void CloseMask(Dataset& dataset, const std::string& file, const std::string& name) {
+    const ErrorCatcher errors(CE_Failure);
+    dataset.CloseMask();
+    ReadAll(file);
+    if (!errors.Text().empty()) throw zmchost::Error(name, KeepingMask(name), errors.Text());
 }
 
-void EmbedSidecar(Dataset& dataset, const std::string& name) {
-    const std::string items = dataset.SidecarText();
-    dataset.ForgetChanges();
-    if (!items.empty()) zmchost::EmbedItems(*dataset.File().source, name, items);
-    SaveMask(dataset, name);
+void SaveSidecar(std::unique_ptr<Dataset> dataset, const std::string& name) {
+    Save(*dataset, name, "keep its metadata in " + name + kSidecarEnding);
+    SaveMask(std::move(dataset), name);
+}
+
+void EmbedSidecar(std::unique_ptr<Dataset> dataset, const std::string& name) {
+    const std::string items = dataset->SidecarText();
+    dataset->ForgetChanges();
+    if (!items.empty()) zmchost::EmbedItems(*dataset->File().source, name, items);
+    SaveMask(std::move(dataset), name);
 }
 
 }  // namespace zmcgdal

@@ -5,6 +5,7 @@
 #include <cpl_string.h>
 #include <gdal_priv.h>
 
+#include <memory>
 #include <string>
 #include <vector>
 
@@ -31,14 +32,18 @@ CPLErr CopySidecar(GDALDataset& source, Dataset& target, bool strict);
 void KeepStatistics(const std::vector<zmchost::FullStatistics>& stored, Dataset& target,
                     Archive& inFile);
 
-// Writes what was set. Throws zmchost::Error, of the pyramid that the user calls `name`, where GDAL
-// could not save all of it; what there is of it by then is anything.
-void SaveSidecar(Dataset& dataset, const std::string& name);
+// Writes what was set, and closes the dataset. Throws zmchost::Error, of the pyramid that the user
+// calls `name`, where GDAL could not save all of it; what there is of it by then is anything.
+void SaveSidecar(std::unique_ptr<Dataset> dataset, const std::string& name);
 
 // The same, but what a sidecar would tell goes into the file, in front of its records; a mask still
-// stands beside it. The dataset is open for update, was built just now, and is not to be used any
-// more. Throws zmchost::Error.
-void EmbedSidecar(Dataset& dataset, const std::string& name);
+// stands beside it. The dataset is open for update and was built just now. Throws zmchost::Error.
+void EmbedSidecar(std::unique_ptr<Dataset> dataset, const std::string& name);
+
+// Ends the use of the mask that a dataset has in `file`, and reads that once more: of a disk that
+// was full some versions of GDAL tell neither when they write nor when they close. The dataset can
+// only be closed then. Throws zmchost::Error, of the pyramid that the user calls `name`.
+void CloseMask(Dataset& dataset, const std::string& file, const std::string& name);
 
 // A sidecar with this item was made of all that the file itself keeps.
 inline constexpr const char* kEmbeddedDomain = "ZMCPYRAMID_SIDECAR";

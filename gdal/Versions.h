@@ -1,7 +1,8 @@
 // Versions: what GDAL calls its drivers with differs between its versions; it is told here alone.
 //
-// 3.6 is the oldest version, and what was built for one works with that alone. Since 3.12 a
-// georeference is an object, and since 3.13 lists of items are constant.
+// 3.6 is the oldest version, and what was built for one works with that alone. Since 3.7 GDAL calls
+// Close before it deletes a dataset, since 3.12 a georeference is an object, and since 3.13 lists
+// of items are constant and Close saves the sidecar.
 #ifndef ZMC_GDAL_VERSIONS_H
 #define ZMC_GDAL_VERSIONS_H
 
@@ -25,8 +26,8 @@ using Items = char**;
 using Flushed = decltype(std::declval<GDALPamDataset&>().FlushCache(false));
 
 // GDALPamDataset, whose georeference is six numbers in every version: x and y are [0] + [1] column
-// + [2] row and [3] + [4] column + [5] row. GDAL's own functions lead to the two that are virtual
-// here.
+// + [2] row and [3] + [4] column + [5] row; and whose last work has one name. GDAL's own functions
+// lead to those that are virtual here.
 class PlacedDataset : public GDALPamDataset {
 public:
     virtual CPLErr ReadTransform(double* transform) const;
@@ -43,6 +44,23 @@ public:
     CPLErr GetGeoTransform(double* transform) final { return ReadTransform(transform); }
     CPLErr SetGeoTransform(double* transform) final { return StoreTransform(transform); }
 #endif
+
+#if GDAL_VERSION_NUM >= GDAL_COMPUTE_VERSION(3, 13, 0)
+    CPLErr Close(GDALProgressFunc progress = nullptr, void* progressData = nullptr) final {
+        const CPLErr finished = Finish();
+        return std::max(finished, GDALPamDataset::Close(progress, progressData));
+    }
+#elif GDAL_VERSION_NUM >= GDAL_COMPUTE_VERSION(3, 7, 0)
+    CPLErr Close() final {
+        const CPLErr finished = Finish();
+        return std::max(finished, GDALPamDataset::Close());
+    }
+#endif
+
+protected:
+    // What is left to do when the dataset goes, before GDAL's own part of that. The destructor
+    // calls it too, so only the first call does anything. Throws nothing; what fails is reported.
+    virtual CPLErr Finish() = 0;
 };
 
 #if GDAL_VERSION_NUM >= GDAL_COMPUTE_VERSION(3, 12, 0)

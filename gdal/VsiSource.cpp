@@ -3,7 +3,6 @@
 #include <cpl_error.h>
 #include <cpl_vsi_virtual.h>
 
-#include <atomic>
 #include <cerrno>
 #include <climits>
 #include <utility>
@@ -11,6 +10,7 @@
 
 #include "files/Lending.h"
 #include "gdal/RemoteSource.h"
+#include "gdal/SourceNumber.h"
 #include "host/base/Error.h"
 #include "host/raster/LentFile.h"
 
@@ -21,14 +21,6 @@ using zelm::files::ByteSource;
 using zelm::files::OpenMode;
 using zelm::files::Range;
 using zelm::files::Transfer;
-
-constexpr std::uint64_t kNoVolume = ~std::uint64_t{0};
-
-std::uint64_t NextNumber() {
-    // Apart from those of other kinds of sources.
-    static std::atomic<std::uint64_t> last{std::uint64_t{1} << 63};
-    return ++last;
-}
 
 const char* AccessFor(OpenMode mode) {
     if (mode == OpenMode::Create) return "w+b";
@@ -80,7 +72,7 @@ VsiSource::VsiSource(std::string fileName, VSILFILE* opened, bool isWritable)
     : name(std::move(fileName)),
       writable(isWritable),
       readsAnywhere(!isWritable && HandleOf(opened).HasPRead()),
-      number(NextNumber()),
+      number(NextSourceNumber()),
       handle(opened) {}
 
 VsiSource::~VsiSource() { VSIFCloseL(handle); }

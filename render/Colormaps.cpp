@@ -28,11 +28,12 @@ Colormap Decoded(std::string_view colours) {
     return map;
 }
 
-constexpr auto kNames = [] {
+constexpr auto NamesOfMaps() {
     std::array<std::string_view, std::size(kMaps)> names;
     for (std::size_t i = 0; i < names.size(); ++i) names[i] = kMaps[i].name;
     return names;
-}();
+}
+constexpr auto kNames = NamesOfMaps();
 
 }  // namespace
 

@@ -3,6 +3,8 @@
 #include <algorithm>
 #include <cmath>
 
+#include "render/Nearest.h"
+
 namespace zmcrender {
 namespace {
 
@@ -85,10 +87,9 @@ private:
 
     // Transparent of what is no index.
     std::array<unsigned char, 4> ColourOf(double value) const {
-        const bool isIndex =
-            value >= 0 && value < static_cast<double>(palette.size()) && value == std::trunc(value);
-        return isIndex ? palette[static_cast<std::size_t>(value)]
-                       : std::array<unsigned char, 4>{0, 0, 0, 0};
+        const auto count = static_cast<double>(palette.size());
+        if (!(value >= 0) || value >= count || value != std::trunc(value)) return {};
+        return palette[static_cast<std::size_t>(value)];
     }
 };
 
@@ -138,7 +139,7 @@ public:
             PaintLit(line, light, picture);
         else
             for (std::size_t i = 0; i < light.size(); ++i)
-                picture[i] = static_cast<std::uint8_t>(255 * light[i] + 0.5);
+                picture[i] = Nearest<std::uint8_t>(255 * light[i]);
         if (!alpha) return;
         std::fill_n(alpha, line.count, std::uint8_t{0});
         heights.channel->MarkPresent(line.Band(heights.place), alpha);
@@ -172,7 +173,7 @@ private:
         std::vector<std::uint8_t> unused(line.count);
         colours->Paint(line, picture, colours->MayHide() ? unused.data() : nullptr);
         for (std::size_t i = 0; i < 3 * light.size(); ++i)
-            picture[i] = static_cast<std::uint8_t>(picture[i] * LitShare(light[i / 3]) + 0.5);
+            picture[i] = Nearest<std::uint8_t>(picture[i] * LitShare(light[i / 3]));
     }
     static double LitShare(double light) { return kShade + (1 - kShade) * light; }
     // What is left of a colour that no light falls on.

@@ -250,9 +250,10 @@ private:
             for (std::size_t i = 0; i < line.count; ++i)
                 opacity[i] = static_cast<Level>(present[i] * unit);
         else
-            for (std::size_t i = 0; i < line.count; ++i)
-                opacity[i] =
-                    static_cast<Level>(std::uint64_t{opacity[i]} * present[i] * unit / opaque);
+            for (std::size_t i = 0; i < line.count; ++i) {
+                const std::uint64_t level = opacity[i];
+                opacity[i] = static_cast<Level>(level * present[i] * unit / opaque);
+            }
         if (!shown) return;
         for (std::size_t i = 0; i < line.count; ++i)
             if (shown[i] == 0) opacity[i] = 0;

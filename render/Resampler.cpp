@@ -4,7 +4,10 @@
 #include <cmath>
 #include <cstring>
 #include <limits>
+#include <type_traits>
 #include <utility>
+
+#include "render/Nearest.h"
 
 namespace zmcrender {
 namespace {
@@ -78,7 +81,8 @@ void Resampler::Add(const Picture& lines) {
 
 void Resampler::Widen(const Picture& lines, std::uint32_t y) {
     const bool hasAlpha = lines.HasAlpha();
-    const auto fill = [&]<class Level>(const Level* from) {
+    const auto fill = [&](const auto* from) {
+        using Level = std::remove_cvref_t<decltype(*from)>;
         constexpr auto most = static_cast<float>(std::numeric_limits<Level>::max());
         float* to = wide.data();
         for (std::uint32_t x = 0; x < sourceWidth; ++x, from += lines.channels) {
@@ -133,9 +137,7 @@ void Resampler::Accumulate(const std::vector<float>& part, float weight) {
 template <class Level>
 void Resampler::EmitAs(Level* levels) {
     constexpr auto most = static_cast<float>(std::numeric_limits<Level>::max());
-    const auto level = [most](float value) {
-        return static_cast<Level>(std::min(value, most) + 0.5f);
-    };
+    const auto level = [most](float value) { return Nearest<Level>(std::min(value, most)); };
     for (const float* from = sum.data(); from != sum.data() + sum.size();) {
         const float alpha = from[colours];
         // Sums of weights that come to 1 but for their rounding.

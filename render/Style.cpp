@@ -63,11 +63,12 @@ constexpr Key kKeys[] = {
     {"depth", SetDepth, [](const Style& style) { return std::to_string(style.depth); }},
 };
 
-constexpr auto kNames = [] {
+constexpr auto NamesOfKeys() {
     std::array<const char*, std::size(kKeys)> names{};
     for (std::size_t i = 0; i < names.size(); ++i) names[i] = kKeys[i].name;
     return names;
-}();
+}
+constexpr auto kNames = NamesOfKeys();
 
 const Key* Find(std::string_view name) {
     const auto found = std::find_if(std::begin(kKeys), std::end(kKeys),

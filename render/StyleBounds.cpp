@@ -8,6 +8,7 @@
 #include "core/ElementTypes.h"
 #include "core/PixelVocabulary.h"
 #include "render/Hillshade.h"
+#include "render/Nearest.h"
 #include "render/SampleBlock.h"
 
 namespace zmcrender {
@@ -62,8 +63,8 @@ Range FromValues(std::vector<double>& values, const Stretch& stretch) {
     const double low = stretch.kind == Kind::Auto ? 0 : stretch.low;
     const double high = stretch.kind == Kind::Auto ? 100 : stretch.high;
     const auto at = [&](double percent) {
-        const auto place = static_cast<std::ptrdiff_t>(
-            percent / 100 * static_cast<double>(values.size() - 1) + 0.5);
+        const auto place =
+            Nearest<std::ptrdiff_t>(percent / 100 * static_cast<double>(values.size() - 1));
         std::nth_element(values.begin(), values.begin() + place, values.end());
         return Number(values[static_cast<std::size_t>(place)]);
     };

@@ -25,7 +25,7 @@ std::uint8_t Tone::Searched(double t, std::size_t at) const {
 
 void Tone::Level(double t, std::uint16_t& level) const {
     const double bent = IsLinear() ? t : std::pow(t, 1 / gamma);
-    level = static_cast<std::uint16_t>(65535 * bent + 0.5);
+    level = Nearest<std::uint16_t>(65535 * bent);
 }
 
 }  // namespace zmcrender

@@ -11,6 +11,8 @@
 #include <cstdint>
 #include <limits>
 
+#include "render/Nearest.h"
+
 namespace zmcrender {
 
 class Tone {
@@ -30,7 +32,7 @@ public:
     // A level where gamma is 1.
     template <class T>
     static T Straight(double t) {
-        return static_cast<T>(std::numeric_limits<T>::max() * t + 0.5);
+        return Nearest<T>(std::numeric_limits<T>::max() * t);
     }
 
 private:

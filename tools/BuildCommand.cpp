@@ -4,6 +4,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <filesystem>
+#include <utility>
 
 #include "core/PixelVocabulary.h"
 #include "gdal/Dataset.h"
@@ -226,7 +227,7 @@ void BuildCommand::WriteSidecar(GDALDataset& dataset, const zmchost::BuildOption
     bool kept = selected && zmcgdal::CopySidecar(*selected, *pyramid, true) == CE_None;
     if (kept) {
         zmcgdal::KeepStatistics(statistics, *pyramid, pyramid->File().archive);
-        (embed ? zmcgdal::EmbedSidecar : zmcgdal::SaveSidecar)(*pyramid, target);
+        (embed ? zmcgdal::EmbedSidecar : zmcgdal::SaveSidecar)(std::move(pyramid), target);
     }
     pyramid.reset();
     const std::string reason = TakeGdalError(target);

@@ -17,6 +17,7 @@
 #include "format/PyramidHeaderRecord.h"
 #include "host/file/PyramidFileInfo.h"
 #include "host/raster/Raster.h"
+#include "render/PixelSource.h"
 #include "render/RasterFacts.h"
 #include "tools/TerminalProgress.h"
 
@@ -33,26 +34,15 @@ constexpr std::uint64_t BytesAtOnce(std::uint64_t bytes, std::uint32_t tileSide)
     return bytes / (kSmall * kSmall) * side * side;
 }
 
-class RasterView {
+class RasterView : public zmcrender::PixelSource {
 public:
-    virtual ~RasterView() = default;
-    virtual std::string Name() const = 0;
-    virtual std::uint32_t PixelType() const = 0;
-    virtual std::uint32_t Bands() const = 0;
-    virtual std::uint32_t MinLevel() const = 0;
-    virtual std::uint32_t MaxLevel() const = 0;
-    virtual std::uint32_t Width(std::uint32_t level) const = 0;
-    virtual std::uint32_t Height(std::uint32_t level) const = 0;
-    virtual void Read(std::uint32_t level, const zmchost::Window& window,
-                      std::span<const std::uint32_t> bands, void* pixels) = 0;
     // Throws Failure if what was read since opening may not be of one file in one state: of a
     // pyramid, if it was written to; of others, which are looked up by name, if they or a file of
     // theirs were replaced as well. A file that takes the name of an open pyramid is not met.
     virtual void CheckUnchanged() const = 0;
     // What is archived of a pyramid; of others type and number of the bands alone.
     virtual zmcrender::RasterFacts Facts() const;
-    // Side of the tiles that are moved at once.
-    virtual std::uint32_t TileSide() const { return kUsualTile; }
+    std::uint32_t TileSide() const override { return kUsualTile; }
     // After a walk that went well: pixels elsewhere in the file may be missing.
     virtual void WarnOfMissing() {}
 

@@ -24,7 +24,7 @@ int Refusal(const char* name) noexcept {
 // had before. What belongs to files on a network alone, such as addresses, stays as good as absent.
 class RegularFiles final : public zmcgdal::ForwardedFiles {
 public:
-    explicit RegularFiles(VSIFilesystemHandler* before) : ForwardedFiles(before) {}
+    using ForwardedFiles::ForwardedFiles;
 
     zmcgdal::OpenedFile Open(const char* name, const char* access, bool setsError,
                              CSLConstList options) override {
@@ -74,9 +74,6 @@ public:
 
 }  // namespace
 
-void OpenRegularFilesOnly() {
-    // The manager deletes the one that it has last.
-    VSIFileManager::InstallHandler("", new RegularFiles(VSIFileManager::GetHandler("")));
-}  // NOLINT(clang-analyzer-cplusplus.NewDeleteLeaks): handed over.
+void OpenRegularFilesOnly() { zmcgdal::InstallForPlainNames<RegularFiles>(); }
 
 }  // namespace zmctools

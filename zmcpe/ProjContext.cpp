@@ -7,7 +7,7 @@ platform::Mutex projMutex;
 
 namespace {
 
-PJ_CONTEXT* context ZMC_GUARDED_BY(projMutex) = nullptr;
+PJ_CONTEXT* shared ZMC_GUARDED_BY(projMutex) = nullptr;
 ProjUser* firstUser ZMC_GUARDED_BY(projMutex) = nullptr;
 bool closed ZMC_GUARDED_BY(projMutex) = false;
 
@@ -25,15 +25,15 @@ ProjContext::ProjContext() { projMutex.Lock(); }
 ProjContext::~ProjContext() { projMutex.Unlock(); }
 
 PJ_CONTEXT* ProjContext::Get() {
-    if (context || closed) return context;
-    context = proj_context_create();
-    if (!context) return nullptr;
+    if (shared || closed) return shared;
+    shared = proj_context_create();
+    if (!shared) return nullptr;
     // Refusals are answers, not news for the error stream. The level alone lets the messages of a
     // database that cannot be used through.
-    proj_log_func(context, nullptr, DropMessage);
-    proj_log_level(context, PJ_LOG_NONE);
-    proj_context_set_enable_network(context, 0);
-    return context;
+    proj_log_func(shared, nullptr, DropMessage);
+    proj_log_level(shared, PJ_LOG_NONE);
+    proj_context_set_enable_network(shared, 0);
+    return shared;
 }
 
 void ProjContext::Enlist(ProjUser* user) {
@@ -49,8 +49,8 @@ void ProjContext::Dismiss(ProjUser* user) {
 
 void ProjContext::CloseForGood() {
     for (ProjUser* user = firstUser; user; user = user->next) user->DropProj();
-    if (context) proj_context_destroy(context);
-    context = nullptr;
+    if (shared) proj_context_destroy(shared);
+    shared = nullptr;
     closed = true;
 }
 

@@ -15,6 +15,7 @@
 #include "host/file/MetadataDocument.h"
 #include "host/file/StoredRecords.h"
 #include "host/journal/MetadataJournal.h"
+#include "host/raster/ArrayOf.h"
 #include "host/raster/Raster.h"
 #include "host/statistics/BandStatistics.h"
 #include "host/statistics/Histogram.h"
@@ -31,15 +32,6 @@ constexpr std::size_t kBandsAtOnce = 128;
 
 // Bytes of samples and masks that are held at once.
 constexpr std::uint64_t kPieceBytes = std::uint64_t{16} << 20;
-
-template <class Record>
-zelm::Array<Record> ArrayOf(const std::vector<Record>& records) {
-    zelm::Array<Record> array;
-    if (!array.SetShape(zelm::ArrayShape(static_cast<std::uint32_t>(records.size()))))
-        throw std::bad_alloc();
-    std::copy(records.begin(), records.end(), array.data);
-    return array;
-}
 
 template <class T>
 class Renewal {
@@ -249,8 +241,8 @@ void ReplaceDocument(zelm::files::ByteSource& source, const std::string& name, s
     if (!text.empty()) write(offset, text.substr(0, 1));
 }
 
-void Strip(zelm::files::ByteSource& source, const std::string& name, const PyramidHeader& header,
-           const std::string& text) {
+void StripRecords(zelm::files::ByteSource& source, const std::string& name,
+                  const PyramidHeader& header, const std::string& text) {
     if (text.empty()) return;
     // A byte order mark of UTF-8 may come first, and no other.
     constexpr std::string_view kFirst = "< \t\r\n\xEF";
@@ -341,7 +333,7 @@ std::vector<FullStatistics> RenewStatistics(const ModulePtr& module,
             if (dynamic_cast<zelm::files::FileSource*>(source.get())) copy.emplace(name);
             OldDocument old(*source, name, raster.Header().tileDataEnd);
             old.text = ReadMetadataText(*source, name, raster.Header());
-            Strip(*source, name, raster.Header(), old.text);
+            StripRecords(*source, name, raster.Header(), old.text);
             Raster stripped = Raster::Open(module, source, name);
             renewal.Store(stripped);
             old.Settle();

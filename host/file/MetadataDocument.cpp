@@ -33,14 +33,14 @@ protected:
     }
 };
 
-[[noreturn]] void Fail(const std::string& name, const std::string& reason) {
+[[noreturn]] void FailToRead(const std::string& name, const std::string& reason) {
     throw Error(name, "read its metadata document", reason);
 }
 
 std::shared_ptr<FileSource> OpenFile(const std::string& file) {
     int error = 0;
     auto source = FileSource::Open(WideFileName(file), OpenMode::Read, &error);
-    if (!source) Fail(file, platform::ErrorText(error));
+    if (!source) FailToRead(file, platform::ErrorText(error));
     return source;
 }
 
@@ -49,7 +49,7 @@ std::uint64_t DocumentSize(ByteSource& source, const std::string& name,
                            const PyramidHeader& header) {
     std::uint64_t size = 0;
     int error = 0;
-    if (!source.TellSize(size, &error)) Fail(name, platform::ErrorText(error));
+    if (!source.TellSize(size, &error)) FailToRead(name, platform::ErrorText(error));
     return size > header.tileDataEnd ? size - header.tileDataEnd : 0;
 }
 
@@ -91,7 +91,7 @@ std::string JudgeMetadataText(std::string text) {
 std::string ReadMetadataText(ByteSource& source, const std::string& name,
                              const PyramidHeader& header) {
     const std::uint64_t size = DocumentSize(source, name, header);
-    if (const std::string wrong = JudgeSize("it", size); !wrong.empty()) Fail(name, wrong);
+    if (const std::string wrong = JudgeSize("it", size); !wrong.empty()) FailToRead(name, wrong);
     std::string text;
     // What has a NUL is no document, and the rest of it, which may be a hole, is not read.
     for (bool hasNul = false; !hasNul && text.size() < size;) {
@@ -101,7 +101,7 @@ std::string ReadMetadataText(ByteSource& source, const std::string& name,
         int error = 0;
         if (source.ReadAt(header.tileDataEnd + before, text.data() + before, piece, &error) !=
             piece)
-            Fail(name, error != 0 ? platform::ErrorText(error) : "the file was cut");
+            FailToRead(name, error != 0 ? platform::ErrorText(error) : "the file was cut");
         hasNul = text.find('\0', before) != text.npos;
     }
     return text;

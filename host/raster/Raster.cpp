@@ -11,6 +11,7 @@
 #include "host/file/PresentTiles.h"
 #include "host/file/StoredRecords.h"
 #include "host/journal/MetadataJournal.h"
+#include "host/raster/ArrayOf.h"
 #include "host/raster/LentFile.h"
 #include "host/raster/NoData.h"
 #include "platform/FileSystem.h"
@@ -85,15 +86,6 @@ struct OwnChange {
     std::uint64_t least;  // bytes that the change leaves
     ~OwnChange() { file.AcceptOwnChange(least); }
 };
-
-template <class Record>
-zelm::Array<Record> ToArray(const std::vector<Record>& records) {
-    zelm::Array<Record> array;
-    if (!array.SetShape(zelm::ArrayShape(static_cast<std::uint32_t>(records.size()))))
-        throw std::bad_alloc();
-    std::copy(records.begin(), records.end(), array.data);
-    return array;
-}
 
 // Without memory the copy of a list is empty, and the module takes the counts that are not there
 // for zeros.
@@ -573,7 +565,7 @@ void Raster::SetStatistics(const std::vector<zelm::RasterBandStats<T>>& given) {
     if (HasStatistics(0))
         throw Error(name, "store statistics", "it has some already, and a file keeps the oldest");
     Store([&] {
-        typed.SetBandStats(ToArray(given));
+        typed.SetBandStats(ArrayOf(given));
         CheckDisk("store statistics");
         bool has = true;
         for (std::uint32_t band = 0; has && band < Bands(); ++band) has = HasStatistics(band);
@@ -593,7 +585,7 @@ template <class T>
 void Raster::SetHistograms(const std::vector<zelm::RasterBandHistogram<T>>& histograms) {
     zelm::RasterReader<T>& typed = Typed<T>();
     CheckWritable("store histograms");
-    const zelm::Array<zelm::RasterBandHistogram<T>> given = ToArray(histograms);
+    const zelm::Array<zelm::RasterBandHistogram<T>> given = ArrayOf(histograms);
     for (std::size_t i = 0; i < histograms.size(); ++i)
         if (!given.data || !HaveSameCounts(given.data[i], histograms[i])) throw std::bad_alloc();
     const auto old = Records<T>();

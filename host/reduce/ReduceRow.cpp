@@ -66,69 +66,55 @@ public:
 
     template <Resampling method>
     void Cells() {
-        const T* const* const pair = source.rows;
-        const bool bothRows = pair[0] && pair[1];
-        const auto run = [this](std::size_t x, std::size_t n) { CellRun<method>(x, n); };
-        const auto one = [](const Cell<T>& cell, std::size_t, std::uint32_t) {
-            return ReduceCell<method>(cell);
-        };
-        Reduce(0, cells, 2, 0, bothRows, run, one);
+        run = &RowReducer::template CellRun<method>;
+        each = &RowReducer::template EachCell<method>;
+        one = &RowReducer::template OneCell<method>;
+        Reduce(0, cells, 2, 0, source.rows[0] && source.rows[1]);
     }
 
     template <class Kernel>
     void Window() {
         constexpr std::size_t rows = 2 * Kernel::kReach;
+        run = &RowReducer::template WindowRunOf<Kernel>;
+        each = &RowReducer::template EachWindow<Kernel>;
+        one = &RowReducer::template OneWindow<Kernel>;
         center = Kernel::kReach - 1;
-        const Part* parts[rows];
         for (std::size_t r = 0; r < rows; ++r)
             parts[r] = reinterpret_cast<const Part*>(source.rows[r]);
-        const PartRows<Part> window{parts, source.masks, kParts * bands, bands, width};
-        const auto run = [&](std::size_t x, std::size_t n) {
-            for (std::size_t p = 0; p < window.stride; ++p)
-                WindowRun<Kernel>(window, p, static_cast<std::uint32_t>(x), n,
-                                  reinterpret_cast<Part*>(out + x * bands));
-        };
-        const auto one = [&](const Cell<T>& cell, std::size_t x, std::uint32_t band) {
-            return WindowCell<Kernel>(window, cell, static_cast<std::uint32_t>(x), band);
-        };
         // Cells whose taps all lie inside the level.
         const std::size_t from = std::min<std::size_t>(cells, Kernel::kReach / 2);
         const std::size_t beyond = width > Kernel::kReach ? (width - Kernel::kReach + 1) / 2 : 0;
         const std::size_t to = std::clamp<std::size_t>(beyond, from, cells);
         const bool allRows = std::all_of(parts, parts + rows, [](const Part* r) { return r; });
-        Reduce(0, from, rows, 0, false, run, one);
-        Reduce(from, to, rows, Kernel::kReach - 1, allRows, run, one);
-        Reduce(to, cells, rows, 0, false, run, one);
+        Reduce(0, from, rows, 0, false);
+        Reduce(from, to, rows, Kernel::kReach - 1, allRows);
+        Reduce(to, cells, rows, 0, false);
     }
 
 private:
-    // Cells [from, to). run(x, n) fills cells that are valid with all samples up to `halo` columns
-    // and rows around them, where runs are possible at all; one(cell, x, band) computes any.
-    template <class Run, class One>
-    void Reduce(std::size_t from, std::size_t to, std::size_t rows, std::size_t halo, bool runs,
-                Run run, One one) {
-        if (!source.masks && runs) return ReduceRun(from, to - from, run, one);
+    // Cells [from, to), of which runs may be taken if `runs`.
+    void Reduce(std::size_t from, std::size_t to, std::size_t rows, std::size_t halo, bool runs) {
+        if (!source.masks && runs) return ReduceRun(from, to - from);
         for (std::size_t x = from; x < to; x += kBlock) {
             const std::size_t n = std::min(kBlock, to - x);
             if (runs && Full(x, n, rows, halo))
-                ReduceRun(x, n, run, one);
+                ReduceRun(x, n);
             else
-                ReduceMixed(x, n, rows, halo, runs, run, one);
+                ReduceMixed(x, n, rows, halo, runs);
         }
     }
 
     // A long run that is not wholly valid, in short ones.
-    template <class Run, class One>
     void ReduceMixed(std::size_t from, std::size_t count, std::size_t rows, std::size_t halo,
-                     bool runs, Run run, One one) {
+                     bool runs) {
         for (std::size_t x = from; x < from + count; x += kShortBlock) {
             const std::size_t n = std::min(kShortBlock, from + count - x);
             if (Empty(x, n))
                 FillInvalid(x, n);
             else if (runs && Full(x, n, rows, halo))
-                ReduceRun(x, n, run, one);
+                ReduceRun(x, n);
             else
-                ReduceEach(x, n, one);
+                (this->*each)(x, n);
         }
     }
 
@@ -141,20 +127,18 @@ private:
                NoneMarked(source.masks, rows, (2 * x - halo) * bands, 2 * (n + halo) * bands);
     }
 
-    template <class Run, class One>
-    void ReduceRun(std::size_t x, std::size_t n, Run run, One one) {
+    void ReduceRun(std::size_t x, std::size_t n) {
         if (n == 0) return;
-        run(x, n);
+        (this->*run)(x, n);
         if (outMask) std::memset(outMask + x * bands, 0, n * bands);
         for (std::uint32_t band = 0; noData && band < bands; ++band) {
-            if (noData[band].hasValue) MoveOffNoData(x, n, band, one);
+            if (noData[band].hasValue) MoveOffNoData(x, n, band);
         }
     }
 
     // Results that read as no data are rare: they are looked for in a loop of its own, and computed
     // again for the side on which the exact result lies.
-    template <class One>
-    void MoveOffNoData(std::size_t x, std::size_t n, std::uint32_t band, One one) {
+    void MoveOffNoData(std::size_t x, std::size_t n, std::uint32_t band) {
         const zelm::NoDataRule<T>& rule = noData[band];
         const T* const results = out + x * bands + band;
         bool found = false;
@@ -162,18 +146,19 @@ private:
         if (!found) return;
         for (std::size_t i = x; i < x + n; ++i) {
             T& result = out[i * bands + band];
-            if (result == rule.value) result = KeptValid(one(ValidSamples(i, band), i, band), rule);
+            if (result == rule.value)
+                result = KeptValid((this->*one)(ValidSamples(i, band), i, band), rule);
         }
     }
 
-    template <class One>
-    void ReduceEach(std::size_t x, std::size_t n, One one) {
+    template <class Compute>
+    void ReduceEach(std::size_t x, std::size_t n, Compute compute) {
         for (std::size_t i = x; i < x + n; ++i) {
             for (std::uint32_t band = 0; band < bands; ++band) {
                 const Cell<T> cell = ValidSamples(i, band);
                 const std::size_t at = i * bands + band;
                 out[at] = cell.count == 0 ? InvalidValue(Rule(band))
-                                          : KeptValid(one(cell, i, band), Rule(band));
+                                          : KeptValid(compute(cell, i, band), Rule(band));
                 if (outMask) outMask[at] = cell.count == 0 ? 1 : 0;
             }
         }
@@ -224,15 +209,51 @@ private:
         }
     }
 
+    template <Resampling method>
+    Rounded<T> OneCell(const Cell<T>& cell, std::size_t, std::uint32_t) const {
+        return ReduceCell<method>(cell);
+    }
+
+    template <Resampling method>
+    void EachCell(std::size_t x, std::size_t n) {
+        ReduceEach(x, n, [](const Cell<T>& cell, std::size_t, std::uint32_t) {
+            return ReduceCell<method>(cell);
+        });
+    }
+
+    PartRows<Part> TapRows() const { return {parts, source.masks, kParts * bands, bands, width}; }
+
     template <class Kernel>
-    static Rounded<T> WindowCell(const PartRows<Part>& window, const Cell<T>& cell, std::uint32_t x,
+    void WindowRunOf(std::size_t x, std::size_t n) {
+        const PartRows<Part> rows = TapRows();
+        for (std::size_t p = 0; p < rows.stride; ++p)
+            WindowRun<Kernel>(rows, p, static_cast<std::uint32_t>(x), n,
+                              reinterpret_cast<Part*>(out + x * bands));
+    }
+
+    template <class Kernel>
+    static Rounded<T> WindowCell(const PartRows<Part>& rows, const Cell<T>& cell, std::size_t x,
                                  std::uint32_t band) {
+        const auto at = static_cast<std::uint32_t>(x);
         if constexpr (zelm::kIsComplex<T>)
             return Joined(
-                WindowPart<Kernel>(window, 2 * std::size_t{band}, band, x, cell.values[0].re),
-                WindowPart<Kernel>(window, 2 * std::size_t{band} + 1, band, x, cell.values[0].im));
+                WindowPart<Kernel>(rows, 2 * std::size_t{band}, band, at, cell.values[0].re),
+                WindowPart<Kernel>(rows, 2 * std::size_t{band} + 1, band, at, cell.values[0].im));
         else
-            return WindowPart<Kernel>(window, band, band, x, cell.values[0]);
+            return WindowPart<Kernel>(rows, band, band, at, cell.values[0]);
+    }
+
+    template <class Kernel>
+    Rounded<T> OneWindow(const Cell<T>& cell, std::size_t x, std::uint32_t band) const {
+        return WindowCell<Kernel>(TapRows(), cell, x, band);
+    }
+
+    template <class Kernel>
+    void EachWindow(std::size_t x, std::size_t n) {
+        const PartRows<Part> rows = TapRows();
+        ReduceEach(x, n, [&rows](const Cell<T>& cell, std::size_t i, std::uint32_t band) {
+            return WindowCell<Kernel>(rows, cell, i, band);
+        });
     }
 
     zelm::NoDataRule<T> Rule(std::uint32_t band) const {
@@ -246,7 +267,17 @@ private:
     const zelm::NoDataRule<T>* const noData;
     T* const out;
     unsigned char* const outMask;
-    std::size_t center = 0;  // the first row of the pair
+    std::size_t center = 0;                             // the first row of the pair
+    const Part* parts[2 * LanczosKernel::kReach] = {};  // the rows of a window
+
+    // The method, as what is called for many cells, so that all around it is compiled once.
+    // Fills cells that are valid with all samples that their windows tap:
+    void (RowReducer::*run)(std::size_t x, std::size_t n) = nullptr;
+    // fills any cells one by one:
+    void (RowReducer::*each)(std::size_t x, std::size_t n) = nullptr;
+    // computes any one:
+    Rounded<T> (RowReducer::*one)(const Cell<T>& cell, std::size_t x,
+                                  std::uint32_t band) const = nullptr;
 };
 
 // The methods that need an order, or a root of squares.

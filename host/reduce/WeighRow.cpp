@@ -15,7 +15,8 @@
 namespace zmchost {
 namespace {
 
-constexpr int kMostTaps = 4 * LanczosKernel::kReach * LanczosKernel::kReach;
+constexpr int kMostTapsOfARow = 2 * LanczosKernel::kReach;
+constexpr int kMostTaps = kMostTapsOfARow * kMostTapsOfARow;
 constexpr std::uint64_t kMostAlpha = ~std::uint32_t{0};  // that counts, so that all sums fit
 
 template <class T>
@@ -66,7 +67,8 @@ inline constexpr int kAlphaBits = std::min(8 * static_cast<int>(sizeof(T)), 32);
 // Whether so little weight is left that what negative taps subtract would show.
 template <class Kernel, class Sum>
 bool IsThin(Sum weights, Sum largest) {
-    return weights < static_cast<Sum>(kWholeWeight<Kernel> / 4) * largest;
+    constexpr std::int64_t quarter = kWholeWeight<Kernel> / 4;
+    return weights < static_cast<Sum>(quarter) * largest;
 }
 
 // Sums over all taps, and over those of positive weight.
@@ -286,18 +288,75 @@ std::optional<Rgba> MixedColor(const Taps<T>& taps, const ColorIndex& colors) {
     return mixed;
 }
 
-// One call of WeighRow. Runs of cells whose taps weigh alike are left as they are.
+// A method as values: what walks over a row is compiled once for all of them.
+template <class T>
+struct WeighingMethod {
+    int reach;
+    std::array<std::int64_t, kMostTapsOfARow> kernel;
+    bool computes;
+    std::optional<Rounded<T>> (*result)(const Taps<T>& taps);
+    std::optional<Rgba> (*mixed)(const Taps<T>& taps, const ColorIndex& colors);
+};
+
 template <class T, Resampling method, class Kernel>
+constexpr WeighingMethod<T> MakeMethod() {
+    WeighingMethod<T> values{Kernel::kReach,
+                             {},
+                             Computes(method),
+                             &WeighedResult<method, Kernel, T>,
+                             &MixedColor<Kernel, method == Resampling::Rms, T>};
+    for (int tap = 0; tap < 2 * Kernel::kReach; ++tap)
+        values.kernel[static_cast<std::size_t>(tap)] = Weight<Kernel>(tap);
+    return values;
+}
+
+template <class T, Resampling method, class Kernel>
+constexpr WeighingMethod<T> kMethod = MakeMethod<T, method, Kernel>();
+
+// Null where samples are taken as they are, whatever they weigh.
+template <class T>
+const WeighingMethod<T>* MethodOf(Resampling method) {
+    switch (method) {
+#define ZMC_METHOD(name, Kernel) \
+    case Resampling::name:       \
+        return &kMethod<T, Resampling::name, Kernel>;
+        ZMC_METHOD(Average, BoxKernel)
+        ZMC_METHOD(Bilinear, BilinearKernel)
+        ZMC_METHOD(Cubic, CubicKernel)
+        ZMC_METHOD(Lanczos, LanczosKernel)
+        ZMC_METHOD(Gauss, GaussKernel)
+        ZMC_METHOD(CubicSpline, CubicSplineKernel)
+        default:
+            break;
+    }
+    if constexpr (!zelm::kIsComplex<T>) {
+        switch (method) {
+            ZMC_METHOD(Rms, BoxKernel)
+            ZMC_METHOD(Mode, BoxKernel)
+            ZMC_METHOD(Minimum, BoxKernel)
+            ZMC_METHOD(Maximum, BoxKernel)
+            ZMC_METHOD(Median, BoxKernel)
+            default:
+                break;
+        }
+    }
+#undef ZMC_METHOD
+    return nullptr;
+}
+
+// One call of WeighRow. Runs of cells whose taps weigh alike are left as they are.
+template <class T>
 class RowWeigher {
     static constexpr std::size_t kBlock = 32;  // cells that are judged together
-    static constexpr int kTaps = 2 * Kernel::kReach;
-    static constexpr int kHalo = Kernel::kReach - 1;
 
 public:
-    RowWeigher(std::uint32_t bandCount, std::uint32_t pixels, const ReductionRows<T>& rows,
-               const zelm::NoDataRule<T>* rules, const Weighing& weights, T* row,
-               unsigned char* rowMask)
-        : bands(bandCount),
+    RowWeigher(const WeighingMethod<T>& chosen, std::uint32_t bandCount, std::uint32_t pixels,
+               const ReductionRows<T>& rows, const zelm::NoDataRule<T>* rules,
+               const Weighing& weights, T* row, unsigned char* rowMask)
+        : method(chosen),
+          taps(2 * chosen.reach),
+          halo(chosen.reach - 1),
+          bands(bandCount),
           width(pixels),
           source(rows),
           noData(rules),
@@ -317,15 +376,17 @@ public:
 
 private:
     const ColorIndex* Colors(std::size_t band) const {
-        return Computes(method) && !zelm::kIsComplex<T> ? weighing.bands[band].colors.get()
-                                                        : nullptr;
+        return method.computes && !zelm::kIsComplex<T> ? weighing.bands[band].colors.get()
+                                                       : nullptr;
     }
     std::uint32_t AlphaBand(std::size_t band) const {
-        return zelm::kIsComplex<T> ? BandWeighing::kNoBand : weighing.bands[band].alpha;
+        if constexpr (zelm::kIsComplex<T>) return BandWeighing::kNoBand;
+        return weighing.bands[band].alpha;
     }
     zelm::NoDataRule<T> Rule(std::size_t band) const {
         return noData ? noData[band] : zelm::NoDataRule<T>{};
     }
+    std::int64_t Weight(int tap) const { return method.kernel[static_cast<std::size_t>(tap)]; }
     unsigned char MaskAt(int row, std::size_t at) const {
         const unsigned char* const mask = source.masks ? source.masks[row] : nullptr;
         return mask ? mask[at] : 0;
@@ -337,11 +398,12 @@ private:
     // Whether all samples of a band that the cells tap weigh the same, and something.
     bool Alike(std::size_t x, std::size_t n, std::size_t band) const {
         const std::uint32_t alpha = AlphaBand(band);
-        const std::size_t first = 2 * x - std::min<std::size_t>(2 * x, kHalo);
-        const std::size_t last = std::min<std::size_t>(2 * (x + n) + kHalo, width);
+        const std::size_t first = 2 * x - std::min(2 * x, static_cast<std::size_t>(halo));
+        const std::size_t last =
+            std::min<std::size_t>(2 * (x + n) + static_cast<std::size_t>(halo), width);
         bool alike = true;
         const T* reference = nullptr;
-        for (int r = 0; r < kTaps && alike; ++r) {
+        for (int r = 0; r < taps && alike; ++r) {
             if (!source.rows[r]) continue;
             if (weighing.hidden && source.masks && source.masks[r])
                 alike = NoneOf(source.masks[r], kHiddenBit, first, last, band);
@@ -365,7 +427,7 @@ private:
     // Calls visit(sample, mask byte) for the cell's own samples, in reading order.
     template <class Visitor>
     void VisitOwn(std::size_t x, std::size_t band, Visitor visit) const {
-        for (int r = kHalo; r < kHalo + 2; ++r) {
+        for (int r = halo; r < halo + 2; ++r) {
             if (!source.rows[r]) continue;
             for (std::size_t c = 2 * x; c < 2 * x + 2; ++c)
                 visit(source.rows[r][c * bands + band], MaskAt(r, c * bands + band));
@@ -373,27 +435,28 @@ private:
     }
 
     Taps<T> Gather(std::size_t x, std::size_t band) const {
-        Taps<T> taps;
-        const auto left = static_cast<std::int64_t>(2 * x) - kHalo;
-        for (int r = 0; r < kTaps; ++r) {
+        Taps<T> gathered;
+        const auto left = static_cast<std::int64_t>(2 * x) - halo;
+        for (int r = 0; r < taps; ++r) {
             if (!source.rows[r]) continue;
-            for (int c = 0; c < kTaps; ++c) {
-                const std::int64_t kernel = Weight<Kernel>(r) * Weight<Kernel>(c);
+            for (int c = 0; c < taps; ++c) {
+                const std::int64_t kernel = Weight(r) * Weight(c);
                 if (kernel != 0 && left + c >= 0 && left + c < static_cast<std::int64_t>(width))
-                    Take(taps, r, static_cast<std::size_t>(left + c), band, kernel);
+                    Take(gathered, r, static_cast<std::size_t>(left + c), band, kernel);
             }
         }
-        return taps;
+        return gathered;
     }
 
-    void Take(Taps<T>& taps, int row, std::size_t column, std::size_t band,
+    void Take(Taps<T>& gathered, int row, std::size_t column, std::size_t band,
               std::int64_t kernel) const {
         const std::size_t at = column * bands + band;
         const unsigned char mask = MaskAt(row, at);
         if ((mask & kInvalidBit) != 0) return;
         const AlphaType<T> alpha = Hides(mask) ? 0 : AlphaAt(row, column, band);
-        taps.alike = taps.alike && alpha > 0 && (taps.count == 0 || alpha == taps.all[0].alpha);
-        if (alpha > 0) taps.all[taps.count++] = {source.rows[row][at], kernel, alpha};
+        gathered.alike =
+            gathered.alike && alpha > 0 && (gathered.count == 0 || alpha == gathered.all[0].alpha);
+        if (alpha > 0) gathered.all[gathered.count++] = {source.rows[row][at], kernel, alpha};
     }
 
     AlphaType<T> AlphaAt(int row, std::size_t column, std::size_t band) const {
@@ -422,30 +485,31 @@ private:
             }
         }
         if (outMask && (outMask[at] & kInvalidBit) != 0) return;
-        const Taps<T> taps = Gather(x, band);
+        const Taps<T> gathered = Gather(x, band);
         if (const ColorIndex* const colors = Colors(band))
-            MendIndex(x, band, taps, *colors);
-        else if (!taps.alike)
-            MendQuantity(x, band, taps);
+            MendIndex(x, band, gathered, *colors);
+        else if (!gathered.alike)
+            MendQuantity(x, band, gathered);
     }
 
-    void MendQuantity(std::size_t x, std::size_t band, const Taps<T>& taps) {
+    void MendQuantity(std::size_t x, std::size_t band, const Taps<T>& gathered) {
         std::optional<Rounded<T>> result;
-        if (taps.count > 0) result = WeighedResult<method, Kernel>(taps);
+        if (gathered.count > 0) result = method.result(gathered);
         if (!result) return LeaveUnweighed(x, band);
         out[x * bands + band] = KeptValid(*result, Rule(band));
     }
 
-    void MendIndex(std::size_t x, std::size_t band, const Taps<T>& taps, const ColorIndex& colors) {
-        if (taps.count == 0) return LeaveUnweighed(x, band);
+    void MendIndex(std::size_t x, std::size_t band, const Taps<T>& gathered,
+                   const ColorIndex& colors) {
+        if (gathered.count == 0) return LeaveUnweighed(x, band);
         T& result = out[x * bands + band];
-        const T& first = taps.all[0].value;
-        if (std::all_of(taps.begin(), taps.end(),
+        const T& first = gathered.all[0].value;
+        if (std::all_of(gathered.begin(), gathered.end(),
                         [&](const Tap<T>& tap) { return tap.value == first; })) {
             result = first;
             return;
         }
-        const auto color = MixedColor<Kernel, method == Resampling::Rms>(taps, colors);
+        const auto color = method.mixed(gathered, colors);
         const auto nearest = color ? colors.Nearest(*color) : std::nullopt;
         if (!nearest)
             return TakeFirst(x, band, weighing.hidden ? kInvalidBit | kHiddenBit : kInvalidBit);
@@ -474,6 +538,9 @@ private:
         });
     }
 
+    const WeighingMethod<T>& method;
+    const int taps;  // of a row
+    const int halo;
     const std::size_t bands;
     const std::uint32_t width;
     const ReductionRows<T>& source;
@@ -491,47 +558,12 @@ bool Weighing::Any() const {
            });
 }
 
-bool Computes(Resampling method) {
-    return method == Resampling::Average || method == Resampling::Rms ||
-           method >= Resampling::Bilinear;
-}
-
 template <class T>
 void WeighRow(Resampling method, std::uint32_t bands, std::uint32_t sourceWidth,
               const ReductionRows<T>& source, const zelm::NoDataRule<T>* noData,
               const Weighing& weighing, T* out, unsigned char* outMask) {
-    const auto run = [&]<Resampling chosen, class Kernel>(
-                         std::integral_constant<Resampling, chosen>, Kernel) {
-        RowWeigher<T, chosen, Kernel>(bands, sourceWidth, source, noData, weighing, out, outMask)
-            .Run();
-    };
-    switch (method) {
-#define ZMC_METHOD(name, Kernel) \
-    case Resampling::name:       \
-        return run(std::integral_constant<Resampling, Resampling::name>(), Kernel());
-        ZMC_METHOD(Average, BoxKernel)
-        ZMC_METHOD(Bilinear, BilinearKernel)
-        ZMC_METHOD(Cubic, CubicKernel)
-        ZMC_METHOD(Lanczos, LanczosKernel)
-        ZMC_METHOD(Gauss, GaussKernel)
-        ZMC_METHOD(CubicSpline, CubicSplineKernel)
-        case Resampling::Nearest:
-            return;
-        default:
-            break;
-    }
-    if constexpr (!zelm::kIsComplex<T>) {
-        switch (method) {
-            ZMC_METHOD(Rms, BoxKernel)
-            ZMC_METHOD(Mode, BoxKernel)
-            ZMC_METHOD(Minimum, BoxKernel)
-            ZMC_METHOD(Maximum, BoxKernel)
-            ZMC_METHOD(Median, BoxKernel)
-            default:
-                return;
-        }
-    }
-#undef ZMC_METHOD
+    if (const WeighingMethod<T>* const chosen = MethodOf<T>(method))
+        RowWeigher<T>(*chosen, bands, sourceWidth, source, noData, weighing, out, outMask).Run();
 }
 
 #define ZMC_X(type, name, code)                                                                  \

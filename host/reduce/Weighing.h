@@ -72,7 +72,10 @@ struct Weighing {
 };
 
 // Whether the method computes a value that no sample need have.
-bool Computes(Resampling method);
+constexpr bool Computes(Resampling method) {
+    return method == Resampling::Average || method == Resampling::Rms ||
+           method >= Resampling::Bilinear;
+}
 
 // Called behind ReduceRow with the same arguments. `weighing` has an entry per band.
 // outMask: may be null only where no band has a no-data value and no row has a mask; kHiddenBit is

@@ -106,7 +106,7 @@ class KnownFiles(AttackTest):
         self.assertHarmless(plain(BANDS=65536, PIXEL_WIDTH=0))
 
     def test_many_bands_and_levels(self):
-        self.assertHarmless(plain(BANDS=65536, PIXEL_HEIGHT=1, PIXEL_WIDTH=1, LEVELMAX=1023,
+        self.assertHarmless(plain(BANDS=many(65536), PIXEL_HEIGHT=1, PIXEL_WIDTH=1, LEVELMAX=1023,
                                   BUILD_METHOD="Morton"))
 
     def test_levels_with_all_bands_of_a_wide_raster(self):
@@ -147,7 +147,7 @@ class KnownFiles(AttackTest):
         self.assertHarmless(draft)
 
     def test_statistics_of_reals_of_all_bands_there_may_be(self):
-        draft = plain(BANDS=65536, BUILD_METHOD="Morton", PIXEL_WIDTH=1, PIXEL_HEIGHT=1,
+        draft = plain(BANDS=many(65536), BUILD_METHOD="Morton", PIXEL_WIDTH=1, PIXEL_HEIGHT=1,
                       PIXEL_TYPE="Double")
         draft.records = [draft.statistics(band) for band in range(many(1000))]
         self.assertHarmless(draft)
@@ -212,7 +212,7 @@ class KnownFiles(AttackTest):
         self.assertHarmless(draft)
 
     def test_a_store_that_never_ended(self):
-        draft = plain(BANDS=65536, BUILD_METHOD="Morton", PIXEL_WIDTH=1, PIXEL_HEIGHT=1)
+        draft = plain(BANDS=many(65536), BUILD_METHOD="Morton", PIXEL_WIDTH=1, PIXEL_HEIGHT=1)
         records = "".join(draft.statistics(band) for band in range(many(2000)))
         draft.document = "\x1a" + records
         self.assertHarmless(draft)
@@ -311,14 +311,15 @@ class HonestFiles(AttackTest):
         return dataset
 
     def test_many_bands_of_a_small_raster(self):
-        draft = plain(BANDS=65536, BUILD_METHOD="Morton", PIXEL_WIDTH=4, PIXEL_HEIGHT=4, LEVELMAX=2)
+        bands = many(65536)
+        draft = plain(BANDS=bands, BUILD_METHOD="Morton", PIXEL_WIDTH=4, PIXEL_HEIGHT=4, LEVELMAX=2)
         draft.body = b"1" * draft.tile_bytes()
-        dataset = self.opens(draft, 65536)
+        dataset = self.opens(draft, bands)
         if dataset:
-            overview = dataset.GetRasterBand(65536).GetOverview(0)
+            overview = dataset.GetRasterBand(bands).GetOverview(0)
             self.assertEqual((overview.XSize, overview.YSize), (2, 2))
             self.assertIsNotNone(overview.ReadRaster(0, 0, 2, 2))
-            self.assertEqual(len(dataset.ReadRaster(0, 0, 4, 4, 2, 2)), 4 * 65536)
+            self.assertEqual(len(dataset.ReadRaster(0, 0, 4, 4, 2, 2)), 4 * bands)
 
     def test_a_raster_of_the_whole_earth(self):
         for ordering in ("Blocked", "Scanline"):

@@ -136,7 +136,9 @@ std::optional<std::uint64_t> Campaign::Only() {
 
 Campaign::Campaign(std::string campaignName, std::uint64_t shortStride)
     : name(std::move(campaignName)),
-      stride(zmctest::IsFullCampaign() || Only() ? 1 : shortStride),
+      stride(zmctest::IsFullCampaign() || Only()
+                 ? 1
+                 : zmctest::WithSanitizers<std::uint64_t>(4, 1) * shortStride),
       phase(FirstVariant(stride)) {
     CatchDeath();
 }

@@ -14,6 +14,7 @@
 #include "tests/campaigns/Silence.h"
 #include "tests/support/CampaignLength.h"
 #include "tests/support/FileFaults.h"
+#include "tests/support/Sanitizers.h"
 
 namespace zmctest {
 namespace {
@@ -51,6 +52,7 @@ protected:
     static std::size_t Stride(std::size_t shortForm = 1) {
         std::size_t times = GetParam().bands > 8 ? 7 : 1;
         if (GetParam().lent) times *= 5;
+        times *= zmctest::WithSanitizers<std::size_t>(3, 1);
         return zmctest::CampaignLength<std::size_t>(shortForm * times, 1);
     }
 

@@ -424,11 +424,11 @@ void FileTrial::Store(const Bytes& before, const FileOracle& oracle, Verdict& ve
         if (stores.meta.histograms.size() != oracle.meta.histograms.size())
             verdict.Complain("a store has changed the number of histograms");
     }
-    Verdict again;
-    again.cost = verdict.cost;
-    Look(stores, {.stores = false}, again);
-    verdict.cost = again.cost;
-    for (const std::string& complaint : again.complaints)
+    Verdict repeated;
+    repeated.cost = verdict.cost;
+    Look(stores, {.stores = false}, repeated);
+    verdict.cost = repeated.cost;
+    for (const std::string& complaint : repeated.complaints)
         verdict.Complain("after a store: " + complaint);
 }
 

@@ -7,6 +7,7 @@
 
 #include "core/NumericConversion.h"
 #include "dispatch/NoDataMask.h"
+#include "tests/dispatch/MarkedSample.h"
 #include "tests/dispatch/PropsReader.h"
 #include "tests/support/ElementTypeList.h"
 #include "tests/support/TileModel.h"
@@ -14,6 +15,7 @@
 namespace zmctest {
 
 using namespace zelm;
+using zmctest::IsMarked;
 namespace {
 
 // Few values, so that samples equal no-data values often, and all the special ones.
@@ -45,23 +47,6 @@ T SpecialSample(Random& random) {
                                 std::numeric_limits<T>::max()};
         return values[random.Between(0, std::size(values) - 1)];
     }
-}
-
-template <class Real>
-bool IsFinite(Real x) {
-    return std::numeric_limits<Real>::lowest() <= x && x <= std::numeric_limits<Real>::max();
-}
-
-// The rule in words: equal to the value, or, where the type can be so, not finite.
-template <class T>
-bool IsMarked(const T& x, bool hasValue, const T& value) {
-    if constexpr (kIsComplex<T>)
-        return (hasValue && x.re == value.re && x.im == value.im) || !IsFinite(x.re) ||
-               !IsFinite(x.im);
-    else if constexpr (std::is_floating_point_v<T>)
-        return (hasValue && x == value) || !IsFinite(x);
-    else
-        return hasValue && x == value;
 }
 
 template <class T>

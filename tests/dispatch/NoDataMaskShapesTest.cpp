@@ -10,6 +10,7 @@
 
 #include "core/NumericConversion.h"
 #include "dispatch/NoDataMask.h"
+#include "tests/dispatch/MarkedSample.h"
 #include "tests/dispatch/PropsReader.h"
 #include "tests/support/ElementTypeList.h"
 #include "tests/support/TileModel.h"
@@ -17,6 +18,7 @@
 namespace zmctest {
 
 using namespace zelm;
+using zmctest::IsMarked;
 namespace {
 
 // Which bands have a no-data value, and which.
@@ -61,17 +63,6 @@ T SampleAt(std::size_t number) {
     } else {
         return static_cast<T>(number * 7 % 6);
     }
-}
-
-template <class T>
-bool IsMarked(const T& x, bool hasValue, const T& value) {
-    if constexpr (kIsComplex<T>)
-        return (hasValue && x.re == value.re && x.im == value.im) || !std::isfinite(x.re) ||
-               !std::isfinite(x.im);
-    else if constexpr (std::is_floating_point_v<T>)
-        return (hasValue && x == value) || !std::isfinite(x);
-    else
-        return hasValue && x == value;
 }
 
 template <class T>

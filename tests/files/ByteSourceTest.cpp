@@ -14,16 +14,14 @@
 #include "files/MemorySource.h"
 #include "files/RecordingSource.h"
 #include "tests/support/FaultySource.h"
+#include "tests/support/TextSource.h"
 
 namespace zelm::files {
 namespace {
 
 using zmctest::FaultySource;
+using zmctest::Holding;
 using zmctest::SourceFault;
-
-std::shared_ptr<MemorySource> Holding(const std::string& text) {
-    return std::make_shared<MemorySource>(MemorySource::Bytes(text.begin(), text.end()));
-}
 
 class Border : public testing::Test {
 protected:

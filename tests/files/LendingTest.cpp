@@ -21,6 +21,7 @@
 #include "files/OpenSource.h"
 #include "tests/support/ChildProcess.h"
 #include "tests/support/ScratchDirectory.h"
+#include "tests/support/TextSource.h"
 
 namespace {
 // What the system's randomness answers in place of its own, while set.
@@ -39,11 +40,8 @@ extern "C" __attribute__((visibility("default"))) ssize_t getrandom(void* buffer
 namespace zelm::files {
 namespace {
 
+using zmctest::Holding;
 using SourcePtr = std::shared_ptr<ByteSource>;
-
-std::shared_ptr<MemorySource> Holding(const std::string& text) {
-    return std::make_shared<MemorySource>(MemorySource::Bytes(text.begin(), text.end()));
-}
 
 std::string TextOf(ByteSource& source) {
     std::string text(32, '#');

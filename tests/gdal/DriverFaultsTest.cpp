@@ -128,7 +128,7 @@ TEST_F(DriverFaults, BlocksOfOtherBandsWaitUntilTheirTileIsWritten) {
         Fill(*dataset, 1, 11);
         Fill(*dataset, 2, 12);
         const FileFaults faults(
-            {folder.String(), zmctest::kWriteCall, 1, false, FileFaultAction::Error, ENOSPC});
+            {name, zmctest::kWriteCall, 1, false, FileFaultAction::Error, ENOSPC});
         CPLErrorReset();
         dataset->FlushCache(false);
         EXPECT_EQ(CPLGetLastErrorType(), CE_Failure);
@@ -162,8 +162,7 @@ TEST_F(DriverFaults, LevelsAreNotMadeOfPixelsThatCouldNotBeWritten) {
     const DatasetPtr dataset = Open(GDAL_OF_UPDATE);
     ASSERT_TRUE(dataset);
     Fill(*dataset, 1, 9);
-    const FileFaults faults(
-        {folder.String(), zmctest::kWriteCall, 1, false, FileFaultAction::Error, ENOSPC});
+    const FileFaults faults({name, zmctest::kWriteCall, 1, false, FileFaultAction::Error, ENOSPC});
     const int factors[] = {2};
     EXPECT_EQ(dataset->BuildOverviews("AVERAGE", 1, factors, 0, nullptr, nullptr, nullptr),
               CE_Failure);
@@ -196,7 +195,7 @@ TEST_F(DriverFaults, LevelsThatWereRenewedBeforeAFailureAreSeen) {
     {
         // The first level has nine tiles.
         const FileFaults faults(
-            {folder.String(), zmctest::kWriteCall, 10, true, FileFaultAction::Error, ENOSPC});
+            {name, zmctest::kWriteCall, 10, true, FileFaultAction::Error, ENOSPC});
         const int factors[] = {2, 4};
         EXPECT_EQ(dataset->BuildOverviews("AVERAGE", 2, factors, 0, nullptr, look, &looking),
                   CE_Failure);

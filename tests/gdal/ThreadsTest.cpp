@@ -105,6 +105,31 @@ TEST(Jobs, TheFailureOfTheFirstIsToldOnceOnTheThreadThatAsked) {
     }
 }
 
+TEST(Jobs, WarningsAreToldOnceEachOnTheThreadThatAskedBeforeAFailure) {
+    const auto warn = [](std::uint64_t job) {
+        CPLError(CE_Warning, CPLE_NotSupported, "of %d", static_cast<int>(job % 3));
+    };
+    const Worker work = [&](std::uint64_t job) {
+        warn(job);
+        return true;
+    };
+    const Worker fail = [&](std::uint64_t job) -> bool {
+        warn(job);
+        throw zmchost::Error("a file", "be read", "of that");
+    };
+    for (const std::uint32_t threads : {1U, 4U}) {
+        const Told told;
+        CPLErrorReset();
+        EXPECT_TRUE(RunJobs(300, threads, [&] { return Alike(work); }, {}));
+        EXPECT_EQ(told.texts, (std::vector<std::string>{"of 0", "of 1", "of 2"}));
+        EXPECT_EQ(CPLGetLastErrorType(), CE_Warning);
+        EXPECT_EQ(CPLGetLastErrorNo(), CPLE_NotSupported);
+    }
+    const Told told;
+    EXPECT_FALSE(RunJobs(1, 1, [&] { return Alike(fail); }, {}));
+    EXPECT_EQ(told.texts, (std::vector<std::string>{"of 0", "a file: cannot be read: of that"}));
+}
+
 TEST(Jobs, FailuresWithoutAWordAndExceptionsAreFailures) {
     const Worker silent = [](std::uint64_t job) { return job != 5; };
     const Worker loud = [](std::uint64_t job) -> bool {
@@ -395,11 +420,11 @@ TEST_F(Threads, AskASharedDatasetForAllThatItKnows) {
     ASSERT_TRUE(shared->Share());
     GDALRasterBand& band = *shared->GetRasterBand(1);
     AtOnce([&](std::uint32_t) {
-        char** const items = band.GetMetadata();
+        const Items items = band.GetMetadata();
         double mean = 0, place[6] = {};
         EXPECT_EQ(band.GetStatistics(FALSE, FALSE, nullptr, nullptr, &mean, nullptr), CE_None);
         EXPECT_GT(mean, 0);
-        EXPECT_EQ(shared->GetGeoTransform(place), CE_None);
+        EXPECT_EQ(GDALGetGeoTransform(GDALDataset::ToHandle(shared.get()), place), CE_None);
         EXPECT_EQ(place[3], 20);
         ASSERT_TRUE(band.GetColorTable());
         EXPECT_EQ(band.GetColorTable()->GetColorEntry(1)->c3, 3);
@@ -427,7 +452,7 @@ TEST_F(Threads, ChangeNothingOfASharedDataset) {
         ASSERT_TRUE(shared->Share());
         GDALRasterBand& band = *shared->GetRasterBand(1);
         double place[] = {10, 1, 0, 20, 0, -1};
-        EXPECT_EQ(shared->SetGeoTransform(place), CE_Failure);
+        EXPECT_EQ(GDALSetGeoTransform(GDALDataset::ToHandle(shared.get()), place), CE_Failure);
         EXPECT_EQ(shared->SetMetadataItem("KEY", "value"), CE_Failure);
         EXPECT_EQ(shared->CreateMaskBand(GMF_PER_DATASET), CE_Failure);
         EXPECT_EQ(band.SetNoDataValue(1), CE_Failure);

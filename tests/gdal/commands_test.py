@@ -26,7 +26,8 @@ class Commands(FolderTest):
         if no_data is not None:
             for number in range(array.shape[0]):
                 source.GetRasterBand(number + 1).SetNoDataValue(no_data)
-        gdal.GetDriverByName("GTiff").CreateCopy(self.path(name), source)
+        gdal.GetDriverByName("GTiff").CreateCopy(self.path(name), source,
+                                                 options=["INTERLEAVE=PIXEL"])
 
     def test_translate_there_and_back_for_every_type(self):
         for data_type in TYPES:

@@ -6,7 +6,7 @@ import unittest
 import numpy as np
 from osgeo import gdal
 
-from rasters import DRIVER, FolderTest, memory_dataset, samples
+from rasters import DRIVER, FolderTest, file_sizes_up_to, memory_dataset, samples
 
 
 class Masks(FolderTest):
@@ -55,6 +55,25 @@ class Masks(FolderTest):
         del dataset
         gdal.PopErrorHandler()
         self.assertEqual(self.files(), ["new.pyr"])
+
+    def test_of_a_new_file_that_is_cut_off_goes_again(self):
+        noise = samples(gdal.GDT_Byte, 3000, 3000, 1)
+        dataset = gdal.GetDriverByName(DRIVER).Create(self.path("new.pyr"), 3000, 3000, 1,
+                                                      options=["LEVELS=0", "STATISTICS=NO"])
+        dataset.WriteArray(noise)
+        dataset.CreateMaskBand(gdal.GMF_PER_DATASET)
+        dataset.GetRasterBand(1).GetMaskBand().WriteArray(noise[0])
+        heard = []
+        # Python drops what is thrown there.
+        gdal.DontUseExceptions()
+        self.addCleanup(gdal.UseExceptions)
+        gdal.PushErrorHandler(lambda kind, number, text: heard.append(text))
+        # Noise that GDAL compresses becomes larger than the pyramid.
+        with file_sizes_up_to(noise.size + 4000):
+            del dataset
+        gdal.PopErrorHandler()
+        self.assertEqual(self.files(), [])
+        self.assertRegex("\n".join(heard), r"cannot keep its mask in .*new\.pyr\.msk: ")
 
     def test_of_another_raster_is_not_taken_over(self):
         self.check(self.masked(), self.mask)

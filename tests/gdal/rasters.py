@@ -1,5 +1,7 @@
 """Rasters for the tests of the driver, and what the tests share."""
+import contextlib
 import os
+import resource
 import shutil
 import tempfile
 import unittest
@@ -58,6 +60,17 @@ def halve(array):
     cut = array[..., :height, :width].astype(np.uint32)
     total = cut[..., ::2, ::2] + cut[..., ::2, 1::2] + cut[..., 1::2, ::2] + cut[..., 1::2, 1::2]
     return ((total + 2) // 4).astype(np.uint8)
+
+
+@contextlib.contextmanager
+def file_sizes_up_to(size):
+    """A limit of this process, which ignores the signal that comes with it, as Python does."""
+    before = resource.getrlimit(resource.RLIMIT_FSIZE)
+    resource.setrlimit(resource.RLIMIT_FSIZE, (size, before[1]))
+    try:
+        yield
+    finally:
+        resource.setrlimit(resource.RLIMIT_FSIZE, before)
 
 
 class FolderTest(unittest.TestCase):

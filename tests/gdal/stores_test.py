@@ -60,6 +60,18 @@ class Editing(StoreTest):
             self.assertEqual(len(shown(self.band(other))), 4)
             self.assertTrue(has_histogram(self.band(other)))
 
+    def test_a_flush_leaves_nothing_of_the_sidecar_to_closing(self):
+        dataset = self.update()
+        dataset.GetRasterBand(2).WriteArray(np.full((9, 9), 77, np.uint8))
+        dataset.FlushCache()
+        with open(self.name + ".aux.xml") as sidecar:
+            text = sidecar.read()
+        self.assertIn("OLD_STATISTICS", text)
+        self.assertNotIn("EDITING", text)
+        os.remove(self.name + ".aux.xml")
+        del dataset
+        self.assertEqual(self.files(), ["raster.pyr"])
+
     def test_all_bands_of_blocks_that_waited_together(self):
         dataset = self.update()
         dataset.WriteArray(np.full((3, 9, 9), 3, np.uint8))

@@ -1,14 +1,13 @@
 """Writing pyramids through GDAL: copies, block by block, and in update mode."""
-import contextlib
 import os
-import resource
 import subprocess
 import unittest
 
 import numpy as np
 from osgeo import gdal
 
-from rasters import COMPLEX, DRIVER, TYPES, FolderTest, halve, memory_dataset, place, samples
+from rasters import (COMPLEX, DRIVER, TYPES, FolderTest, file_sizes_up_to, halve, memory_dataset,
+                     place, samples)
 
 
 def quiet(call):
@@ -17,17 +16,6 @@ def quiet(call):
         return call()
     finally:
         gdal.PopErrorHandler()
-
-
-@contextlib.contextmanager
-def file_sizes_up_to(size):
-    """A limit of this process, which ignores the signal that comes with it, as Python does."""
-    before = resource.getrlimit(resource.RLIMIT_FSIZE)
-    resource.setrlimit(resource.RLIMIT_FSIZE, (size, before[1]))
-    try:
-        yield
-    finally:
-        resource.setrlimit(resource.RLIMIT_FSIZE, before)
 
 
 def gdal_levels(name, number):
@@ -342,6 +330,16 @@ class BlockByBlock(FolderTest):
         except RuntimeError:
             pass
         self.assertEqual(self.files(), ["new.pyr"])
+
+    @unittest.skipUnless(hasattr(gdal.Dataset, "Close"), "GDAL closes without an answer")
+    def test_closing_answers_that_a_file_cannot_be_made(self):
+        dataset = self.create(30, 30, 1, gdal.GDT_Byte)
+        os.mkdir(self.path("new.pyr"))
+        # Where closing throws, Python of 3.10 closes once more.
+        gdal.DontUseExceptions()
+        self.addCleanup(gdal.UseExceptions)
+        self.assertEqual(quiet(dataset.Close), gdal.CE_Failure)
+        self.assertIn("cannot replace it: it is a folder", gdal.GetLastErrorMsg())
 
     def test_options_that_do_not_fit_are_refused_at_once(self):
         for data_type, option in ((gdal.GDT_CFloat32, "RESAMPLING=MEDIAN"),

@@ -10,6 +10,7 @@
 #include "files/FileSource.h"
 #include "host/file/MetadataDocument.h"
 #include "host/raster/Raster.h"
+#include "tests/support/CountingSource.h"
 #include "tests/support/FailureOf.h"
 #include "tests/support/MemorySource.h"
 #include "tests/support/ParseCounter.h"
@@ -20,6 +21,7 @@ namespace {
 
 using zelm::files::FileSource;
 using zelm::files::OpenMode;
+using zmctest::CountingSource;
 using zmctest::DocumentParses;
 using zmctest::FailureOf;
 using zmctest::TestModule;
@@ -224,29 +226,6 @@ TEST_F(EmbeddedItemsTest, TheFirstElementOfTheRootCountsAlone) {
     Replace(file, text.erase(text.find(element), element.size()));
     EXPECT_EQ(Items(file), "");
 }
-
-class CountingSource : public zelm::files::ByteSource {
-public:
-    explicit CountingSource(std::shared_ptr<ByteSource> source) : inner(std::move(source)) {}
-    std::uint64_t bytes = 0;
-    int reads = 0;
-
-protected:
-    zelm::files::Transfer DoReadAt(std::uint64_t offset, void* buffer, std::size_t size) override {
-        zelm::files::Transfer done;
-        done.bytes = inner->ReadAt(offset, buffer, size, &done.error);
-        bytes += done.bytes;
-        ++reads;
-        return done;
-    }
-    int DoTellSize(std::uint64_t& size) const override {
-        size = inner->Size();
-        return 0;
-    }
-
-private:
-    std::shared_ptr<ByteSource> inner;
-};
 
 TEST_F(EmbeddedItemsTest, AFileWithoutThemCostsOneShortRead) {
     Make(file, true);

@@ -11,29 +11,25 @@
 #include "host/base/Error.h"
 #include "host/base/Xerces.h"
 #include "host/raster/Raster.h"
+#include "tests/support/FailureOf.h"
 #include "tests/support/MemorySource.h"
 #include "tests/support/ScratchDirectory.h"
 
 namespace zmchost {
 namespace {
 
-std::string FailureOf(const std::string& path) {
-    try {
-        Module::Load(path);
-        return "no failure";
-    } catch (const Error& error) {
-        return error.what();
-    }
+std::string LoadFailure(const std::string& path) {
+    return zmctest::FailureOf([&] { Module::Load(path); });
 }
 
 TEST(Module, FailuresNameTheFileAndTheReason) {
-    EXPECT_THAT(FailureOf("/no/such/module.so"),
+    EXPECT_THAT(LoadFailure("/no/such/module.so"),
                 testing::AllOf(testing::HasSubstr("/no/such/module.so"),
                                testing::HasSubstr("no such file")));
     const zmctest::ScratchDirectory folder;
     zmctest::WriteText(folder / "text.so", "no library");
-    EXPECT_THAT(FailureOf(folder / "text.so"), testing::HasSubstr("no loadable library"));
-    EXPECT_THAT(FailureOf("libtbb.so.12"), testing::HasSubstr("its two functions are not in it"));
+    EXPECT_THAT(LoadFailure(folder / "text.so"), testing::HasSubstr("no loadable library"));
+    EXPECT_THAT(LoadFailure("libtbb.so.12"), testing::HasSubstr("its two functions are not in it"));
 }
 
 TEST(Module, EnvironmentNamesTheDefault) {

@@ -13,25 +13,17 @@
 #include "core/PixelVocabulary.h"
 #include "host/build/PixelWork.h"
 #include "host/build/PyramidBuilder.h"
+#include "tests/support/FailureOf.h"
 #include "tests/support/MemorySource.h"
 #include "tests/support/ScratchDirectory.h"
 
 namespace zmchost {
 namespace {
 
+using zmctest::FailureOf;
 using zmctest::MemorySource;
 using zmctest::ScratchDirectory;
 using zmctest::TestModule;
-
-template <class Action>
-std::string FailureOf(Action&& action) {
-    try {
-        action();
-        return "no failure";
-    } catch (const Error& error) {
-        return error.what();
-    }
-}
 
 template <class T>
 zelm::RasterProps PropsOf(std::uint32_t samples, std::uint32_t lines, std::uint32_t bands) {

@@ -12,6 +12,7 @@
 #include "host/reduce/ReductionWindow.h"
 #include "tests/host/AnyPicture.h"
 #include "tests/host/NaiveReduction.h"
+#include "tests/support/Sanitizers.h"
 
 namespace {
 
@@ -155,7 +156,7 @@ void CheckMethod(Resampling method) {
     const std::uint32_t halo = zmchost::ReductionHalo(method);
     for (const MaskKind kind :
          {MaskKind::None, MaskKind::Clear, MaskKind::Noise, MaskKind::Runs, MaskKind::Full}) {
-        for (int round = 0; round < 12; ++round) {
+        for (int round = 0; round < zmctest::WithSanitizers(4, 12); ++round) {
             const std::uint32_t bands = 1 + static_cast<std::uint32_t>(random() % 5);
             const bool wide = round == 0 && halo <= 1;
             const std::uint32_t width =

@@ -13,6 +13,7 @@
 #include "host/file/MetadataDocument.h"
 #include "host/file/StoredRecords.h"
 #include "host/raster/Raster.h"
+#include "tests/support/CountingSource.h"
 #include "tests/support/MemorySource.h"
 #include "tests/support/ParseCounter.h"
 #include "tests/support/ScratchDirectory.h"
@@ -288,27 +289,6 @@ TEST_F(StoredRecordsTest, DocumentThatIsNotThereIsLookedForAgain) {
 
 // --- what is read to make a level anew ---
 
-class CountingSource : public zelm::files::ByteSource {
-public:
-    explicit CountingSource(std::shared_ptr<ByteSource> source) : inner(std::move(source)) {}
-    std::uint64_t bytes = 0;
-
-protected:
-    zelm::files::Transfer DoReadAt(std::uint64_t offset, void* buffer, std::size_t size) override {
-        zelm::files::Transfer done;
-        done.bytes = inner->ReadAt(offset, buffer, size, &done.error);
-        bytes += done.bytes;
-        return done;
-    }
-    int DoTellSize(std::uint64_t& size) const override {
-        size = inner->Size();
-        return 0;
-    }
-
-private:
-    std::shared_ptr<ByteSource> inner;
-};
-
 class LevelReductionTest : public StoredRecordsTest,
                            public testing::WithParamInterface<std::pair<Resampling, bool>> {};
 
@@ -324,7 +304,7 @@ TEST_P(LevelReductionTest, ReadsNoHaloForAMethodThatNeedsNone) {
                                 std::vector<Pixel>(std::size_t{side} * side));
         }
     }
-    const auto source = std::make_shared<CountingSource>(
+    const auto source = std::make_shared<zmctest::CountingSource>(
         FileSource::Open(file.c_str(), zelm::files::OpenMode::Read));
     Raster raster = Raster::Open(TestModule(), source, "a raster");
     LevelReduction<Pixel> reduction(raster, method);

@@ -15,7 +15,7 @@ namespace zmctest {
 using namespace zelm;
 namespace {
 
-constexpr std::uint64_t kOffset = 4;
+constexpr std::uint64_t kTextOffset = 4;
 
 std::string TextOf(const DocumentText& text) {
     return text.bytes ? std::string(reinterpret_cast<const char*>(text.bytes.get()), text.size)
@@ -88,7 +88,7 @@ public:
 std::vector<std::string> StatesOf(const std::vector<std::string>& documents) {
     StateFile file("tile");
     for (const std::string& document : documents)
-        DocumentStore<StateFile>(file, kOffset)
+        DocumentStore<StateFile>(file, kTextOffset)
             .Write(reinterpret_cast<const unsigned char*>(document.data()), document.size());
     return file.states;
 }
@@ -107,7 +107,7 @@ TEST(DocumentTextTest, NothingIsNotUnfinished) { EXPECT_FALSE(DocumentText().IsU
 TEST(DocumentTextTest, AtRestItIsReadTwice) {
     const std::vector<std::string> states = {"tile<D/>"};
     ChangingFile file(states, [] { return 0; });
-    EXPECT_EQ(TextOf(DocumentText::Take(file, kOffset)), "<D/>");
+    EXPECT_EQ(TextOf(DocumentText::Take(file, kTextOffset)), "<D/>");
     EXPECT_EQ(file.reads, 2);
 }
 
@@ -115,7 +115,7 @@ TEST(DocumentTextTest, ThereIsNone) {
     for (const std::string content : {"", "til", "tile"}) {
         const std::vector<std::string> states = {content};
         ChangingFile file(states, [] { return 0; });
-        EXPECT_FALSE(DocumentText::Take(file, kOffset).bytes);
+        EXPECT_FALSE(DocumentText::Take(file, kTextOffset).bytes);
         EXPECT_EQ(file.reads, 0);
     }
 }
@@ -127,7 +127,7 @@ TEST(DocumentTextTest, LongTextsAreComparedToTheirEnd) {
     const std::vector<std::string> states = {whole, other};
     std::size_t bytes = 0;
     ChangingFile file(states, [&] { return ++bytes == 150000 ? 1 : 0; });
-    EXPECT_EQ(TextOf(DocumentText::Take(file, kOffset)), other.substr(kOffset));
+    EXPECT_EQ(TextOf(DocumentText::Take(file, kTextOffset)), other.substr(kTextOffset));
     EXPECT_GT(file.reads, 10) << "taken again, in pieces";
 }
 
@@ -136,7 +136,7 @@ TEST(DocumentTextTest, AMarkThatStaysIsAnAnswer) {
         "tile\x1A"
         "D/>"};
     ChangingFile file(states, [] { return 0; });
-    const DocumentText text = DocumentText::Take(file, kOffset);
+    const DocumentText text = DocumentText::Take(file, kTextOffset);
     EXPECT_EQ(TextOf(text),
               "\x1A"
               "D/>");
@@ -148,7 +148,7 @@ TEST(DocumentTextTest, ATextThatNeverRestsIsNone) {
     std::vector<std::string> states;
     for (int i = 0; i < 1000; ++i) states.push_back("tile<D" + std::to_string(i % 10) + "/>");
     ChangingFile file(states, [] { return 1; });
-    EXPECT_FALSE(DocumentText::Take(file, kOffset).bytes);
+    EXPECT_FALSE(DocumentText::Take(file, kTextOffset).bytes);
     EXPECT_LE(file.reads, 32) << "and the reader does not wait for it for good";
 }
 
@@ -163,7 +163,7 @@ TEST(DocumentTextTest, AStoreInOneMomentOfTheReading) {
                     const std::size_t event = events++;
                     return event == 0 ? from : event == moment + 1 ? to - from : 0;
                 });
-                const std::string text = TextOf(DocumentText::Take(file, kOffset));
+                const std::string text = TextOf(DocumentText::Take(file, kTextOffset));
                 ASSERT_TRUE(IsOneOf(text)) << from << ' ' << to << ' ' << moment << ' ' << text;
             }
 }
@@ -178,14 +178,14 @@ TEST(DocumentTextTest, StoresAtAnyPace) {
             return random() % pace == 0 ? random() % leap : 0;
         };
         ChangingFile file(states, clock);
-        const std::string text = TextOf(DocumentText::Take(file, kOffset));
+        const std::string text = TextOf(DocumentText::Take(file, kTextOffset));
         ASSERT_TRUE(IsOneOf(text)) << text;
         taken += text[0] == '<';
         ChangingFile once(states, clock);
         std::uint64_t size = 0;
         once.TellSize(size);
         std::string single(32, '\n');
-        once.ReadAt(kOffset, single.data(), size > kOffset ? 32 : 0);
+        once.ReadAt(kTextOffset, single.data(), size > kTextOffset ? 32 : 0);
         mixturesOfOneReading += !IsOneOf(single);
     }
     EXPECT_GT(taken, 20000);

@@ -11,6 +11,7 @@
 #include "core/PixelVocabulary.h"
 #include "files/OpenSource.h"
 #include "tests/support/PyramidFiles.h"
+#include "tests/support/Sanitizers.h"
 #include "tests/support/ScratchDirectory.h"
 #include "tests/support/XercesEnvironment.h"
 
@@ -396,7 +397,9 @@ TEST_F(XmlDocumentTest, ATextBeyondTheLimitIsNotWritten) {
 
 TEST_F(XmlDocumentTest, TreesAreBoundedInNodes) {
     PyramidXMLDocument parsed;
-    for (const std::string piece : {"<A/>", "<!---->", "<?p?>", "<![CDATA[]]>"}) {
+    std::vector<std::string> pieces{"<!---->"};
+    if (!zmctest::IsSanitized()) pieces.insert(pieces.end(), {"<A/>", "<?p?>", "<![CDATA[]]>"});
+    for (const std::string& piece : pieces) {
         std::string text = "<DATASET>";
         for (std::uint32_t i = 0; i < kMaxDocumentNodes; ++i) text += piece;
         EXPECT_FALSE(Parse(parsed, text + "</DATASET>")) << piece;
@@ -422,12 +425,13 @@ TEST_F(XmlDocumentTest, StatisticsCountForTheChildrenThatTheyHave) {
 }
 
 TEST_F(XmlDocumentTest, ManyRecordsWithoutFlagsAreTakenAndReadAgain) {
-    for (std::uint32_t band = 0; band < 105000; ++band) {
+    const std::uint32_t bands = zmctest::WithSanitizers(10500u, 105000u);
+    for (std::uint32_t band = 0; band < bands; ++band) {
         RasterBandStats<int> stats;
         stats.band = band;
         ASSERT_TRUE(document.WriteBandStatsElement(stats)) << band;
     }
-    EXPECT_EQ(ValuesOf(Text(), "RSTC_BAND").size(), 105000u);
+    EXPECT_EQ(ValuesOf(Text(), "RSTC_BAND").size(), bands);
     const std::string text = Raw();
     PyramidXMLDocument parsed;
     EXPECT_TRUE(Parse(parsed, text));

@@ -42,7 +42,7 @@ enum class FileFaultAction {
 };
 
 struct FileFault {
-    std::string folder;         // absolute; calls on what lies below it count
+    std::string folder;         // absolute; calls on it and on what lies below count
     unsigned calls = kAnyCall;  // which of them
     std::size_t n = 0;          // from 1; 0 lets none fail and only counts
     bool fromThenOn = false;    // the n-th and all that follow

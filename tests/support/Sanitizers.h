@@ -11,6 +11,13 @@ inline bool IsSanitized() {
     return sanitized;
 }
 
+// How much of a long test is done: all of it, or with sanitizers, which look at each step of the
+// code and need no further repetition of it, `share`.
+template <class Length>
+Length WithSanitizers(Length share, Length all) {
+    return IsSanitized() ? share : all;
+}
+
 }  // namespace zmctest
 
 #endif

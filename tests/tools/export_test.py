@@ -102,8 +102,10 @@ class Export(ToolTest):
             np.testing.assert_array_equal(back.GetRasterBand(1).GetMaskBand().ReadAsArray(),
                                           expected)
             del back
-            for name in ("back.tif", "back.tif.msk"):
-                os.remove(self.path(name))
+            # The mask stands beside the file, or in it from GDAL 3.9 on.
+            for name in self.files():
+                if name.startswith("back.tif"):
+                    os.remove(self.path(name))
 
     def test_the_format_is_told_as_gdals_own_programs_tell_it(self):
         self.pyramid()

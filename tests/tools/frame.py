@@ -12,9 +12,11 @@ from osgeo import gdal
 gdal.UseExceptions()
 TOOL = os.environ["ZMC_TOOL"]
 
-# GDAL's types and those of the pyramids that are built from them; the signed byte is a flag here.
+# A flag of bytes before GDAL 3.7.
+SIGNED_BYTE = getattr(gdal, "GDT_Int8", gdal.GDT_Byte)
+# GDAL's types and those of the pyramids that are built from them.
 TYPES = {
-    "Byte": (gdal.GDT_Byte, np.uint8), "Char": (gdal.GDT_Byte, np.int8),
+    "Byte": (gdal.GDT_Byte, np.uint8), "Char": (SIGNED_BYTE, np.int8),
     "UInt16": (gdal.GDT_UInt16, np.uint16), "Int16": (gdal.GDT_Int16, np.int16),
     "UInt32": (gdal.GDT_UInt32, np.uint32), "Int32": (gdal.GDT_Int32, np.int32),
     "UInt64": (gdal.GDT_UInt64, np.uint64), "Int64": (gdal.GDT_Int64, np.int64),
@@ -42,21 +44,23 @@ def samples(type_name, height, width, bands, seed=1):
 def geotiff(path, pixels, type_name="Byte", options=(), nodata=None, colors=None):
     height, width, bands = pixels.shape
     options = list(options)
-    if type_name == "Char":
+    flagged = type_name == "Char" and SIGNED_BYTE == gdal.GDT_Byte
+    if flagged:
         options.append("PIXELTYPE=SIGNEDBYTE")
     dataset = gdal.GetDriverByName("GTiff").Create(path, width, height, bands, TYPES[type_name][0],
                                                    options)
     for band in range(bands):
         target = dataset.GetRasterBand(band + 1)
         plane = np.ascontiguousarray(pixels[:, :, band])
-        target.WriteArray(plane.view(np.uint8) if type_name == "Char" else plane)
-        if nodata is not None:
-            target.SetNoDataValue(nodata)
+        # While a file is still empty: later GDAL takes none.
         if colors is not None:
             table = gdal.ColorTable()
             for index, color in enumerate(colors):
                 table.SetColorEntry(index, color)
             target.SetColorTable(table)
+        target.WriteArray(plane.view(np.uint8) if flagged else plane)
+        if nodata is not None:
+            target.SetNoDataValue(nodata)
     dataset = None
     return path
 
