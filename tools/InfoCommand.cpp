@@ -59,8 +59,8 @@ void MakeReadable(Json& document) {
         histogram.erase("counts");
     }
     for (Json& palette : document["palettes"]) {
-        Json& colors = palette["colors"];
-        palette["count"] = colors.size();
+        palette["count"] = palette["colors"].size();
+        Json& colors = palette["colors"];  // after the new member, which moves the others
         if (colors.size() > kColorsOnALine)
             colors.erase(colors.begin() + kColorsOnALine, colors.end());
     }
