@@ -54,6 +54,14 @@ class Info(ToolTest):
             counts = np.bincount(pixels[:, :, band].ravel(), minlength=256)
             self.assertEqual(record["counts"], counts.tolist())
 
+    def test_a_palette_is_told_to_people_by_its_number_of_colours(self):
+        colors = [(i, 255 - i, 7, 255) for i in range(256)]
+        geotiff(self.path("source.tif"), samples("Byte", 20, 30, 1), colors=colors)
+        self.good("build", "source.tif", "made.pyr")
+        self.assertEqual(self.document("info", "made.pyr")["palettes"],
+                         [{"band": 1, "colors": [list(color) for color in colors]}])
+        self.assertIn("palette of band 1: 256 colors", self.good("info", "made.pyr").splitlines())
+
     def test_the_place_on_earth_and_no_data(self):
         geotiff(self.path("source.tif"), samples("Int16", 20, 30, 2), "Int16", nodata=-7)
         source = gdal.Open(self.path("source.tif"), gdal.GA_Update)
