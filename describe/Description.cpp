@@ -1,5 +1,6 @@
 #include "describe/Description.h"
 
+#include <algorithm>
 #include <span>
 
 #include "core/PixelVocabulary.h"
@@ -45,36 +46,33 @@ Json StatisticsOf(const zmchost::Raster& raster) {
     return list;
 }
 
-template <class Counts>
-Json CountsOf(const Counts& counts) {
-    Json::array_t list;
-    list.reserve(counts.size());
-    for (const auto count : counts) list.push_back(JsonNumber(count));
-    return list;
+template <class T>
+std::span<const std::uint64_t> CountsOf(const zelm::RasterBandHistogram<T>& record) {
+    return {record.counts.data, record.counts.data ? record.counts.shape.elements : 0};
 }
 
 template <class T>
-Json HistogramsOf(const zmchost::Raster& raster) {
+Json HistogramsOf(const zmchost::Raster& raster, const TellCounts& tell) {
     Json list = Json::array();
     const auto records = raster.Records<T>();
     for (const auto& record : records->Histograms()) {
-        const std::span counts(record.counts.data,
-                               record.counts.data ? record.counts.shape.elements : 0);
-        list.push_back({{"band", record.band + 1},
-                        {"level", record.level},
-                        {"binCount", record.binCount},
-                        {"binSize", JsonNumber(record.binSize)},
-                        {"minimum", JsonNumber(record.minimum)},
-                        {"maximum", JsonNumber(record.maximum)},
-                        {"counts", CountsOf(counts)}});
+        Json histogram = {{"band", record.band + 1},
+                          {"level", record.level},
+                          {"binCount", record.binCount},
+                          {"binSize", JsonNumber(record.binSize)},
+                          {"minimum", JsonNumber(record.minimum)},
+                          {"maximum", JsonNumber(record.maximum)}};
+        tell(histogram, CountsOf(record));
+        list.push_back(std::move(histogram));
     }
     return list;
 }
 
-Json ColorsOf(const zelm::ColorList& palette) {
+Json ColorsOf(const zelm::ColorList& palette, std::size_t most) {
     Json::array_t colors;
-    colors.reserve(palette.Colors().size());
+    colors.reserve(std::min(most, palette.Colors().size()));
     for (const zelm::ColorList::Rgba color : palette.Colors()) {
+        if (colors.size() == most) break;
         Json::array_t channels(4);
         for (int i = 0; i < 4; ++i)
             channels[static_cast<std::size_t>(i)] = zelm::ColorList::Channel(color, i);
@@ -84,13 +82,28 @@ Json ColorsOf(const zelm::ColorList& palette) {
 }
 
 template <class T>
-Json PalettesOf(const zmchost::Raster& raster) {
+Json PalettesOf(const zmchost::Raster& raster, std::size_t most) {
     Json list = Json::array();
     const auto records = raster.Records<T>();
+    for (std::uint32_t band = 0; band < raster.Bands(); ++band) {
+        const zelm::ColorList* const palette = records->BandPalette(band);
+        if (!palette) continue;
+        Json entry = {{"band", band + 1}, {"colors", ColorsOf(*palette, most)}};
+        if (most != kAllColors) entry["count"] = palette->Colors().size();
+        list.push_back(std::move(entry));
+    }
+    return list;
+}
+
+template <class T>
+std::uint64_t RecordValuesOf(const zmchost::Raster& raster) {
+    std::uint64_t values = 0;
+    const auto records = raster.Records<T>();
+    for (const auto& record : records->Histograms()) values += CountsOf(record).size();
     for (std::uint32_t band = 0; band < raster.Bands(); ++band)
         if (const zelm::ColorList* const palette = records->BandPalette(band))
-            list.push_back({{"band", band + 1}, {"colors", ColorsOf(*palette)}});
-    return list;
+            values += palette->Colors().size();
+    return values;
 }
 
 template <class Describe>
@@ -129,12 +142,29 @@ Json DescribeStatistics(const zmchost::Raster& raster) {
     return OfType(raster, [&]<class T>(std::type_identity<T>) { return StatisticsOf<T>(raster); });
 }
 
-Json DescribeHistograms(const zmchost::Raster& raster) {
-    return OfType(raster, [&]<class T>(std::type_identity<T>) { return HistogramsOf<T>(raster); });
+void TellAllCounts(Json& histogram, std::span<const std::uint64_t> counts) {
+    Json::array_t list;
+    list.reserve(counts.size());
+    for (const auto count : counts) list.push_back(JsonNumber(count));
+    histogram["counts"] = std::move(list);
 }
 
-Json DescribePalettes(const zmchost::Raster& raster) {
-    return OfType(raster, [&]<class T>(std::type_identity<T>) { return PalettesOf<T>(raster); });
+Json DescribeHistograms(const zmchost::Raster& raster, const TellCounts& tell) {
+    return OfType(raster,
+                  [&]<class T>(std::type_identity<T>) { return HistogramsOf<T>(raster, tell); });
+}
+
+Json DescribePalettes(const zmchost::Raster& raster, std::size_t most) {
+    return OfType(raster,
+                  [&]<class T>(std::type_identity<T>) { return PalettesOf<T>(raster, most); });
+}
+
+std::uint64_t RecordValues(const zmchost::Raster& raster) {
+    std::uint64_t values = 0;
+    zelm::VisitElementType(raster.PixelType(), [&]<class T>(std::type_identity<T>) {
+        values = RecordValuesOf<T>(raster);
+    });
+    return values;
 }
 
 void AddRecords(const zmchost::Raster& raster, Json& document) {

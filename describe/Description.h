@@ -5,6 +5,11 @@
 #ifndef ZMC_DESCRIBE_DESCRIPTION_H
 #define ZMC_DESCRIBE_DESCRIPTION_H
 
+#include <cstddef>
+#include <cstdint>
+#include <functional>
+#include <limits>
+#include <span>
 #include <string>
 
 #include "describe/JsonNumbers.h"
@@ -22,10 +27,24 @@ Json DescribeLayout(const std::string& name, const zmchost::PyramidFileInfo& inf
 // The lists of an open raster, whose document is in order (Raster::DocumentFault). Throw
 // zmchost::Error.
 Json DescribeStatistics(const zmchost::Raster& raster);
-Json DescribeHistograms(const zmchost::Raster& raster);
-Json DescribePalettes(const zmchost::Raster& raster);
+
+// Tells the counts of a histogram's bins, in whatever form; they are good during the call.
+using TellCounts = std::function<void(Json& histogram, std::span<const std::uint64_t> counts)>;
+// As the list "counts".
+void TellAllCounts(Json& histogram, std::span<const std::uint64_t> counts);
+Json DescribeHistograms(const zmchost::Raster& raster, const TellCounts& tell = TellAllCounts);
+
+inline constexpr std::size_t kAllColors = std::numeric_limits<std::size_t>::max();
+// Of each palette the first `most` colours; unless all are asked for, "count" tells how many there
+// are.
+Json DescribePalettes(const zmchost::Raster& raster, std::size_t most = kAllColors);
+
 // Fills all three into a document.
 void AddRecords(const zmchost::Raster& raster, Json& document);
+
+// How many counts and colours that is: a file of a few kilobytes may repeat one palette for
+// thousands of bands, so whoever answers strangers asks first. Throws zmchost::Error.
+std::uint64_t RecordValues(const zmchost::Raster& raster);
 
 }  // namespace zmcdescribe
 

@@ -1,4 +1,7 @@
 // What a file tells of itself: /info, /statistics and /histogram.
+#include <cstdint>
+#include <span>
+
 #include "describe/Description.h"
 #include "describe/Place.h"
 #include "gdal/ErrorCatcher.h"
@@ -24,6 +27,15 @@ Json PlaceOf(ServedRaster::Reader& reader) {
     return zmcdescribe::DescribePlace(dataset);
 }
 
+// A document in the making holds sixteen bytes for a count and some hundred for a colour.
+constexpr std::uint64_t kMostValues = 1 << 20;
+
+void CheckValues(std::uint64_t values) {
+    if (values > kMostValues)
+        throw Refusal(413, "histograms and palettes of more than " + std::to_string(kMostValues) +
+                               " counts and colours stand in no document");
+}
+
 using Describe = Json (*)(const Request& request, ServedRaster& raster,
                           ServedRaster::Reader& reader);
 
@@ -41,7 +53,10 @@ Answer DocumentOf(const Request& request, Service& service, Describe describe) {
 Json Info(const Request&, ServedRaster& raster, ServedRaster::Reader& reader) {
     Json document =
         zmcdescribe::DescribeLayout(raster.Name(), zmchost::DescribePyramidFile(raster.Header()));
-    if (reader.Raster().DocumentFault().empty()) zmcdescribe::AddRecords(reader.Raster(), document);
+    if (reader.Raster().DocumentFault().empty()) {
+        CheckValues(zmcdescribe::RecordValues(reader.Raster()));
+        zmcdescribe::AddRecords(reader.Raster(), document);
+    }
     document.update(PlaceOf(reader));
     return document;
 }
@@ -55,8 +70,14 @@ Json Statistics(const Request&, ServedRaster& raster, ServedRaster::Reader& read
 Json Histograms(const Request& request, ServedRaster& raster, ServedRaster::Reader& reader) {
     const auto band = request.Count("band", raster.Header().bandCount);
     if (band == 0u) throw Refusal(400, "band: bands count from 1");
+    std::uint64_t told = 0;
     Json chosen = Json::array();
-    for (Json& histogram : zmcdescribe::DescribeHistograms(reader.Raster()))
+    for (Json& histogram : zmcdescribe::DescribeHistograms(
+             reader.Raster(), [&](Json&one, std::span<const std::uint64_t> counts) {
+                 if (band && one["band"] != *band) return;
+                 CheckValues(told += counts.size());
+                 zmcdescribe::TellAllCounts(one, counts);
+             }))
         if (!band || histogram["band"] == *band) chosen.push_back(std::move(histogram));
     return {{"schema", zmcdescribe::kSchema},
             {"file", raster.Name()},

@@ -1,4 +1,6 @@
+#include <cstdint>
 #include <cstdio>
+#include <span>
 #include <string>
 #include <vector>
 
@@ -43,27 +45,15 @@ enum class Detail { All, Readable };
 
 constexpr std::size_t kColorsOnALine = 64;
 
-// Those beyond 2^53 stand as texts.
-std::vector<double> HeightsOf(const Json& counts) {
-    std::vector<double> heights;
-    for (const Json& count : counts)
-        heights.push_back(count.is_string() ? std::stod(count.get<std::string>())
-                                            : count.get<double>());
-    return heights;
-}
-
-void MakeReadable(Json& document) {
+void AddReadableRecords(const zmchost::Raster& raster, Json& document) {
     const bool draws = platform::IsTerminal(platform::StandardStream::Output);
-    for (Json& histogram : document["histograms"]) {
-        if (draws) histogram["bars"] = DrawBars(HeightsOf(histogram["counts"]));
-        histogram.erase("counts");
-    }
-    for (Json& palette : document["palettes"]) {
-        palette["count"] = palette["colors"].size();
-        Json& colors = palette["colors"];  // after the new member, which moves the others
-        if (colors.size() > kColorsOnALine)
-            colors.erase(colors.begin() + kColorsOnALine, colors.end());
-    }
+    document["statistics"] = zmcdescribe::DescribeStatistics(raster);
+    document["histograms"] = zmcdescribe::DescribeHistograms(
+        raster, [&](Json& histogram, std::span<const std::uint64_t> counts) {
+            if (draws)
+                histogram["bars"] = DrawBars(std::vector<double>(counts.begin(), counts.end()));
+        });
+    document["palettes"] = zmcdescribe::DescribePalettes(raster, kColorsOnALine);
 }
 
 Json Describe(const std::string& file, Detail detail) {
@@ -79,8 +69,10 @@ Json Describe(const std::string& file, Detail detail) {
         Warn(file, wrong + "; statistics, histograms and palettes are not shown");
         return document;
     }
-    zmcdescribe::AddRecords(raster, document);
-    if (detail == Detail::Readable) MakeReadable(document);
+    if (detail == Detail::Readable)
+        AddReadableRecords(raster, document);
+    else
+        zmcdescribe::AddRecords(raster, document);
     return document;
 }
 

@@ -281,6 +281,19 @@ TEST_F(ServicesTest, RecordsAreThoseOfTheFile) {
     EXPECT_EQ(Status("/info/b.pyr"), 404);
 }
 
+TEST_F(ServicesTest, DocumentsOfMoreThanAMillionCountsAreRefused) {
+    zmctest::MemorySource<unsigned short> noise(4, 4, 17);
+    noise.FillWithNoise(1);
+    zmchost::BuildOptions options;
+    options.bins = 65536;
+    zmchost::PyramidBuilder(zmctest::TestModule()).Build(noise, folder / "deep.pyr", options);
+    zmctest::MakeOld(folder / "deep.pyr");
+    EXPECT_EQ(Status("/info/deep.pyr"), 413);
+    EXPECT_EQ(Status("/histogram/deep.pyr"), 413);
+    EXPECT_EQ(Document("/histogram/deep.pyr?band=17")["histograms"][0]["counts"].size(), 65536u);
+    EXPECT_EQ(Document("/statistics/deep.pyr")["statistics"].size(), 17u);
+}
+
 TEST_F(ServicesTest, TheListTellsEveryRouteAndFile) {
     const Json api = Document("/api");
     EXPECT_EQ(api["files"][0], (Json{{"name", "a.pyr"}, {"url", "http://here/files/a.pyr"}}));
