@@ -200,16 +200,17 @@ Layer LayerOfId(const Request& request, Service& service, const std::string& id)
 // --- sets of tiles of a raster ---
 
 Json TilesetLinks(const Request& request, const Layer& layer, const TileMatrixSet& set) {
-    const std::string look = LookQueryOf(request);
-    const std::string url = CollectionUrl(request, layer.id) + "/map/tiles/" + set.id;
-    return Json::array({JsonLink(url + look, "self", set.title),
-                        JsonLink(SetUrl(request, set), kScheme, set.title)});
+    const std::string url =
+        CollectionUrl(request, layer.id) + "/map/tiles/" + set.id + LookQueryOf(request);
+    return Json::array(
+        {JsonLink(url, "self", set.title), JsonLink(SetUrl(request, set), kScheme, set.title)});
 }
 
 Json TilesetOf(const Request& request, const Layer& layer, const TileMatrixSet& set) {
     Json document = {
         {"title", layer.name + ": " + set.title}, {"dataType", "map"}, {"crs", set.system.json}};
-    if (!set.uri.empty()) document["tileMatrixSetURI"] = set.uri;
+    // By it clients choose, whether it is in the register or not.
+    document["tileMatrixSetURI"] = set.uri.empty() ? SetUrl(request, set) : set.uri;
     document["links"] = TilesetLinks(request, layer, set);
     return document;
 }

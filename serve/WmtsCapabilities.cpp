@@ -1,5 +1,6 @@
 #include "serve/WmtsCapabilities.h"
 
+#include <algorithm>
 #include <array>
 #include <charconv>
 #include <initializer_list>
@@ -155,25 +156,27 @@ std::string MatrixText(const TileMatrixSet& set, const TileMatrix& matrix) {
             Element("MatrixHeight", std::to_string(matrix.down)));
 }
 
-std::string SetText(const TileMatrixSet& set) {
+// The first matrices of a set.
+std::string SetText(const TileMatrixSet& set, std::size_t count) {
     std::string text = Element("ows:Title", set.title) + Element("ows:Identifier", set.id) +
                        Element("ows:SupportedCRS", set.system.name);
     if (!set.scaleSet.empty())
         text += Element("WellKnownScaleSet", "urn:ogc:def:wkss:OGC:1.0:" + set.scaleSet);
-    for (const TileMatrix& matrix : set.matrices) text += MatrixText(set, matrix);
+    for (std::size_t i = 0; i < count; ++i) text += MatrixText(set, set.matrices[i]);
     return Around("TileMatrixSet", text);
 }
 
 std::string ContentsOf(const std::string& baseUrl, const std::vector<Layer>& layers,
                        const std::string& look) {
     std::string text, sets;
-    bool hasMercator = false;
+    // Clients take the finest matrix of a set for the size of its layers, whatever their limits.
+    std::size_t deepest = 0;
     for (const Layer& layer : layers) {
         text += LayerText(baseUrl, layer, look);
-        sets += SetText(layer.own);
-        hasMercator = hasMercator || layer.plane;
+        sets += SetText(layer.own, layer.own.matrices.size());
+        deepest = std::max(deepest, layer.mercatorLimits.size());
     }
-    if (hasMercator) sets += SetText(WebMercatorQuad());
+    if (deepest > 0) sets += SetText(WebMercatorQuad(), deepest);
     return Around("Contents", text + sets);
 }
 

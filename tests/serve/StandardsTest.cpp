@@ -160,6 +160,7 @@ TEST_F(StandardsTest, TilesetsOfARasterAreItsOwnAndWebMercator) {
     ASSERT_EQ(list.size(), 2u);
     EXPECT_EQ(list[0]["crs"], "http://www.opengis.net/def/crs/EPSG/0/32633");
     EXPECT_EQ(list[0]["dataType"], "map");
+    EXPECT_EQ(list[0]["tileMatrixSetURI"], "http://here/ogc/tileMatrixSets/own-a.pyr");
     EXPECT_EQ(list[1]["tileMatrixSetURI"],
               "http://www.opengis.net/def/tilematrixset/OGC/1.0/WebMercatorQuad");
     for (const Json& tileset : list) {
@@ -232,6 +233,26 @@ TEST_F(StandardsTest, WebMercatorQuadIsTheOneThatIsRegistered) {
     const Json& last = set["tileMatrices"][24];
     EXPECT_NEAR(last["scaleDenominator"], 33.3238997477482, 1e-9);
     EXPECT_EQ(last["matrixWidth"], 1 << 24);
+}
+
+TEST_F(StandardsTest, CapabilitiesHaveTheMatricesThatTheLayersNeed) {
+    const auto matrices = [&](const std::string& target) {
+        const std::string text = Text(target);
+        const std::string set = text.substr(text.rfind("<TileMatrixSet><ows:Title>Web Mercator"));
+        std::size_t count = 0;
+        for (std::size_t at = 0; (at = set.find("<TileMatrix>", at)) != set.npos; ++at) ++count;
+        return count;
+    };
+    BuildNoise<unsigned char>(folder / "coarse.pyr", 100, 80, 1);
+    PlaceRaster(folder / "coarse.pyr", kUtm, 400000, 5000000, 1000, 1000);
+    const std::size_t fine = PlaneOf("a.pyr")->Zoom() + 1,
+                      coarse = PlaneOf("coarse.pyr")->Zoom() + 1;
+    EXPECT_GT(fine, coarse);
+    EXPECT_EQ(matrices("/wmts/1.0.0/WMTSCapabilities.xml"), fine);
+    EXPECT_EQ(matrices("/wmts/1.0.0/a.pyr/WMTSCapabilities.xml"), fine);
+    EXPECT_EQ(matrices("/wmts/1.0.0/coarse.pyr/WMTSCapabilities.xml"), coarse);
+    // Finer tiles than those are answered all the same.
+    EXPECT_EQ(Status("/wmts/1.0.0/coarse.pyr/default/WebMercatorQuad/24/0/0.png"), 200);
 }
 
 TEST_F(StandardsTest, CoordinatesStandInTheOrderOfTheirSystem) {
