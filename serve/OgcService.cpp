@@ -18,7 +18,7 @@ namespace {
 using zmcdescribe::Json;
 using zmcrender::PictureFormat;
 
-constexpr const char* kNothing = "there is nothing of that name below /ogc";
+constexpr const char* kNoResource = "there is nothing of that name below /ogc";
 constexpr const char* kTilesets = "http://www.opengis.net/def/rel/ogc/1.0/tilesets-map";
 constexpr const char* kScheme = "http://www.opengis.net/def/rel/ogc/1.0/tiling-scheme";
 constexpr const char* kSchemes = "http://www.opengis.net/def/rel/ogc/1.0/tiling-schemes";
@@ -287,7 +287,7 @@ Answer TileOf(const Request& request, Service& service, const std::vector<std::s
 
 // --- the definition ---
 
-Json Get(const char* summary, std::initializer_list<const char*> names) {
+Json Operation(const char* summary, std::initializer_list<const char*> names) {
     Json parameters = Json::array();
     for (const char* const name : names)
         parameters.push_back({{"$ref", std::string("#/components/parameters/") + name}});
@@ -328,18 +328,18 @@ Json Parameters() {
 Json Paths() {
     const std::string collection = "/collections/{collectionId}";
     const std::string tiles = collection + "/map/tiles", set = tiles + "/{tileMatrixSetId}";
-    return {{"/", Get("links", {})},
-            {"/conformance", Get("what of the standards is held", {})},
-            {"/api", Get("this definition", {})},
-            {"/tileMatrixSets", Get("the sets of tiles", {})},
-            {"/tileMatrixSets/{tileMatrixSetId}", Get("a set of tiles", {"tileMatrixSetId"})},
-            {"/collections", Get("the rasters", {"limit", "offset"})},
-            {collection, Get("a raster", {"collectionId"})},
-            {tiles, Get("its sets of tiles", {"collectionId"})},
-            {set, Get("one of them", {"collectionId", "tileMatrixSetId"})},
+    return {{"/", Operation("links", {})},
+            {"/conformance", Operation("what of the standards is held", {})},
+            {"/api", Operation("this definition", {})},
+            {"/tileMatrixSets", Operation("the sets of tiles", {})},
+            {"/tileMatrixSets/{tileMatrixSetId}", Operation("a set of tiles", {"tileMatrixSetId"})},
+            {"/collections", Operation("the rasters", {"limit", "offset"})},
+            {collection, Operation("a raster", {"collectionId"})},
+            {tiles, Operation("its sets of tiles", {"collectionId"})},
+            {set, Operation("one of them", {"collectionId", "tileMatrixSetId"})},
             {set + "/{tileMatrix}/{tileRow}/{tileCol}",
-             Get("a tile", {"collectionId", "tileMatrixSetId", "tileMatrix", "tileRow", "tileCol",
-                            "f", "resampling", "stretch", "bands", "colormap"})}};
+             Operation("a tile", {"collectionId", "tileMatrixSetId", "tileMatrix", "tileRow",
+                                  "tileCol", "f", "resampling", "stretch", "bands", "colormap"})}};
 }
 
 Answer Definition(const Request& request) {
@@ -372,7 +372,7 @@ Answer Plain(const Request& request, Service& service, const std::vector<std::st
     if (parts.size() == 2 && parts[0] == "tileMatrixSets") return Set(request, service, parts[1]);
     if (parts.size() == 2 && parts[0] == "collections")
         return Document(request, CollectionOf(request, LayerOfId(request, service, parts[1])));
-    throw Refusal(404, kNothing);
+    throw Refusal(404, kNoResource);
 }
 
 Answer HandleOgc(const Request& request, Service& service) {
@@ -386,7 +386,7 @@ Answer HandleOgc(const Request& request, Service& service) {
     StyleOf(request, {"f", "quality", "resampling"});
     if (count == 4) return Tilesets(request, service, parts[1]);
     if (count == 5) return Tileset(request, service, parts[1], parts[4]);
-    throw Refusal(404, kNothing);
+    throw Refusal(404, kNoResource);
 }
 
 }  // namespace

@@ -29,19 +29,19 @@ constexpr const char* kPixelSystem =
 
 using Text = std::unique_ptr<char, decltype(&CPLFree)>;
 
-std::string TextOf(const Text& text) { return text ? text.get() : ""; }
+std::string HeldText(const Text& text) { return text ? text.get() : ""; }
 
 std::string WktOf(const OGRSpatialReference& system) {
     char* text = nullptr;
     system.exportToWkt(&text);
-    return TextOf(Text(text, &CPLFree));
+    return HeldText(Text(text, &CPLFree));
 }
 
 // As a document tells a system that has no name.
 Json ProjJsonOf(const OGRSpatialReference& system) {
     char* text = nullptr;
     system.exportToPROJJSON(&text, nullptr);
-    Json document = Json::parse(TextOf(Text(text, &CPLFree)), nullptr, false);
+    Json document = Json::parse(HeldText(Text(text, &CPLFree)), nullptr, false);
     return Json::object({{"wkt", document.is_discarded() ? Json() : std::move(document)}});
 }
 

@@ -56,7 +56,7 @@ std::string Get(const std::string& url, const char* encoding) {
                   {{"xlink:href", url}});
 }
 
-std::string Operation(const char* name, const std::string& gets) {
+std::string OperationText(const char* name, const std::string& gets) {
     return Around("ows:Operation", Around("ows:DCP", Around("ows:HTTP", gets)), {{"name", name}});
 }
 
@@ -64,12 +64,12 @@ std::string Operations(const std::string& baseUrl, const std::string& look) {
     // Where the parameters of a request go.
     const std::string byKeys = baseUrl + "/wmts" + (look.empty() ? "?" : look + '&');
     const std::string byPath = baseUrl + "/wmts/1.0.0";
-    return Around(
-        "ows:OperationsMetadata",
-        Operation("GetCapabilities",
-                  Get(byKeys, "KVP") + Get(byPath + "/WMTSCapabilities.xml" + look, "RESTful")) +
-            Operation("GetTile", Get(byKeys, "KVP")) +
-            Operation("GetFeatureInfo", Get(byKeys, "KVP")));
+    return Around("ows:OperationsMetadata",
+                  OperationText("GetCapabilities",
+                                Get(byKeys, "KVP") +
+                                    Get(byPath + "/WMTSCapabilities.xml" + look, "RESTful")) +
+                      OperationText("GetTile", Get(byKeys, "KVP")) +
+                      OperationText("GetFeatureInfo", Get(byKeys, "KVP")));
 }
 
 std::string Identification() {

@@ -206,13 +206,15 @@ constexpr std::string_view kKeys[] = {
     "service",    "request", "version", "layer",      "style", "format", "tilematrixset",
     "tilematrix", "tilerow", "tilecol", "infoformat", "i",     "j"};
 
+bool IsStandards(std::string_view key) {
+    return std::any_of(std::begin(kKeys), std::end(kKeys),
+                       [key](std::string_view name) { return SameWord(key, name); });
+}
+
 zmcrender::Style StyleOfKeys(const Request& request) {
     zmcrender::Style style;
-    for (const auto& [key, value] : request.query) {
-        const bool isStandards = std::any_of(std::begin(kKeys), std::end(kKeys),
-                                             [&](auto name) { return SameWord(key, name); });
-        if (!isStandards && zmcrender::Style::IsKey(key)) style.Set(key, *request.Value(key));
-    }
+    for (const auto& [key, value] : request.query)
+        if (!IsStandards(key) && zmcrender::Style::IsKey(key)) style.Set(key, *request.Value(key));
     return style;
 }
 

@@ -2,6 +2,7 @@
 #include <nlohmann/json.hpp>
 
 #include <cmath>
+#include <thread>
 
 #include "serve/Documents.h"
 #include "serve/LayerId.h"
@@ -547,6 +548,26 @@ TEST_F(StandardsTest, StylesAndDepthsAreThoseOfOtherTiles) {
     EXPECT_EQ(Ask(tile + "&bands=2&hillshade=1").status, 200);
     EXPECT_EQ(Ask(tile + "&expression=b1-b2&stretch=-9,9").status, 200);
     EXPECT_EQ(Ask(kTiles + "/own-a.pyr/0/0/0?f=png&depth=16").Text()[24], 16);
+}
+
+TEST_F(StandardsTest, AnyNumberOfThreadsGetTheSameTiles) {
+    Serve();
+    const auto plane = PlaneOf("a.pyr");
+    std::vector<std::string> targets, alone;
+    for (std::uint32_t zoom = 0; zoom <= 16; zoom += 2)
+        targets.push_back(kTiles + "/WebMercatorQuad" +
+                          TileAt(zoom, plane->Spots()[220].x, plane->Spots()[220].y));
+    for (const std::string& target : targets) alone.push_back(Mark(target));
+    Serve();
+    std::vector<std::vector<std::string>> found(8);
+    {
+        std::vector<std::jthread> threads;
+        for (auto& marks : found)
+            threads.emplace_back([&] {
+                for (const std::string& target : targets) marks.push_back(Mark(target));
+            });
+    }
+    for (const auto& marks : found) EXPECT_EQ(marks, alone);
 }
 
 // --- WMTS ---

@@ -5,7 +5,6 @@ import os
 import pathlib
 import shutil
 import subprocess
-import sys
 import tempfile
 import unittest
 import xml.etree.ElementTree as ElementTree
@@ -13,7 +12,7 @@ import xml.etree.ElementTree as ElementTree
 import numpy as np
 from osgeo import gdal, osr
 
-from server_test import TOOL, Server, geotiff, make_old, samples
+from server_test import TOOL, Pyramid, Server, geotiff, make_old, samples
 
 gdal.SetConfigOption("GDAL_ENABLE_WMS_CACHE", "NO")
 WMTS, OWS = "{http://www.opengis.net/wmts/1.0}", "{http://www.opengis.net/ows/1.1}"
@@ -97,18 +96,14 @@ class StandardsTest(unittest.TestCase):
         shown = dataset.ReadAsArray()
         np.testing.assert_array_equal(np.moveaxis(shown[:3], 0, 2), self.noise)
         self.assertTrue((shown[3] == 255).all())
-        levels = gdal.OpenEx(os.path.join(self.folder, "data", "noise.pyr"),
-                             allowed_drivers=["ZMCPyramid"])
-        if levels is None:
-            self.skipTest("GDAL has not the driver here")
-        self.assertEqual(dataset.GetRasterBand(1).GetOverviewCount(),
-                         levels.GetRasterBand(1).GetOverviewCount())
-        for band in (1, 2, 3):
-            for level in range(levels.GetRasterBand(1).GetOverviewCount()):
-                expected = levels.GetRasterBand(band).GetOverview(level).ReadAsArray()
-                got = dataset.GetRasterBand(band).GetOverview(level).ReadAsArray()
-                height, width = expected.shape
-                np.testing.assert_array_equal(got[:height, :width], expected)
+        file = Pyramid(self.path("noise.pyr"))
+        self.assertEqual(dataset.GetRasterBand(1).GetOverviewCount(), file.level_max)
+        for level in range(1, file.level_max + 1):
+            expected = file.read(level)
+            height, width, _ = expected.shape
+            for band in range(3):
+                got = dataset.GetRasterBand(band + 1).GetOverview(level - 1).ReadAsArray()
+                np.testing.assert_array_equal(got[:height, :width], expected[:, :, band])
 
     def test_tiles_by_keys_are_those_by_paths(self):
         text = self.server.get("/wmts?SERVICE=WMTS&REQUEST=GetCapabilities")[2].decode()
@@ -191,6 +186,35 @@ class StandardsTest(unittest.TestCase):
             pixels = 9000 * 7000 * 2 / cell ** 2
             if pixels > 100:
                 self.assertAlmostEqual(shown / pixels, 1, delta=0.15 + 4 / pixels ** 0.5)
+
+    def test_pixels_without_data_are_transparent_and_lend_nothing_to_others(self):
+        pixels = np.full((400, 400, 1), 200, np.uint8)
+        pixels[100:250, 150:300] = 0
+        self.addCleanup(lambda: [each.unlink() for each in
+                                 pathlib.Path(self.folder, "data").glob("holes.pyr*")])
+        self.build("holes.pyr", pixels, 32633, (400000, 10, 0, 5000000, 0, -10))
+        limits = json.loads(self.server.get(
+            "/ogc/collections/holes.pyr/map/tiles/WebMercatorQuad")[2])["tileMatrixSetLimits"]
+        for limit, method in ((limits[-1], "bilinear"), (limits[-1], "cubic"),
+                              (limits[-3], "bilinear"), (limits[-2], "nearest")):
+            shown = empty = 0
+            for row in range(limit["minTileRow"], limit["maxTileRow"] + 1):
+                for column in range(limit["minTileCol"], limit["maxTileCol"] + 1):
+                    tile = picture(self.server.get(
+                        f"/ogc/collections/holes.pyr/map/tiles/WebMercatorQuad/"
+                        f"{limit['tileMatrix']}/{row}/{column}?f=png&nodata=0"
+                        f"&resampling={method}")[2])
+                    if tile.shape[2] == 1:
+                        tile = np.concatenate([tile, np.full_like(tile, 255)], axis=2)
+                    seen = tile[:, :, 1] > 0
+                    shown += seen.sum()
+                    empty += (~seen).sum()
+                    # 199: of a sum of weights times 200.
+                    self.assertTrue((np.abs(tile[seen][:, 0].astype(int) - 200) <= 1).all())
+            cell = 2 * EDGE / 256 / 2 ** int(limit["tileMatrix"])
+            pixels_shown = (4000 * 4000 - 1500 * 1500) * 2 / cell ** 2
+            self.assertAlmostEqual(shown / pixels_shown, 1, delta=0.08)
+            self.assertGreater(empty, 0)
 
     def test_values_of_a_place_are_those_of_the_raster(self):
         dataset = self.open("noise.pyr", "own-noise.pyr")
