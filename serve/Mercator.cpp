@@ -202,8 +202,9 @@ void Mercator::LookAround(double width, double height) {
     std::vector<Spot> all;
     for (std::size_t i = 0; i < Grid::Count(); ++i) {
         Spot spot;
-        spot.column = width * static_cast<double>(i % kSpots) / (kSpots - 1);
-        spot.line = height * static_cast<double>(i / kSpots) / (kSpots - 1);
+        const std::size_t row = i / kSpots, column = i % kSpots;
+        spot.column = width * static_cast<double>(column) / (kSpots - 1);
+        spot.line = height * static_cast<double>(row) / (kSpots - 1);
         all.push_back(spot);
     }
     for (const auto& [right, below] : {std::pair(0, 0), std::pair(1, 0), std::pair(0, 1)})

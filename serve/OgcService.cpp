@@ -125,7 +125,8 @@ Answer Sets(const Request& request, Service& service) {
     const TileMatrixSet& mercator = WebMercatorQuad();
     Json list = Json::array({SetEntry(request, mercator.id, mercator.title)});
     list[0]["uri"] = mercator.uri;
-    for (const std::string& name : service.catalog.List().names)
+    const Catalog::Listing listing = service.catalog.List();
+    for (const std::string& name : listing.names)
         list.push_back(SetEntry(request, OwnSetOf(name), "The own grid of " + name));
     return Document(
         request, {{"tileMatrixSets", std::move(list)}, {"links", Json::array({SelfOf(request)})}});
@@ -207,8 +208,9 @@ Json TilesetLinks(const Request& request, const Layer& layer, const TileMatrixSe
 }
 
 Json TilesetOf(const Request& request, const Layer& layer, const TileMatrixSet& set) {
-    Json document = {
-        {"title", layer.name + ": " + set.title}, {"dataType", "map"}, {"crs", set.system.json}};
+    Json document = {{"title", layer.name + ": " + set.title},
+                     {"dataType", "map"},
+                     {"crs", DescribeSystem(set.system)}};
     // By it clients choose, whether it is in the register or not.
     document["tileMatrixSetURI"] = set.uri.empty() ? SetUrl(request, set) : set.uri;
     document["links"] = TilesetLinks(request, layer, set);
@@ -245,7 +247,7 @@ Answer Tileset(const Request& request, Service& service, const std::string& id,
         DescribeLimits(isMercator ? layer.mercatorLimits : layer.ownLimits);
     const Corners corners = isMercator ? CornersOf(*layer.plane) : layer.corners;
     document["boundingBox"] = {
-        {"lowerLeft", corners[0]}, {"upperRight", corners[1]}, {"crs", set.system.json}};
+        {"lowerLeft", corners[0]}, {"upperRight", corners[1]}, {"crs", DescribeSystem(set.system)}};
     // The set stands in one place where there is none in the register.
     if (!isMercator) document["tileMatrixSet"] = DescribeSet(set);
     for (const Format& format : kFormats)

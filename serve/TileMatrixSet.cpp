@@ -10,6 +10,7 @@
 
 #include "gdal/ErrorCatcher.h"
 #include "serve/MapTile.h"
+#include "serve/Request.h"
 
 namespace zmcserve {
 namespace {
@@ -37,27 +38,28 @@ std::string WktOf(const OGRSpatialReference& system) {
     return HeldText(Text(text, &CPLFree));
 }
 
-// As a document tells a system that has no name.
-Json ProjJsonOf(const OGRSpatialReference& system) {
+std::string ProjJsonOf(const OGRSpatialReference& system) {
     char* text = nullptr;
     system.exportToPROJJSON(&text, nullptr);
-    Json document = Json::parse(HeldText(Text(text, &CPLFree)), nullptr, false);
-    return Json::object({{"wkt", document.is_discarded() ? Json() : std::move(document)}});
+    return HeldText(Text(text, &CPLFree));
 }
 
 GridSystem Named(const std::string& code) {
-    return {"urn:ogc:def:crs:EPSG::" + code, "http://www.opengis.net/def/crs/EPSG/0/" + code, false,
-            1};
+    GridSystem system;
+    system.name = "urn:ogc:def:crs:EPSG::" + code;
+    system.uri = "http://www.opengis.net/def/crs/EPSG/0/" + code;
+    return system;
 }
 
 GridSystem SystemOf(const OGRSpatialReference& own) {
     const char* const authority = own.GetAuthorityName(nullptr);
-    const char* const code = own.GetAuthorityCode(nullptr);
-    GridSystem system{WktOf(own), ProjJsonOf(own), false, 1};
+    const char* const told = own.GetAuthorityCode(nullptr);
+    const auto code = WholeNumber(told ? told : "", 0x7fffffff);
+    GridSystem system{WktOf(own), "", ProjJsonOf(own), false, 1};
     OGRSpatialReference registered;
     if (authority && code && std::string_view(authority) == "EPSG" &&
-        registered.importFromEPSG(std::atoi(code)) == OGRERR_NONE) {
-        system = Named(code);
+        registered.importFromEPSG(static_cast<int>(*code)) == OGRERR_NONE) {
+        system = Named(std::to_string(*code));
         system.northFirst =
             registered.EPSGTreatsAsLatLong() || registered.EPSGTreatsAsNorthingEasting();
     }
@@ -99,7 +101,7 @@ void TakePlace(ServedRaster& raster, TileMatrixSet& set, double& cell) {
     const zmcgdal::ErrorCatcher quiet(CE_Failure);
     OGRSpatialReference pixels;
     pixels.SetFromUserInput(kPixelSystem);
-    set.system = {kPixelSystem, ProjJsonOf(pixels), false, 1};
+    set.system = {kPixelSystem, "", ProjJsonOf(pixels), false, 1};
     cell = 1;
 }
 
@@ -182,10 +184,17 @@ Corners CornersOf(const TileMatrixSet& grid, double width, double height) {
             Ordered(grid.system, west + width * cell, north)};
 }
 
+Json DescribeSystem(const GridSystem& system) {
+    if (!system.uri.empty()) return system.uri;
+    Json document = Json::parse(system.projJson, nullptr, false);
+    if (document.is_discarded()) document = nullptr;
+    return Json::object({{"wkt", std::move(document)}});
+}
+
 Json DescribeSet(const TileMatrixSet& set) {
     Json document = {{"id", set.id}, {"title", set.title}};
     if (!set.uri.empty()) document["uri"] = set.uri;
-    document["crs"] = set.system.json;
+    document["crs"] = DescribeSystem(set.system);
     if (!set.scaleSet.empty())
         document["wellKnownScaleSet"] = "http://www.opengis.net/def/wkss/OGC/1.0/" + set.scaleSet;
     Json matrices = Json::array();

@@ -22,7 +22,8 @@ struct GridSystem {
     // "urn:ogc:def:crs:EPSG::32633"; the text of one that has no name among the OGC's, which is
     // WKT.
     std::string name;
-    zmcdescribe::Json json;   // the same as documents of JSON tell it
+    std::string uri;          // the same as documents of JSON have it; empty: it has no name
+    std::string projJson;     // of one without a name
     bool northFirst = false;  // coordinates stand as north, east
     double metres = 1;        // a unit, on the equator
 };
@@ -69,7 +70,8 @@ using Corners = std::array<std::array<double, 2>, 2>;
 Corners CornersOf(const TileMatrixSet& grid, double width, double height);
 Corners CornersOf(const PlaneExtent& extent);
 
-// As the standard of tile matrix sets, 2.0, has it in JSON.
+// As the standard of tile matrix sets, 2.0, has them in JSON.
+zmcdescribe::Json DescribeSystem(const GridSystem& system);
 zmcdescribe::Json DescribeSet(const TileMatrixSet& set);
 zmcdescribe::Json DescribeLimits(const std::vector<TileLimits>& limits);
 

@@ -47,8 +47,8 @@ DatasetPtr Borrowed(Picture& picture) {
     DatasetPtr dataset(driver->Create("", static_cast<int>(picture.width),
                                       static_cast<int>(picture.height), 0, TypeOf(picture),
                                       nullptr));
-    const std::uint32_t sample = picture.depth / 8;
-    for (std::uint32_t channel = 0; dataset && channel < picture.channels; ++channel) {
+    const std::size_t sample = picture.depth / 8;
+    for (std::size_t channel = 0; dataset && channel < picture.channels; ++channel) {
         char address[32] = {};
         address[CPLPrintPointer(address, &picture.bytes[channel * sample], sizeof address - 1)] = 0;
         CPLStringList options;
