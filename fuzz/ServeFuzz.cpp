@@ -66,6 +66,9 @@ zmcserve::Service& TheService() {
                 folder / name,
                 std::filesystem::file_time_type::clock::now() - std::chrono::hours(1));
         }
+        std::ofstream(folder / "a.pyr.aux.xml")
+            << "<PAMDataset><SRS>EPSG:32633</SRS><GeoTransform>400000,1000,0,5000000,0,-1000"
+               "</GeoTransform></PAMDataset>";
         std::ofstream(folder / "text.pyr") << "no pyramid";
         return new zmcserve::Service({folder.Path()}, false, zmcgdal::SharedModule(),
                                      SmallLimits());

@@ -457,10 +457,28 @@ def serve_seeds():
         b"/statistics/a.pyr", b"/histogram/sub/m.pyr?band=9", b"/info/a.pyr",
         b"/point/a.pyr?x=89&y=69&level=0&bands=1", b"/profile/a.pyr?line=0,0.5,90,70&samples=9",
         b"/window/a.pyr.npy?window=1,2,3,4&level=0&bands=2", b"/%00%ff?a=%", b"a")
+    targets += (
+        b"/ogc", b"/ogc/conformance?f=json", b"/ogc/api", b"/ogc/collections?limit=1&offset=1",
+        b"/ogc/collections/sub~2Fm.pyr", b"/ogc/tileMatrixSets", b"/ogc/tileMatrixSets/own-a.pyr",
+        b"/ogc/tileMatrixSets/WebMercatorQuad", b"/ogc/collections/a.pyr/map/tiles",
+        b"/ogc/collections/a.pyr/map/tiles/WebMercatorQuad?stretch=0,9&quality=3",
+        b"/ogc/collections/a.pyr/map/tiles/own-a.pyr/0/0/0?f=webp",
+        b"/ogc/collections/a.pyr/map/tiles/WebMercatorQuad/5/11/17?resampling=cubic&depth=16",
+        b"/ogc/collections/a.pyr/map/tiles/WebMercatorQuad/24/6007466/9049434?f=jpeg",
+        b"/wmts/1.0.0/WMTSCapabilities.xml?gamma=2", b"/wmts/1.0.0/a.pyr/WMTSCapabilities.xml",
+        b"/wmts?SERVICE=WMTS&REQUEST=GetCapabilities&AcceptVersions=1.0.0",
+        b"/wmts?service=WMTS&request=GetTile&version=1.0.0&layer=a.pyr&style=default"
+        b"&format=image/png&tilematrixset=WebMercatorQuad&tilematrix=6&tilerow=23&tilecol=34",
+        b"/wmts?service=WMTS&request=GetFeatureInfo&version=1.0.0&layer=sub~2Fm.pyr&style="
+        b"&format=image/jpeg&tilematrixset=own-sub~2Fm.pyr&tilematrix=0&tilerow=0&tilecol=0"
+        b"&i=3&j=4&infoformat=text/plain",
+        b"/wmts/1.0.0/a.pyr/default/WebMercatorQuad/6/23/34.png?resampling=nearest",
+        b"/wmts/1.0.0/a.pyr/default/own-a.pyr/0/0/0/69/89.json")
     headers = (
         b"", b"\nRange: bytes=0-9\nIf-Range: \"x\"", b"\nRange: bytes=-5,9-",
         b"\nAccept-Encoding: zstd;q=0.5, gzip", b"\nIf-None-Match: *",
         b"\nIf-Modified-Since: Sun, 06 Nov 1994 08:49:37 GMT\nRange: bytes=99999999999999999999-",
+        b"\nAccept: image/webp;q=0.3, image/*;q=0.2, */*;q=0",
         b"\nIf-Match: W/\"a\", \"b\"\nIf-Unmodified-Since: Sunday, 06-Nov-94 08:49:37 GMT")
     for number, target in enumerate(targets):
         yield str(number), target + headers[number % len(headers)]

@@ -3,9 +3,10 @@
 #include <libdeflate.h>
 #include <zstd.h>
 
-#include <charconv>
 #include <memory>
 #include <new>
+
+#include "serve/Negotiation.h"
 
 namespace zmcserve {
 namespace {
@@ -19,18 +20,6 @@ constexpr const char* kSuffixes[] = {"", "-gzip", "-zstd"};
 struct FreeCompressor {
     void operator()(libdeflate_compressor* made) const { libdeflate_free_compressor(made); }
 };
-
-// 0 to 1; one that cannot be read counts as 1.
-double Weight(std::string_view parameters) {
-    for (const std::string_view part : Split(parameters, ';')) {
-        const std::string_view text = Trimmed(part);
-        if (text.substr(0, 2) != "q=") continue;
-        double weight = 1;
-        std::from_chars(text.data() + 2, text.data() + text.size(), weight);
-        return weight;
-    }
-    return 1;
-}
 
 std::string Gzipped(std::string_view bytes) {
     const std::unique_ptr<libdeflate_compressor, FreeCompressor> compressor(
@@ -71,7 +60,7 @@ Coding CodingFor(std::string_view accepted) {
     for (const std::string_view part : Split(accepted, ',')) {
         const std::size_t end = part.find(';');
         const std::string_view name = Trimmed(part.substr(0, end));
-        const double weight = end == part.npos ? 1 : Weight(part.substr(end + 1));
+        const double weight = end == part.npos ? 1 : WeightOf(part.substr(end + 1));
         if (SameWord(name, "gzip") || SameWord(name, "x-gzip")) gzip = weight;
         if (SameWord(name, "zstd")) zstd = weight;
         if (name == "*") others = weight;

@@ -2,6 +2,9 @@
 
 #include <cstdint>
 #include <cstdio>
+#include <utility>
+
+#include "serve/Conditions.h"
 
 namespace zmcserve {
 
@@ -11,6 +14,13 @@ Answer JsonAnswer(const zmcdescribe::Json& document) {
     answer.body = document.dump(-1, ' ', false, zmcdescribe::Json::error_handler_t::replace) + '\n';
     answer.compressible = true;
     return answer;
+}
+
+Answer WithTextTag(const Request& request, Answer document) {
+    const Validators validators{'"' + VariantOf(document.Text()) + '"', std::nullopt};
+    if (auto answer = AnswerOfConditions(request, validators)) return std::move(*answer);
+    SetValidators(document, validators);
+    return document;
 }
 
 std::string VariantOf(std::string_view text) {

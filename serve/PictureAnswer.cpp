@@ -41,18 +41,25 @@ std::shared_ptr<const zmcrender::Renderer> JudgedRenderer(const Service& service
 }
 
 zmcrender::Picture RenderLevelWindow(const Service& service, ServedRaster& raster,
-                                     const zmcrender::Style& style, std::uint32_t level,
-                                     const zmchost::Window& window, const Deadline& deadline) {
+                                     ServedRaster::Reader& reader, const zmcrender::Style& style,
+                                     std::uint32_t level, const zmchost::Window& window,
+                                     const Deadline& deadline) {
     thread_local zmcrender::SampleBlock block;
     const KeptSmall kept{block};
-    const auto reader = raster.Borrow(deadline);
-    const auto renderer = JudgedRenderer(service, raster, style, *reader);
+    const auto renderer = JudgedRenderer(service, raster, style, reader);
     CheckWindow(service, window.Pixels(), renderer->Bands().size() * raster.SampleBytes());
     const zmcrender::Samples samples =
-        block.Read(reader->Pixels(), level, window, renderer->Bands(), renderer->Halo());
+        block.Read(reader.Pixels(), level, window, renderer->Bands(), renderer->Halo());
     raster.File().CheckUnchanged();
     deadline.Check();
     return renderer->Render(samples);
+}
+
+zmcrender::Picture RenderLevelWindow(const Service& service, ServedRaster& raster,
+                                     const zmcrender::Style& style, std::uint32_t level,
+                                     const zmchost::Window& window, const Deadline& deadline) {
+    const auto reader = raster.Borrow(deadline);
+    return RenderLevelWindow(service, raster, *reader, style, level, window, deadline);
 }
 
 Answer CodedAnswer(const zmcrender::Picture& picture, zmcrender::PictureFormat format,

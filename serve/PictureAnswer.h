@@ -24,6 +24,11 @@ std::shared_ptr<const zmcrender::Renderer> JudgedRenderer(const Service& service
 
 // The pixels of a window of a level, one to one. The file was unchanged when they were read.
 zmcrender::Picture RenderLevelWindow(const Service& service, ServedRaster& raster,
+                                     ServedRaster::Reader& reader, const zmcrender::Style& style,
+                                     std::uint32_t level, const zmchost::Window& window,
+                                     const Deadline& deadline);
+// The same with a reader of its own.
+zmcrender::Picture RenderLevelWindow(const Service& service, ServedRaster& raster,
                                      const zmcrender::Style& style, std::uint32_t level,
                                      const zmchost::Window& window, const Deadline& deadline);
 

@@ -9,6 +9,7 @@
 #include "host/base/Error.h"
 #include "host/file/PyramidFileInfo.h"
 #include "serve/Answer.h"
+#include "serve/Mercator.h"
 
 namespace zmcserve {
 namespace {
@@ -74,6 +75,7 @@ struct ServedRaster::Reader::Tools {
     std::unique_ptr<zmcgdal::Dataset> dataset;
     bool lookedForDataset = false;
     std::unique_ptr<MaskedPixels> pixels;
+    std::unique_ptr<const Mercator> mercator;
     Deadline deadline;
 };
 
@@ -168,6 +170,15 @@ GDALDataset* ServedRaster::Reader::Dataset() {
     if (!tools->lookedForDataset) tools->dataset = OpenDataset(*raster->file, raster->companions);
     tools->lookedForDataset = true;
     return tools->dataset.get();
+}
+
+const Mercator& ServedRaster::Reader::InMercator() {
+    if (!tools->mercator) {
+        const zelm::LevelGeometry finest = raster->Geometry(raster->FinestLevel());
+        tools->mercator =
+            std::make_unique<const Mercator>(raster->Place(), finest.samples, finest.lines);
+    }
+    return *tools->mercator;
 }
 
 std::unique_ptr<ServedRaster::Reader> ServedRaster::Borrow(const Deadline& deadline) {

@@ -39,6 +39,7 @@
 
 namespace zmcserve {
 
+class Mercator;
 class ServedRaster;
 using ServedRasterPtr = std::shared_ptr<ServedRaster>;
 
@@ -76,6 +77,9 @@ public:
         // The raster as a dataset of the driver; null where it shows none. Whoever uses it catches
         // what it reports (gdal/ErrorCatcher.h).
         GDALDataset* Dataset();
+        // Where the raster lies in Web Mercator; it stays with this reader for the next who borrows
+        // it. Throws Refusal (404) where it has no place there.
+        const Mercator& InMercator();
 
     private:
         friend class ServedRaster;

@@ -10,14 +10,27 @@ namespace zmcserve {
 
 std::vector<Route> FileRoutes();     // the files themselves
 std::vector<Route> TileRoutes();     // tiles in the raster's own grid
+std::vector<Route> OgcRoutes();      // OGC API - Tiles
+std::vector<Route> WmtsRoutes();     // WMTS
 std::vector<Route> PictureRoutes();  // previews
 std::vector<Route> ValueRoutes();    // points, profiles, windows of samples
 std::vector<Route> RecordRoutes();   // what a file tells: info, statistics, histograms
 std::vector<Route> ServerRoutes();   // the server itself: api, health, metrics
 std::vector<Route> PageRoutes();     // the viewer
 
+// clang-format off
 inline constexpr std::vector<Route> (*kServices[])() = {
-    FileRoutes, TileRoutes, PictureRoutes, ValueRoutes, RecordRoutes, ServerRoutes, PageRoutes};
+    FileRoutes,
+    TileRoutes,
+    OgcRoutes,
+    WmtsRoutes,
+    PictureRoutes,
+    ValueRoutes,
+    RecordRoutes,
+    ServerRoutes,
+    PageRoutes,
+};
+// clang-format on
 
 // What no route has: the viewer's files, which may lie anywhere below the root.
 Answer AnswerOfPage(const Request& request, Service& service);

@@ -1,5 +1,4 @@
 // Tiles in the raster's own grid, at /tiles/NAME/{z}/{x}/{y}.FORMAT, and their TileJSON.
-#include <algorithm>
 #include <cmath>
 
 #include "describe/JsonNumbers.h"
@@ -27,21 +26,12 @@ struct Address {
     std::string_view ending;  // in the request
 };
 
-std::uint64_t Coordinate(std::string_view text) {
-    const bool isNumber = !text.empty() && std::all_of(text.begin(), text.end(),
-                                                       [](char c) { return c >= '0' && c <= '9'; });
-    if (!isNumber) throw Refusal(400, Quoted(text) + " is no number of a tile");
-    const auto number = WholeNumber(text, 0xffffffffu);
-    if (!number) throw Refusal(404, kNoTile);
-    return *number;
-}
-
 Address AddressOf(const Request& request) {
     const std::size_t count = request.segments.size();
     if (count < 5) throw Refusal(404, "the address of a tile is /tiles/NAME/{z}/{x}/{y}.FORMAT");
     const auto [y, ending] = StemAndEnding(request.segments[count - 1]);
-    return {NameOfSegments(request, 1, count - 3), Coordinate(request.segments[count - 3]),
-            Coordinate(request.segments[count - 2]), Coordinate(y), ending};
+    return {NameOfSegments(request, 1, count - 3), TileNumber(request.segments[count - 3]),
+            TileNumber(request.segments[count - 2]), TileNumber(y), ending};
 }
 
 bool WantsTileJson(const Request& request) {

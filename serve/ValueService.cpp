@@ -3,7 +3,6 @@
 #include <cmath>
 #include <numeric>
 
-#include "core/ElementTypes.h"
 #include "describe/JsonNumbers.h"
 #include "serve/Conditions.h"
 #include "serve/Documents.h"
@@ -12,6 +11,7 @@
 #include "serve/Service.h"
 #include "serve/Services.h"
 #include "serve/Tile.h"
+#include "serve/Values.h"
 
 namespace zmcserve {
 namespace {
@@ -20,42 +20,6 @@ using zmcdescribe::Json;
 
 constexpr std::uint64_t kMostSamples = 8192;  // along a line
 constexpr std::uint64_t kMostValues = std::uint64_t{1} << 18;
-
-// Integers of 64 bits are texts, however small: readers that know doubles only take them for what
-// they are.
-template <class T>
-Json ExactValue(const T& value) {
-    if constexpr (std::is_integral_v<T> && sizeof(T) == 8)
-        return std::to_string(value);
-    else
-        return zmcdescribe::JsonNumber(value);
-}
-
-Json ValuesOf(std::uint32_t pixelType, const unsigned char* samples, std::size_t count) {
-    Json::array_t values;
-    zelm::VisitElementType(pixelType, [&]<class T>(std::type_identity<T>) {
-        const T* const typed = reinterpret_cast<const T*>(samples);
-        for (std::size_t i = 0; i < count; ++i) values.push_back(ExactValue(typed[i]));
-    });
-    return values;
-}
-
-Json NumbersOf(const std::vector<std::uint32_t>& bands) {
-    Json list = Json::array();
-    for (const std::uint32_t band : bands) list.push_back(band + 1);
-    return list;
-}
-
-// Of the middle of a pixel of a level, in the raster's own system; null where it has none.
-Json CoordinatesOf(ServedRaster& raster, std::uint32_t level, double x, double y) {
-    const auto& transform = raster.Place().transform;
-    if (!transform) return nullptr;
-    const auto& t = *transform;
-    const double scale = std::ldexp(1.0, static_cast<int>(level));
-    const double column = (x + 0.5) * scale, line = (y + 0.5) * scale;
-    return {zmcdescribe::JsonNumber(t[0] + column * t[1] + line * t[2]),
-            zmcdescribe::JsonNumber(t[3] + column * t[4] + line * t[5])};
-}
 
 std::uint32_t PixelOf(const Request& request, std::string_view key, std::uint32_t extent) {
     const auto at = request.Count(key, 0xffffffffu);
@@ -92,16 +56,7 @@ Answer HandlePoint(const Request& request, Service& service) {
     const std::uint32_t y = PixelOf(request, "y", geometry.lines);
     const auto bands = BandsOf(request, raster->Header().bandCount);
     CheckValues(bands.size());
-    auto samples = Room(*raster, bands.size());
-    raster->Borrow(request.deadline)->Pixels().Read(level, {x, y, 1, 1}, bands, samples.data());
-    raster->File().CheckUnchanged();
-    Answer answer = JsonAnswer(
-        {{"x", x},
-         {"y", y},
-         {"level", level},
-         {"coordinates", CoordinatesOf(*raster, level, x, y)},
-         {"bands", NumbersOf(bands)},
-         {"values", ValuesOf(raster->Header().pixelType, samples.data(), bands.size())}});
+    Answer answer = JsonAnswer(DescribePixel(*raster, level, x, y, bands, request.deadline));
     SetValidators(answer, validators);
     return answer;
 }

@@ -7,6 +7,7 @@
 #include <chrono>
 #include <filesystem>
 #include <fstream>
+#include <iomanip>
 #include <memory>
 #include <string>
 #include <utility>
@@ -41,6 +42,17 @@ MemorySource<T> BuildNoise(const std::string& file, std::uint32_t width, std::ui
     zmchost::PyramidBuilder(TestModule()).Build(source, file, options);
     MakeOld(file);
     return source;
+}
+
+// Tells GDAL, beside the file, where the raster lies; the pixels of its finest level start at the
+// upper left corner and are that large.
+inline void PlaceRaster(const std::string& file, const std::string& system, double west,
+                        double north, double width, double height) {
+    std::ofstream(file + ".aux.xml")
+        << std::setprecision(17) << "<PAMDataset><SRS>" << zmcserve::Escaped(system)
+        << "</SRS><GeoTransform>" << west << ',' << width << ",0," << north << ",0," << -height
+        << "</GeoTransform></PAMDataset>";
+    MakeOld(file + ".aux.xml");
 }
 
 class ServeTest : public testing::Test {
