@@ -93,6 +93,30 @@ TEST(RenderWindow, EdgesOfWindowsMayLieBetweenThePixelsOfALevel) {
               (std::vector<unsigned char>{40, 120, 200}));
 }
 
+TEST(RenderWindow, AScaleHasThePixelsOfItsLevelAndTheNearestOnesBeyondIt) {
+    auto source = Flat(7, 5, 2);
+    source.levels[1].samples = {10, 20, 30, 40, 50, 60};
+    const Renderer renderer(source.Facts(), {}, source);
+    EXPECT_EQ(ExtentInScale(7, 1), 4u);
+    EXPECT_EQ(ExtentInScale(0xffffffffu, 32), 1u);
+    EXPECT_EQ(RenderInScale(renderer, source, 1, {0, 0, 4, 3}).bytes,
+              (std::vector<unsigned char>{10, 20, 30, 30, 40, 50, 60, 60, 40, 50, 60, 60}));
+    EXPECT_EQ(RenderInScale(renderer, source, 1, {1, 0, 2, 2}).bytes,
+              (std::vector<unsigned char>{20, 30, 50, 60}));
+    // The column that the level lacks, alone.
+    EXPECT_EQ(RenderInScale(renderer, source, 1, {3, 0, 1, 3}).bytes,
+              (std::vector<unsigned char>{30, 60, 60}));
+    // Scales beyond the levels, down to a pixel, are made of the coarsest.
+    source.readLevels.clear();
+    EXPECT_EQ(RenderInScale(renderer, source, 2, {0, 0, 2, 2}).bytes,
+              (std::vector<unsigned char>{30, 45, 45, 60}));
+    EXPECT_EQ(RenderInScale(renderer, source, 3, {0, 0, 1, 1}).bytes,
+              (std::vector<unsigned char>{35}));
+    EXPECT_EQ(RenderInScale(renderer, source, 32, {0, 0, 1, 1}).bytes,
+              (std::vector<unsigned char>{35}));
+    EXPECT_EQ(source.readLevels, (Levels{1, 1, 1}));
+}
+
 // 96 MiB of samples, of which no more than a third may be held at once.
 TEST(RenderWindow, ALevelThatIsTooLargeIsReadInStrips) {
     constexpr std::uint32_t kWidth = 4096, kHeight = 3072;
