@@ -2,6 +2,7 @@
 
 #include <ogr_spatialref.h>
 
+#include <algorithm>
 #include <cmath>
 #include <cstring>
 #include <memory>
@@ -10,6 +11,15 @@
 #include "serve/Parameters.h"
 
 namespace zmcserve {
+
+std::uint32_t TileNumber(std::string_view text) {
+    const bool isNumber = !text.empty() && std::all_of(text.begin(), text.end(),
+                                                       [](char c) { return c >= '0' && c <= '9'; });
+    if (!isNumber) throw Refusal(400, Quoted(text) + " is no number of a tile");
+    const auto number = WholeNumber(text, 0xffffffffu);
+    if (!number) throw Refusal(404, kNoTile);
+    return static_cast<std::uint32_t>(*number);
+}
 
 TilePlace FindTile(const ServedRaster& raster, std::uint64_t zoom, std::uint64_t column,
                    std::uint64_t row) {

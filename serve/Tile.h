@@ -6,6 +6,7 @@
 #include <cstdint>
 #include <optional>
 #include <span>
+#include <string_view>
 
 #include "serve/Conditions.h"
 #include "serve/SampleAnswer.h"
@@ -14,6 +15,9 @@
 namespace zmcserve {
 
 inline constexpr const char* kNoTile = "there is no such tile";
+
+// A number of a tile: digits. Throws Refusal: 400 for anything else, 404 for what no tile has.
+std::uint32_t TileNumber(std::string_view text);
 
 struct TilePlace {
     std::uint32_t level = 0;

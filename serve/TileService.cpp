@@ -1,5 +1,4 @@
 // Tiles in the raster's own grid, at /tiles/NAME/{z}/{x}/{y}.FORMAT, and their TileJSON.
-#include <algorithm>
 #include <cmath>
 
 #include "describe/JsonNumbers.h"
@@ -27,21 +26,12 @@ struct Address {
     std::string_view ending;  // in the request
 };
 
-std::uint64_t Coordinate(std::string_view text) {
-    const bool isNumber = !text.empty() && std::all_of(text.begin(), text.end(),
-                                                       [](char c) { return c >= '0' && c <= '9'; });
-    if (!isNumber) throw Refusal(400, Quoted(text) + " is no number of a tile");
-    const auto number = WholeNumber(text, 0xffffffffu);
-    if (!number) throw Refusal(404, kNoTile);
-    return *number;
-}
-
 Address AddressOf(const Request& request) {
     const std::size_t count = request.segments.size();
     if (count < 5) throw Refusal(404, "the address of a tile is /tiles/NAME/{z}/{x}/{y}.FORMAT");
     const auto [y, ending] = StemAndEnding(request.segments[count - 1]);
-    return {NameOfSegments(request, 1, count - 3), Coordinate(request.segments[count - 3]),
-            Coordinate(request.segments[count - 2]), Coordinate(y), ending};
+    return {NameOfSegments(request, 1, count - 3), TileNumber(request.segments[count - 3]),
+            TileNumber(request.segments[count - 2]), TileNumber(y), ending};
 }
 
 bool WantsTileJson(const Request& request) {
@@ -142,6 +132,20 @@ Json LevelsOf(const ServedRaster& raster) {
     return list;
 }
 
+// Every format with its tiles. A style is a matter of pictures.
+Json FormatsOf(const std::string& tiles, const std::string& style) {
+    Json list = Json::array();
+    const auto add = [&](const char* ending, const char* type, const std::string& query) {
+        list.push_back(
+            {{"format", ending}, {"type", type}, {"tiles", Json::array({tiles + ending + query})}});
+    };
+    for (const char* const ending : {"jpg", "png", "webp"})
+        add(ending, zmcrender::MediaType(*zmcrender::PictureFormatOfName(ending)), style);
+    for (const char* const ending : {"raw", "npy"})
+        add(ending, MediaType(*SampleFormatOfName(ending)), "");
+    return list;
+}
+
 Answer TileJson(const Request& request, Service& service) {
     const std::string name = NameOfSegments(request, 1, request.segments.size() - 1);
     const ServedRasterPtr raster = service.catalog.Raster(name);
@@ -154,11 +158,13 @@ Answer TileJson(const Request& request, Service& service) {
         question == request.target.npos ? "" : request.target.substr(question);
     StyleOf(request, {"quality"});
     const std::string tiles =
-        request.baseUrl + "/tiles/" + PercentEncoded(name, true) + "/{z}/{x}/{y}.png" + style;
+        request.baseUrl + "/tiles/" + PercentEncoded(name, true) + "/{z}/{x}/{y}.";
     Json document = {{"tilejson", "3.0.0"},
                      {"name", name},
                      {"scheme", "xyz"},
-                     {"tiles", Json::array({tiles})},
+                     {"tiles", Json::array({tiles + "png" + style})},
+                     {"format", "png"},
+                     {"formats", FormatsOf(tiles, style)},
                      {"minzoom", 0},
                      {"maxzoom", raster->MostZoom()},
                      {"vector_layers", Json::array()},

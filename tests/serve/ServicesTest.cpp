@@ -182,6 +182,21 @@ TEST_F(ServicesTest, TileJsonTellsTheGrid) {
     EXPECT_EQ(document["tilejson"], "3.0.0");
     EXPECT_EQ(document["tiles"][0], "http://here/tiles/a.pyr/{z}/{x}/{y}.png");
     EXPECT_EQ(document["maxzoom"], 1);
+    EXPECT_EQ(document["format"], "png");
+    const Json formats = Document("/tiles/a.pyr/tile.json?gamma=2")["formats"];
+    std::vector<std::string> names, types;
+    for (const Json& format : formats) {
+        names.push_back(format["format"]);
+        types.push_back(format["type"]);
+        std::string tile = format["tiles"][0];
+        for (const char* const part : {"{z}", "{x}", "{y}"}) tile.replace(tile.find(part), 3, "0");
+        const Answer answer = Ask(tile.substr(std::string("http://here").size()));
+        EXPECT_EQ(answer.status, 200) << tile;
+        EXPECT_EQ(answer.type, types.back()) << tile;
+    }
+    EXPECT_EQ(names, (std::vector<std::string>{"jpg", "png", "webp", "raw", "npy"}));
+    EXPECT_EQ(formats[1]["tiles"][0], "http://here/tiles/a.pyr/{z}/{x}/{y}.png?gamma=2");
+    EXPECT_EQ(formats[3]["tiles"][0], "http://here/tiles/a.pyr/{z}/{x}/{y}.raw");
     EXPECT_EQ(document["levels"][0]["width"], 150);
     EXPECT_EQ(document["levels"][1]["tilesAcross"], 2);
     EXPECT_EQ(Document("/tiles/a.pyr/tile.json?gamma=2")["tiles"][0],
