@@ -8,16 +8,20 @@
 
 namespace zmcserve {
 
-std::vector<Route> FileRoutes();     // the files themselves
-std::vector<Route> TileRoutes();     // tiles in the raster's own grid
-std::vector<Route> PictureRoutes();  // previews
-std::vector<Route> ValueRoutes();    // points, profiles, windows of samples
-std::vector<Route> RecordRoutes();   // what a file tells: info, statistics, histograms
-std::vector<Route> ServerRoutes();   // the server itself: api, health, metrics
-std::vector<Route> PageRoutes();     // the viewer
+std::vector<Route> FileRoutes();      // the files themselves
+std::vector<Route> TileRoutes();      // tiles in the raster's own grid
+std::vector<Route> PictureRoutes();   // previews
+std::vector<Route> ValueRoutes();     // points, profiles, windows of samples
+std::vector<Route> RecordRoutes();    // what a file tells: info, statistics, histograms
+std::vector<Route> ServerRoutes();    // the server itself: api, health, metrics
+std::vector<Route> PageRoutes();      // the viewer
+std::vector<Route> DeepZoomRoutes();  // Deep Zoom: DZI
+std::vector<Route> ImageRoutes();     // the IIIF Image API
 
 inline constexpr std::vector<Route> (*kServices[])() = {
-    FileRoutes, TileRoutes, PictureRoutes, ValueRoutes, RecordRoutes, ServerRoutes, PageRoutes};
+    FileRoutes,   TileRoutes, PictureRoutes,  ValueRoutes, RecordRoutes,
+    ServerRoutes, PageRoutes, DeepZoomRoutes, ImageRoutes,
+};
 
 // What no route has: the viewer's files, which may lie anywhere below the root.
 Answer AnswerOfPage(const Request& request, Service& service);
