@@ -2,6 +2,7 @@
 import assert from "node:assert/strict";
 import { readFileSync } from "node:fs";
 
+import axe from "axe-core";
 import { type Browser, type BrowserContextOptions, chromium, type Page } from "playwright-core";
 
 import type { App } from "../../src/app.js";
@@ -43,6 +44,13 @@ export class Bench {
 
   /** A page that shows the viewer, with what stands behind its name in the address. */
   async open(address = "", options: BrowserContextOptions = {}): Promise<Page> {
+    const page = await this.visit(`${this.base}/index.html${address}`, options);
+    await idle(page);
+    return page;
+  }
+
+  /** Any page. */
+  async visit(url: string, options: BrowserContextOptions = {}): Promise<Page> {
     const context = await (this.browser as Browser).newContext({
       viewport: { width: 640, height: 480 },
       reducedMotion: "reduce",
@@ -51,10 +59,26 @@ export class Bench {
     const page = await context.newPage();
     page.setDefaultTimeout(15000);
     page.on("pageerror", (error) => this.complaints.push(String(error)));
-    await page.goto(`${this.base}/index.html${address}`);
-    await idle(page);
+    await page.goto(url);
     return page;
   }
+}
+
+interface Finding {
+  id: string;
+  nodes: { html: string; failureSummary?: string }[];
+}
+
+/** What axe complains of. */
+export async function findings(on: Page): Promise<Finding[]> {
+  await on.evaluate(axe.source);
+  return on.evaluate(async () => {
+    const run = (globalThis as unknown as { axe: { run(): Promise<{ violations: Finding[] }> } }).axe.run;
+    return (await run()).violations.map(({ id, nodes }) => ({
+      id,
+      nodes: nodes.map(({ html, failureSummary }) => ({ html, failureSummary: failureSummary ?? "" })),
+    }));
+  });
 }
 
 /** Once all that is in view has come. */
