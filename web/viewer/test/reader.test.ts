@@ -87,3 +87,23 @@ for (const type of PIXEL_TYPES)
       assert.deepEqual(told, await inNode(name), name);
     }
   });
+
+test("the page of the documents, as it stands, shows a pyramid sample by sample", async () => {
+  pyramids.make([{ name: "scene", seed: 9, array: [3, 90, 120] }]);
+  bench.putExample(pyramids.bytes("scene"));
+  const shown = await bench.visit(`${bench.base}/page.html`);
+  await shown.waitForFunction(() => document.querySelector("canvas")?.width === 120);
+  const pixels = await shown.evaluate(() => {
+    const canvas = document.querySelector("canvas") as HTMLCanvasElement;
+    return [...(canvas.getContext("2d") as CanvasRenderingContext2D).getImageData(0, 0, 120, canvas.height).data];
+  });
+  const bands = pyramids.expected("scene", 0);
+  assert.equal(pixels.length, 4 * 120 * 90);
+  for (let i = 0; i < 120 * 90; ++i)
+    assert.deepEqual(
+      pixels.slice(4 * i, 4 * i + 4),
+      [0, 1, 2].map((band) => bands[band * 120 * 90 + i]).concat(255),
+      `pixel ${i}`,
+    );
+  await shown.context().close();
+});

@@ -42,6 +42,15 @@ export class Bench {
     this.site.files.set(name, { bytes });
   }
 
+  /** The page of the documents, page.html, as it stands, with what it asks for. */
+  putExample(scene: Uint8Array): void {
+    const put = (name: string, type: string, from: string): unknown =>
+      this.site.files.set(name, { bytes: Uint8Array.from(readFileSync(from)), type });
+    put("page.html", "text/html", "examples/page.html");
+    put("zmcraster-web.js", "text/javascript", "dist/index.js");
+    this.put("scene.pyr", scene);
+  }
+
   /** A page that shows the viewer, with what stands behind its name in the address. */
   async open(address = "", options: BrowserContextOptions = {}): Promise<Page> {
     const page = await this.visit(`${this.base}/index.html${address}`, options);
