@@ -114,7 +114,7 @@ Answer DeepTileAnswer(const Request& request, Service& service, const std::strin
 
 Answer HandleDeepZoom(const Request& request, Service& service) {
     const std::size_t count = request.segments.size();
-    if (const auto name = Without(kDescriptor, NameOfSegments(request, 1, count)))
+    if (const auto name = Without(kDescriptor, NameOfRest(request)))
         return Descriptor(request, service, *name);
     if (count > 3)
         if (const auto name = Without(kTiles, NameOfSegments(request, 1, count - 2)))

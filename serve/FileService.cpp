@@ -49,7 +49,7 @@ std::optional<Answer> SidecarAnswer(const Request& request, Service& service,
 }
 
 Answer HandleFile(const Request& request, Service& service) {
-    const std::string name = NameOfSegments(request, 1, request.segments.size());
+    const std::string name = NameOfRest(request);
     if (auto answer = SidecarAnswer(request, service, name)) return std::move(*answer);
     return FileAnswer(request, service.catalog.File(name));
 }

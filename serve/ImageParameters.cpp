@@ -144,7 +144,7 @@ PictureSize SizeOfPercent(std::string_view text, const Window& region, bool mayG
 }
 
 // "w,", ",h" and "w,h": what is not told is 0.
-PictureSize Pair(std::string_view text) {
+PictureSize PixelPair(std::string_view text) {
     const auto parts = Split(text, ',');
     PictureSize pair;
     const auto take = [&](std::string_view part, std::uint32_t& extent) {
@@ -162,7 +162,7 @@ PictureSize Pair(std::string_view text) {
 
 PictureSize SizeWithin(std::string_view text, const Window& region, const ImageLimits& limits,
                        bool mayGrow) {
-    const PictureSize box = Pair(text);
+    const PictureSize box = PixelPair(text);
     if (box.width == 0 || box.height == 0)
         throw Misread("size", text, "has one number where there have to be two");
     if (mayGrow) return FitWithin(region, box.width, box.height, limits);
@@ -171,7 +171,7 @@ PictureSize SizeWithin(std::string_view text, const Window& region, const ImageL
 }
 
 PictureSize SizeOfPair(std::string_view text, const Window& region) {
-    PictureSize size = Pair(text);
+    PictureSize size = PixelPair(text);
     if (size.width == 0) size.width = std::max(Share(region.width, region.height, size.height), 1u);
     if (size.height == 0)
         size.height = std::max(Share(region.height, region.width, size.width), 1u);

@@ -80,7 +80,7 @@ Image ImageOf(const Request& request, Service& service, std::size_t end) {
     return image;
 }
 
-ImageLimits LimitsOf(const Service& service) {
+ImageLimits ImageLimitsOf(const Service& service) {
     return {service.limits.side, service.limits.pixels};
 }
 
@@ -108,7 +108,7 @@ Json SizesOf(const Window& whole, const std::vector<std::uint32_t>& scales,
 
 Json InfoOf(const Image& image, const Service& service) {
     const Window whole = image.raster->Whole();
-    const ImageLimits limits = LimitsOf(service);
+    const ImageLimits limits = ImageLimitsOf(service);
     const std::uint32_t side = TileSideOf(service, *image.raster);
     const auto scales = ScalesOf(whole, side);
     Json factors = Json::array();
@@ -256,7 +256,7 @@ std::string CanonicalOf(const Image& image, const Wanted& wanted, const ImageLim
 
 Answer ImageAnswer(const Request& request, Service& service) {
     const Image image = ImageOf(request, service, request.segments.size() - 4);
-    const ImageLimits limits = LimitsOf(service);
+    const ImageLimits limits = ImageLimitsOf(service);
     const Wanted wanted = WantedOf(request, image.raster->Whole(), limits);
     const Validators validators{image.raster->ETagWithCompanions("p"), std::nullopt};
     if (auto answer = AnswerOfConditions(request, validators)) return std::move(*answer);

@@ -32,7 +32,7 @@ bool WantsLegend(const Request& request) {
 }
 
 Answer HandlePreview(const Request& request, Service& service) {
-    const std::string last = NameOfSegments(request, 1, request.segments.size());
+    const std::string last = NameOfRest(request);
     const auto [name, ending] = StemAndEnding(last);
     const auto format = zmcrender::PictureFormatOfName(ending);
     if (!format) throw Refusal(404, "the formats of previews are jpg, png and webp");
