@@ -1,35 +1,76 @@
-# zmc_embed_pages(folder source): writes a C++ source with the files of a folder, as serve/Pages.h
-# has them; none where there is no such folder. What is in it is looked at when the build is set up,
-# and again whenever one of them changes.
-function(zmc_embed_pages folder source)
-    set(types .html "text/html; charset=utf-8" .js "text/javascript; charset=utf-8"
-        .css "text/css; charset=utf-8" .svg image/svg+xml .png image/png .ico image/x-icon
-        .json application/json .webmanifest application/manifest+json .woff2 font/woff2
-        .wasm application/wasm .txt "text/plain; charset=utf-8" .map application/json)
-    file(GLOB_RECURSE files RELATIVE "${folder}" CONFIGURE_DEPENDS "${folder}/*")
-    list(SORT files)
-    set(number 0)
-    set(arrays "")
-    set(rows "")
-    foreach(file IN LISTS files)
-        set_property(DIRECTORY APPEND PROPERTY CMAKE_CONFIGURE_DEPENDS "${folder}/${file}")
-        file(READ "${folder}/${file}" digits HEX)
-        file(SHA256 "${folder}/${file}" hash)
-        string(SUBSTRING "${hash}" 0 32 version)
-        string(REGEX REPLACE "(..)" "0x\\1," bytes "${digits}")
-        get_filename_component(ending "${file}" LAST_EXT)
-        list(FIND types "${ending}" place)
-        set(type application/octet-stream)
-        if(place GREATER_EQUAL 0)
-            math(EXPR place "${place} + 1")
-            list(GET types ${place} type)
-        endif()
-        string(APPEND arrays "constexpr unsigned char kFile${number}[] = {${bytes}0};\n")
-        string(APPEND rows "    {\"${file}\", \"${type}\", Bytes(kFile${number}, sizeof kFile${number} - 1), \"${version}\"},\n")
-        math(EXPR number "${number} + 1")
-    endforeach()
-    set(ZMC_PAGE_ARRAYS "${arrays}")
-    set(ZMC_PAGE_ROWS "${rows}")
-    set(ZMC_PAGE_COUNT ${number})
-    configure_file("${ZMC_ROOT}/serve/Pages.cpp.in" "${source}" @ONLY)
+# zmc_embed_viewer(source): the C++ source that holds the files of the viewer, as serve/Pages.h has
+# them. The build makes the viewer of web/ for it, with the tools that its lock file names: they are
+# got from the npm registry once for a build folder, and nothing is looked for there as long as the
+# lock file stays. Without the viewer the source holds none.
+#
+# ZMC_BUILD_VIEWER decides: ON, OFF, or AUTO, which is ON where Node and npm are there and the build
+# is not one that looks for faults in C++ alone.
+
+set(ZMC_BUILD_VIEWER AUTO CACHE STRING
+    "Put the viewer, which Node makes, into zmcraster serve: ON, OFF or AUTO")
+set_property(CACHE ZMC_BUILD_VIEWER PROPERTY STRINGS AUTO ON OFF)
+
+# Sets `problem` to why the viewer cannot be made, or to nothing.
+function(zmc_find_node problem)
+    set(${problem} "" PARENT_SCOPE)
+    find_program(ZMC_NODE node)
+    find_program(ZMC_NPM npm)
+    if(NOT ZMC_NODE OR NOT ZMC_NPM)
+        set(${problem} "there is no Node with npm" PARENT_SCOPE)
+        return()
+    endif()
+    execute_process(COMMAND "${ZMC_NODE}" -e "process.exit(parseInt(process.versions.node) < 18 ? 1 : 0)"
+        RESULT_VARIABLE old)
+    if(old)
+        set(${problem} "Node is older than 18" PARENT_SCOPE)
+    endif()
+endfunction()
+
+# Sets `wanted`, and says in a line what has been decided and why.
+function(zmc_decide_viewer wanted)
+    set(${wanted} OFF PARENT_SCOPE)
+    if(NOT ZMC_BUILD_VIEWER AND NOT ZMC_BUILD_VIEWER STREQUAL AUTO)
+        message(STATUS "zmcraster serve: without the viewer, as ZMC_BUILD_VIEWER says")
+        return()
+    endif()
+    zmc_find_node(problem)
+    if(ZMC_BUILD_VIEWER STREQUAL AUTO AND (ZMC_SANITIZE OR ZMC_FUZZ OR ZMC_COVERAGE))
+        set(problem "this build looks for faults in C++")
+    elseif(problem AND NOT ZMC_BUILD_VIEWER STREQUAL AUTO)
+        message(FATAL_ERROR "ZMC_BUILD_VIEWER: ${problem}")
+    endif()
+    if(problem)
+        message(STATUS "zmcraster serve: without the viewer (${problem})")
+        return()
+    endif()
+    message(STATUS "zmcraster serve: with the viewer")
+    set(${wanted} ON PARENT_SCOPE)
+endfunction()
+
+function(zmc_embed_viewer source)
+    set(web "${ZMC_ROOT}/web")
+    set(tools "${CMAKE_BINARY_DIR}/web")
+    set(page "${CMAKE_BINARY_DIR}/viewer")
+    set(write "${CMAKE_COMMAND}" -DZMC_SOURCE=${source} -DZMC_TEMPLATE=${ZMC_ROOT}/serve/Pages.cpp.in)
+    set(writer "${ZMC_ROOT}/cmake/WritePages.cmake" "${ZMC_ROOT}/serve/Pages.cpp.in")
+    zmc_decide_viewer(wanted)
+    if(NOT wanted)
+        add_custom_command(OUTPUT "${source}" COMMAND ${write} -P "${ZMC_ROOT}/cmake/WritePages.cmake"
+            DEPENDS ${writer} VERBATIM COMMENT "Leaving the viewer out")
+        return()
+    endif()
+    add_custom_command(OUTPUT "${page}/tools.stamp"
+        COMMAND "${web}/run-tests" install "${tools}"
+        COMMAND "${CMAKE_COMMAND}" -E make_directory "${page}"
+        COMMAND "${CMAKE_COMMAND}" -E touch "${page}/tools.stamp"
+        DEPENDS "${web}/package.json" "${web}/package-lock.json"
+        VERBATIM COMMENT "Getting the tools that make the viewer")
+    file(GLOB_RECURSE sources CONFIGURE_DEPENDS "${web}/src/*.ts" "${web}/viewer/src/*.ts")
+    add_custom_command(OUTPUT "${source}"
+        COMMAND "${web}/run-tests" page "${tools}" "${page}"
+        COMMAND ${write} "-DZMC_FOLDER=${page}/viewer/dist" -P "${ZMC_ROOT}/cmake/WritePages.cmake"
+        DEPENDS ${sources} ${writer} "${page}/tools.stamp" "${web}/run-tests"
+                "${web}/viewer/build.mjs" "${web}/viewer/index.html" "${web}/viewer/style.css"
+                "${ZMC_ROOT}/render/colormaps.txt"
+        VERBATIM COMMENT "Making the viewer")
 endfunction()

@@ -456,7 +456,11 @@ def serve_seeds():
         b"/preview/a.pyr.png?size=40&window=1,2,30,20&legend=1&bands=1&colormap=viridis",
         b"/statistics/a.pyr", b"/histogram/sub/m.pyr?band=9", b"/info/a.pyr",
         b"/point/a.pyr?x=89&y=69&level=0&bands=1", b"/profile/a.pyr?line=0,0.5,90,70&samples=9",
-        b"/window/a.pyr.npy?window=1,2,3,4&level=0&bands=2", b"/%00%ff?a=%", b"a")
+        b"/window/a.pyr.npy?window=1,2,3,4&level=0&bands=2", b"/dzi/a.pyr.dzi?format=webp", b"/dzi/sub/m.pyr_files/3/0_0.png?bands=9&gamma=2",
+        b"/iiif/sub%2fm.pyr%3Fbands=2/info.json", b"/iiif/a.pyr",
+        b"/iiif/a.pyr/pct:10,10.5,50,50/^!40,9/!90/gray.png?stretch=p2,98",
+        b"/iiif/a.pyr/square/,30/270/bitonal.jpg", b"/iiif/a.pyr/1,2,30,40/^pct:150/0/color.webp",
+        b"/%00%ff?a=%", b"a")
     targets += (
         b"/ogc", b"/ogc/conformance?f=json", b"/ogc/api", b"/ogc/collections?limit=1&offset=1",
         b"/ogc/collections/sub~2Fm.pyr", b"/ogc/tileMatrixSets", b"/ogc/tileMatrixSets/own-a.pyr",

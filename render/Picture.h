@@ -29,6 +29,14 @@ Picture WithEightBits(Picture picture);
 Picture WithSixteenBits(Picture picture);
 // The same with red, green and blue, whether it had them or was grey.
 Picture WithColours(Picture picture);
+// The same in grey, as bright as red, green and blue are together to the eye: (299 r + 587 g +
+// 114 b) / 1000, rounded; as it is if it is grey.
+Picture InGrey(Picture picture);
+// The same in black, below half the brightness, and white, with 8 bits.
+Picture InBlackAndWhite(Picture picture);
+// The same mirrored from left to right if that is wanted, and then turned clockwise by so many
+// quarters of a full turn.
+Picture Turned(Picture picture, bool mirrored, unsigned quarters);
 
 }  // namespace zmcrender
 

@@ -37,6 +37,8 @@ public:
 
 // All of level 0, as far as the levels tell of it; empty where they have all shrunk to nothing.
 zmchost::Window WholeOf(const PixelSource& source);
+// The same of a raster whose level has so many pixels.
+zmchost::Window WholeOfLevel(std::uint32_t level, std::uint32_t width, std::uint32_t height);
 
 // An open raster, which is borrowed.
 class RasterPixels final : public PixelSource {

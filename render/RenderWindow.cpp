@@ -32,11 +32,12 @@ Area OnLevel(const Window& window, std::uint32_t level, const Window& whole) {
     return area;
 }
 
-// Whole pixels that an area touches, and one more on each side where it grows.
+// Whole pixels that an area touches, and one more on each side where it grows. An area beyond the
+// edge touches the pixels at the edge.
 Window Touched(const Area& area, const Window& whole, std::uint32_t width, std::uint32_t height) {
     const auto span = [](double start, double extent, std::uint32_t target, std::uint32_t size) {
         const double more = extent < target ? 1 : 0;
-        const double from = std::max(std::floor(start) - more, 0.0);
+        const double from = std::clamp(std::floor(start) - more, 0.0, size - 1.0);
         const double to = std::min(std::ceil(start + extent) + more, static_cast<double>(size));
         return std::pair(static_cast<std::uint32_t>(from),
                          static_cast<std::uint32_t>(std::max(to - from, 1.0)));
@@ -90,15 +91,48 @@ void EachStrip(const Renderer& renderer, PixelSource& source, std::uint32_t leve
     }
 }
 
+// An area of a level in width x height pixels.
+Picture RenderArea(const Renderer& renderer, PixelSource& source, std::uint32_t level,
+                   const Area& area, std::uint32_t width, std::uint32_t height) {
+    const Window whole{0, 0, source.Width(level), source.Height(level)};
+    const Window touched = Touched(area, whole, width, height);
+    CheckLine(renderer, source, touched);
+    if (IsSame(area, touched, width, height) &&
+        LineBytes(renderer, source, touched) * height <= kStripBytes) {
+        SampleBlock block;
+        return renderer.Render(
+            block.Read(source, level, touched, renderer.Bands(), renderer.Halo()));
+    }
+    const Area inside{area.x - touched.x, area.y - touched.y, area.width, area.height};
+    Resampler resampler(touched.width, touched.height, renderer.Colours(),
+                        renderer.Settings().depth, inside, width, height);
+    EachStrip(renderer, source, level, touched,
+              [&](const Picture& strip) { resampler.Add(strip); });
+    return resampler.Finish(false);
+}
+
+// The coarsest level that has pixels.
+std::uint32_t CoarsestOf(const PixelSource& source) {
+    std::uint32_t found = source.MinLevel();
+    while (found < source.MaxLevel() && source.Width(found + 1) != 0 &&
+           source.Height(found + 1) != 0)
+        ++found;
+    return found;
+}
+
 }  // namespace
 
 Window WholeOf(const PixelSource& source) {
     const std::uint32_t level = source.MinLevel();
+    return WholeOfLevel(level, source.Width(level), source.Height(level));
+}
+
+Window WholeOfLevel(std::uint32_t level, std::uint32_t width, std::uint32_t height) {
     const auto whole = [level](std::uint32_t extent) {
         return static_cast<std::uint32_t>(
             std::min<std::uint64_t>(std::uint64_t{extent} << (level & 31u), 0xffffffffu));
     };
-    return {0, 0, whole(source.Width(level)), whole(source.Height(level))};
+    return {0, 0, whole(width), whole(height)};
 }
 
 std::uint32_t LevelFor(const PixelSource& source, const Window& window, std::uint32_t width,
@@ -117,21 +151,15 @@ Picture RenderWindow(const Renderer& renderer, PixelSource& source, const Window
                      std::uint32_t width, std::uint32_t height) {
     const std::uint32_t level = LevelFor(source, window, width, height);
     const Window whole{0, 0, source.Width(level), source.Height(level)};
-    const Area area = OnLevel(window, level, whole);
-    const Window touched = Touched(area, whole, width, height);
-    CheckLine(renderer, source, touched);
-    if (IsSame(area, touched, width, height) &&
-        LineBytes(renderer, source, touched) * height <= kStripBytes) {
-        SampleBlock block;
-        return renderer.Render(
-            block.Read(source, level, touched, renderer.Bands(), renderer.Halo()));
-    }
-    const Area inside{area.x - touched.x, area.y - touched.y, area.width, area.height};
-    Resampler resampler(touched.width, touched.height, renderer.Colours(),
-                        renderer.Settings().depth, inside, width, height);
-    EachStrip(renderer, source, level, touched,
-              [&](const Picture& strip) { resampler.Add(strip); });
-    return resampler.Finish(false);
+    return RenderArea(renderer, source, level, OnLevel(window, level, whole), width, height);
+}
+
+Picture RenderInScale(const Renderer& renderer, PixelSource& source, std::uint32_t level,
+                      const Window& window) {
+    const std::uint32_t own = std::clamp(level, source.MinLevel(), CoarsestOf(source));
+    const double step = std::ldexp(1.0, static_cast<int>(level) - static_cast<int>(own));
+    const Area area{window.x * step, window.y * step, window.width * step, window.height * step};
+    return RenderArea(renderer, source, own, area, window.width, window.height);
 }
 
 }  // namespace zmcrender

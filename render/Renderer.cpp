@@ -125,7 +125,7 @@ private:
         const bool withAlpha = alphaBand && given.size() == shown + 1;
         if (style.stretch.kind != Stretch::Kind::Ranges) {
             for (const std::uint32_t band : colourBands)
-                bounds.push_back(BoundsOfBand(facts, style, source, band));
+                bounds.push_back(BoundsOfBand(facts, style, source, band, shown));
         } else if (given.size() == 1) {
             bounds.assign(shown, given[0]);
         } else if (given.size() == shown || withAlpha) {

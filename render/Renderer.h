@@ -83,6 +83,19 @@ private:
 Picture RenderWindow(const Renderer& renderer, PixelSource& source, const zmchost::Window& window,
                      std::uint32_t width, std::uint32_t height);
 
+// A window of the raster in the scale 1 / 2^level, one to one. A raster has so many pixels in each
+// scale as reach its edges, of which the last may lie half outside: an extent halved and rounded
+// up. Where the raster has that level, its pixels are taken as they are, and the nearest ones for
+// those that its size, which is rounded down, lacks. Coarser scales are reduced from its coarsest
+// level, finer ones enlarged from its finest. `level` is 32 at most. Throws as RenderWindow.
+Picture RenderInScale(const Renderer& renderer, PixelSource& source, std::uint32_t level,
+                      const zmchost::Window& window);
+// The pixels of such a scale along an extent of level 0.
+inline std::uint32_t ExtentInScale(std::uint32_t extent, std::uint32_t level) {
+    const std::uint64_t step = std::uint64_t{1} << level;
+    return static_cast<std::uint32_t>((extent + (step - 1)) / step);
+}
+
 // The level that RenderWindow reads for it.
 std::uint32_t LevelFor(const PixelSource& source, const zmchost::Window& window,
                        std::uint32_t width, std::uint32_t height);

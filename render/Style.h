@@ -7,9 +7,9 @@
 //     bands       1 to 4 bands, counted from 1: "2" grey, "2,4" grey and alpha, "3,2,1" colours,
 //                 "1,2,3,4" colours and alpha. Default: what the raster says of its bands
 //                 (RasterFacts.h)
-//     stretch     "auto" (default): Byte as it is; other types from 2 to 98 per cent of the
-//                     archived histogram, else between the archived minimum and maximum, else
-//                     between those of a coarse level
+//     stretch     "auto" (default): three bands of Byte as they are; a single one and other types
+//                     from 2 to 98 per cent of the archived histogram, else between the archived
+//                     minimum and maximum, else between those of a coarse level
 //                 "MIN,MAX", or one such pair for each band of `bands`: "0,100;0,200;5,50"
 //                 "pLOW,HIGH": per cents of the archived histogram: "p2,98"
 //                 "sN": mean - N to mean + N standard deviations: "s2.5"

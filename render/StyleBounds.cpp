@@ -137,10 +137,11 @@ Range BoundsOfValues(const Style& style, PixelSource& source, std::span<const st
 }
 
 Range BoundsOfBand(const RasterFacts& facts, const Style& style, PixelSource& source,
-                   std::uint32_t band) {
+                   std::uint32_t band, std::size_t shown) {
     const Kind kind = style.stretch.kind;
-    const bool isByte = facts.pixelType == zelm::PixelTypeCode::Byte;
-    if (kind == Kind::None || (kind == Kind::Auto && isByte)) return Plain(style);
+    // Colours of bytes are meant for a screen; each stretched by itself would have another tint.
+    const bool isColour = shown > 1 && facts.pixelType == zelm::PixelTypeCode::Byte;
+    if (kind == Kind::None || (kind == Kind::Auto && isColour)) return Plain(style);
     if (const auto range = FromRecords(facts, style.stretch, band)) return *range;
     const auto channel = ValuesChannel(facts, style, band);
     // Exact, where 64-bit integers are more than doubles.

@@ -2,6 +2,7 @@
 #ifndef ZMC_RENDER_STYLEBOUNDS_H
 #define ZMC_RENDER_STYLEBOUNDS_H
 
+#include <cstddef>
 #include <functional>
 #include <span>
 
@@ -19,10 +20,10 @@ std::optional<Number> NoDataOf(const RasterFacts& facts, const Style& style, std
 std::unique_ptr<const Channel> ValuesChannel(const RasterFacts& facts, const Style& style,
                                              std::uint32_t band);
 
-// Bounds of a band, from 0, for any stretch but pairs of the user's. Reads samples where the
-// records do not tell.
+// Bounds of a band, from 0, for any stretch but pairs of the user's; `shown` tells how many bands
+// are shown together, of which each is a colour. Reads samples where the records do not tell.
 Range BoundsOfBand(const RasterFacts& facts, const Style& style, PixelSource& source,
-                   std::uint32_t band);
+                   std::uint32_t band, std::size_t shown);
 
 // Values of the samples that VisitSamples hands out: NaN of those that are missing or hidden.
 using LineValues = std::function<void(const PixelLine& line, double* values)>;

@@ -4,10 +4,11 @@
 //     1870
 //
 // which is the common log format with the time in microseconds behind it. The status is 0 where the
-// client went before there was an answer, or sent what is no HTTP. What a client sent stands
-// with `\xHH` in place of quotes, backslashes and all that is no printable ASCII character. Lines
-// that the reader of the log does not take in time are dropped and counted, so that nobody waits
-// for it. Any thread may call.
+// client went before there was an answer. Of what the HTTP library refuses by itself, such as heads
+// that are too long, method and protocol are "-". What a client sent stands with `\xHH` in place of
+// quotes, backslashes and all that is no printable ASCII character. Lines that the reader of the
+// log does not take in time are dropped and counted, so that nobody waits for it. Any thread may
+// call.
 #ifndef ZMC_SERVE_ACCESSLOG_H
 #define ZMC_SERVE_ACCESSLOG_H
 

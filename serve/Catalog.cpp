@@ -15,7 +15,7 @@ namespace {
 
 constexpr const char* kNothing = "there is no pyramid of that name";
 // What the driver may look at beside a raster.
-constexpr const char* kCompanions[] = {".aux.xml", ".msk"};
+constexpr const char* kCompanions[] = {kSidecar, ".msk"};
 
 bool IsPlainPart(std::string_view part) { return !part.empty() && part[0] != '.'; }
 
@@ -141,6 +141,18 @@ ServedFilePtr Catalog::File(std::string_view name) {
     const Found found = Find(name);
     if (const ServedRasterPtr raster = TakeHeld(name, found)) return raster->FilePtr();
     return Open(found, name);
+}
+
+std::optional<ServedFilePtr> Catalog::Sidecar(std::string_view name) try {
+    const Found found = Find(name);
+    static_cast<void>(File(name));
+    auto file =
+        platform::OpenBeneath(found.root->folder, found.below + kSidecar, found.root->links);
+    if (!file) return ServedFilePtr();
+    return std::make_shared<const ServedFile>(std::move(file), std::string(name) + kSidecar);
+} catch (const Refusal& refusal) {
+    if (refusal.Status() != 404) throw;
+    return std::nullopt;
 }
 
 ServedRasterPtr Catalog::RasterIfOpen(std::string_view name) { return TakeHeld(name, Find(name)); }

@@ -18,6 +18,7 @@
 #include <list>
 #include <memory>
 #include <mutex>
+#include <optional>
 #include <string>
 #include <string_view>
 #include <unordered_map>
@@ -28,6 +29,9 @@
 #include "serve/ServedRaster.h"
 
 namespace zmcserve {
+
+// What the name of a sidecar has behind that of its raster.
+inline constexpr const char* kSidecar = ".aux.xml";
 
 class Catalog {
 public:
@@ -43,7 +47,10 @@ public:
     // pyramid of that name, 400 for what can be no name, 403 for a link that leads out, 500 where
     // the system refuses.
     ServedFilePtr File(std::string_view name);
-    // The same as a raster. Throws Refusal (500) too for a file whose header is damaged.
+    // The sidecar beside the file of that name; null where it has none, nothing where there is no
+    // such file. Throws Refusal as File does, but for 404.
+    std::optional<ServedFilePtr> Sidecar(std::string_view name);
+    // The file as a raster. Throws Refusal (500) too for a file whose header is damaged.
     ServedRasterPtr Raster(std::string_view name);
     // The same where it is open already and still is what the name stands for; else null. Takes no
     // more than a few calls of the system.

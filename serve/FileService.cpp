@@ -14,7 +14,7 @@ Answer Unsatisfiable(std::uint64_t size) {
                         .With("Content-Range", "bytes */" + std::to_string(size)));
 }
 
-Answer FileAnswer(const Request& request, const ServedFilePtr& file) {
+Answer FileAnswer(const Request& request, const ServedFilePtr& file, const char* type = kType) {
     const Validators validators{file->ETag(), file->Modified()};
     if (auto answer = AnswerOfConditions(request, validators)) return std::move(*answer);
     const std::uint64_t size = file->Size();
@@ -22,7 +22,7 @@ Answer FileAnswer(const Request& request, const ServedFilePtr& file) {
     const RangeKind kind = RangeOf(request, validators, size, range);
     if (kind == RangeKind::Unsatisfiable) return Unsatisfiable(size);
     Answer answer;
-    answer.type = kType;
+    answer.type = type;
     SetValidators(answer, validators);
     answer.Set("Accept-Ranges", "bytes");
     answer.body = FileRange{file, 0, size};
@@ -35,9 +35,23 @@ Answer FileAnswer(const Request& request, const ServedFilePtr& file) {
     return answer;
 }
 
+// The sidecar of a raster. Readers ask for it each time, and that there is none is no fault.
+std::optional<Answer> SidecarAnswer(const Request& request, Service& service,
+                                    std::string_view name) {
+    if (!name.ends_with(kSidecar)) return std::nullopt;
+    const auto sidecar =
+        service.catalog.Sidecar(name.substr(0, name.size() - std::string_view(kSidecar).size()));
+    if (!sidecar) return std::nullopt;
+    if (*sidecar) return FileAnswer(request, *sidecar, "application/xml");
+    Answer none;
+    none.status = 204;
+    return none;
+}
+
 Answer HandleFile(const Request& request, Service& service) {
-    return FileAnswer(request,
-                      service.catalog.File(NameOfSegments(request, 1, request.segments.size())));
+    const std::string name = NameOfRest(request);
+    if (auto answer = SidecarAnswer(request, service, name)) return std::move(*answer);
+    return FileAnswer(request, service.catalog.File(name));
 }
 
 std::optional<Answer> HandleFileQuickly(const Request& request, Service& service) {
@@ -51,7 +65,8 @@ std::vector<Route> FileRoutes() {
              HandleFile,
              HandleFileQuickly,
              {{"files", "/files/{+name}",
-               "the file itself, with ranges: RFC 9110, one range in one request"}}}};
+               "the file itself, with ranges: RFC 9110, one range in one request; at NAME.aux.xml "
+               "its sidecar, or 204"}}}};
 }
 
 }  // namespace zmcserve

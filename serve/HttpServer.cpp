@@ -381,12 +381,20 @@ void HttpServer::Server::Note(const Connection* connection, const Exchange& exch
               std::chrono::duration_cast<std::chrono::microseconds>(time)});
 }
 
+// What the library answered by itself: to a head that is malformed or too long, before anybody here
+// is asked. 0 where nothing was answered.
+int StatusOfLibrary(MHD_Connection* connection) {
+    const auto* const info = MHD_get_connection_info(connection, MHD_CONNECTION_INFO_HTTP_STATUS);
+    return info ? static_cast<int>(info->http_status) : 0;
+}
+
 void HttpServer::Server::End(void* self, MHD_Connection* connection, void** held,
                              MHD_RequestTerminationCode) {
     const std::unique_ptr<Exchange> exchange(static_cast<Exchange*>(std::exchange(*held, nullptr)));
     Connection* const from = ConnectionOf(connection);
     if (from) from->Rest();
     if (!exchange) return;
+    if (exchange->status == 0) exchange->status = StatusOfLibrary(connection);
     try {
         static_cast<Server*>(self)->Note(from, *exchange);
     } catch (const std::bad_alloc&) {

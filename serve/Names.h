@@ -20,6 +20,11 @@ inline std::string NameOfSegments(const Request& request, std::size_t first, std
     return name;
 }
 
+// All behind the first, which is the service's.
+inline std::string NameOfRest(const Request& request) {
+    return NameOfSegments(request, 1, request.segments.size());
+}
+
 // "0/1.jpg" has the stem "0/1" and the ending "jpg"; without a dot the ending is empty.
 inline std::pair<std::string_view, std::string_view> StemAndEnding(std::string_view name) {
     const std::size_t dot = name.rfind('.');

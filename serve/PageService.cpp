@@ -41,11 +41,12 @@ std::string RowOf(const std::string& name) {
            "\">description</a></td><td><a href=\"/files/" + encoded + "\">file</a></td></tr>\n";
 }
 
-Answer ListPage(Service& service) {
+Answer ListPage(Service& service, const char* note) {
     const Catalog::Listing listing = service.catalog.List();
     std::string text =
         "<!doctype html>\n<html lang=\"en\">\n<meta charset=\"utf-8\">\n"
-        "<title>zmcraster</title>\n<h1>Pyramids</h1>\n<table>\n";
+        "<title>zmcraster</title>\n<h1>Pyramids</h1>\n";
+    text.append(note).append("<table>\n");
     for (const std::string& name : listing.names) text += RowOf(name);
     text += "</table>\n";
     if (!listing.complete) text += "<p>There are more than are listed here.</p>\n";
@@ -72,12 +73,17 @@ Answer AnswerOfPage(const Request& request, Service& service) {
     for (const std::string& segment : request.segments) path += (path.empty() ? "" : "/") + segment;
     if (const Page* const page = FindPage(path.empty() ? "index.html" : path))
         return PageAnswer(request, *page);
-    if (path.empty()) return ListPage(service);
+    if (path.empty())
+        return ListPage(service, "<p>This program was built without the viewer.</p>\n");
     throw Refusal(404, "there is no such service; /api lists them");
 }
 
 std::vector<Route> PageRoutes() {
-    return {{"", AnswerOfPage, nullptr, {{"viewer", "/", "a page that shows the rasters"}}}};
+    return {{"", AnswerOfPage, nullptr, {{"viewer", "/", "a page that shows the rasters"}}},
+            {"list",
+             [](const Request&, Service& service) { return ListPage(service, ""); },
+             nullptr,
+             {{"list", "/list", "the rasters as a page without scripts"}}}};
 }
 
 }  // namespace zmcserve

@@ -1,7 +1,7 @@
 // Pages: the files of the viewer, which the build puts into the program.
 //
-// They are those of web/viewer/dist, where there is such a folder when the build is set up; else
-// there are none, and the root shows a plain list of the files.
+// There are none in a build without the viewer (cmake/EmbedPages.cmake); then the root shows a
+// plain list of the files.
 #ifndef ZMC_SERVE_PAGES_H
 #define ZMC_SERVE_PAGES_H
 

@@ -3,6 +3,7 @@
 #include <stdexcept>
 
 #include "render/Expression.h"
+#include "render/Legend.h"
 #include "render/SampleBlock.h"
 #include "serve/Parameters.h"
 
@@ -25,6 +26,15 @@ std::uint64_t PixelsToSample(const zmcrender::PixelSource& source) {
     for (const zmchost::Window& window : zmcrender::WindowsToSample(source).windows)
         most = std::max(most, window.Pixels());
     return most;
+}
+
+// Whether a window lies in a level of the raster, and is small enough to be read at once.
+bool IsTileOfLevel(const ServedRaster& raster, std::uint32_t level, const zmchost::Window& window) {
+    if (level < raster.FinestLevel() || level > raster.CoarsestLevel()) return false;
+    const zelm::LevelGeometry geometry = raster.Geometry(level);
+    const std::uint64_t side = raster.Header().tileSize;
+    return window.Right() <= geometry.samples && window.Bottom() <= geometry.lines &&
+           window.Pixels() <= side * side;
 }
 
 }  // namespace
@@ -60,6 +70,46 @@ zmcrender::Picture RenderLevelWindow(const Service& service, ServedRaster& raste
                                      const zmchost::Window& window, const Deadline& deadline) {
     const auto reader = raster.Borrow(deadline);
     return RenderLevelWindow(service, raster, *reader, style, level, window, deadline);
+}
+
+zmcrender::Picture RenderScaleWindow(const Service& service, ServedRaster& raster,
+                                     const zmcrender::Style& style, std::uint32_t level,
+                                     const zmchost::Window& window, const Deadline& deadline) {
+    if (IsTileOfLevel(raster, level, window))
+        return RenderLevelWindow(service, raster, style, level, window, deadline);
+    const auto reader = raster.Borrow(deadline);
+    const auto renderer = JudgedRenderer(service, raster, style, *reader);
+    zmcrender::Picture picture =
+        zmcrender::RenderInScale(*renderer, reader->Pixels(), level, window);
+    raster.File().CheckUnchanged();
+    deadline.Check();
+    return picture;
+}
+
+zmcrender::Picture RenderPart(const Service& service, ServedRaster& raster,
+                              const zmcrender::Style& style, const zmchost::Window& window,
+                              const zmcrender::PictureSize& size, const Deadline& deadline,
+                              bool legend) {
+    const auto reader = raster.Borrow(deadline);
+    const auto renderer = JudgedRenderer(service, raster, style, *reader);
+    zmcrender::Picture picture =
+        zmcrender::RenderWindow(*renderer, reader->Pixels(), window, size.width, size.height);
+    if (legend) picture = zmcrender::WithLegend(std::move(picture), *renderer);
+    raster.File().CheckUnchanged();
+    deadline.Check();
+    return picture;
+}
+
+std::uint32_t TileSideOf(const Service& service, const ServedRaster& raster) {
+    std::uint32_t side = std::max(raster.Header().tileSize, 1u);
+    while (side > 1 &&
+           (side > service.limits.side || std::uint64_t{side} * side > service.limits.pixels))
+        side /= 2;
+    return side;
+}
+
+void CheckHasPixels(const ServedRaster& raster) {
+    if (raster.Levels() == 0) throw Refusal(404, "the raster has no pixels");
 }
 
 Answer CodedAnswer(const zmcrender::Picture& picture, zmcrender::PictureFormat format,

@@ -8,6 +8,7 @@
 #include <memory>
 
 #include "render/Codec.h"
+#include "render/PictureSize.h"
 #include "render/Renderer.h"
 #include "serve/Answer.h"
 #include "serve/Request.h"
@@ -31,6 +32,26 @@ zmcrender::Picture RenderLevelWindow(const Service& service, ServedRaster& raste
 zmcrender::Picture RenderLevelWindow(const Service& service, ServedRaster& raster,
                                      const zmcrender::Style& style, std::uint32_t level,
                                      const zmchost::Window& window, const Deadline& deadline);
+
+// The pixels of a window of the raster in the scale 1 / 2^level, one to one, whether the raster has
+// such a level or not: render/Renderer.h. The file was unchanged when they were read.
+zmcrender::Picture RenderScaleWindow(const Service& service, ServedRaster& raster,
+                                     const zmcrender::Style& style, std::uint32_t level,
+                                     const zmchost::Window& window, const Deadline& deadline);
+
+// A window of level 0 in another size, with a legend under it if that is wanted. The file was
+// unchanged when it was read.
+zmcrender::Picture RenderPart(const Service& service, ServedRaster& raster,
+                              const zmcrender::Style& style, const zmchost::Window& window,
+                              const zmcrender::PictureSize& size, const Deadline& deadline,
+                              bool legend = false);
+
+// The side of the tiles into which other services cut a raster: that of its own, halved until a
+// picture of one is within the limits.
+std::uint32_t TileSideOf(const Service& service, const ServedRaster& raster);
+
+// Throws Refusal (404) where the raster has no pixels.
+void CheckHasPixels(const ServedRaster& raster);
 
 // The coded picture as an answer without validators.
 Answer CodedAnswer(const zmcrender::Picture& picture, zmcrender::PictureFormat format, int quality);

@@ -2,7 +2,6 @@
 #include <algorithm>
 
 #include "render/Codec.h"
-#include "render/Legend.h"
 #include "render/PictureSize.h"
 #include "serve/Conditions.h"
 #include "serve/Names.h"
@@ -33,7 +32,7 @@ bool WantsLegend(const Request& request) {
 }
 
 Answer HandlePreview(const Request& request, Service& service) {
-    const std::string last = NameOfSegments(request, 1, request.segments.size());
+    const std::string last = NameOfRest(request);
     const auto [name, ending] = StemAndEnding(last);
     const auto format = zmcrender::PictureFormatOfName(ending);
     if (!format) throw Refusal(404, "the formats of previews are jpg, png and webp");
@@ -43,21 +42,17 @@ Answer HandlePreview(const Request& request, Service& service) {
     const zmcrender::Style style = StyleOf(request, {"quality", "size", "window", "legend"});
     const int quality = QualityOf(request);
     const bool legend = WantsLegend(request);
-    if (raster->Levels() == 0) throw Refusal(404, "the raster has no pixels");
-    const auto reader = raster->Borrow(request.deadline);
-    const zmchost::Window whole = zmcrender::WholeOf(reader->Pixels());
+    CheckHasPixels(*raster);
+    const zmchost::Window whole = raster->Whole();
     const zmchost::Window window = WindowOf(request, whole.width, whole.height);
     const auto shape =
         zmcrender::SizeOfPicture(window, LongerSide(request, service, window, *format));
     if (std::uint64_t{shape.width} * shape.height > service.limits.pixels)
         throw Refusal(400, "size: the picture would have more than " +
                                std::to_string(service.limits.pixels) + " pixels");
-    const auto renderer = JudgedRenderer(service, *raster, style, *reader);
-    zmcrender::Picture picture =
-        zmcrender::RenderWindow(*renderer, reader->Pixels(), window, shape.width, shape.height);
-    if (legend) picture = zmcrender::WithLegend(std::move(picture), *renderer);
-    raster->File().CheckUnchanged();
-    Answer answer = CodedAnswer(picture, *format, quality);
+    Answer answer =
+        CodedAnswer(RenderPart(service, *raster, style, window, shape, request.deadline, legend),
+                    *format, quality);
     SetValidators(answer, validators);
     return answer;
 }

@@ -17,10 +17,6 @@ namespace {
 
 using zmcdescribe::Json;
 
-std::string NameOf(const Request& request) {
-    return NameOfSegments(request, 1, request.segments.size());
-}
-
 Json PlaceOf(ServedRaster::Reader& reader) {
     GDALDataset* const dataset = reader.Dataset();
     const zmcgdal::ErrorCatcher quiet(CE_Failure);
@@ -40,7 +36,7 @@ using Describe = Json (*)(const Request& request, ServedRaster& raster,
                           ServedRaster::Reader& reader);
 
 Answer DocumentOf(const Request& request, Service& service, Describe describe) {
-    const ServedRasterPtr raster = service.catalog.Raster(NameOf(request));
+    const ServedRasterPtr raster = service.catalog.Raster(NameOfRest(request));
     const Validators validators{raster->ETagWithCompanions("d"), std::nullopt};
     if (auto answer = AnswerOfConditions(request, validators)) return std::move(*answer);
     const auto reader = raster->Borrow(request.deadline);

@@ -61,9 +61,13 @@ std::string NpyHeader(const SampleShape& shape) {
     return header + text;
 }
 
+const char* MediaType(SampleFormat format) {
+    return format == SampleFormat::Npy ? "application/x-npy" : "application/octet-stream";
+}
+
 Answer SampleAnswerOf(const SampleShape& shape, SampleFormat format) {
     Answer answer;
-    answer.type = format == SampleFormat::Npy ? "application/x-npy" : "application/octet-stream";
+    answer.type = MediaType(format);
     answer.compressible = true;
     answer.Set("X-Raster-Type", zelm::PixelTypeName(shape.pixelType));
     answer.Set("X-Raster-Width", std::to_string(shape.width));

@@ -19,6 +19,8 @@ namespace zmcserve {
 enum class SampleFormat { Raw, Npy };
 std::optional<SampleFormat> SampleFormatOfName(std::string_view name);  // "raw" or "npy"
 
+const char* MediaType(SampleFormat format);
+
 struct SampleShape {
     std::uint32_t pixelType = 0;
     std::uint32_t width = 0;

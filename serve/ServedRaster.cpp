@@ -126,6 +126,11 @@ ServedRaster::~ServedRaster() = default;
 
 std::uint32_t ServedRaster::SampleBytes() const { return zelm::PixelSize(header.pixelType); }
 
+zmchost::Window ServedRaster::Whole() const {
+    const zelm::LevelGeometry finest = Geometry(FinestLevel());
+    return zmcrender::WholeOfLevel(FinestLevel(), finest.samples, finest.lines);
+}
+
 std::optional<std::uint32_t> ServedRaster::LevelOfZoom(std::uint64_t zoom) const {
     if (zoom >= levels) return std::nullopt;
     return coarsest - static_cast<std::uint32_t>(zoom);

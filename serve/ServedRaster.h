@@ -106,6 +106,8 @@ public:
     std::uint32_t CoarsestLevel() const { return coarsest; }
     std::uint32_t Levels() const { return levels; }
     zelm::LevelGeometry Geometry(std::uint32_t level) const { return header.Geometry(level); }
+    // All of level 0, as far as the finest level tells of it, in its pixels.
+    zmchost::Window Whole() const;
     // The level of a zoom; none where there is no such.
     std::optional<std::uint32_t> LevelOfZoom(std::uint64_t zoom) const;
     std::uint32_t MostZoom() const { return levels == 0 ? 0 : levels - 1; }

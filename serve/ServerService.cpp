@@ -12,9 +12,12 @@ using zmcdescribe::Json;
 
 Json FilesOf(const Request& request, const Catalog::Listing& listing) {
     Json files = Json::array();
-    for (const std::string& name : listing.names)
-        files.push_back(
-            {{"name", name}, {"url", request.baseUrl + "/files/" + PercentEncoded(name, true)}});
+    for (const std::string& name : listing.names) {
+        const std::string encoded = PercentEncoded(name, true);
+        files.push_back({{"name", name},
+                         {"url", request.baseUrl + "/files/" + encoded},
+                         {"preview", request.baseUrl + "/preview/" + encoded + ".webp?size=480"}});
+    }
     return files;
 }
 

@@ -17,6 +17,8 @@ std::vector<Route> ValueRoutes();    // points, profiles, windows of samples
 std::vector<Route> RecordRoutes();   // what a file tells: info, statistics, histograms
 std::vector<Route> ServerRoutes();   // the server itself: api, health, metrics
 std::vector<Route> PageRoutes();     // the viewer
+std::vector<Route> DeepZoomRoutes();  // Deep Zoom: DZI
+std::vector<Route> ImageRoutes();     // the IIIF Image API
 
 // clang-format off
 inline constexpr std::vector<Route> (*kServices[])() = {
@@ -29,6 +31,8 @@ inline constexpr std::vector<Route> (*kServices[])() = {
     RecordRoutes,
     ServerRoutes,
     PageRoutes,
+    DeepZoomRoutes,
+    ImageRoutes,
 };
 // clang-format on
 

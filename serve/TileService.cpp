@@ -132,6 +132,20 @@ Json LevelsOf(const ServedRaster& raster) {
     return list;
 }
 
+// Every format with its tiles. A style is a matter of pictures.
+Json FormatsOf(const std::string& tiles, const std::string& style) {
+    Json list = Json::array();
+    const auto add = [&](const char* ending, const char* type, const std::string& query) {
+        list.push_back(
+            {{"format", ending}, {"type", type}, {"tiles", Json::array({tiles + ending + query})}});
+    };
+    for (const char* const ending : {"jpg", "png", "webp"})
+        add(ending, zmcrender::MediaType(*zmcrender::PictureFormatOfName(ending)), style);
+    for (const char* const ending : {"raw", "npy"})
+        add(ending, MediaType(*SampleFormatOfName(ending)), "");
+    return list;
+}
+
 Answer TileJson(const Request& request, Service& service) {
     const std::string name = NameOfSegments(request, 1, request.segments.size() - 1);
     const ServedRasterPtr raster = service.catalog.Raster(name);
@@ -144,11 +158,13 @@ Answer TileJson(const Request& request, Service& service) {
         question == request.target.npos ? "" : request.target.substr(question);
     StyleOf(request, {"quality"});
     const std::string tiles =
-        request.baseUrl + "/tiles/" + PercentEncoded(name, true) + "/{z}/{x}/{y}.png" + style;
+        request.baseUrl + "/tiles/" + PercentEncoded(name, true) + "/{z}/{x}/{y}.";
     Json document = {{"tilejson", "3.0.0"},
                      {"name", name},
                      {"scheme", "xyz"},
-                     {"tiles", Json::array({tiles})},
+                     {"tiles", Json::array({tiles + "png" + style})},
+                     {"format", "png"},
+                     {"formats", FormatsOf(tiles, style)},
                      {"minzoom", 0},
                      {"maxzoom", raster->MostZoom()},
                      {"vector_layers", Json::array()},

@@ -41,13 +41,9 @@ void CheckValues(std::uint64_t count) {
                                " values; name fewer bands or samples");
 }
 
-std::string NameOf(const Request& request) {
-    return NameOfSegments(request, 1, request.segments.size());
-}
-
 Answer HandlePoint(const Request& request, Service& service) {
     request.AllowKeys({"x", "y", "level", "bands"});
-    const ServedRasterPtr raster = service.catalog.Raster(NameOf(request));
+    const ServedRasterPtr raster = service.catalog.Raster(NameOfRest(request));
     const Validators validators{raster->ETagWithCompanions("v"), std::nullopt};
     if (auto answer = AnswerOfConditions(request, validators)) return std::move(*answer);
     const std::uint32_t level = LevelOf(request, *raster);
@@ -96,7 +92,7 @@ std::uint32_t PixelAt(double at, std::uint32_t extent) {
 
 Answer HandleProfile(const Request& request, Service& service) {
     request.AllowKeys({"line", "samples", "level", "bands"});
-    const ServedRasterPtr raster = service.catalog.Raster(NameOf(request));
+    const ServedRasterPtr raster = service.catalog.Raster(NameOfRest(request));
     const Validators validators{raster->ETag("v"), std::nullopt};
     if (auto answer = AnswerOfConditions(request, validators)) return std::move(*answer);
     const std::uint32_t level = LevelOf(request, *raster);
@@ -135,7 +131,7 @@ Answer HandleProfile(const Request& request, Service& service) {
 
 Answer HandleWindow(const Request& request, Service& service) {
     request.AllowKeys({"window", "level", "bands"});
-    const std::string last = NameOf(request);
+    const std::string last = NameOfRest(request);
     const auto [name, ending] = StemAndEnding(last);
     const auto format = SampleFormatOfName(ending);
     if (!format) throw Refusal(404, "the formats of windows are raw and npy");

@@ -3,6 +3,7 @@
 #include <thread>
 
 #include "gdal/LazyRaster.h"
+#include "platform/FileSystem.h"
 #include "platform/Interrupts.h"
 #include "platform/Network.h"
 #include "serve/HttpServer.h"
@@ -34,6 +35,7 @@ private:
     zmcserve::ServiceLimits Limits() const;
     zmcserve::ServerOptions Options() const;
     void Tell(const zmcserve::HttpServer& server) const;
+    std::string PageToOpen(const std::string& url, zmcserve::Service& service) const;
 };
 
 void ServeCommand::Describe(OptionTable& table) {
@@ -48,7 +50,8 @@ void ServeCommand::Describe(OptionTable& table) {
               "Address or name of this machine to listen at (default 127.0.0.1: programs of this "
               "machine alone reach it)")
         .Named("ADDRESS");
-    table.Flag("--open", open, "Show it in the browser");
+    table.Flag("--open", open,
+               "Show it in the browser: a single file at once, else all of them to choose from");
     table.Flag("--follow-links", followLinks, "Follow symbolic links that lead out of the folders");
     table
         .Text("--base-url", baseUrl,
@@ -138,13 +141,23 @@ void ServeCommand::Tell(const zmcserve::HttpServer& server) const {
     if (!server.IsLocal()) Warn(host, "whoever reaches this address can read all that is served");
 }
 
+// The viewer, at the file where there is only one.
+std::string ServeCommand::PageToOpen(const std::string& url, zmcserve::Service& service) const {
+    const auto listing = service.catalog.List();
+    const bool isOne = named.size() == 1 && listing.names.size() == 1 &&
+                       listing.names[0] == platform::NameOf(named[0]);
+    if (!isOne) return url;
+    const std::string file = "files/" + zmcserve::PercentEncoded(listing.names[0]);
+    return url + "?file=" + zmcserve::PercentEncoded(file, true);
+}
+
 ExitStatus ServeCommand::Run() {
     const zmcserve::ServiceLimits limits = Limits();
     const zmcserve::ServerOptions options = Options();
     zmcserve::Service service(named, followLinks, zmcgdal::SharedModule(), limits);
     const zmcserve::HttpServer server(service, options);
     Tell(server);
-    if (open && !platform::OpenInBrowser(server.Url()))
+    if (open && !platform::OpenInBrowser(PageToOpen(server.Url(), service)))
         Warn(server.Url(), "no browser can be started");
     while (!platform::IsInterrupted()) std::this_thread::sleep_for(std::chrono::milliseconds(50));
     return ExitStatus::Done;

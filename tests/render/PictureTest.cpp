@@ -45,5 +45,39 @@ TEST(Picture, GreyBecomesThreeEqualColours) {
               Sixteen({1000, 1000, 1000, 2000}, 4).bytes);
 }
 
+TEST(Picture, ColoursBecomeTheGreyThatTheEyeSees) {
+    const Picture colours{2, 1, 4, 8, {255, 0, 0, 7, 10, 20, 30, 255}};
+    const Picture grey = InGrey(colours);
+    EXPECT_EQ(grey.channels, 2u);
+    EXPECT_EQ(grey.bytes, (Bytes{76, 7, 18, 255}));
+    EXPECT_EQ(InGrey(grey).bytes, grey.bytes);
+    EXPECT_EQ(InGrey(Sixteen({65535, 65535, 65535, 0, 0, 1000}, 3)).bytes,
+              Sixteen({65535, 114}, 1).bytes);
+}
+
+TEST(Picture, BlackAndWhiteHasTwoLevelsAndItsAlpha) {
+    EXPECT_EQ(InBlackAndWhite({4, 1, 1, 8, {0, 127, 128, 255}}).bytes, (Bytes{0, 0, 255, 255}));
+    EXPECT_EQ(InBlackAndWhite({1, 1, 4, 8, {200, 200, 200, 9}}).bytes, (Bytes{255, 9}));
+    EXPECT_EQ(InBlackAndWhite(Sixteen({32639, 32896}, 1)).bytes, (Bytes{0, 255}));
+}
+
+TEST(Picture, TurnsGoClockwiseAndComeAfterTheMirror) {
+    const Picture picture{3, 2, 1, 8, {1, 2, 3, 4, 5, 6}};
+    const auto turned = [&](bool mirrored, unsigned quarters) {
+        const Picture made = Turned(picture, mirrored, quarters);
+        EXPECT_EQ(made.width, quarters % 2 ? 2u : 3u);
+        EXPECT_EQ(made.height, quarters % 2 ? 3u : 2u);
+        return made.bytes;
+    };
+    EXPECT_EQ(turned(false, 0), (Bytes{1, 2, 3, 4, 5, 6}));
+    EXPECT_EQ(turned(false, 1), (Bytes{4, 1, 5, 2, 6, 3}));
+    EXPECT_EQ(turned(false, 2), (Bytes{6, 5, 4, 3, 2, 1}));
+    EXPECT_EQ(turned(false, 3), (Bytes{3, 6, 2, 5, 1, 4}));
+    EXPECT_EQ(turned(true, 0), (Bytes{3, 2, 1, 6, 5, 4}));
+    EXPECT_EQ(turned(true, 1), (Bytes{6, 3, 5, 2, 4, 1}));
+    EXPECT_EQ(Turned({2, 1, 3, 8, {1, 2, 3, 4, 5, 6}}, true, 0).bytes, (Bytes{4, 5, 6, 1, 2, 3}));
+    EXPECT_EQ(Turned(Sixteen({1, 2}, 1), false, 2).bytes, Sixteen({2, 1}, 1).bytes);
+}
+
 }  // namespace
 }  // namespace zmcrender

@@ -44,7 +44,7 @@ TEST(RenderWindow, TheCoarsestLevelThatIsStillAsFineIsRead) {
     EXPECT_EQ(LevelFor(source, all, 32, 16), 3u);
     EXPECT_EQ(LevelFor(source, all, 1, 1), 3u);
     EXPECT_EQ(LevelFor(source, {64, 64, 64, 32}, 32, 16), 1u);
-    const Renderer renderer(source.Facts(), {}, source);
+    const Renderer renderer(source.Facts(), Styled({{"stretch", "none"}}), source);
     source.readLevels.clear();
     EXPECT_EQ(RenderWindow(renderer, source, all, 40, 20).bytes,
               std::vector<unsigned char>(800, 2));
@@ -73,7 +73,7 @@ TEST(RenderWindow, AWindowOfAnyPlaceIsThePartOfTheWhole) {
     std::vector<unsigned char> samples(64 * 48);
     for (auto& sample : samples) sample = static_cast<unsigned char>(random());
     MemoryPixels<unsigned char> source(64, 48, 1, samples);
-    const Renderer renderer(source.Facts(), {}, source);
+    const Renderer renderer(source.Facts(), Styled({{"stretch", "none"}}), source);
     const Picture whole{64, 48, 1, 8, samples};
     EXPECT_EQ(RenderWindow(renderer, source, {3, 5, 50, 40}, 17, 9).bytes,
               Resize(whole, {3, 5, 50, 40}, 17, 9).bytes);
@@ -85,12 +85,36 @@ TEST(RenderWindow, AWindowOfAnyPlaceIsThePartOfTheWhole) {
 TEST(RenderWindow, EdgesOfWindowsMayLieBetweenThePixelsOfALevel) {
     MemoryPixels<unsigned char> source(8, 2, 1, std::vector<unsigned char>(16, 0));
     source.levels.push_back({4, 1, {0, 80, 160, 240}, {}});
-    const Renderer renderer(source.Facts(), {}, source);
+    const Renderer renderer(source.Facts(), Styled({{"stretch", "none"}}), source);
     // Level 0's columns 1 to 6 are level 1's from 0.5 to 3.5: two halves at the ends.
     EXPECT_EQ(RenderWindow(renderer, source, {1, 0, 6, 2}, 1, 1).bytes,
               (std::vector<unsigned char>{120}));
     EXPECT_EQ(RenderWindow(renderer, source, {1, 0, 6, 2}, 3, 1).bytes,
               (std::vector<unsigned char>{40, 120, 200}));
+}
+
+TEST(RenderWindow, AScaleHasThePixelsOfItsLevelAndTheNearestOnesBeyondIt) {
+    auto source = Flat(7, 5, 2);
+    source.levels[1].samples = {10, 20, 30, 40, 50, 60};
+    const Renderer renderer(source.Facts(), Styled({{"stretch", "none"}}), source);
+    EXPECT_EQ(ExtentInScale(7, 1), 4u);
+    EXPECT_EQ(ExtentInScale(0xffffffffu, 32), 1u);
+    EXPECT_EQ(RenderInScale(renderer, source, 1, {0, 0, 4, 3}).bytes,
+              (std::vector<unsigned char>{10, 20, 30, 30, 40, 50, 60, 60, 40, 50, 60, 60}));
+    EXPECT_EQ(RenderInScale(renderer, source, 1, {1, 0, 2, 2}).bytes,
+              (std::vector<unsigned char>{20, 30, 50, 60}));
+    // The column that the level lacks, alone.
+    EXPECT_EQ(RenderInScale(renderer, source, 1, {3, 0, 1, 3}).bytes,
+              (std::vector<unsigned char>{30, 60, 60}));
+    // Scales beyond the levels, down to a pixel, are made of the coarsest.
+    source.readLevels.clear();
+    EXPECT_EQ(RenderInScale(renderer, source, 2, {0, 0, 2, 2}).bytes,
+              (std::vector<unsigned char>{30, 45, 45, 60}));
+    EXPECT_EQ(RenderInScale(renderer, source, 3, {0, 0, 1, 1}).bytes,
+              (std::vector<unsigned char>{35}));
+    EXPECT_EQ(RenderInScale(renderer, source, 32, {0, 0, 1, 1}).bytes,
+              (std::vector<unsigned char>{35}));
+    EXPECT_EQ(source.readLevels, (Levels{1, 1, 1}));
 }
 
 // 96 MiB of samples, of which no more than a third may be held at once.
@@ -148,7 +172,7 @@ TEST(RenderWindow, StripsOfLitHeightsHaveNoSeams) {
 TEST(RenderWindow, HiddenPixelsLendNoColour) {
     MemoryPixels<unsigned char> source(4, 1, 1, {200, 0, 100, 0});
     source.levels[0].mask = {255, 0, 255, 255};
-    const Renderer renderer(source.Facts(), {}, source);
+    const Renderer renderer(source.Facts(), Styled({{"stretch", "none"}}), source);
     EXPECT_EQ(RenderWindow(renderer, source, {0, 0, 4, 1}, 2, 1).bytes,
               (std::vector<unsigned char>{200, 128, 50, 255}));
 }

@@ -45,12 +45,26 @@ MemoryPixels<unsigned char> Bytewise(std::uint32_t bands) {
 }
 
 TEST(Renderer, BytesAreShownAsTheyAre) {
-    for (const std::uint32_t bands : {1u, 3u}) {
-        auto source = Bytewise(bands);
-        const Picture picture = Rendered(source, source.Facts(), {});
-        EXPECT_EQ(picture.channels, bands);
-        EXPECT_EQ(picture.bytes, source.levels[0].samples);
-    }
+    auto source = Bytewise(3);
+    const Picture picture = Rendered(source, source.Facts(), {});
+    EXPECT_EQ(picture.channels, 3u);
+    EXPECT_EQ(picture.bytes, source.levels[0].samples);
+}
+
+TEST(Renderer, ASingleBandOfBytesIsStretchedAsOtherTypesAre) {
+    auto source = Bytewise(3);
+    RasterFacts facts = source.Facts();
+    EXPECT_EQ(BoundsOf(source, facts, {{"bands", "2"}}), One(Number(11), Number(101)));
+    facts.bands[1].histogram =
+        HistogramFacts{Number(0), Number(99), 1, std::vector<std::uint64_t>(100, 10)};
+    EXPECT_EQ(BoundsOf(source, facts, {{"bands", "2"}}), One(Number(1), Number(97)));
+    EXPECT_EQ(BoundsOf(source, facts, {{"bands", "2"}, {"colormap", "viridis"}}),
+              One(Number(1), Number(97)));
+    // With a band of alpha it is single all the same.
+    EXPECT_EQ(BoundsOf(source, facts, {{"bands", "2,3"}}), One(Number(1), Number(97)));
+    EXPECT_EQ(BoundsOf(source, facts, {{"bands", "2"}, {"stretch", "none"}}),
+              One(Number(0), Number(255)));
+    EXPECT_EQ(BoundsOf(source, facts, {})[1], (Range{Number(0), Number(255)}));
 }
 
 TEST(Renderer, TheFirstThreeOfManyBandsAreColours) {
@@ -71,13 +85,16 @@ TEST(Renderer, AFourthBandIsAlphaAndASecondIsOfGrey) {
     MemoryPixels<unsigned char> source(2, 1, 4, {1, 2, 3, 255, 5, 6, 7, 8});
     EXPECT_EQ(Rendered(source, source.Facts(), Styled({{"bands", "1,2,3,4"}})).bytes,
               (Bytes{1, 2, 3, 255, 5, 6, 7, 8}));
-    EXPECT_EQ(Rendered(source, source.Facts(), Styled({{"bands", "2,4"}})).bytes,
-              (Bytes{2, 255, 6, 8}));
+    EXPECT_EQ(
+        Rendered(source, source.Facts(), Styled({{"bands", "2,4"}, {"stretch", "none"}})).bytes,
+        (Bytes{2, 255, 6, 8}));
 }
 
 TEST(Renderer, AnOpaqueAlphaBandLeavesNoAlpha) {
     MemoryPixels<unsigned char> source(1, 2, 2, {1, 255, 2, 255});
-    EXPECT_EQ(Rendered(source, source.Facts(), Styled({{"bands", "1,2"}})).bytes, (Bytes{1, 2}));
+    EXPECT_EQ(
+        Rendered(source, source.Facts(), Styled({{"bands", "1,2"}, {"stretch", "none"}})).bytes,
+        (Bytes{1, 2}));
 }
 
 TEST(Renderer, AlphaOfOtherTypesFillsTheirRangeUnlessAPairIsGiven) {
@@ -134,7 +151,7 @@ TEST(Renderer, AMaskHides) {
     ASSERT_EQ(picture.channels, 4u);
     EXPECT_EQ((Bytes{picture.bytes[3], picture.bytes[7], picture.bytes[11], picture.bytes[15]}),
               (Bytes{255, 0, 255, 0}));
-    const Renderer renderer(source.Facts(), Styled({{"bands", "1"}}), source);
+    const Renderer renderer(source.Facts(), Styled({{"bands", "1"}, {"stretch", "none"}}), source);
     const unsigned char shown[] = {0, 9};
     const Samples samples{.data = "ab", .width = 2, .height = 1, .shown = shown};
     EXPECT_EQ(renderer.Render(samples).bytes, (Bytes{'a', 0, 'b', 255}));

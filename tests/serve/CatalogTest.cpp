@@ -87,6 +87,29 @@ TEST_F(CatalogTest, ALinkThatASidecarIsIsNotFollowedOutOfTheFolder) {
     EXPECT_NE(Ask("/info/a.pyr").Text().find("\"geoTransform\":[7.0"), std::string::npos);
 }
 
+TEST_F(CatalogTest, ASidecarIsHandedOutWithItsRasterAlone) {
+    EXPECT_EQ(Status("/files/a.pyr.aux.xml"), 204);
+    const std::string text = "<PAMDataset/>";
+    for (const char* const name : {"a.pyr.aux.xml", "note.txt.aux.xml", "none.pyr.aux.xml"})
+        std::ofstream(inside + '/' + name) << text;
+    std::ofstream(inside + "/note.txt") << "no pyramid";
+    zmctest::MakeOld(inside + "/a.pyr.aux.xml");
+    const Answer sidecar = Ask("/files/a.pyr.aux.xml");
+    EXPECT_EQ(sidecar.status, 200);
+    EXPECT_EQ(sidecar.type, "application/xml");
+    EXPECT_EQ(sidecar.Text(), text);
+    EXPECT_EQ(
+        Status("/files/a.pyr.aux.xml", {{"If-None-Match", std::string(sidecar.Header("ETag"))}}),
+        304);
+    EXPECT_EQ(Status("/files/note.txt.aux.xml"), 404);
+    EXPECT_EQ(Status("/files/none.pyr.aux.xml"), 404);
+    EXPECT_EQ(Status("/files/.aux.xml"), 400);
+    fs::remove(inside + "/a.pyr.aux.xml");
+    std::ofstream(outside + "/other.xml") << text;
+    fs::create_symlink("../outside/other.xml", inside + "/a.pyr.aux.xml");
+    EXPECT_EQ(Status("/files/a.pyr.aux.xml"), 204);
+}
+
 TEST_F(CatalogTest, FilesThatAreNamedAreServedByTheirOwnNames) {
     fs::create_symlink(outside + "/secret.pyr", folder / "link.pyr");
     named = {inside + "/sub/deep/b.pyr", folder / "link.pyr"};

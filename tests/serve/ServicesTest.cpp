@@ -4,6 +4,7 @@
 #include <cstring>
 
 #include "core/PixelVocabulary.h"
+#include "serve/Pages.h"
 #include "serve/SampleAnswer.h"
 #include "tests/serve/ServeFixture.h"
 #include "tests/support/ElementTypeList.h"
@@ -182,6 +183,21 @@ TEST_F(ServicesTest, TileJsonTellsTheGrid) {
     EXPECT_EQ(document["tilejson"], "3.0.0");
     EXPECT_EQ(document["tiles"][0], "http://here/tiles/a.pyr/{z}/{x}/{y}.png");
     EXPECT_EQ(document["maxzoom"], 1);
+    EXPECT_EQ(document["format"], "png");
+    const Json formats = Document("/tiles/a.pyr/tile.json?gamma=2")["formats"];
+    std::vector<std::string> names, types;
+    for (const Json& format : formats) {
+        names.push_back(format["format"]);
+        types.push_back(format["type"]);
+        std::string tile = format["tiles"][0];
+        for (const char* const part : {"{z}", "{x}", "{y}"}) tile.replace(tile.find(part), 3, "0");
+        const Answer answer = Ask(tile.substr(std::string("http://here").size()));
+        EXPECT_EQ(answer.status, 200) << tile;
+        EXPECT_EQ(answer.type, types.back()) << tile;
+    }
+    EXPECT_EQ(names, (std::vector<std::string>{"jpg", "png", "webp", "raw", "npy"}));
+    EXPECT_EQ(formats[1]["tiles"][0], "http://here/tiles/a.pyr/{z}/{x}/{y}.png?gamma=2");
+    EXPECT_EQ(formats[3]["tiles"][0], "http://here/tiles/a.pyr/{z}/{x}/{y}.raw");
     EXPECT_EQ(document["levels"][0]["width"], 150);
     EXPECT_EQ(document["levels"][1]["tilesAcross"], 2);
     EXPECT_EQ(Document("/tiles/a.pyr/tile.json?gamma=2")["tiles"][0],
@@ -296,7 +312,10 @@ TEST_F(ServicesTest, DocumentsOfMoreThanAMillionCountsAreRefused) {
 
 TEST_F(ServicesTest, TheListTellsEveryRouteAndFile) {
     const Json api = Document("/api");
-    EXPECT_EQ(api["files"][0], (Json{{"name", "a.pyr"}, {"url", "http://here/files/a.pyr"}}));
+    EXPECT_EQ(api["files"][0], (Json{{"name", "a.pyr"},
+                                     {"url", "http://here/files/a.pyr"},
+                                     {"preview", "http://here/preview/a.pyr.webp?size=480"}}));
+    EXPECT_EQ(Ask("/preview/a.pyr.webp?size=480").type, "image/webp");
     for (const Route& route : service->router.Routes())
         for (const Endpoint& endpoint : route.endpoints) {
             const Json told = {{"name", endpoint.name},
@@ -314,13 +333,34 @@ TEST_F(ServicesTest, NamesOfAnyBytesReachPagesAndDocumentsEscaped) {
     const std::string name = "<script>alert(1)</script>\xFF&\".pyr";
     const std::string flat = "x" + name.substr(0, 16) + name.substr(26);
     std::filesystem::copy_file(folder / "a.pyr", folder / flat);
-    const std::string page = Ask("/").Text();
+    const std::string page = Ask("/list").Text();
     EXPECT_EQ(page.find("<script"), std::string::npos);
     EXPECT_NE(page.find("&lt;script&gt;"), std::string::npos);
-    EXPECT_NE(Ask("/").Header("Content-Security-Policy").find("default-src 'none'"),
+    EXPECT_NE(Ask("/list").Header("Content-Security-Policy").find("default-src 'none'"),
               std::string::npos);
     EXPECT_NO_THROW(Document("/api"));
     EXPECT_EQ(Status("/info/" + PercentEncoded(flat)), 200);
+}
+
+TEST_F(ServicesTest, TheRootIsTheViewerOrSaysThatThereIsNone) {
+    const Answer root = Ask("/");
+    const std::string page = root.Text();
+    EXPECT_EQ(root.type, "text/html; charset=utf-8");
+    EXPECT_NE(root.Header("Content-Security-Policy").find("script-src 'self'"), std::string::npos);
+    if (Pages().empty()) {
+        EXPECT_NE(page.find("built without the viewer"), std::string::npos);
+        EXPECT_NE(page.find("/preview/a.pyr.png"), std::string::npos);
+        return;
+    }
+    for (const std::string file : {"viewer.js", "viewer.css"}) {
+        EXPECT_NE(page.find('"' + file + '"'), std::string::npos);
+        const Answer part = Ask("/" + file);
+        EXPECT_EQ(part.status, 200);
+        EXPECT_GT(part.Size(), 1000u);
+        EXPECT_EQ(Status("/" + file, {{"If-None-Match", std::string(part.Header("ETag"))}}), 304);
+    }
+    EXPECT_EQ(page.find("src=\"http"), std::string::npos);
+    EXPECT_EQ(page.find("href=\"http"), std::string::npos);
 }
 
 TEST_F(ServicesTest, OtherMethodsAndAddressesAreRefused) {

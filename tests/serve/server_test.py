@@ -6,6 +6,7 @@ import io
 import json
 import os
 import pathlib
+import re
 import resource
 import shutil
 import signal
@@ -15,6 +16,7 @@ import sys
 import tempfile
 import time
 import unittest
+import urllib.parse
 
 import numpy as np
 
@@ -384,6 +386,52 @@ class ServerTest(unittest.TestCase):
         self.assertEqual(len(lines), 2)
         self.assertRegex(lines[0], r'^127\.0\.0\.1 - - \[.*\] "GET /healthz HTTP/1\.1" 200 3 \d+$')
         self.assertRegex(lines[1], r'"GET /a%22b\\x22c HTTP/1\.1" 404 \d+ \d+$')
+
+    def test_the_log_has_what_the_http_library_answered_by_itself(self):
+        log = self.path("refused.log")
+        with Server(self.path("a.pyr"), "--access-log", log) as server:
+            told = []
+            for target, head in ((b"/big", b"Host: a\r\nX: " + b"a" * 100000),
+                                 (b"/nohost", b"X: a"), (b"/two", b"Host: a\r\nHost: b\r\n b: c")):
+                answer = server.send(b"GET " + target + b" HTTP/1.1\r\n" + head + b"\r\n\r\n", wait=3)
+                self.assertRegex(answer[:12], rb"^HTTP/1\.[01] [45]")
+                told.append((target.decode(), int(answer[9:12])))
+        lines = pathlib.Path(log).read_text(encoding="ascii").splitlines()
+        logged = [re.search(r'"\S+ (/\S+) \S+" (\d+) ', line).groups() for line in lines]
+        self.assertEqual([(target, int(status)) for target, status in logged], told)
+
+    def test_open_shows_a_single_file_at_once_and_else_all(self):
+        folder = self.path("open")
+        os.makedirs(os.path.join(folder, "bin"))
+        opener = os.path.join(folder, "bin", "xdg-open")
+        with open(opener, "w", encoding="utf-8") as script:
+            script.write(f'#!/bin/sh\nprintf %s "$1" >"{folder}/told.part"\n'
+                         f'mv "{folder}/told.part" "{folder}/told"\n')
+        os.chmod(opener, 0o755)
+        name = "a b%&#é.pyr"
+        shutil.copy(self.path("a.pyr"), os.path.join(folder, name))
+        path = os.environ["PATH"]
+        os.environ["PATH"] = os.path.dirname(opener) + os.pathsep + path
+        self.addCleanup(os.environ.update, {"PATH": path})
+
+        def opened(*named):
+            with Server("--open", *named) as server:
+                deadline = time.monotonic() + 10
+                while not os.path.exists(folder + "/told") and time.monotonic() < deadline:
+                    time.sleep(0.02)
+                page = pathlib.Path(folder, "told").read_text(encoding="utf-8")
+                os.remove(folder + "/told")
+                self.assertTrue(page.startswith(server.url))
+                query = urllib.parse.parse_qs(urllib.parse.urlsplit(page).query)
+                self.assertEqual(server.get(urllib.parse.urlsplit(page).path)[0], 200)
+                for file in query.get("file", []):
+                    self.assertEqual(server.get("/" + file)[0], 200)
+                    self.assertEqual(urllib.parse.unquote(file), "files/" + name)
+                return query
+
+        self.assertIn("file", opened(os.path.join(folder, name)))
+        self.assertEqual(opened(folder), {})
+        self.assertEqual(opened(os.path.join(folder, name), self.path("a.pyr")), {})
 
     def test_links_begin_as_the_client_calls_the_server_or_as_is_told(self):
         link = json.loads(self.server.get("/api", {"Host": "maps.example:80"})[2])["files"][0]["url"]

@@ -5,7 +5,7 @@ import { after, before, test } from "node:test";
 
 import { LimitError, type Metadata, type PixelType, Pyramid } from "zmcraster-web";
 
-import { documentOf, fileOf, headerOf, info, Pyramids, randomNumbers } from "./support/pyramids.js";
+import { documentOf, fileOf, headerOf, info, PIXEL_TYPES, Pyramids, randomNumbers } from "./support/pyramids.js";
 
 const pyramids = new Pyramids();
 after(() => pyramids.remove());
@@ -226,20 +226,7 @@ for (const [name, inside] of Object.entries(ODD))
     await compareBytes(withMetadata(`<DATASET>${inside}</DATASET>\n\n`, type));
   });
 
-for (const type of [
-  "Byte",
-  "Char",
-  "UInt16",
-  "Int16",
-  "UInt32",
-  "Int32",
-  "UInt64",
-  "Int64",
-  "Single",
-  "Double",
-  "ComplexSingle",
-  "ComplexDouble",
-] as PixelType[])
+for (const type of PIXEL_TYPES)
   test(`numbers of all spellings are those that the command line reads as ${type}`, async () => {
     // A histogram for each, since of statistics there is one for a band.
     const records = NUMBERS.map((value) =>

@@ -6,6 +6,22 @@ import { join } from "node:path";
 
 import type { PixelType, TileOrdering } from "zmcraster-web";
 
+/** The twelve types, told once more for tests: a test that asked the reader for them would not miss one. */
+export const PIXEL_TYPES: readonly PixelType[] = [
+  "Byte",
+  "Char",
+  "UInt16",
+  "Int16",
+  "UInt32",
+  "Int32",
+  "UInt64",
+  "Int64",
+  "Single",
+  "Double",
+  "ComplexSingle",
+  "ComplexDouble",
+];
+
 /** What the environment has to tell: see run-tests. */
 function setting(name: string): string {
   const value = process.env[name];

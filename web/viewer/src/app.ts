@@ -14,8 +14,8 @@ import { type Origin, originOf } from "./raster.js";
 import { Readout } from "./readout.js";
 import { type Layer, Renderer } from "./renderer.js";
 import { Side } from "./side.js";
+import { Start } from "./start.js";
 import type { Style } from "./style.js";
-import { listenToTheme } from "./theme.js";
 import { Viewport } from "./viewport.js";
 
 const PAN = 80; // pixels of the page that an arrow key moves by
@@ -36,6 +36,7 @@ export class App implements Gestures {
   private readonly address = new Address(() =>
     this.sides.length && !this.viewport.moving ? writeLink(this.state()) : undefined,
   );
+  private readonly start = new Start((origin) => void this.open(origin));
   private swipe: number | undefined;
   private line: Line | undefined;
   private plain = false;
@@ -71,7 +72,6 @@ export class App implements Gestures {
 
   private listen(): void {
     listen(this.map, this);
-    listenToTheme();
     listenToSplit(
       (share) => this.setSwipe(share),
       () => this.swipe ?? 0.5,
@@ -93,6 +93,11 @@ export class App implements Gestures {
 
   private listenToButtons(): void {
     const click = (id: string, act: () => void): void => byId(id).addEventListener("click", act);
+    byId("home").addEventListener("click", (event) => {
+      if (event.ctrlKey || event.metaKey || event.shiftKey || event.altKey) return;
+      event.preventDefault();
+      this.goHome();
+    });
     click("open", () => this.chooseFile());
     click("compare", () => this.compare(this.sides.length < 2));
     click("draw-line", () => this.drawLine(!this.profile.drawing));
@@ -153,6 +158,14 @@ export class App implements Gestures {
     this.show();
     await Promise.all(opening);
     this.opened();
+  }
+
+  /** Lets go of all files: a step to go back by. */
+  private goHome(): void {
+    if (!this.sides.length) return;
+    this.address.write();
+    history.pushState(null, "", location.pathname);
+    void this.apply({ sides: [] });
   }
 
   private originFor(file: string): Origin {
@@ -276,19 +289,12 @@ export class App implements Gestures {
       byId<HTMLButtonElement>(id).disabled = !shown;
     byId("compare").setAttribute("aria-pressed", String(this.sides.length === 2));
     byId("scale").hidden = !shown;
-    this.showWelcome();
+    this.start.show(!this.sides.length);
     const panel = byId("controls");
     if (side?.raster && side.style) this.showControls(panel, side);
     else panel.replaceChildren();
     this.notices.show(this.sides);
     this.draw();
-  }
-
-  private showWelcome(): void {
-    const welcome = byId("welcome");
-    welcome.hidden = this.sides.length > 0;
-    if (!welcome.hidden && !welcome.querySelector(".opener"))
-      welcome.append(opener((origin) => void this.open(origin)));
   }
 
   private showControls(panel: HTMLElement, side: Side): void {

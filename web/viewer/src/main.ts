@@ -1,7 +1,9 @@
 // The page begins here.
 import { App } from "./app.js";
 import { byId } from "./dom.js";
+import { listenToTheme } from "./theme.js";
 
+listenToTheme();
 try {
   (globalThis as { viewer?: App }).viewer = new App();
 } catch (error) {

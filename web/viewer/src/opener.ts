@@ -1,26 +1,7 @@
 // How a file is chosen: from the list of the server, by its URL, or from the user's own disk.
 import { h } from "./dom.js";
+import { offered, originOfListed } from "./gallery.js";
 import { type Origin, originOf } from "./raster.js";
-
-interface Listed {
-  name: string;
-  url: string;
-}
-
-/** The files that the server offers; none where it has no list. */
-async function offered(): Promise<Listed[]> {
-  if (!location.protocol.startsWith("http")) return [];
-  try {
-    const response = await fetch("api", { headers: { Accept: "application/json" } });
-    if (!response.ok || !response.headers.get("Content-Type")?.includes("json")) return [];
-    const { files } = (await response.json()) as { files?: unknown };
-    const isListed = (each: unknown): each is Listed =>
-      typeof (each as Listed)?.name === "string" && typeof (each as Listed)?.url === "string";
-    return Array.isArray(files) ? files.filter(isListed) : [];
-  } catch {
-    return [];
-  }
-}
 
 /** A pyramid among files that were chosen or dropped together, with the sidecar that belongs to it. */
 export function chosen(files: readonly File[]): Origin | undefined {
@@ -29,8 +10,11 @@ export function chosen(files: readonly File[]): Origin | undefined {
   return file && { name: file.name, file, ...(sidecar && { sidecar }) };
 }
 
-/** A form with all ways to open a file. `open` is called with the one that is chosen. */
-export function opener(open: (origin: Origin) => void): HTMLElement {
+/**
+ * A form with all ways to open a file: with the list of the server, unless that stands elsewhere. `open` is called with
+ * the one that is chosen.
+ */
+export function opener(open: (origin: Origin) => void, lists = true): HTMLElement {
   const picker = h("input", {
     type: "file",
     multiple: true,
@@ -67,11 +51,12 @@ export function opener(open: (origin: Origin) => void): HTMLElement {
   );
   address.addEventListener("input", () => address.setCustomValidity(""));
   const list = h("ul", { class: "files", "aria-label": "Files of this server", hidden: true });
-  void offered().then((files) => {
-    list.hidden = !files.length;
-    for (const { name, url } of files)
-      list.append(h("li", {}, h("button", { type: "button", onclick: () => open({ ...originOf(url), name }) }, name)));
-  });
+  if (lists)
+    void offered().then((listing) => {
+      list.hidden = !listing;
+      for (const file of listing?.files ?? [])
+        list.append(h("li", {}, h("button", { type: "button", onclick: () => open(originOfListed(file)) }, file.name)));
+    });
   return h(
     "div",
     { class: "opener" },

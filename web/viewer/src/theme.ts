@@ -12,22 +12,20 @@ function stored(): string | null {
   }
 }
 
-function isDark(): boolean {
-  const chosen = document.documentElement.dataset["theme"];
-  return chosen ? chosen === "dark" : system.matches;
-}
-
-/** Takes up the choice of last time, and makes the button change it. */
+/** Takes up the choice of last time, and makes the button change it. The style knows one word for dark: of the page. */
 export function listenToTheme(): void {
   const button = byId("theme");
-  const choice = stored();
-  if (choice === "dark" || choice === "light") document.documentElement.dataset["theme"] = choice;
-  const refresh = (): void => button.setAttribute("aria-pressed", String(isDark()));
+  const root = document.documentElement;
+  let choice = stored();
+  const refresh = (): void => {
+    const dark = choice === "dark" || (choice !== "light" && system.matches);
+    root.dataset["theme"] = dark ? "dark" : "light";
+    button.setAttribute("aria-pressed", String(dark));
+  };
   button.addEventListener("click", () => {
-    const theme = isDark() ? "light" : "dark";
-    document.documentElement.dataset["theme"] = theme;
+    choice = root.dataset["theme"] === "dark" ? "light" : "dark";
     try {
-      localStorage.setItem(KEY, theme);
+      localStorage.setItem(KEY, choice);
     } catch {
       // it holds for this page alone
     }

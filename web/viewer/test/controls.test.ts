@@ -3,12 +3,11 @@ import assert from "node:assert/strict";
 import { readFileSync } from "node:fs";
 import { after, before, test } from "node:test";
 
-import axe from "axe-core";
 import type { Page } from "playwright-core";
 
 import { headerOf, Pyramids } from "../../test/support/pyramids.js";
 import type { App } from "../src/app.js";
-import { assertSame, Bench, go, idle, link, picture } from "./support/browser.js";
+import { assertSame, Bench, findings, go, idle, link, picture } from "./support/browser.js";
 
 declare const viewer: App;
 
@@ -460,8 +459,8 @@ test("files open from the disk, by a drop, and by the list of a server", async (
   ];
   bench.site.files.set("api", { bytes: new TextEncoder().encode(JSON.stringify({ files })), type: "application/json" });
   const welcome = await bench.open("", WIDE);
-  await welcome.getByRole("button", { name: "<b>One</b>" }).waitFor();
-  await welcome.getByRole("button", { name: "Three bands" }).click();
+  await welcome.getByRole("link", { name: "<b>One</b>" }).waitFor();
+  await welcome.getByRole("link", { name: "Three bands" }).click();
   await welcome.getByRole("heading", { level: 1, name: "Three bands" }).waitFor();
   await idle(welcome);
   assert.equal(
@@ -615,22 +614,6 @@ test("small screens show the picture first, and the controls below it when asked
   assert.ok(overflow <= 0, `${overflow}`);
   await small.context().close();
 });
-
-interface Finding {
-  id: string;
-  nodes: { html: string; failureSummary?: string }[];
-}
-
-async function findings(on: Page): Promise<Finding[]> {
-  await on.evaluate(axe.source);
-  return on.evaluate(async () => {
-    const run = (globalThis as unknown as { axe: { run(): Promise<{ violations: Finding[] }> } }).axe.run;
-    return (await run()).violations.map(({ id, nodes }) => ({
-      id,
-      nodes: nodes.map(({ html, failureSummary }) => ({ html, failureSummary: failureSummary ?? "" })),
-    }));
-  });
-}
 
 for (const colorScheme of ["light", "dark"] as const)
   test(`axe finds nothing to complain of in the ${colorScheme} theme`, async () => {

@@ -5,25 +5,11 @@ import { readFileSync } from "node:fs";
 import { after, before, test } from "node:test";
 
 import type { Page } from "playwright-core";
-import { type PixelType, Pyramid } from "zmcraster-web";
+import { Pyramid } from "zmcraster-web";
 
-import { headerOf, Pyramids } from "../../test/support/pyramids.js";
+import { headerOf, PIXEL_TYPES, Pyramids } from "../../test/support/pyramids.js";
 import { Bench } from "./support/browser.js";
 
-const TYPES: PixelType[] = [
-  "Byte",
-  "Char",
-  "UInt16",
-  "Int16",
-  "UInt32",
-  "Int32",
-  "UInt64",
-  "Int64",
-  "Single",
-  "Double",
-  "ComplexSingle",
-  "ComplexDouble",
-];
 const ORDERINGS = ["Scanline", "Blocked", "Morton"] as const;
 
 const bench = new Bench();
@@ -33,7 +19,7 @@ let page: Page;
 before(async () => {
   await bench.start();
   const shape = { PIXEL_WIDTH: 97, PIXEL_HEIGHT: 61, TILESIZE: 16, LEVELMAX: 3, BANDS: 3 };
-  const jobs = TYPES.flatMap((type, seed) =>
+  const jobs = PIXEL_TYPES.flatMap((type, seed) =>
     ORDERINGS.map((ordering) => ({
       name: `${type}-${ordering}`,
       seed,
@@ -92,7 +78,7 @@ async function inNode(name: string): Promise<Told> {
   return told;
 }
 
-for (const type of TYPES)
+for (const type of PIXEL_TYPES)
   test(`${type}: in all orderings a browser reads the samples that Node reads`, async () => {
     for (const ordering of ORDERINGS) {
       const name = `${type}-${ordering}`;
@@ -101,3 +87,23 @@ for (const type of TYPES)
       assert.deepEqual(told, await inNode(name), name);
     }
   });
+
+test("the page of the documents, as it stands, shows a pyramid sample by sample", async () => {
+  pyramids.make([{ name: "scene", seed: 9, array: [3, 90, 120] }]);
+  bench.putExample(pyramids.bytes("scene"));
+  const shown = await bench.visit(`${bench.base}/page.html`);
+  await shown.waitForFunction(() => document.querySelector("canvas")?.width === 120);
+  const pixels = await shown.evaluate(() => {
+    const canvas = document.querySelector("canvas") as HTMLCanvasElement;
+    return [...(canvas.getContext("2d") as CanvasRenderingContext2D).getImageData(0, 0, 120, canvas.height).data];
+  });
+  const bands = pyramids.expected("scene", 0);
+  assert.equal(pixels.length, 4 * 120 * 90);
+  for (let i = 0; i < 120 * 90; ++i)
+    assert.deepEqual(
+      pixels.slice(4 * i, 4 * i + 4),
+      [0, 1, 2].map((band) => bands[band * 120 * 90 + i]).concat(255),
+      `pixel ${i}`,
+    );
+  await shown.context().close();
+});

@@ -2,6 +2,7 @@
 import assert from "node:assert/strict";
 import { readFileSync } from "node:fs";
 
+import axe from "axe-core";
 import { type Browser, type BrowserContextOptions, chromium, type Page } from "playwright-core";
 
 import type { App } from "../../src/app.js";
@@ -41,8 +42,24 @@ export class Bench {
     this.site.files.set(name, { bytes });
   }
 
+  /** The page of the documents, page.html, as it stands, with what it asks for. */
+  putExample(scene: Uint8Array): void {
+    const put = (name: string, type: string, from: string): unknown =>
+      this.site.files.set(name, { bytes: Uint8Array.from(readFileSync(from)), type });
+    put("page.html", "text/html", "examples/page.html");
+    put("zmcraster-web.js", "text/javascript", "dist/index.js");
+    this.put("scene.pyr", scene);
+  }
+
   /** A page that shows the viewer, with what stands behind its name in the address. */
   async open(address = "", options: BrowserContextOptions = {}): Promise<Page> {
+    const page = await this.visit(`${this.base}/index.html${address}`, options);
+    await idle(page);
+    return page;
+  }
+
+  /** Any page. */
+  async visit(url: string, options: BrowserContextOptions = {}): Promise<Page> {
     const context = await (this.browser as Browser).newContext({
       viewport: { width: 640, height: 480 },
       reducedMotion: "reduce",
@@ -51,10 +68,26 @@ export class Bench {
     const page = await context.newPage();
     page.setDefaultTimeout(15000);
     page.on("pageerror", (error) => this.complaints.push(String(error)));
-    await page.goto(`${this.base}/index.html${address}`);
-    await idle(page);
+    await page.goto(url);
     return page;
   }
+}
+
+interface Finding {
+  id: string;
+  nodes: { html: string; failureSummary?: string }[];
+}
+
+/** What axe complains of. */
+export async function findings(on: Page): Promise<Finding[]> {
+  await on.evaluate(axe.source);
+  return on.evaluate(async () => {
+    const run = (globalThis as unknown as { axe: { run(): Promise<{ violations: Finding[] }> } }).axe.run;
+    return (await run()).violations.map(({ id, nodes }) => ({
+      id,
+      nodes: nodes.map(({ html, failureSummary }) => ({ html, failureSummary: failureSummary ?? "" })),
+    }));
+  });
 }
 
 /** Once all that is in view has come. */
