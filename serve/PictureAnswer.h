@@ -27,6 +27,12 @@ zmcrender::Picture RenderLevelWindow(const Service& service, ServedRaster& raste
                                      const zmcrender::Style& style, std::uint32_t level,
                                      const zmchost::Window& window, const Deadline& deadline);
 
+// The same, coded, as an answer without validators. Samples that are the picture already go from
+// where they were read to the codec.
+Answer CodedLevelWindow(const Service& service, ServedRaster& raster, const zmcrender::Style& style,
+                        std::uint32_t level, const zmchost::Window& window,
+                        zmcrender::PictureFormat format, int quality, const Deadline& deadline);
+
 // The coded picture as an answer without validators.
 Answer CodedAnswer(const zmcrender::Picture& picture, zmcrender::PictureFormat format, int quality);
 
