@@ -60,6 +60,9 @@ public:
     }
 
     std::uint32_t Colours() const { return look->Channels(); }
+    bool IsCopy(const Samples& samples) const {
+        return samples.halo == 0 && CopiesLines(samples) && !MayHide(samples);
+    }
     template <class Level>
     Picture Render(const Samples& samples) const;
     Picture Render(const Samples& samples) const {
@@ -236,6 +239,11 @@ private:
         alpha = {PlaceOf(*alphaBand), MakeChannel(settings)};
     }
 
+    bool CopiesLines(const Samples& samples) const {
+        return look->IsCopy() && (!samples.planar || bands.size() == 1) &&
+               bands.size() == look->Channels() && style.depth == 8;
+    }
+
     bool MayHide(const Samples& samples) const {
         return samples.shown || alpha.channel || look->MayHide();
     }
@@ -296,8 +304,7 @@ template <class Level>
 Picture Renderer::Plan::Render(const Samples& samples) const {
     Picture picture = MadePicture(samples, look->Channels(), sizeof(Level));
     const bool hides = MayHide(samples);
-    const bool copies = look->IsCopy() && (!samples.planar || bands.size() == 1) &&
-                        bands.size() == look->Channels() && style.depth == 8;
+    const bool copies = CopiesLines(samples);
     std::vector<Level> opacity(hides ? std::size_t{samples.width} * samples.height : 0);
     std::vector<std::uint8_t> present(hides ? samples.width : 0, std::uint8_t{255});
     for (std::uint32_t y = 0; y < samples.height; ++y) {
@@ -334,6 +341,8 @@ std::span<const std::array<unsigned char, 3>> Renderer::LegendColours() const {
     return plan->legend;
 }
 const Style& Renderer::Settings() const { return plan->style; }
+
+bool Renderer::IsCopy(const Samples& samples) const { return plan->IsCopy(samples); }
 
 Picture Renderer::Render(const Samples& samples) const {
     if (samples.width == 0 || samples.height == 0)

@@ -67,6 +67,10 @@ public:
     std::span<const std::array<unsigned char, 3>> LegendColours() const;
     const Style& Settings() const;
 
+    // Whether the picture of these samples has their bytes as they are, so that whoever has them
+    // need not render: bytes in the order of the picture, which no stretch changes and nothing
+    // hides.
+    bool IsCopy(const Samples& samples) const;
     // The picture of these samples: 1 or 3 channels, and alpha where any pixel is not opaque.
     // Throws std::bad_alloc.
     Picture Render(const Samples& samples) const;

@@ -86,6 +86,18 @@ bool IsHost(std::string_view text) {
     });
 }
 
+// Names of headers are words without blanks. "Transfer-Encoding " is none, and somebody in front of
+// the server could take it for one: then the two would not agree on where the next request begins.
+bool HasOddHeader(const Request& request) {
+    const auto isOdd = [](char c) {
+        return c <= 0x20 || c == 0x7F ||
+               std::string_view("()<>@,;:\\\"/[]?={}").find(c) != std::string_view::npos;
+    };
+    return std::any_of(request.headers.begin(), request.headers.end(), [&](const auto& header) {
+        return header.first.empty() || std::any_of(header.first.begin(), header.first.end(), isOdd);
+    });
+}
+
 // Bytes behind the head, which no request here has; what comes there could be taken for the next
 // one.
 bool HasBody(const Request& request) {
@@ -298,6 +310,7 @@ void HttpServer::Server::FillIn(MHD_Connection* connection, Exchange& exchange) 
     const int count = MHD_get_connection_values(connection, MHD_HEADER_KIND, &TakeHeader, &request);
     if (count < 0 || request.headers.size() >= Request::kMostHeaders)
         throw Refusal(431, "the request has too many headers");
+    if (HasOddHeader(request)) throw Refusal(400, "a header has a name that none can have");
     if (HasBody(request) && request.method != Method::Other)
         throw Refusal(413, "requests with a body are not taken");
     if (HasBody(request)) throw Refusal(405, kOtherMethods).With("Allow", kMethods);
@@ -318,9 +331,7 @@ MHD_Result HttpServer::Server::Judge(MHD_Connection* connection, Exchange& excha
     try {
         FillIn(connection, exchange);
     } catch (...) {
-        Answer answer = AnswerOfException();
-        answer.Set("Access-Control-Allow-Origin", "*");
-        return Send(connection, exchange, std::move(answer));
+        return Send(connection, exchange, Finished(AnswerOfException()));
     }
     exchange.state = Exchange::State::Judged;
     return MHD_YES;
@@ -331,9 +342,8 @@ MHD_Result HttpServer::Server::TakeJudged(MHD_Connection* connection, Exchange& 
         return Send(connection, exchange, std::move(*quick));
     if (ending || !work->Reserve()) {
         ++service.metrics.refusedAsBusy;
-        Answer answer = ToAnswer(Refusal::Busy("too many requests wait already"));
-        answer.Set("Access-Control-Allow-Origin", "*");
-        return Send(connection, exchange, std::move(answer));
+        return Send(connection, exchange,
+                    Finished(ToAnswer(Refusal::Busy("too many requests wait already"))));
     }
     exchange.state = Exchange::State::AtWork;
     MHD_suspend_connection(connection);

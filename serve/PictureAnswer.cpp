@@ -21,6 +21,30 @@ struct KeptSmall {
     }
 };
 
+// Where the thread reads samples: memory that is there already costs less than new memory.
+zmcrender::SampleBlock& BlockOfThread() {
+    thread_local zmcrender::SampleBlock block;
+    return block;
+}
+
+struct PictureSamples {
+    std::shared_ptr<const zmcrender::Renderer> renderer;
+    zmcrender::Samples samples;  // in the block of the thread
+};
+
+PictureSamples ReadForPicture(const Service& service, ServedRaster& raster,
+                              ServedRaster::Reader& reader, const zmcrender::Style& style,
+                              std::uint32_t level, const zmchost::Window& window,
+                              const Deadline& deadline) {
+    auto renderer = JudgedRenderer(service, raster, style, reader);
+    CheckWindow(service, window.Pixels(), renderer->Bands().size() * raster.SampleBytes());
+    const zmcrender::Samples samples =
+        BlockOfThread().Read(reader.Pixels(), level, window, renderer->Bands(), renderer->Halo());
+    raster.File().CheckUnchanged();
+    deadline.Check();
+    return {std::move(renderer), samples};
+}
+
 std::uint64_t PixelsToSample(const zmcrender::PixelSource& source) {
     std::uint64_t most = 0;
     for (const zmchost::Window& window : zmcrender::WindowsToSample(source).windows)
@@ -54,15 +78,26 @@ zmcrender::Picture RenderLevelWindow(const Service& service, ServedRaster& raste
                                      ServedRaster::Reader& reader, const zmcrender::Style& style,
                                      std::uint32_t level, const zmchost::Window& window,
                                      const Deadline& deadline) {
-    thread_local zmcrender::SampleBlock block;
+    const KeptSmall kept{BlockOfThread()};
+    const PictureSamples read =
+        ReadForPicture(service, raster, reader, style, level, window, deadline);
+    return read.renderer->Render(read.samples);
+}
+
+Answer CodedLevelWindow(const Service& service, ServedRaster& raster, const zmcrender::Style& style,
+                        std::uint32_t level, const zmchost::Window& window,
+                        zmcrender::PictureFormat format, int quality, const Deadline& deadline) {
+    zmcrender::SampleBlock& block = BlockOfThread();
     const KeptSmall kept{block};
-    const auto renderer = JudgedRenderer(service, raster, style, reader);
-    CheckWindow(service, window.Pixels(), renderer->Bands().size() * raster.SampleBytes());
-    const zmcrender::Samples samples =
-        block.Read(reader.Pixels(), level, window, renderer->Bands(), renderer->Halo());
-    raster.File().CheckUnchanged();
-    deadline.Check();
-    return renderer->Render(samples);
+    // Others may have the reader while the picture is made.
+    const auto [renderer, samples] =
+        ReadForPicture(service, raster, *raster.Borrow(deadline), style, level, window, deadline);
+    if (!renderer->IsCopy(samples)) return CodedAnswer(renderer->Render(samples), format, quality);
+    zmcrender::Picture picture{samples.width, samples.height, renderer->Colours(), 8,
+                               std::move(block.pixels)};
+    Answer answer = CodedAnswer(picture, format, quality);
+    block.pixels = std::move(picture.bytes);
+    return answer;
 }
 
 zmcrender::Picture RenderLevelWindow(const Service& service, ServedRaster& raster,

@@ -33,6 +33,12 @@ zmcrender::Picture RenderLevelWindow(const Service& service, ServedRaster& raste
                                      const zmcrender::Style& style, std::uint32_t level,
                                      const zmchost::Window& window, const Deadline& deadline);
 
+// The same, coded, as an answer without validators. Samples that are the picture already go from
+// where they were read to the codec.
+Answer CodedLevelWindow(const Service& service, ServedRaster& raster, const zmcrender::Style& style,
+                        std::uint32_t level, const zmchost::Window& window,
+                        zmcrender::PictureFormat format, int quality, const Deadline& deadline);
+
 // The pixels of a window of the raster in the scale 1 / 2^level, one to one, whether the raster has
 // such a level or not: render/Renderer.h. The file was unchanged when they were read.
 zmcrender::Picture RenderScaleWindow(const Service& service, ServedRaster& raster,

@@ -28,6 +28,17 @@ std::string Decoded(std::string_view text, bool plusIsBlank) {
     return std::move(*decoded);
 }
 
+// "http://server/path" means "/path" as well: every server has to take what proxies are sent.
+std::string_view WithoutServer(std::string_view target) {
+    for (const std::string_view scheme : {"http://", "https://"}) {
+        if (!SameWord(target.substr(0, scheme.size()), scheme)) continue;
+        const std::size_t end = target.find_first_of("/?#", scheme.size());
+        if (target.size() == scheme.size() || end == scheme.size()) break;
+        return end == target.npos ? "/" : target.substr(end);
+    }
+    return target;
+}
+
 std::vector<std::string> SegmentsOf(std::string_view path) {
     if (path.empty() || path[0] != '/') throw Refusal(400, "the address is no path");
     const auto parts = Split(path.substr(1), '/');
@@ -137,10 +148,13 @@ Request Request::Parse(Method method, std::string_view target) {
     Request request;
     request.method = method;
     request.target = target;
+    target = WithoutServer(target);
+    const bool hasServer = target.size() != request.target.size();
     // No client sends a fragment; what looks like one ends the query.
     target = target.substr(0, target.find('#'));
     const std::size_t question = target.find('?');
-    request.path = target.substr(0, question);
+    const std::string_view path = target.substr(0, question);
+    request.path = path.empty() && hasServer ? std::string_view("/") : path;
     request.segments = SegmentsOf(request.path);
     if (question != target.npos) request.query = PairsOf(target.substr(question + 1));
     return request;

@@ -43,14 +43,14 @@ public:
     static constexpr std::size_t kMostPairs = 64;  // of the query
     static constexpr std::size_t kMostHeaders = 100;
 
-    // Takes a request target apart: "/tiles/scene.pyr/0/0/0.jpg?stretch=p2,98". Throws Refusal: 414
-    // where it is too long, 400 where it is no path, has a "%" without two hexadecimal digits, or
-    // too many parts.
+    // Takes a request target apart: "/tiles/scene.pyr/0/0/0.jpg?stretch=p2,98", or the same behind
+    // "http://" and a server, which is not looked at. Throws Refusal: 414 where it is too long, 400
+    // where it is no path, has a "%" without two hexadecimal digits, or too many parts.
     static Request Parse(Method method, std::string_view target);
 
     Method method = Method::Get;
     std::string target;                 // as it came
-    std::string path;                   // the part in front of the query, as it came
+    std::string path;                   // the part between server and query, as it came
     std::vector<std::string> segments;  // decoded; "/a/b%2Fc/" has "a", "b/c" and ""
     std::vector<std::pair<std::string, std::string>> query;  // decoded, "+" is a blank
     std::vector<std::pair<std::string, std::string>> headers;

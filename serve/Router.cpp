@@ -21,11 +21,6 @@ void AddCommonHeaders(Answer& answer) {
     if (answer.Header("Cache-Control").empty()) answer.Set("Cache-Control", "no-cache");
 }
 
-Answer Finished(Answer answer) {
-    AddCommonHeaders(answer);
-    return answer;
-}
-
 Answer OptionsAnswer() {
     Answer answer;
     answer.status = 204;
@@ -75,6 +70,11 @@ std::optional<Answer> Router::HandleQuickly(const Request& request, Service& ser
     return answer;
 } catch (...) {
     return Finished(AnswerOfException());
+}
+
+Answer Finished(Answer answer) {
+    AddCommonHeaders(answer);
+    return answer;
 }
 
 Answer AnswerOfException() {

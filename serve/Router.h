@@ -63,6 +63,9 @@ std::vector<Route> AllRoutes();
 // The answer to what is being handled as an exception; to be called from a handler of one.
 Answer AnswerOfException();
 
+// An answer that no router has made, with the headers that all answers have.
+Answer Finished(Answer answer);
+
 }  // namespace zmcserve
 
 #endif

@@ -72,9 +72,8 @@ Answer PictureTile(const Request& request, const Service& service, ServedRaster&
                    const TilePlace& tile, PictureFormat format) {
     const zmcrender::Style style = StyleOf(request, {"quality"});
     const int quality = QualityOf(request);
-    return CodedAnswer(
-        RenderLevelWindow(service, raster, style, tile.level, tile.window, request.deadline),
-        format, quality);
+    return CodedLevelWindow(service, raster, style, tile.level, tile.window, format, quality,
+                            request.deadline);
 }
 
 Validators ValidatorsOf(const ServedRaster& raster, bool isPicture) {

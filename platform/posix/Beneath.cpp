@@ -8,6 +8,7 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <optional>
 #include <utility>
 
 #include "platform/posix/Descriptor.h"
@@ -83,13 +84,18 @@ int OpenBelow(const std::string& folder, const std::string& name, Links links, i
     return OpenByParts(root.Number(), name, flags);
 }
 
-// By one call where no link can lead out: of what is asked for with each request.
-bool TellAtOnce(const std::string& folder, const std::string& name, Links links,
-                struct stat& status) {
+// By one call where no link can lead out, of what is asked for with each request: whether it is
+// there. Nothing where that takes a look at each part of the path.
+std::optional<bool> TellAtOnce(const std::string& folder, const std::string& name, Links links,
+                               struct stat& status) {
+    if (links == Links::Within && name.find('/') != name.npos) return std::nullopt;
     const std::string path = folder + '/' + name;
-    if (links == Links::Followed) return ::stat(path.c_str(), &status) == 0;
-    if (name.find('/') != name.npos) return false;
-    return ::lstat(path.c_str(), &status) == 0 && !S_ISLNK(status.st_mode);
+    const int failed =
+        links == Links::Followed ? ::stat(path.c_str(), &status) : ::lstat(path.c_str(), &status);
+    // Together they may be longer than the system takes at once.
+    if (failed != 0 && errno == ENAMETOOLONG) return std::nullopt;
+    if (failed == 0 && S_ISLNK(status.st_mode)) return std::nullopt;
+    return failed == 0;
 }
 
 bool Describe(int folder, const char* name, FolderEntry& entry, Links links,
@@ -122,14 +128,14 @@ std::unique_ptr<File> OpenBeneath(const std::string& folder, const std::string& 
 bool TellIdentityBeneath(const std::string& folder, const std::string& name, Links links,
                          FileIdentity& identity, int* error) {
     struct stat status;
-    bool told = TellAtOnce(folder, name, links, status);
+    std::optional<bool> told = TellAtOnce(folder, name, links, status);
     if (!told) {
         const Held opened(OpenBelow(folder, name, links, O_PATH));
         told = opened.Number() >= 0 && ::fstat(opened.Number(), &status) == 0;
     }
-    if (error) *error = told ? 0 : errno;
-    if (told) identity = IdentityFrom(status);
-    return told;
+    if (error) *error = *told ? 0 : errno;
+    if (*told) identity = IdentityFrom(status);
+    return *told;
 }
 
 std::vector<FolderEntry> ListBeneath(const std::string& folder, const std::string& name,

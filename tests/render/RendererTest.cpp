@@ -67,6 +67,26 @@ TEST(Renderer, ASingleBandOfBytesIsStretchedAsOtherTypesAre) {
     EXPECT_EQ(BoundsOf(source, facts, {})[1], (Range{Number(0), Number(255)}));
 }
 
+TEST(Renderer, SamplesThatAreThePictureAlreadyAreTold) {
+    auto source = Bytewise(3);
+    const Bytes bytes = source.levels[0].samples;
+    const unsigned char shown[] = {0, 1, 1, 1};
+    const Samples samples{.data = bytes.data(), .width = 2, .height = 2};
+    const auto isCopy = [&](const Pairs& style, const Samples& of) {
+        return Renderer(source.Facts(), Styled(style), source).IsCopy(of);
+    };
+    EXPECT_TRUE(isCopy({}, samples));
+    EXPECT_EQ(Renderer(source.Facts(), {}, source).Render(samples).bytes, bytes);
+    EXPECT_TRUE(isCopy({{"bands", "1"}}, samples));
+    EXPECT_FALSE(isCopy({}, {.data = bytes.data(), .width = 2, .height = 2, .shown = shown}));
+    EXPECT_FALSE(isCopy({}, {.data = bytes.data(), .width = 2, .height = 2, .planar = true}));
+    EXPECT_FALSE(isCopy({}, {.data = bytes.data(), .width = 1, .height = 1, .halo = 1}));
+    const Pairs others = {{"stretch", "0,100"},  {"gamma", "2"},    {"depth", "16"},
+                          {"colormap", "turbo"}, {"nodata", "11"},  {"expression", "b1"},
+                          {"bands", "1,2"},      {"bands", "1,1,2"}};
+    for (const auto& style : others) EXPECT_FALSE(isCopy({style}, samples)) << style.first;
+}
+
 TEST(Renderer, TheFirstThreeOfManyBandsAreColours) {
     auto source = Bytewise(5);
     EXPECT_EQ(Rendered(source, source.Facts(), {}).bytes,

@@ -35,8 +35,21 @@ TEST(Request, SegmentsAreSplitBeforeTheyAreDecoded) {
     EXPECT_EQ(request.Value("w"), std::nullopt);
 }
 
+TEST(Request, AServerInFrontOfThePathIsLeftOut) {
+    for (const char* const front : {"http://a", "HTTPS://a.example:80", "http://[::1]:1"}) {
+        const std::string server = front;
+        EXPECT_EQ(Request::Parse(Method::Get, server + "/b/c?d=e").path, "/b/c");
+        EXPECT_EQ(Request::Parse(Method::Get, server + "/b/c?d=e").query.size(), 1u);
+        for (const char* const rest : {"", "/", "?d=e", "#f"})
+            EXPECT_EQ(Request::Parse(Method::Get, server + rest).path, "/") << rest;
+        EXPECT_EQ(Request::Parse(Method::Get, server + "/b").target, server + "/b");
+    }
+    for (const char* const target : {"http://", "http:///a", "http://?a", "ftp://a/b", "http:/a"})
+        EXPECT_THROW(Request::Parse(Method::Get, target), Refusal) << target;
+}
+
 TEST(Request, WhatIsNoAddressIsRefused) {
-    for (const char* const target : {"", "a", "*", "http://here/", "/%", "/%4", "/%zz", "/?a=%g0"})
+    for (const char* const target : {"", "a", "*", "http:/here/", "/%", "/%4", "/%zz", "/?a=%g0"})
         EXPECT_EQ(StatusOfParsing(target), 400) << target;
     EXPECT_EQ(StatusOfParsing("/" + std::string(Request::kLongestTarget, 'a')), 414);
     EXPECT_EQ(StatusOfParsing("/" + std::string(Request::kMostSegments + 1, '/')), 400);

@@ -4,6 +4,7 @@
 #include <cstring>
 
 #include "core/PixelVocabulary.h"
+#include "render/Codec.h"
 #include "serve/Pages.h"
 #include "serve/SampleAnswer.h"
 #include "tests/serve/ServeFixture.h"
@@ -153,6 +154,30 @@ TEST_F(ServicesTest, PictureTilesHaveTheSizeOfTheirTileAndAType) {
               Ask("/tiles/a.pyr/1/0/0.jpg?quality=95").Size());
     const std::string tag(png.Header("ETag"));
     EXPECT_EQ(Status("/tiles/a.pyr/1/1/0.png", {{"If-None-Match", tag}}), 304);
+}
+
+TEST_F(ServicesTest, PictureTilesAreTheCodedSamplesWhateverTileCameBefore) {
+    for (const char* const tile : {"1/0/0", "1/1/0", "0/0/0", "1/0/0"}) {
+        const std::string at = std::string("/tiles/a.pyr/") + tile;
+        const Answer raw = Ask(at + ".raw");
+        const std::string samples = raw.Text();
+        const auto side = [&](const char* name) {
+            return static_cast<std::uint32_t>(std::stoul(std::string(raw.Header(name))));
+        };
+        const zmcrender::Picture picture{side("X-Raster-Width"),
+                                         side("X-Raster-Height"),
+                                         3,
+                                         8,
+                                         {samples.begin(), samples.end()}};
+        for (const auto& [ending, format] : {std::pair(".jpg", zmcrender::PictureFormat::Jpeg),
+                                             std::pair(".png", zmcrender::PictureFormat::Png),
+                                             std::pair(".webp", zmcrender::PictureFormat::WebP)}) {
+            const auto coded = zmcrender::Encode(picture, format);
+            EXPECT_EQ(Ask(at + ending).Text(), std::string(coded.begin(), coded.end()))
+                << tile << ending;
+            EXPECT_NE(Ask(at + ending + "?stretch=0,100").Text(), Ask(at + ending).Text());
+        }
+    }
 }
 
 TEST_F(ServicesTest, TilesThatThereAreNotAreNotFound) {
