@@ -29,6 +29,13 @@ std::uint64_t PixelsToSample(const zmcrender::PixelSource& source) {
 
 }  // namespace
 
+zmcrender::Picture RenderLevelWindow(const Service& service, ServedRaster& raster,
+                                     const zmcrender::Style& style, std::uint32_t level,
+                                     const zmchost::Window& window, const Deadline& deadline) {
+    const auto reader = raster.Borrow(deadline);
+    return RenderLevelWindow(service, raster, *reader, style, level, window, deadline);
+}
+
 std::shared_ptr<const zmcrender::Renderer> JudgedRenderer(const Service& service,
                                                           ServedRaster& raster,
                                                           const zmcrender::Style& style,
@@ -53,13 +60,6 @@ zmcrender::Picture RenderLevelWindow(const Service& service, ServedRaster& raste
     raster.File().CheckUnchanged();
     deadline.Check();
     return renderer->Render(samples);
-}
-
-zmcrender::Picture RenderLevelWindow(const Service& service, ServedRaster& raster,
-                                     const zmcrender::Style& style, std::uint32_t level,
-                                     const zmchost::Window& window, const Deadline& deadline) {
-    const auto reader = raster.Borrow(deadline);
-    return RenderLevelWindow(service, raster, *reader, style, level, window, deadline);
 }
 
 Answer CodedAnswer(const zmcrender::Picture& picture, zmcrender::PictureFormat format,
