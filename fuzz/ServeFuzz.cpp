@@ -49,7 +49,7 @@ private:
 
 zmcserve::ServiceLimits SmallLimits() {
     zmcserve::ServiceLimits limits;
-    limits.pixels = 1u << 14;
+    limits.pixels = 1u << 16;
     limits.window = 1u << 20;
     return limits;
 }

@@ -14,8 +14,6 @@ namespace {
 
 using zmcrender::Picture;
 
-// Of all that tiles of a file may claim, what is still made into a picture of a whole size.
-constexpr std::uint32_t kMostSide = 4096;
 // Of a level that are warped for a tile: sixteen times what fits one pixel to one.
 constexpr std::uint64_t kMostSourcePixels = std::uint64_t{2} << 20;
 
@@ -52,9 +50,9 @@ Picture OwnTile(const Service& service, ServedRaster& raster, const MapTile& til
                 const MapLook& look, const Deadline& deadline) {
     const TilePlace place = FindTile(raster, tile.matrix, tile.column, tile.row);
     const std::uint32_t side = raster.Header().tileSize;
-    if (side > kMostSide)
-        throw Refusal(400, "tiles of more than " + std::to_string(kMostSide) +
-                               " pixels a side are not made whole");
+    if (side > service.limits.side || std::uint64_t{side} * side > service.limits.pixels)
+        throw Refusal(400, "a whole tile would have " + std::to_string(side) + " x " +
+                               std::to_string(side) + " pixels, which is beyond the limit");
     return Padded(
         RenderLevelWindow(service, raster, look.style, place.level, place.window, deadline), side);
 }

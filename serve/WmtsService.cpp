@@ -24,7 +24,7 @@ namespace {
 using zmcdescribe::Json;
 
 constexpr std::size_t kMostLayers = 1000;   // of one document
-constexpr std::uint32_t kMostBands = 4096;  // of which a pixel's values are told
+constexpr std::uint32_t kMostBands = 1000;  // of which a pixel's values are told
 
 // --- what goes wrong ---
 

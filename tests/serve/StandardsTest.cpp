@@ -325,6 +325,29 @@ TEST_F(StandardsTest, OwnTilesAreThoseOfTheRasterInTheirWholeSize) {
               Mark(kTiles + "/own-a.pyr/2/1/2?f=png"));
 }
 
+TEST_F(StandardsTest, TilesHaveTheSideThatTheFileTellsUpToALimit) {
+    BuildNoise<unsigned char>(folder / "small.pyr", 10, 8, 1);
+    const std::string bytes = BytesOf(folder / "small.pyr"), name = "<HEADER_TILESIZE>";
+    const std::size_t at = bytes.find(name) + name.size();
+    ASSERT_EQ(bytes.substr(at, 4), "256<");
+    const auto tile = [&](const std::string& side) {
+        std::string changed = bytes;
+        std::ofstream(folder / "side.pyr", std::ios::binary) << changed.replace(at, 3, side);
+        zmctest::MakeOld(folder / "side.pyr");
+        Serve();
+        return Ask("/ogc/collections/side.pyr/map/tiles/own-side.pyr/0/0/0?f=png");
+    };
+    EXPECT_EQ(SizeInPng(tile("512")), std::string("\0\0\2\0\0\0\2\0", 8));
+    EXPECT_EQ(Document("/ogc/tileMatrixSets/own-side.pyr")["tileMatrices"][0]["tileHeight"], 512);
+    limits.pixels = 512 * 512;
+    EXPECT_EQ(tile("512").status, 200);
+    EXPECT_EQ(tile("513").status, 400);
+    limits = {};
+    limits.side = 600;
+    EXPECT_EQ(tile("600").status, 200);
+    EXPECT_EQ(tile("601").status, 400);
+}
+
 TEST_F(StandardsTest, TheFormatIsThatOfTheKeyOrTheHeader) {
     const std::string tile = kTiles + "/WebMercatorQuad/0/0/0";
     EXPECT_EQ(Ask(tile).type, "image/png");
@@ -693,6 +716,26 @@ TEST_F(StandardsTest, WhatIsDamagedIsNoLayerAndHurtsNoOther) {
     const Answer report = Ask("/wmts/1.0.0/bad.pyr/default/own-bad.pyr/0/0/0.png");
     EXPECT_EQ(report.status, 500);
     EXPECT_NE(report.Text().find("NoApplicableCode"), std::string::npos);
+}
+
+TEST_F(StandardsTest, ListsAndValuesAreBounded) {
+    for (int i = 0; i < 1000; ++i)
+        std::filesystem::create_hard_link(folder / "plain.pyr",
+                                          folder / ("b" + std::to_string(i) + ".pyr"));
+    const std::string capabilities = Text("/wmts/1.0.0/WMTSCapabilities.xml");
+    std::size_t layers = 0;
+    for (std::size_t at = 0; (at = capabilities.find("<Layer>", at)) != capabilities.npos; ++at)
+        ++layers;
+    EXPECT_EQ(layers, 1000u);
+    const Json page = Document("/ogc/collections?limit=4294967295");
+    EXPECT_EQ(page["numberReturned"], 1000);
+    EXPECT_EQ(page["numberMatched"], 1002);
+    EXPECT_EQ(Document("/ogc/collections")["numberReturned"], 100);
+    BuildNoise<unsigned char>(folder / "many.pyr", 1, 1, 1001);
+    EXPECT_EQ(Status("/wmts/1.0.0/many.pyr/default/own-many.pyr/0/0/0/0/0.json"), 400);
+    BuildNoise<unsigned char>(folder / "many.pyr", 1, 1, 1000);
+    EXPECT_EQ(Document("/wmts/1.0.0/many.pyr/default/own-many.pyr/0/0/0/0/0.json")["values"].size(),
+              1000u);
 }
 
 TEST_F(StandardsTest, ListsThatTakeTooLongAreRefused) {
