@@ -1,7 +1,8 @@
 # zmc_embed_viewer(source): the C++ source that holds the files of the viewer, as serve/Pages.h has
 # them. The build makes the viewer of web/ for it, with the tools that its lock file names: they are
 # got from the npm registry once for a build folder, and nothing is looked for there as long as the
-# lock file stays. Without the viewer the source holds none.
+# lock file stays. Without the viewer the source holds none. The global property ZMC_HAS_VIEWER tells
+# tests which it is.
 #
 # ZMC_BUILD_VIEWER decides: ON, OFF, or AUTO, which is ON where Node and npm are there and the build
 # is not one that looks for faults in C++ alone.
@@ -54,6 +55,7 @@ function(zmc_embed_viewer source)
     set(write "${CMAKE_COMMAND}" -DZMC_SOURCE=${source} -DZMC_TEMPLATE=${ZMC_ROOT}/serve/Pages.cpp.in)
     set(writer "${ZMC_ROOT}/cmake/WritePages.cmake" "${ZMC_ROOT}/serve/Pages.cpp.in")
     zmc_decide_viewer(wanted)
+    set_property(GLOBAL PROPERTY ZMC_HAS_VIEWER ${wanted})
     if(NOT wanted)
         add_custom_command(OUTPUT "${source}" COMMAND ${write} -P "${ZMC_ROOT}/cmake/WritePages.cmake"
             DEPENDS ${writer} VERBATIM COMMENT "Leaving the viewer out")

@@ -1,5 +1,5 @@
 """The installed program shows the viewer: serves_the_viewer.py PROGRAM DIST, where DIST has the files that the build
-made of it, or is not there in a build without the viewer. Nothing but the program is asked, from an empty folder."""
+made of it, or is empty in a build without the viewer. Nothing but the program is asked, from an empty folder."""
 import os
 import pathlib
 import re
@@ -8,7 +8,8 @@ import sys
 import tempfile
 import urllib.request
 
-PROGRAM, DIST = sys.argv[1], pathlib.Path(sys.argv[2])
+PROGRAM = sys.argv[1]
+DIST = pathlib.Path(sys.argv[2]) if sys.argv[2] else None
 
 
 def get(url):
@@ -45,7 +46,7 @@ def main():
                               env=plain) as server:
             try:
                 url = server.stdout.readline().decode().strip()
-                if DIST.is_dir():
+                if DIST:
                     check_viewer(url)
                 else:
                     assert "built without the viewer" in check_page(url)[0]
