@@ -233,7 +233,9 @@ export class App implements Gestures {
     this.show();
     this.remember(false);
     if (this.line) this.readLine();
-    void this.idle().then(() => this.warm());
+    void this.idle()
+      .then(shown)
+      .then(() => this.warm());
   }
 
   // What was drawn last has to be drawn once more, or the page would show nothing.
@@ -624,6 +626,11 @@ export class App implements Gestures {
     return performance.now() - start;
   }
 }
+
+// Once what was drawn last is on the screen.
+const shown = async (): Promise<void> => {
+  for (let frames = 0; frames < 3; ++frames) await new Promise((resolve) => requestAnimationFrame(resolve));
+};
 
 const NOWHERE: Placement = { left: 0, top: 0, scaleX: 1, scaleY: 1 };
 

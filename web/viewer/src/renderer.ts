@@ -29,6 +29,7 @@ export interface Layer {
 
 interface Program {
   program: WebGLProgram;
+  checked: boolean; // that it was made well
   locations: Map<string, WebGLUniformLocation | null>;
 }
 
@@ -126,9 +127,12 @@ export class Renderer {
     const backdrop = countOf({ left: 0, top: 0, right: last.tilesAcross - 1, bottom: last.tilesDown - 1 }) <= 4;
     const coarsest = backdrop && last.level !== level.level ? tilesOf(last, wholeOf(last)) : [];
     if (ask) store.want([...coarsest, ...tiles], groups);
-    const prepared = this.prepare(layer, groups);
+    // Its program is being made while the first tiles come.
+    const look = this.lookOf(layer, groups);
+    this.program(look.variant);
+    let prepared: Prepared | undefined;
     const painter = new Painter(raster, store, groups, placement, (tile, area, at) =>
-      this.drawTile(prepared, tile, area, at),
+      this.drawTile((prepared ??= this.prepare(look)), tile, area, at),
     );
     for (const tile of tiles) painter.paint(tile);
   }
@@ -167,8 +171,7 @@ export class Renderer {
   }
 
   // All of a style that does not depend on the tile.
-  private prepare({ raster, store, style }: Layer, groups: number[]): Prepared {
-    const { gl } = this;
+  private lookOf({ raster, store, style }: Layer, groups: number[]): Look {
     const first = style.bands[0] as number;
     const bands = [first, style.bands[1] ?? first, style.bands[2] ?? first, style.alpha ?? first];
     const shown = style.alpha === undefined ? style.bands : [...style.bands, style.alpha];
@@ -178,6 +181,7 @@ export class Renderer {
     const colors = this.colorsOf(raster, style);
     const variant: Variant = {
       sampler: store.format.sampler,
+      small: store.format.bytes <= 2 && store.format.sampler !== "sampler2D",
       complex: isComplex(raster.type),
       together: groups.length === 1,
       straight:
@@ -190,6 +194,11 @@ export class Renderer {
       flat: bounds.some(({ minimum, maximum }) => minimum === maximum),
       colors: !colors ? "none" : style.colors === "palette" ? "palette" : "map",
     };
+    return { variant, channels, groups, bounds, noData, colors, style };
+  }
+
+  private prepare({ variant, channels, groups, bounds, noData, colors, style }: Look): Prepared {
+    const { gl } = this;
     const program = this.use(variant);
     channels.forEach((_, i) => gl.uniform1i(this.at(program, `tile${i}`), i));
     gl.uniform4iv(
@@ -197,16 +206,16 @@ export class Renderer {
       channels.map(({ component }) => component),
     );
     gl.uniform1f(this.at(program, "power"), 1 / style.gamma);
-    this.setBounds(program, variant.sampler, bounds);
+    this.setBounds(program, variant, bounds);
     this.setNoData(program, variant, noData);
     gl.uniform1i(this.at(program, "part"), PARTS.indexOf(style.part));
     if (colors) this.setColors(program, colors);
     return { program, channels, groups };
   }
 
-  private setBounds(program: Program, sampler: Sampler, bounds: readonly Range[]): void {
+  private setBounds(program: Program, { sampler, small }: Variant, bounds: readonly Range[]): void {
     const { gl } = this;
-    const bases = bounds.map(({ minimum }) => baseOf(sampler, minimum));
+    const bases = bounds.map(({ minimum }) => baseOf(sampler, small, minimum));
     this.setVector(program, sampler, "base", bases);
     const set = (name: string, value: (range: Range, i: number) => number): void =>
       gl.uniform4fv(this.at(program, name), bounds.map(value));
@@ -270,12 +279,28 @@ export class Renderer {
     return texture;
   }
 
-  private use(variant: Variant): Program {
+  private program(variant: Variant): Program {
     const name = Object.values(variant).join(" ");
     const program = this.programs.get(name) ?? this.compile(fragment(variant));
     this.programs.set(name, program);
+    return program;
+  }
+
+  private use(variant: Variant): Program {
+    const program = this.program(variant);
+    if (!program.checked) this.check(program);
     this.gl.useProgram(program.program);
     return program;
+  }
+
+  // Asking waits until the program is made, so it is asked as late as can be.
+  private check(program: Program): void {
+    const { gl } = this;
+    if (!gl.getProgramParameter(program.program, gl.LINK_STATUS) && !gl.isContextLost()) {
+      const logs = (gl.getAttachedShaders(program.program) ?? []).map((shader) => gl.getShaderInfoLog(shader));
+      throw new Error(`The graphics processor refuses a program: ${logs.filter(Boolean).join(" ")}`);
+    }
+    program.checked = true;
   }
 
   private compile(source: string): Program {
@@ -289,11 +314,9 @@ export class Renderer {
       gl.shaderSource(shader, text);
       gl.compileShader(shader);
       gl.attachShader(program, shader);
-      if (!gl.getShaderParameter(shader, gl.COMPILE_STATUS) && !gl.isContextLost())
-        throw new Error(`The graphics processor refuses a program: ${gl.getShaderInfoLog(shader)}`);
     }
     gl.linkProgram(program);
-    return { program, locations: new Map() };
+    return { program, locations: new Map(), checked: false };
   }
 
   private at({ program, locations }: Program, name: string): WebGLUniformLocation | null {
@@ -309,6 +332,17 @@ export class Renderer {
     this.gl.uniform4f(this.at(program, "area"), left, top, right, bottom);
     this.gl.drawArrays(this.gl.TRIANGLE_STRIP, 0, 4);
   }
+}
+
+/** What a style comes to for a raster. */
+interface Look {
+  variant: Variant;
+  channels: readonly Channel[];
+  groups: readonly number[];
+  bounds: readonly Range[];
+  noData: readonly (number | undefined)[];
+  colors: Uint8Array | undefined;
+  style: Style;
 }
 
 /** A style that is ready to be drawn with. */
@@ -329,11 +363,13 @@ function boundsOf(raster: Raster, store: TileStore, style: Style, band: number, 
   return { minimum: (minimum - base) / by, maximum: (maximum - base) / by };
 }
 
-// The value that samples are counted from: the minimum, as near as their type has it.
-function baseOf(sampler: Sampler, minimum: number): number {
+// The value that samples are counted from: the minimum, as near as their type has it. A minimum that is far from all
+// small samples may be farther from it.
+function baseOf(sampler: Sampler, small: boolean, minimum: number): number {
   if (sampler === "sampler2D") return Math.fround(minimum);
   const [least, most] = TYPE_ENDS[sampler];
-  return Math.min(Math.max(Math.floor(minimum), least), most);
+  const end = small ? 2 ** 20 : 2 ** 32;
+  return Math.min(Math.max(Math.floor(minimum), least, -end), most, end);
 }
 
 const TYPE_ENDS = { usampler2D: [0, 2 ** 32 - 1], isampler2D: [-(2 ** 31), 2 ** 31 - 1] } as const;

@@ -5,6 +5,8 @@ import type { Sampler } from "./samples.js";
 /** What a program is made for. */
 export interface Variant {
   sampler: Sampler;
+  /** Samples are whole and have 16 bits at most. */
+  small: boolean;
   /** Textures hold the two parts of one band. */
   complex: boolean;
   /** All bands are in one texture; else each in its own. */
@@ -44,6 +46,9 @@ interface Words {
 // twice their precision: a narrow stretch of large values keeps its steps.
 const ABOVE_INTEGER = `mix(-vec4(uvec4(base) - uvec4(value)), vec4(uvec4(value) - uvec4(base)),
     greaterThanEqual(value, base)) - rest`;
+
+// Of small ones a difference is never too large, and signed numbers become reals more quickly than others.
+const ABOVE_SMALL = "vec4(ivec4(value) - ivec4(base)) - rest";
 
 const WORDS: Record<Sampler, Words> = {
   usampler2D: {
@@ -103,7 +108,7 @@ float partOf(vec2 both) {
 
 /** The text of a program for pixels. Colours come out multiplied by alpha. */
 export function fragment(variant: Variant): string {
-  const { sampler, complex, count, alpha, noData, power, flat, colors } = variant;
+  const { sampler, small, complex, count, alpha, noData, power, flat, colors } = variant;
   const { value, vector, above, missing, index } = WORDS[sampler];
   const stretched = power ? "pow(t, vec4(power))" : "t";
   const single = {
@@ -147,7 +152,7 @@ void main() {
   ivec2 texel = ivec2(clamp(at, vec2(0.0), limit));
   ${fetch(variant, vector)}
   uvec4 missing = ${missing}${noData && !complex ? " | (uvec4(equal(value, noData)) & hasNoData)" : ""};
-  vec4 above = ${above};
+  vec4 above = ${small ? ABOVE_SMALL : above};
   vec4 t = clamp(above * inverse, 0.0, 1.0);
   ${flat ? "t = mix(t, vec4(greaterThanEqual(above, vec4(0.0))), flatness);" : ""}
   vec4 entry = floor(255.0 * ${stretched} + 0.5);
