@@ -15,6 +15,10 @@ set(ZMC_WARNING_FLAGS -Wall -Wextra -Wpedantic -Wconversion -Wsign-conversion -W
     $<$<CXX_COMPILER_ID:GNU>:-Wduplicated-cond>
     $<$<AND:$<CXX_COMPILER_ID:GNU>,$<VERSION_LESS:$<CXX_COMPILER_VERSION>,16>>:-Wduplicated-branches>
     $<$<CXX_COMPILER_ID:GNU>:-Wlogical-op> $<$<CXX_COMPILER_ID:Clang>:-Wthread-safety>)
+# Where sources are compiled as one, g++ takes what stands in one of them for a header's.
+if(CMAKE_UNITY_BUILD)
+    list(APPEND ZMC_WARNING_FLAGS $<$<CXX_COMPILER_ID:GNU>:-Wno-subobject-linkage>)
+endif()
 if(ZMC_WARNINGS_AS_ERRORS)
     list(APPEND ZMC_WARNING_FLAGS -Werror)
 endif()

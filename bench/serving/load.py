@@ -58,13 +58,40 @@ class Wrk:
              "-s", self.script, url, "--", path, str(self.threads), str(pause)],
             stdout=subprocess.PIPE, text=True)
 
-    def run(self, url, requests, seconds):
-        """Answers a second. Whatever is not answered well is an error."""
+    def run(self, url, requests, seconds, processes=()):
+        """Answers a second, and answers for each second that a processor was at work for it: wrk's, and that of
+        the processes of the server. Whatever is not answered well is an error."""
+        before = work_of(processes) + work_of_children()
         text = self.start(url, requests, seconds).communicate()[0]
+        work = work_of(processes) + work_of_children() - before
         told = json.loads(re.search(r"^\{.*\}$", text, re.M).group())
         if told["bad"] or told["broken"]:
             raise RuntimeError(f"{url}: {told}")
-        return told["requests"] / told["microseconds"] * 1e6
+        return Rate(told["requests"] / told["microseconds"] * 1e6, told["requests"] / work)
+
+
+Rate = collections.namedtuple("Rate", "answers per_work")
+
+
+def work_of(processes):
+    """Seconds that processors were at work for them, and for those that they have started and that live."""
+    total = 0
+    for process in processes:
+        try:
+            with open(f"/proc/{process}/stat", encoding="ascii") as file:
+                fields = file.read().rsplit(")", 1)[1].split()
+            with open(f"/proc/{process}/task/{process}/children", encoding="ascii") as file:
+                children = file.read().split()
+        except FileNotFoundError:
+            continue
+        total += (int(fields[11]) + int(fields[12])) / os.sysconf("SC_CLK_TCK") + work_of(children)
+    return total
+
+
+def work_of_children():
+    """The same of those that have ended."""
+    times = os.times()
+    return times.children_user + times.children_system
 
 
 # --- at a given rate ---
@@ -173,7 +200,7 @@ def _encode(path, tile_bytes, quality, seconds, first, queue):
         compress(handle, places[warm % count], side, 0, side, rgb, to, ctypes.byref(size), halved,
                  quality, no_room)
     done, at = 0, first % count
-    begin = time.perf_counter()
+    begin, work = time.perf_counter(), time.process_time()
     end = begin + seconds
     while time.perf_counter() < end:
         size.value = room
@@ -182,18 +209,19 @@ def _encode(path, tile_bytes, quality, seconds, first, queue):
             raise RuntimeError("the codec fails")
         done += 1
         at = (at + 1) % count
-    queue.put(done / (time.perf_counter() - begin))
+    queue.put((done, time.perf_counter() - begin, time.process_time() - work))
 
 
 def codec_alone(path, tile_bytes, quality, seconds, workers):
-    """Tiles a second by so many processes."""
+    """Tiles a second by so many processes, and tiles for each second of work."""
     queue = multiprocessing.Queue()
     jobs = [multiprocessing.Process(target=_encode,
                                     args=(path, tile_bytes, quality, seconds, 97 * i, queue))
             for i in range(workers)]
     for job in jobs:
         job.start()
-    total = sum(queue.get(timeout=seconds + 60) for _ in jobs)
+    results = [queue.get(timeout=seconds + 60) for _ in jobs]
     for job in jobs:
         job.join()
-    return total
+    return Rate(sum(done / took for done, took, _ in results),
+                sum(done for done, _, _ in results) / sum(work for _, _, work in results))

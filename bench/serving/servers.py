@@ -42,6 +42,9 @@ class Serve:
         stop(self.process)
         assert self.process.returncode == 0, "the server did not end well"
 
+    def numbers(self):
+        return [self.process.pid]
+
     def resident(self):
         """MiB of memory that it has."""
         with open(f"/proc/{self.process.pid}/status", encoding="ascii") as status:
@@ -64,6 +67,9 @@ class Fcgi:
                 subprocess.Popen([command], stdin=listener, stdout=subprocess.DEVNULL,
                                  stderr=subprocess.DEVNULL, env={**os.environ, **environment})
                 for _ in range(workers)]
+
+    def numbers(self):
+        return [process.pid for process in self.processes]
 
     def stop(self):
         for process in self.processes:
@@ -173,3 +179,6 @@ class Nginx:
 
     def stop(self):
         stop(self.process)
+
+    def numbers(self):
+        return [self.process.pid]

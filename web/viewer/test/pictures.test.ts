@@ -316,6 +316,12 @@ const REFERENCES: [name: string, options: string[], link: string][] = [
     return [type, ["--bands", "1", `--stretch=${pair}`], `bands=1&stretch=${pair}`];
   }),
   ["Byte", ["--bands", "1,2,3", "--stretch", "20,230;0,255;9,99"], "bands=1,2,3&stretch=20,230;0,255;9,99"],
+  // Far from all samples there are.
+  [
+    "Byte",
+    ["--bands", "1,2,3", "--stretch=-3000000,300;4000000,5000000;0,255"],
+    "bands=1,2,3&stretch=-3000000,300;4000000,5000000;0,255",
+  ],
   [
     "Byte",
     ["--bands", "1,2,3,4", "--stretch", "0,255;0,255;0,255;0,255"],
