@@ -77,7 +77,7 @@ TEST(Renderer, SamplesThatAreThePictureAlreadyAreTold) {
     };
     EXPECT_TRUE(isCopy({}, samples));
     EXPECT_EQ(Renderer(source.Facts(), {}, source).Render(samples).bytes, bytes);
-    EXPECT_TRUE(isCopy({{"bands", "1"}}, samples));
+    EXPECT_TRUE(isCopy({{"bands", "1"}, {"stretch", "none"}}, samples));
     EXPECT_FALSE(isCopy({}, {.data = bytes.data(), .width = 2, .height = 2, .shown = shown}));
     EXPECT_FALSE(isCopy({}, {.data = bytes.data(), .width = 2, .height = 2, .planar = true}));
     EXPECT_FALSE(isCopy({}, {.data = bytes.data(), .width = 1, .height = 1, .halo = 1}));

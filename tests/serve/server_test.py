@@ -148,6 +148,23 @@ class ServerTest(unittest.TestCase):
         self.assertNotIn("Content-Length", again)
         self.assertEqual(again["ETag"], headers["ETag"])
 
+    def test_a_304_ends_with_its_head(self):
+        """What came behind it would be taken for the next answer."""
+        tag = self.server.get("/files/a.pyr", {"Range": "bytes=0-1"})[1]["ETag"]
+        with socket.create_connection(("127.0.0.1", self.server.port), timeout=5) as stream:
+            stream.sendall(f"GET /files/a.pyr HTTP/1.1\r\nHost: a\r\nIf-None-Match: {tag}\r\n\r\n".encode())
+            got = b""
+            try:
+                while part := stream.recv(1 << 16):
+                    got += part
+                    if b"\r\n\r\n" in got:
+                        stream.settimeout(0.5)
+            except socket.timeout:
+                pass
+        self.assertTrue(got.startswith(b"HTTP/1.1 304 "))
+        self.assertEqual(got.split(b"\r\n\r\n", 1)[1], b"")
+        self.assertNotIn(b"\r\nTransfer-Encoding:", got)
+
     def test_head_has_the_length_and_no_body(self):
         for path in ("/files/a.pyr", "/tiles/a.pyr/0/0/0.png", "/api"):
             whole = self.server.get(path)

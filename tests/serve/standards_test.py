@@ -202,7 +202,7 @@ class StandardsTest(unittest.TestCase):
                 for column in range(limit["minTileCol"], limit["maxTileCol"] + 1):
                     tile = picture(self.server.get(
                         f"/ogc/collections/holes.pyr/map/tiles/WebMercatorQuad/"
-                        f"{limit['tileMatrix']}/{row}/{column}?f=png&nodata=0"
+                        f"{limit['tileMatrix']}/{row}/{column}?f=png&nodata=0&stretch=none"
                         f"&resampling={method}")[2])
                     if tile.shape[2] == 1:
                         tile = np.concatenate([tile, np.full_like(tile, 255)], axis=2)
