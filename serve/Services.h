@@ -8,15 +8,15 @@
 
 namespace zmcserve {
 
-std::vector<Route> FileRoutes();     // the files themselves
-std::vector<Route> TileRoutes();     // tiles in the raster's own grid
-std::vector<Route> OgcRoutes();      // OGC API - Tiles
-std::vector<Route> WmtsRoutes();     // WMTS
-std::vector<Route> PictureRoutes();  // previews
-std::vector<Route> ValueRoutes();    // points, profiles, windows of samples
-std::vector<Route> RecordRoutes();   // what a file tells: info, statistics, histograms
-std::vector<Route> ServerRoutes();   // the server itself: api, health, metrics
-std::vector<Route> PageRoutes();     // the viewer
+std::vector<Route> FileRoutes();      // the files themselves
+std::vector<Route> TileRoutes();      // tiles in the raster's own grid
+std::vector<Route> OgcRoutes();       // OGC API - Tiles
+std::vector<Route> WmtsRoutes();      // WMTS
+std::vector<Route> PictureRoutes();   // previews
+std::vector<Route> ValueRoutes();     // points, profiles, windows of samples
+std::vector<Route> RecordRoutes();    // what a file tells: info, statistics, histograms
+std::vector<Route> ServerRoutes();    // the server itself: api, health, metrics
+std::vector<Route> PageRoutes();      // the viewer
 std::vector<Route> DeepZoomRoutes();  // Deep Zoom: DZI
 std::vector<Route> ImageRoutes();     // the IIIF Image API
 
