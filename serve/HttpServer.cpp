@@ -184,8 +184,8 @@ MHD_Response* ResponseOfNothing() {
     };
     MHD_Response* const made =
         MHD_create_response_from_callback(MHD_SIZE_UNKNOWN, 1, none, nullptr, nullptr);
-    // The library would send the end of a body in chunks behind the head, and on a connection that goes
-    // on that is taken for the next answer: so there are none, and the connection ends.
+    // The library would send the end of a body in chunks behind the head, and on a connection that
+    // goes on that is taken for the next answer: so there are none, and the connection ends.
     if (made) MHD_set_response_options(made, MHD_RF_HTTP_1_0_COMPATIBLE_STRICT, MHD_RO_END);
     return made;
 }
