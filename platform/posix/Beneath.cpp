@@ -150,6 +150,7 @@ std::vector<FolderEntry> ListBeneath(const std::string& folder, const std::strin
     if (error) *error = listing ? 0 : errno;
     if (!listing) return entries;
     const int number = opened.Release();  // the listing's now
+    // NOLINTNEXTLINE(concurrency-mt-unsafe): nobody else has the listing.
     while (const dirent* const found = ::readdir(listing.get())) {
         FolderEntry entry;
         if (IsItselfOrAbove(found->d_name)) continue;
