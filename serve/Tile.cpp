@@ -5,6 +5,7 @@
 #include <algorithm>
 #include <cmath>
 #include <cstring>
+#include <limits>
 #include <memory>
 
 #include "gdal/ErrorCatcher.h"
@@ -74,7 +75,8 @@ std::optional<std::array<double, 4>> BoundsInDegrees(ServedRaster& raster) {
     if (!transformation) return std::nullopt;
     const auto& t = *place.transform;
     const double width = raster.Header().width, height = raster.Header().height;
-    double x[2] = {INFINITY, -INFINITY}, y[2] = {INFINITY, -INFINITY};
+    constexpr double kFar = std::numeric_limits<double>::infinity();
+    double x[2] = {kFar, -kFar}, y[2] = {kFar, -kFar};
     for (const auto& [column, line] : {std::pair(0.0, 0.0), std::pair(width, 0.0),
                                        std::pair(0.0, height), std::pair(width, height)}) {
         const double east = t[0] + column * t[1] + line * t[2];
