@@ -183,7 +183,7 @@ struct Wanted {
 };
 
 Wanted WantedOf(const Request& request, const Window& whole, const ImageLimits& limits) {
-    const auto* const part = &request.segments[request.segments.size() - 4];
+    const auto part = request.segments.end() - 4;
     Wanted wanted;
     wanted.region = RegionOf(part[0], whole);
     wanted.size = ImageSizeOf(part[1], wanted.region, limits);

@@ -21,7 +21,7 @@ char KindOf() {
     else if constexpr (std::is_floating_point_v<T>)
         return 'f';
     else
-        return std::is_signed_v<T> ? 'i' : 'u';
+        return std::is_signed<T>::value ? 'i' : 'u';
 }
 
 std::string TypeText(std::uint32_t pixelType) {
