@@ -12,16 +12,13 @@ namespace {
 Json SystemOf(const GDALDataset& dataset) {
     const OGRSpatialReference* const system = dataset.GetSpatialRef();
     if (!system) return nullptr;
-    const char* const options[] = {"FORMAT=WKT2_2019", "MULTILINE=NO", nullptr};
-    char* text = nullptr;
-    system->exportToWkt(&text, options);
-    const std::unique_ptr<char, decltype(&CPLFree)> wkt(text, &CPLFree);
+    const std::string wkt = WktOf(*system);
     const char* const name = system->GetName();
     const char* const authority = system->GetAuthorityName(nullptr);
     const char* const code = system->GetAuthorityCode(nullptr);
     return {{"name", name ? Json(name) : Json()},
             {"authority", authority && code ? Json(std::string(authority) + ":" + code) : Json()},
-            {"wkt", text ? Json(text) : Json()}};
+            {"wkt", wkt.empty() ? Json() : Json(wkt)}};
 }
 
 Json TransformOf(GDALDataset& dataset) {
@@ -45,6 +42,14 @@ Json NoDataOf(GDALDataset& dataset) {
 }
 
 }  // namespace
+
+std::string WktOf(const OGRSpatialReference& system) {
+    const char* const options[] = {"FORMAT=WKT2_2019", "MULTILINE=NO", nullptr};
+    char* text = nullptr;
+    system.exportToWkt(&text, options);
+    const std::unique_ptr<char, decltype(&CPLFree)> wkt(text, &CPLFree);
+    return text ? text : "";
+}
 
 Json DescribePlace(GDALDataset* dataset) {
     if (!dataset) return {{"crs", nullptr}, {"geoTransform", nullptr}, {"noData", nullptr}};

@@ -27,12 +27,6 @@ Refusal Homeless(const std::string& why) {
 
 bool IsSomewhere(double x, double y) { return std::isfinite(x) && std::isfinite(y); }
 
-void Apply(const std::array<double, 6>& t, double& x, double& y) {
-    const double east = t[0] + x * t[1] + y * t[2];
-    y = t[3] + x * t[4] + y * t[5];
-    x = east;
-}
-
 // The value in the middle of the order.
 double Median(std::vector<double>& values) {
     const auto half = values.begin() + static_cast<std::ptrdiff_t>(values.size() / 2);

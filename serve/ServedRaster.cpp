@@ -1,10 +1,9 @@
 #include "serve/ServedRaster.h"
 
-#include <ogr_spatialref.h>
-
 #include <algorithm>
 
 #include "core/PixelVocabulary.h"
+#include "describe/Place.h"
 #include "gdal/ErrorCatcher.h"
 #include "host/base/Error.h"
 #include "host/file/PyramidFileInfo.h"
@@ -36,25 +35,11 @@ std::unique_ptr<zmcgdal::Dataset> OpenDataset(const ServedFile& file, const Comp
     }
 }
 
-std::string TextOf(const char* text) { return text ? text : ""; }
-
-void TakeSystem(const OGRSpatialReference& system, Georeference& place) {
-    const char* const options[] = {"FORMAT=WKT2_2019", "MULTILINE=NO", nullptr};
-    char* text = nullptr;
-    system.exportToWkt(&text, options);
-    const std::unique_ptr<char, decltype(&CPLFree)> wkt(text, &CPLFree);
-    place.wkt = TextOf(text);
-    place.name = TextOf(system.GetName());
-    const char* const authority = system.GetAuthorityName(nullptr);
-    const char* const code = system.GetAuthorityCode(nullptr);
-    if (authority && code) place.authority = std::string(authority) + ":" + code;
-}
-
 Georeference PlaceOf(GDALDataset& dataset) {
     const zmcgdal::ErrorCatcher quiet(CE_Failure);
     Georeference place;
     if (const OGRSpatialReference* const system = dataset.GetSpatialRef())
-        TakeSystem(*system, place);
+        place.wkt = zmcdescribe::WktOf(*system);
     std::array<double, 6> numbers{};
     if (GDALGetGeoTransform(GDALDataset::ToHandle(&dataset), numbers.data()) == CE_None)
         place.transform = numbers;

@@ -45,12 +45,18 @@ using ServedRasterPtr = std::shared_ptr<ServedRaster>;
 
 // Where a raster lies, as the driver tells it.
 struct Georeference {
-    std::string wkt;        // WKT 2 of 2019
-    std::string name;       // of the system, for people
-    std::string authority;  // "EPSG:32633"; empty where none is told
-    // GDAL's: x and y of the upper left corner are the first and the fourth number.
+    std::string wkt;  // WKT 2 of 2019
+    // GDAL's, from pixels of the finest level that is there: x and y of its upper left corner are
+    // the first and the fourth number.
     std::optional<std::array<double, 6>> transform;
 };
+
+// Takes a place through such numbers.
+inline void Apply(const std::array<double, 6>& transform, double& x, double& y) {
+    const double east = transform[0] + x * transform[1] + y * transform[2];
+    y = transform[3] + x * transform[4] + y * transform[5];
+    x = east;
+}
 
 // The files beside a raster that tell of it, and the state in which each was found.
 struct Companions {

@@ -73,14 +73,14 @@ std::optional<std::array<double, 4>> BoundsInDegrees(ServedRaster& raster) {
     const std::unique_ptr<OGRCoordinateTransformation> transformation(
         OGRCreateCoordinateTransformation(&own, &degrees));
     if (!transformation) return std::nullopt;
-    const auto& t = *place.transform;
-    const double width = raster.Header().width, height = raster.Header().height;
+    const zelm::LevelGeometry finest = raster.Geometry(raster.FinestLevel());
+    const double width = finest.samples, height = finest.lines;
     constexpr double kFar = std::numeric_limits<double>::infinity();
     double x[2] = {kFar, -kFar}, y[2] = {kFar, -kFar};
     for (const auto& [column, line] : {std::pair(0.0, 0.0), std::pair(width, 0.0),
                                        std::pair(0.0, height), std::pair(width, height)}) {
-        const double east = t[0] + column * t[1] + line * t[2];
-        const double north = t[3] + column * t[4] + line * t[5];
+        double east = column, north = line;
+        Apply(*place.transform, east, north);
         x[0] = std::min(x[0], east), x[1] = std::max(x[1], east);
         y[0] = std::min(y[0], north), y[1] = std::max(y[1], north);
     }

@@ -20,11 +20,10 @@ Json ExactValue(const T& value) {
 Json CoordinatesOf(ServedRaster& raster, std::uint32_t level, double x, double y) {
     const auto& transform = raster.Place().transform;
     if (!transform) return nullptr;
-    const auto& t = *transform;
-    const double scale = std::ldexp(1.0, static_cast<int>(level));
-    const double column = (x + 0.5) * scale, line = (y + 0.5) * scale;
-    return {zmcdescribe::JsonNumber(t[0] + column * t[1] + line * t[2]),
-            zmcdescribe::JsonNumber(t[3] + column * t[4] + line * t[5])};
+    const double scale = std::ldexp(1.0, static_cast<int>(level - raster.FinestLevel()));
+    double east = (x + 0.5) * scale, north = (y + 0.5) * scale;
+    Apply(*transform, east, north);
+    return {zmcdescribe::JsonNumber(east), zmcdescribe::JsonNumber(north)};
 }
 
 }  // namespace

@@ -10,6 +10,7 @@
 #include "serve/Negotiation.h"
 #include "serve/TileMatrixSet.h"
 #include "tests/serve/ServeFixture.h"
+#include "tests/support/PyramidFiles.h"
 
 namespace zmcserve {
 namespace {
@@ -54,6 +55,19 @@ protected:
                part(x + Mercator::kEdge);
     }
 };
+
+TEST_F(StandardsTest, PlacesAreThoseOfTheFinestLevelThatIsThere) {
+    const zmctest::HeaderText header{.width = 40, .height = 20, .levelMin = 1, .levelMax = 1};
+    const std::string file = folder / "half.pyr";
+    std::ofstream(file, std::ios::binary)
+        << zmctest::FileWithHeader(header.Text()) << std::string(20 * 10, '\7');
+    zmctest::MakeOld(file);
+    PlaceRaster(file, "EPSG:4326", 10, 50, 0.5, 0.5);
+    EXPECT_EQ(Document("/point/half.pyr?x=0&y=0&level=1")["coordinates"], Json({10.25, 49.75}));
+    EXPECT_EQ(Document("/tiles/half.pyr/tile.json")["bounds"], Json({10, 45, 20, 50}));
+    EXPECT_EQ(Document("/ogc/collections/half.pyr")["extent"]["spatial"]["bbox"][0],
+              Json({10, 45, 20, 50}));
+}
 
 const std::string kTiles = "/ogc/collections/a.pyr/map/tiles";
 const std::string kPlainTiles = "/ogc/collections/plain.pyr/map/tiles";
