@@ -555,7 +555,9 @@ class ReadOnly(ToolTest):
                     if os.readlink(f"{folder}/{number}") == path:
                         with open(f"/proc/{child.pid}/fdinfo/{number}") as info:
                             flags = int(info.read().split("flags:")[1].split()[0], 8)
-                        modes.add(flags & os.O_ACCMODE)
+                        # A number that was closed meanwhile may be that of another file already.
+                        if os.readlink(f"{folder}/{number}") == path:
+                            modes.add(flags & os.O_ACCMODE)
             except OSError:
                 pass
         self.assertEqual(child.returncode, 0, words)
