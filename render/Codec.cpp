@@ -12,13 +12,14 @@ namespace {
 struct Format {
     PictureFormat format;
     const char* name;
+    const char* ending;
     const char* mediaType;
     std::uint32_t longestSide;
 };
 
-constexpr Format kFormats[] = {{PictureFormat::Jpeg, "JPEG", "image/jpeg", 65535},
-                               {PictureFormat::Png, "PNG", "image/png", 2147483647},
-                               {PictureFormat::WebP, "WebP", "image/webp", 16383}};
+constexpr Format kFormats[] = {{PictureFormat::Jpeg, "JPEG", "jpg", "image/jpeg", 65535},
+                               {PictureFormat::Png, "PNG", "png", "image/png", 2147483647},
+                               {PictureFormat::WebP, "WebP", "webp", "image/webp", 16383}};
 
 const Format& Of(PictureFormat format) { return kFormats[static_cast<std::size_t>(format)]; }
 
@@ -58,11 +59,13 @@ std::optional<PictureFormat> PictureFormatOfName(std::string_view name) {
     std::string word(name);
     for (char& c : word)
         if (c >= 'A' && c <= 'Z') c = static_cast<char>(c - 'A' + 'a');
-    if (word == "jpg" || word == "jpeg") return PictureFormat::Jpeg;
-    if (word == "png") return PictureFormat::Png;
-    if (word == "webp") return PictureFormat::WebP;
+    if (word == "jpeg") return PictureFormat::Jpeg;
+    for (const Format& each : kFormats)
+        if (word == each.ending) return each.format;
     return std::nullopt;
 }
+
+const char* EndingOf(PictureFormat format) { return Of(format).ending; }
 
 const char* MediaType(PictureFormat format) { return Of(format).mediaType; }
 

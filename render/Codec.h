@@ -13,11 +13,15 @@
 namespace zmcrender {
 
 enum class PictureFormat { Jpeg, Png, WebP };
+inline constexpr PictureFormat kPictureFormats[] = {PictureFormat::Jpeg, PictureFormat::Png,
+                                                    PictureFormat::WebP};
 
 inline constexpr int kDefaultQuality = 85;
 
 // Of "jpg", "jpeg", "png" or "webp", in any case of letters.
 std::optional<PictureFormat> PictureFormatOfName(std::string_view name);
+// As the ending of a file: "jpg", "png" or "webp".
+const char* EndingOf(PictureFormat format);
 // "image/jpeg" and the like.
 const char* MediaType(PictureFormat format);
 // Pixels that a format takes in either direction: 65,535 of JPEG, 16,383 of WebP, 2^31 - 1 of PNG.

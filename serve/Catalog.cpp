@@ -137,15 +137,16 @@ void Catalog::Hold(const std::string& name, ServedRasterPtr raster) {
     }
 }
 
-ServedFilePtr Catalog::File(std::string_view name) {
-    const Found found = Find(name);
+ServedFilePtr Catalog::File(std::string_view name) { return FileOf(Find(name), name); }
+
+ServedFilePtr Catalog::FileOf(const Found& found, std::string_view name) {
     if (const ServedRasterPtr raster = TakeHeld(name, found)) return raster->FilePtr();
     return Open(found, name);
 }
 
 std::optional<ServedFilePtr> Catalog::Sidecar(std::string_view name) try {
     const Found found = Find(name);
-    static_cast<void>(File(name));
+    static_cast<void>(FileOf(found, name));  // of what is no pyramid nothing is told
     auto file =
         platform::OpenBeneath(found.root->folder, found.below + kSidecar, found.root->links);
     if (!file) return ServedFilePtr();

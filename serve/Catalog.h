@@ -80,6 +80,7 @@ private:
 
     Found Find(std::string_view name) const;
     ServedFilePtr Open(const Found& found, std::string_view name) const;
+    ServedFilePtr FileOf(const Found& found, std::string_view name);
     ServedRasterPtr TakeHeld(std::string_view name, const Found& found);
     void Hold(const std::string& name, ServedRasterPtr raster);
     void ListBelow(const Root& root, const std::string& folder, std::size_t depth,

@@ -90,9 +90,11 @@ void Compress(const Request& request, std::uint64_t most, Answer& answer) {
 
 std::string WithoutCodings(std::string_view tags) {
     std::string text(tags);
-    for (const char* const suffix : {"-gzip\"", "-zstd\""})
-        for (std::size_t at = text.find(suffix); at != text.npos; at = text.find(suffix, at))
-            text.erase(at, std::string_view(suffix).size() - 1);
+    for (const Coding coding : {Coding::Gzip, Coding::Zstd}) {
+        const std::string suffix = kSuffixes[static_cast<int>(coding)];
+        for (std::size_t at = 0; (at = text.find(suffix + '"', at)) != text.npos;)
+            text.erase(at, suffix.size());
+    }
     return text;
 }
 

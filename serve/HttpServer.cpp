@@ -199,7 +199,7 @@ MHD_Response* ResponseOfBody(Answer&& answer) {
 
 MHD_Response* ResponseOf(Answer&& answer) {
     const std::string type = answer.type;
-    const Headers headers = answer.headers;
+    const Headers headers = std::move(answer.headers);
     MHD_Response* const made = ResponseOfBody(std::move(answer));
     if (!made) return nullptr;
     if (!type.empty()) MHD_add_response_header(made, MHD_HTTP_HEADER_CONTENT_TYPE, type.c_str());

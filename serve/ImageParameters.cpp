@@ -16,6 +16,8 @@ namespace {
 using zmchost::Window;
 using zmcrender::PictureSize;
 
+constexpr std::string_view kPercent = "pct:";
+
 Refusal Misread(const char* part, std::string_view text, const std::string& what) {
     return Refusal(400, std::string(part) + ": " + Quoted(text) + " " + what);
 }
@@ -66,14 +68,14 @@ Span CutToPercent(double start, double extent, std::uint32_t whole) {
 Window WindowOfPixels(std::string_view text, const Window& whole) {
     const auto parts = Split(text, ',');
     std::array<std::uint64_t, 4> numbers{};
-    for (std::size_t i = 0; i < parts.size(); ++i) {
-        const auto number = WholeNumber(parts[i], ~std::uint64_t{0});
-        if (parts.size() != 4 || !number)
+    for (std::size_t i = 0; i < 4; ++i) {
+        const auto number =
+            parts.size() == 4 ? WholeNumber(parts[i], ~std::uint64_t{0}) : std::nullopt;
+        if (!number)
             throw Misread("region", text,
                           "is none of full, square, x,y,w,h of whole numbers and pct:x,y,w,h");
         numbers[i] = *number;
     }
-    if (parts.size() != 4) throw Misread("region", text, "is not four numbers");
     const Span x = CutTo(numbers[0], numbers[2], whole.width);
     const Span y = CutTo(numbers[1], numbers[3], whole.height);
     return {x.start, y.start, x.extent, y.extent};
@@ -180,9 +182,8 @@ PictureSize SizeOfPair(std::string_view text, const Window& region) {
 
 PictureSize UnboundedSize(std::string_view text, const Window& region, const ImageLimits& limits,
                           bool mayGrow) {
-    constexpr std::string_view kPercent = "pct:";
     if (text == "max") return Largest(region, limits, mayGrow);
-    if (text.substr(0, kPercent.size()) == kPercent)
+    if (text.starts_with(kPercent))
         return SizeOfPercent(text.substr(kPercent.size()), region, mayGrow);
     if (text.substr(0, 1) == "!") return SizeWithin(text.substr(1), region, limits, mayGrow);
     return SizeOfPair(text, region);
@@ -196,10 +197,9 @@ constexpr std::string_view kOtherFormats[] = {"tif", "gif", "jp2", "pdf"};
 }  // namespace
 
 Window RegionOf(std::string_view text, const Window& whole) {
-    constexpr std::string_view kPercent = "pct:";
     if (text == "full") return whole;
     if (text == "square") return Square(whole);
-    const Window region = text.substr(0, kPercent.size()) == kPercent
+    const Window region = text.starts_with(kPercent)
                               ? WindowOfPercents(text.substr(kPercent.size()), whole)
                               : WindowOfPixels(text, whole);
     if (region.width == 0 || region.height == 0)

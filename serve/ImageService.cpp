@@ -12,6 +12,7 @@
 #include "serve/Documents.h"
 #include "serve/ImageParameters.h"
 #include "serve/Names.h"
+#include "serve/Negotiation.h"
 #include "serve/Parameters.h"
 #include "serve/PictureAnswer.h"
 #include "serve/Service.h"
@@ -131,23 +132,9 @@ Json InfoOf(const Image& image, const Service& service) {
              {"canonicalLinkHeader", "mirroring", "profileLinkHeader", "sizeUpscaling"}}};
 }
 
-// Whether a list of media types names this one with more than no weight.
-bool Accepts(const Request& request, std::string_view type) {
-    const std::string accepted = request.Header("Accept").value_or("");
-    for (const std::string_view each : Split(accepted, ',')) {
-        const auto parts = Split(each, ';');
-        if (!SameWord(Trimmed(parts[0]), type)) continue;
-        return std::none_of(parts.begin() + 1, parts.end(), [](std::string_view part) {
-            part = Trimmed(part);
-            return part.substr(0, 3) == "q=0" && part.find_first_of("123456789") == part.npos;
-        });
-    }
-    return false;
-}
-
 Answer InfoAnswer(const Request& request, Service& service) {
     const Image image = ImageOf(request, service, request.segments.size() - 1);
-    const bool linked = Accepts(request, "application/ld+json");
+    const bool linked = Names(request.Header("Accept").value_or(""), "application/ld+json");
     const Validators validators{image.raster->ETag(VariantOf(image.base) + (linked ? "l" : "")),
                                 std::nullopt};
     auto known = AnswerOfConditions(request, validators);

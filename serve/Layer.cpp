@@ -2,6 +2,7 @@
 
 #include "host/base/Error.h"
 #include "serve/LayerId.h"
+#include "serve/Parameters.h"
 #include "serve/Tile.h"
 
 namespace zmcserve {
@@ -29,7 +30,7 @@ std::optional<Layer> LayerIfAny(Service& service, const std::string& name,
 }  // namespace
 
 Layer LayerOf(ServedRaster& raster, const Deadline& deadline) {
-    if (raster.Levels() == 0) throw Refusal(404, "the raster has no pixels");
+    CheckHasPixels(raster);
     const zelm::LevelGeometry finest = raster.Geometry(raster.FinestLevel());
     Layer layer;
     layer.name = raster.Name();

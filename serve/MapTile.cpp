@@ -6,6 +6,7 @@
 
 #include "serve/Conditions.h"
 #include "serve/LayerId.h"
+#include "serve/Parameters.h"
 #include "serve/PictureAnswer.h"
 #include "serve/Tile.h"
 
@@ -13,6 +14,8 @@ namespace zmcserve {
 namespace {
 
 using zmcrender::Picture;
+
+constexpr std::string_view kOwn = "own-";
 
 // Of a level that are warped for a tile: sixteen times what fits one pixel to one.
 constexpr std::uint64_t kMostSourcePixels = std::uint64_t{2} << 20;
@@ -74,17 +77,6 @@ Picture MercatorTile(const Service& service, ServedRaster& raster, const MapTile
                        look.resampling);
 }
 
-const char* EndingOf(zmcrender::PictureFormat format) {
-    switch (format) {
-        case zmcrender::PictureFormat::Jpeg:
-            return "jpg";
-        case zmcrender::PictureFormat::WebP:
-            return "webp";
-        default:
-            return "png";
-    }
-}
-
 // As a pixel of the finest level, of a place in pixels of it.
 std::optional<Pixel> PixelAt(const ServedRaster& raster, double x, double y) {
     const zelm::LevelGeometry finest = raster.Geometry(raster.FinestLevel());
@@ -94,7 +86,12 @@ std::optional<Pixel> PixelAt(const ServedRaster& raster, double x, double y) {
 
 }  // namespace
 
-std::string OwnSetOf(std::string_view name) { return "own-" + LayerIdOf(name); }
+std::string OwnSetOf(std::string_view name) { return std::string(kOwn) + LayerIdOf(name); }
+
+std::optional<std::string> NameOfOwnSet(std::string_view set) {
+    if (!set.starts_with(kOwn)) return std::nullopt;
+    return NameOfLayerId(set.substr(kOwn.size()));
+}
 
 bool IsMercatorSet(std::string_view set, std::string_view name) {
     if (set == kMercatorSet) return true;
@@ -114,17 +111,17 @@ std::uint32_t SideOfTile(const ServedRaster& raster, const MapTile& tile) {
     return tile.isMercator ? Mercator::kTileSide : raster.Header().tileSize;
 }
 
-Answer MapTileAnswer(const Request& request, Service& service, const std::string& name,
+Answer MapTileAnswer(const Request& request, const Service& service, ServedRaster& raster,
                      const MapTile& tile, const MapLook& look) {
-    const ServedRasterPtr raster = service.catalog.Raster(name);
     if (tile.isMercator) CheckMercatorTile(tile);
-    if (raster->Levels() == 0) throw Refusal(404, "the raster has no pixels");
+    CheckHasPixels(raster);
     const Validators validators{
-        raster->ETagWithCompanions(std::string("m") + EndingOf(look.format)), std::nullopt};
+        raster.ETagWithCompanions(std::string("m") + zmcrender::EndingOf(look.format)),
+        std::nullopt};
     if (auto answer = AnswerOfConditions(request, validators)) return std::move(*answer);
     const Picture picture = tile.isMercator
-                                ? MercatorTile(service, *raster, tile, look, request.deadline)
-                                : OwnTile(service, *raster, tile, look, request.deadline);
+                                ? MercatorTile(service, raster, tile, look, request.deadline)
+                                : OwnTile(service, raster, tile, look, request.deadline);
     request.deadline.Check();
     Answer answer = CodedAnswer(picture, look.format, look.quality);
     SetValidators(answer, validators);
@@ -140,7 +137,7 @@ std::optional<Pixel> PixelOfTile(ServedRaster& raster, const MapTile& tile, std:
                        (place.window.y + j + 0.5) * scale);
     }
     CheckMercatorTile(tile);
-    if (raster.Levels() == 0) throw Refusal(404, "the raster has no pixels");
+    CheckHasPixels(raster);
     const PlaneExtent extent = Mercator::ExtentOfTile(tile.matrix, tile.column, tile.row);
     const double cell = Mercator::CellOf(tile.matrix);
     double x = extent.west + (i + 0.5) * cell, y = extent.north - (j + 0.5) * cell;

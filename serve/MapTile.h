@@ -24,6 +24,8 @@ namespace zmcserve {
 inline constexpr const char* kMercatorSet = "WebMercatorQuad";
 // Of the raster's own grid.
 std::string OwnSetOf(std::string_view name);
+// Whose own grid it is; nothing where the words are those of no such set.
+std::optional<std::string> NameOfOwnSet(std::string_view set);
 
 // A tile by the words of an address.
 struct MapTile {
@@ -49,7 +51,7 @@ Resampling ResamplingOf(const Request& request);
 
 // The tile as an answer, with validators. Throws Refusal (404) for one that there is not, and what
 // rendering throws.
-Answer MapTileAnswer(const Request& request, Service& service, const std::string& name,
+Answer MapTileAnswer(const Request& request, const Service& service, ServedRaster& raster,
                      const MapTile& tile, const MapLook& look);
 
 // The pixel of the finest level, counted in it, that stands in the middle of pixel (i, j) of a

@@ -33,6 +33,15 @@ double WeightOfType(std::string_view accepted, std::string_view type) {
 
 }  // namespace
 
+bool Names(std::string_view accepted, std::string_view type) {
+    for (const std::string_view part : Split(accepted, ',')) {
+        const std::size_t end = part.find(';');
+        if (SameWord(Trimmed(part.substr(0, end)), type))
+            return end == part.npos || WeightOf(part.substr(end + 1)) > 0;
+    }
+    return false;
+}
+
 double WeightOf(std::string_view parameters) {
     for (const std::string_view part : Split(parameters, ';')) {
         const std::string_view text = Trimmed(part);

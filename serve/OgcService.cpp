@@ -134,10 +134,9 @@ Answer Sets(const Request& request, Service& service) {
 
 Answer Set(const Request& request, Service& service, const std::string& id) {
     if (id == kMercatorSet) return Document(request, DescribeSet(WebMercatorQuad()));
-    constexpr std::string_view kOwn = "own-";
-    if (!id.starts_with(kOwn)) throw Refusal(404, Quoted(id) + " is no set of tiles");
-    const ServedRasterPtr raster =
-        service.catalog.Raster(NameOfLayerId(std::string_view(id).substr(kOwn.size())));
+    const auto name = NameOfOwnSet(id);
+    if (!name) throw Refusal(404, Quoted(id) + " is no set of tiles");
+    const ServedRasterPtr raster = service.catalog.Raster(*name);
     Answer answer = Document(request, DescribeSet(OwnGrid(*raster)));
     raster->File().CheckUnchanged();
     return answer;
@@ -282,7 +281,7 @@ Answer TileOf(const Request& request, Service& service, const std::vector<std::s
     look.format = FormatOf(request);
     look.quality = QualityOf(request);
     look.resampling = ResamplingOf(request);
-    Answer answer = MapTileAnswer(request, service, name, tile, look);
+    Answer answer = MapTileAnswer(request, service, *service.catalog.Raster(name), tile, look);
     if (!request.Value("f")) answer.Set("Vary", "Accept");
     return answer;
 }

@@ -75,9 +75,13 @@ std::vector<std::uint32_t> BandsOf(const Request& request, std::uint32_t bands) 
     return list;
 }
 
+void CheckHasPixels(const ServedRaster& raster) {
+    if (raster.Levels() == 0) throw Refusal(404, "the raster has no pixels");
+}
+
 std::uint32_t LevelOf(const Request& request, const ServedRaster& raster) {
     const auto given = request.Count("level", 0xffffffffu);
-    if (raster.Levels() == 0) throw Refusal(404, "the raster has no pixels");
+    CheckHasPixels(raster);
     const std::uint64_t level = given ? *given : raster.FinestLevel();
     if (level < raster.FinestLevel() || level > raster.CoarsestLevel())
         throw Refusal(404, "there is no such level: they are " +

@@ -31,6 +31,9 @@ zmchost::Window WindowOf(const Request& request, std::uint32_t width, std::uint3
 // "3,1" counted from 1, as bands from 0; all where nothing is given. Any number, also of the same.
 std::vector<std::uint32_t> BandsOf(const Request& request, std::uint32_t bands);
 
+// Throws Refusal (404) where the raster has no pixels.
+void CheckHasPixels(const ServedRaster& raster);
+
 // The level that "level" names, or the finest. Throws Refusal (404) where there is no such, or none
 // has a pixel.
 std::uint32_t LevelOf(const Request& request, const ServedRaster& raster);

@@ -143,10 +143,6 @@ std::uint32_t TileSideOf(const Service& service, const ServedRaster& raster) {
     return side;
 }
 
-void CheckHasPixels(const ServedRaster& raster) {
-    if (raster.Levels() == 0) throw Refusal(404, "the raster has no pixels");
-}
-
 Answer CodedAnswer(const zmcrender::Picture& picture, zmcrender::PictureFormat format,
                    int quality) try {
     Answer answer;

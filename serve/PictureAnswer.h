@@ -56,9 +56,6 @@ zmcrender::Picture RenderPart(const Service& service, ServedRaster& raster,
 // picture of one is within the limits.
 std::uint32_t TileSideOf(const Service& service, const ServedRaster& raster);
 
-// Throws Refusal (404) where the raster has no pixels.
-void CheckHasPixels(const ServedRaster& raster);
-
 // The coded picture as an answer without validators.
 Answer CodedAnswer(const zmcrender::Picture& picture, zmcrender::PictureFormat format, int quality);
 

@@ -23,7 +23,7 @@ Json PlaceOf(ServedRaster::Reader& reader) {
     return zmcdescribe::DescribePlace(dataset);
 }
 
-// A document in the making holds sixteen bytes for a count and some hundred for a colour.
+// Of one document. In the making each is many times as large as in the file.
 constexpr std::uint64_t kMostValues = 1 << 20;
 
 void CheckValues(std::uint64_t values) {

@@ -138,8 +138,8 @@ Json FormatsOf(const std::string& tiles, const std::string& style) {
         list.push_back(
             {{"format", ending}, {"type", type}, {"tiles", Json::array({tiles + ending + query})}});
     };
-    for (const char* const ending : {"jpg", "png", "webp"})
-        add(ending, zmcrender::MediaType(*zmcrender::PictureFormatOfName(ending)), style);
+    for (const PictureFormat format : zmcrender::kPictureFormats)
+        add(zmcrender::EndingOf(format), zmcrender::MediaType(format), style);
     for (const char* const ending : {"raw", "npy"})
         add(ending, MediaType(*SampleFormatOfName(ending)), "");
     return list;

@@ -14,10 +14,9 @@ namespace {
 
 using Attributes = std::initializer_list<std::pair<const char*, std::string>>;
 
-constexpr std::pair<zmcrender::PictureFormat, const char*> kEndings[] = {
-    {zmcrender::PictureFormat::Png, "png"},
-    {zmcrender::PictureFormat::Jpeg, "jpg"},
-    {zmcrender::PictureFormat::WebP, "webp"}};
+// The first is the usual one.
+constexpr zmcrender::PictureFormat kOrder[] = {
+    zmcrender::PictureFormat::Png, zmcrender::PictureFormat::Jpeg, zmcrender::PictureFormat::WebP};
 
 // The shortest text that reads as the same number.
 std::string Number(double value) {
@@ -118,10 +117,11 @@ std::string Resources(const std::string& baseUrl, const Layer& layer, const std:
     const std::string tile = baseUrl + "/wmts/1.0.0/" + layer.id +
                              "/{Style}/{TileMatrixSet}/{TileMatrix}/{TileRow}/{TileCol}";
     std::string text;
-    for (const auto& [format, ending] : kEndings)
-        text += Empty("ResourceURL", {{"format", zmcrender::MediaType(format)},
-                                      {"resourceType", "tile"},
-                                      {"template", tile + '.' + ending + look}});
+    for (const zmcrender::PictureFormat format : kOrder)
+        text +=
+            Empty("ResourceURL", {{"format", zmcrender::MediaType(format)},
+                                  {"resourceType", "tile"},
+                                  {"template", tile + '.' + zmcrender::EndingOf(format) + look}});
     text += Empty("ResourceURL", {{"format", kInfoFormats[0]},
                                   {"resourceType", "FeatureInfo"},
                                   {"template", tile + "/{J}/{I}.json"}});
@@ -135,7 +135,7 @@ std::string LayerText(const std::string& baseUrl, const Layer& layer, const std:
         Element("ows:Title", layer.name) + DegreesOf(layer) + Element("ows:Identifier", layer.id) +
         BoxOf("ows:BoundingBox", layer.corners[0], layer.corners[1], layer.own.system.name) +
         Around("Style", Element("ows:Identifier", kWmtsStyle), {{"isDefault", "true"}});
-    for (const auto& [format, ending] : kEndings)
+    for (const zmcrender::PictureFormat format : kOrder)
         text += Element("Format", zmcrender::MediaType(format));
     for (const char* const format : kInfoFormats) text += Element("InfoFormat", format);
     text += LinkTo(layer.own, layer.ownLimits);

@@ -129,7 +129,7 @@ Answer GetTile(const Request& request, Service& service, const TileWords& words,
     look.quality = QualityOf(request);
     look.resampling = ResamplingOf(request);
     try {
-        return MapTileAnswer(request, service, raster->Name(), tile, look);
+        return MapTileAnswer(request, service, *raster, tile, look);
     } catch (const Refusal& refusal) {
         if (refusal.Status() == 404) ThrowOutOfRange(words, refusal);
         throw;
