@@ -70,7 +70,7 @@ function(zmc_embed_viewer source)
     file(GLOB_RECURSE sources CONFIGURE_DEPENDS "${web}/src/*.ts" "${web}/viewer/src/*.ts")
     add_custom_command(OUTPUT "${source}"
         COMMAND "${web}/run-tests" page "${tools}" "${page}"
-        COMMAND ${write} "-DZMC_FOLDER=${page}/viewer/dist" -P "${ZMC_ROOT}/cmake/WritePages.cmake"
+        COMMAND ${write} "-DZMC_FOLDER=${page}/viewer/served" -P "${ZMC_ROOT}/cmake/WritePages.cmake"
         DEPENDS ${sources} ${writer} "${page}/tools.stamp" "${web}/run-tests"
                 "${web}/viewer/build.mjs" "${web}/viewer/index.html" "${web}/viewer/style.css"
                 "${ZMC_ROOT}/render/colormaps.txt"

@@ -128,6 +128,10 @@ RasterFacts FactsOf(const zmchost::Raster& raster) {
     return facts;
 }
 
+bool HasUsualPalette(const RasterFacts& facts, std::uint32_t band) {
+    return !facts.bands[band].palette.empty() && IsWholeType(facts.pixelType);
+}
+
 std::vector<std::uint32_t> UsualBands(const RasterFacts& facts) {
     const auto red = Meant(facts, BandMeaning::Red), green = Meant(facts, BandMeaning::Green),
                blue = Meant(facts, BandMeaning::Blue), alpha = Meant(facts, BandMeaning::Alpha);
@@ -137,7 +141,7 @@ std::vector<std::uint32_t> UsualBands(const RasterFacts& facts) {
         return bands;
     }
     if (facts.bands.size() == 2 && alpha == 2u) return {1, 2};
-    if (facts.bands.size() >= 3 && facts.bands[0].palette.empty()) return {1, 2, 3};
+    if (facts.bands.size() >= 3 && !HasUsualPalette(facts, 0)) return {1, 2, 3};
     return {1};
 }
 

@@ -51,10 +51,14 @@ struct RasterFacts {
 // a malformed document tells nothing.
 RasterFacts FactsOf(const zmchost::Raster& raster);
 
+// Whether a band is shown in its palette where the style does not say so: where it has one and the
+// samples are integers. Others are values and no indices, even if the file archives colours.
+bool HasUsualPalette(const RasterFacts& facts, std::uint32_t band);
+
 // The bands that a picture shows where the style names none, counted from 1: red, green, blue and
 // alpha by their meanings where the raster has the three colours; grey and alpha of a raster of two
-// bands of which the second is alpha; else 1,2,3 of three bands or more of which the first has no
-// palette; else 1.
+// bands of which the second is alpha; else 1,2,3 of three bands or more of which the first is not
+// shown in a palette; else 1.
 std::vector<std::uint32_t> UsualBands(const RasterFacts& facts);
 
 // The value below which `percent` per cent of the counted samples lie. With target = percent times

@@ -114,12 +114,13 @@ private:
     }
 
     bool ShowsPalette(const RasterFacts& facts) const {
-        const bool has = !facts.bands[colourBands[0]].palette.empty();
-        if (style.colormap == "palette" && !has)
+        const std::uint32_t band = colourBands[0];
+        const bool wanted = style.colormap == "palette";
+        if (wanted && facts.bands[band].palette.empty())
             throw StyleError("colormap", "the band has no palette");
-        return style.colormap == "palette" ||
-               (style.colormap.empty() && has && colourBands.size() == 1 &&
-                style.stretch.kind == Stretch::Kind::Auto);
+        return wanted ||
+               (style.colormap.empty() && colourBands.size() == 1 &&
+                style.stretch.kind == Stretch::Kind::Auto && HasUsualPalette(facts, band));
     }
 
     void SettleBounds(const RasterFacts& facts, PixelSource& source) {

@@ -16,7 +16,8 @@
 //                 "none": 0 to 255, or to 65535 in pictures of 16 bits
 //     gamma       0.01 to 100, default 1: t becomes t^(1/gamma)
 //     colormap    a name of colormaps.txt, "-NAME" for it reversed, or "palette" for the file's own
-//                 (default of a single band that has one, where no stretch is given). For one band
+//                 (default of a single band of integers that has one, where no stretch is given).
+//                 For one band
 //     nodata      "auto" (default): the no-data values of the raster are transparent; "none": they
 //                 are not; a number: it is, in all bands, in place of the raster's
 //     expression  arithmetic of bands: "(b4-b3)/(b4+b3)" (Expression.h). It takes the place of

@@ -12,7 +12,8 @@ namespace {
 // What scripts of pages from elsewhere may see, beside what every page may.
 constexpr const char* kExposed =
     "Accept-Ranges, Content-Encoding, Content-Length, Content-Range, ETag, Link, Retry-After, "
-    "X-Raster-Bands, X-Raster-Height, X-Raster-Order, X-Raster-Type, X-Raster-Width";
+    "X-Picture-Place, X-Raster-Bands, X-Raster-Height, X-Raster-Order, X-Raster-Type, "
+    "X-Raster-Width";
 
 void AddCommonHeaders(Answer& answer) {
     answer.Set("Access-Control-Allow-Origin", "*");

@@ -13,6 +13,7 @@ std::vector<Route> TileRoutes();      // tiles in the raster's own grid
 std::vector<Route> OgcRoutes();       // OGC API - Tiles
 std::vector<Route> WmtsRoutes();      // WMTS
 std::vector<Route> PictureRoutes();   // previews
+std::vector<Route> ViewRoutes();      // what a screen shows
 std::vector<Route> ValueRoutes();     // points, profiles, windows of samples
 std::vector<Route> RecordRoutes();    // what a file tells: info, statistics, histograms
 std::vector<Route> ServerRoutes();    // the server itself: api, health, metrics
@@ -27,6 +28,7 @@ inline constexpr std::vector<Route> (*kServices[])() = {
     OgcRoutes,
     WmtsRoutes,
     PictureRoutes,
+    ViewRoutes,
     ValueRoutes,
     RecordRoutes,
     ServerRoutes,

@@ -3,7 +3,8 @@
 //     node first_picture.mjs NODE_MODULES < JSON
 //
 // { pages: [{ name, url, kind, raster }], rounds, chromium, width, height, screenshots }: `kind` tells how a page says
-// that it is done, `raster` what stands in the addresses of requests for pixels. Rounds go through all pages in turns,
+// that it is done ("viewer" says both when the server's picture of the whole view is on the screen, and when the samples
+// themselves have taken its place), `raster` what stands in the addresses of requests for pixels. Rounds go through all pages in turns,
 // each in a browser of its own. The last page of kind "viewer" tells how long a change of style takes too.
 import { createRequire } from "node:module";
 import { readFileSync } from "node:fs";
@@ -14,13 +15,41 @@ const { pages, rounds, chromium: executablePath, width, height, screenshots } = 
 // Software for what a graphics processor would do, for all alike.
 const args = ["--no-sandbox", "--use-gl=angle", "--use-angle=swiftshader", "--enable-unsafe-swiftshader"];
 
-// In the page, before anything of its own: `done` is the moment after the last part of the view was drawn, and one
-// more frame has been made, so that the picture is on the screen.
+// In the page, before anything of its own: `done` is the moment after the last part of the view was drawn, and two more
+// frames have been made, so that the picture is on the screen; `first` the same of a picture of the whole view that
+// was there before, in the resolution of what is drawn then, if there was one.
 function watch(kind) {
   const whole = new Promise((resolve) => {
     globalThis.whole = resolve;
   });
   const frame = () => new Promise((resolve) => requestAnimationFrame(resolve));
+  const early = async () => {
+    for (;;) {
+      const image = document.getElementById("first-picture");
+      if (image) return image;
+      if (globalThis.drawn) return undefined;
+      await new Promise((resolve) => setTimeout(resolve, 2));
+    }
+  };
+  globalThis.first =
+    kind === "viewer" &&
+    early().then(async (image) => {
+      if (!image) return undefined;
+      await frame();
+      await frame();
+      const { width, height } = image.getBoundingClientRect();
+      const by = devicePixelRatio;
+      // Those of the level that the samples are drawn from, which is the nearest in size to the pixels of the screen.
+      if (image.naturalWidth < 0.7 * width * by || image.naturalHeight < 0.7 * height * by)
+        throw new Error("the first picture has not the resolution of the screen");
+      const milliseconds = performance.now();
+      // What the browser itself tells, which is later where it is not done with the frame.
+      const presented = await new Promise((resolve) => {
+        new PerformanceObserver((list) => resolve(list.getEntries()[0].renderTime)).observe({ type: "element", buffered: true });
+        setTimeout(resolve, 5000);
+      });
+      return { milliseconds, presented, width: image.naturalWidth, height: image.naturalHeight };
+    });
   globalThis.done = (async () => {
     if (kind === "viewer") {
       while (!globalThis.viewer) await new Promise((resolve) => setTimeout(resolve, 2));
@@ -28,6 +57,7 @@ function watch(kind) {
     } else await whole;
     await frame();
     await frame();
+    globalThis.drawn = true;
     return performance.now();
   })();
 }
@@ -53,10 +83,10 @@ const restyle = () => {
   const viewer = globalThis.viewer;
   const [side] = viewer.sides;
   const before = side.style;
-  const time = (style) => {
+  const time = (style, grain) => {
     const start = performance.now();
     side.style = style;
-    viewer.time();
+    viewer.time(grain);
     return performance.now() - start;
   };
   const stretched = (i) => ({
@@ -72,6 +102,10 @@ const restyle = () => {
   const turns = Array.from({ length: 30 }, (_, i) => i);
   for (const i of [0, 1, 2]) time(mapped(i));
   const result = { stretch: turns.map((i) => time(stretched(i))), colours: turns.map((i) => time(mapped(i))) };
+  // As while a handle is dragged, where all pixels take longer than a frame: every second one of a line, every second line.
+  time(stretched(0), 2);
+  result["stretch, while a handle moves"] = turns.map((i) => time(stretched(i), 2));
+  result["colours, while a handle moves"] = turns.map((i) => time(mapped(i), 2));
   side.style = before;
   const { width, height } = viewer.picture();
   return { ...result, width, height };
@@ -90,7 +124,8 @@ async function visit({ name, url, kind, raster }, last) {
     const late = new Promise((_, reject) =>
       setTimeout(() => reject(new Error(`${name}: no picture after a minute; ${problems}`)), 60000).unref(),
     );
-    const milliseconds = await Promise.race([page.evaluate("globalThis.done"), late]);
+    const drawn = await Promise.race([page.evaluate("globalThis.done"), late]);
+    const first = await page.evaluate("globalThis.first");
     const before = [...seen];
     if (problems.length) throw new Error(`${name}: ${problems[0]}`);
     await page.waitForTimeout(50); // sizes are told a little later
@@ -98,7 +133,9 @@ async function visit({ name, url, kind, raster }, last) {
     const bytes = (list) => list.reduce((sum, each) => sum + each.bytes, 0);
     const result = {
       name,
-      milliseconds,
+      milliseconds: first?.milliseconds ?? drawn,
+      drawn,
+      first,
       requests: before.length,
       bytes: bytes(before),
       rasterRequests: ofRaster.length,

@@ -32,7 +32,7 @@ def check_page(url):
 def check_viewer(url):
     text, page = check_page(url)
     names = sorted(path.name for path in DIST.iterdir())
-    assert names == ["index.html", "viewer.css", "viewer.js"], names
+    assert names == ["first.js", "index.html", "viewer.css", "viewer.js"], names
     assert 'src="viewer.js"' in text and 'href="viewer.css"' in text
     for name in names:
         assert get(url + name)[0] == (DIST / name).read_bytes(), name

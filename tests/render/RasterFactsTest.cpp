@@ -133,6 +133,8 @@ TEST(UsualBands, GoByTheMeaningsOfTheBands) {
     RasterFacts facts = WithMeanings({Palette, Unknown, Unknown});
     facts.bands[0].palette.push_back({1, 2, 3, 255});
     EXPECT_EQ(UsualBands(facts), (Numbers{1}));
+    facts.pixelType = zelm::PixelTypeCode::Single;
+    EXPECT_EQ(UsualBands(facts), (Numbers{1, 2, 3}));
 }
 
 TEST(PercentileOf, OfBinsOfOneValueIsTheValueBelowWhichThatManyLie) {

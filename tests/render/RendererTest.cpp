@@ -191,13 +191,24 @@ TEST(Renderer, APaletteIsShownUnlessAStretchOrAnotherMapIsAskedFor) {
     EXPECT_EQ(Rendered(source, facts, {}).bytes[7], 0);
 }
 
-TEST(Renderer, APaletteGoesByWholeValuesOfEveryType) {
+TEST(Renderer, APaletteThatIsAskedForGoesByWholeValuesOfEveryType) {
     MemoryPixels<double> source(5, 1, 1, {1, 0.5, -1, 2, std::nan("")});
     RasterFacts facts = source.Facts();
     facts.bands[0].palette = {{1, 1, 1, 255}, {9, 8, 7, 255}};
-    const Picture picture = Rendered(source, facts, {});
+    const Picture picture = Rendered(source, facts, Styled({{"colormap", "palette"}}));
     EXPECT_EQ(Bytes(picture.bytes.begin(), picture.bytes.begin() + 4), (Bytes{9, 8, 7, 255}));
     for (std::size_t i = 1; i < 5; ++i) EXPECT_EQ(picture.bytes[4 * i + 3], 0) << i;
+}
+
+TEST(Renderer, RealsAndComplexSamplesAreStretchedUnlessTheirPaletteIsAskedFor) {
+    MemoryPixels<float> heights(3, 1, 1, {-10.5f, 0.25f, 11});
+    RasterFacts facts = heights.Facts();
+    facts.bands[0].palette = {{1, 1, 1, 255}, {9, 8, 7, 255}};
+    EXPECT_EQ(Rendered(heights, facts, {}).bytes, (Bytes{0, 128, 255}));
+    MemoryPixels<zelm::Complex<float>> waves(2, 1, 1, {{0, 0}, {3, 4}});
+    facts = waves.Facts();
+    facts.bands[0].palette = {{1, 1, 1, 255}, {9, 8, 7, 255}};
+    EXPECT_EQ(Rendered(waves, facts, {}).bytes, (Bytes{0, 255}));
 }
 
 HistogramFacts Ramp(Number minimum, Number maximum, double binSize, std::size_t bins) {

@@ -245,6 +245,75 @@ TEST_F(ServicesTest, PreviewsHaveTheSizeThatIsAskedFor) {
     EXPECT_EQ(Status("/preview/a.pyr"), 404);
 }
 
+TEST_F(ServicesTest, APictureOfAScreenLiesWhereTheScreenShowsTheRaster) {
+    const auto place = [&](const std::string& query) {
+        return std::string(Ask("/view/a.pyr" + query).Header("X-Picture-Place"));
+    };
+    // The whole raster fills 94 per cent of the narrower side, here at 0.47 pixels for each of its.
+    EXPECT_EQ(place("?screen=150,150"), "5,28,141,94");
+    EXPECT_EQ(place("?screen=600,400"), "18,12,564,376");
+    EXPECT_EQ(place("?screen=100,80&at=0,0&zoom=0.5"), "50,40,50,40");
+    EXPECT_EQ(place("?screen=100,80&at=300,200&zoom=0.5"), "0,0,50,40");
+    EXPECT_EQ(place("?screen=10,10&at=150,100&zoom=1"), "0,0,10,10");
+    // From farther away than the coarsest level.
+    EXPECT_EQ(place("?screen=100,80&at=150,100&zoom=0.21"), "19,19,63,42");
+    // Whole pixels, which reach beyond the screen.
+    EXPECT_EQ(place("?screen=10,10&at=20.5,20.5&zoom=4"), "-1,-1,12,12");
+    EXPECT_EQ(Status("/view/a.pyr?screen=10,10&at=-100,20&zoom=1"), 404);
+    EXPECT_EQ(Status("/view/b.pyr?screen=10,10"), 404);
+}
+
+TEST_F(ServicesTest, APictureOfAScreenIsThePreviewOfItsPart) {
+    const auto same = [&](const std::string& query, const std::string& preview) {
+        EXPECT_EQ(Ask("/view/a.pyr?" + query).Text(), Ask("/preview/a.pyr.jpg?" + preview).Text())
+            << query;
+    };
+    same("screen=100,80&at=0,0&zoom=0.5", "window=0,0,100,80&size=50");
+    same("screen=100,80&at=150,100&zoom=0.21", "size=63");
+    same("screen=600,400", "size=300");
+    same("screen=10,10&at=20.5,20.5&zoom=4", "window=19,19,3,3&size=3");
+    same("screen=100,80&at=0,0&zoom=0.5&bands=2&stretch=10,90&gamma=2&quality=40",
+         "window=0,0,100,80&size=50&bands=2&stretch=10,90&gamma=2&quality=40");
+}
+
+TEST_F(ServicesTest, APictureOfAScreenHasAFormatThatKeepsWhatIsInIt) {
+    EXPECT_EQ(Ask("/view/a.pyr?screen=90,90").type, "image/jpeg");
+    EXPECT_EQ(Ask("/view/a.pyr?screen=600,400&bands=1&nodata=7").type, "image/webp");
+    zmctest::MemorySource<unsigned char> indices(20, 10, 1);
+    zmchost::PyramidBuilder(zmctest::TestModule()).Build(indices, folder / "i.pyr");
+    {
+        auto raster =
+            zmchost::Raster::Open(zmctest::TestModule(), folder / "i.pyr", zmchost::Access::Update);
+        zelm::Palette palette;
+        zelm::Color colour;
+        colour.red = 10, colour.green = 20, colour.blue = 30, colour.alpha = 255, colour.isNull = 0;
+        palette.AddColor(colour);
+        raster.SetBandPalette(0, palette);
+    }
+    EXPECT_EQ(Ask("/view/i.pyr?screen=90,90").type, "image/png");
+    EXPECT_EQ(Ask("/view/i.pyr?screen=90,90&stretch=0,9").type, "image/jpeg");
+}
+
+TEST_F(ServicesTest, AScreenThatIsNoneIsRefused) {
+    for (const char* const query :
+         {"", "?screen=5", "?screen=0,5", "?screen=5,-1", "?screen=1.5,5", "?screen=9000,5",
+          "?screen=5,5&at=1,1", "?screen=5,5&zoom=1", "?screen=5,5&at=1&zoom=1",
+          "?screen=5,5&at=1,1&zoom=0", "?screen=5,5&at=1,1&zoom=129", "?screen=5,5&at=1,nan&zoom=1",
+          "?screen=5,5&colour=red", "?screen=5,5&bands=4", "?screen=5,5&quality=0"})
+        EXPECT_EQ(Status(std::string("/view/a.pyr") + query), 400) << query;
+    limits.pixels = 100;
+    Serve();
+    EXPECT_EQ(Status("/view/a.pyr?screen=10,10"), 200);
+    EXPECT_EQ(Status("/view/a.pyr?screen=10,11"), 400);
+}
+
+TEST_F(ServicesTest, APictureOfAScreenIsKeptByItsTag) {
+    const std::string tag(Ask("/view/a.pyr?screen=90,90").Header("ETag"));
+    EXPECT_EQ(Status("/view/a.pyr?screen=90,90", {{"If-None-Match", tag}}), 304);
+    EXPECT_NE(Ask("/api").Header("Access-Control-Expose-Headers").find("X-Picture-Place"),
+              std::string::npos);
+}
+
 TEST_F(ServicesTest, APointHasItsExactValues) {
     const Json point = Document("/point/a.pyr?x=299&y=199");
     for (std::size_t band = 0; band < 3; ++band)
@@ -377,7 +446,7 @@ TEST_F(ServicesTest, TheRootIsTheViewerOrSaysThatThereIsNone) {
         EXPECT_NE(page.find("/preview/a.pyr.png"), std::string::npos);
         return;
     }
-    for (const std::string file : {"viewer.js", "viewer.css"}) {
+    for (const std::string file : {"first.js", "viewer.js", "viewer.css"}) {
         EXPECT_NE(page.find('"' + file + '"'), std::string::npos);
         const Answer part = Ask("/" + file);
         EXPECT_EQ(part.status, 200);

@@ -137,7 +137,8 @@ class AbuseTest(unittest.TestCase):
                  b"..%0d%0a", b".", b"%2e", b"")
         slashes = (b"/", b"%2f", b"%2F", b"%5c", b"\\", b"%252f", b"%c0%af", b"//", b"/./")
         for service, end in ((b"files", b""), (b"info", b""), (b"tiles", b"/0/0/0.raw"),
-                             (b"preview", b".png"), (b"window", b".npy"), (b"point", b"")):
+                             (b"preview", b".png"), (b"window", b".npy"), (b"point", b""),
+                             (b"view", b"")):
             for up in above:
                 for slash in slashes:
                     for front in (b"", b"sub" + slash + up + slash):
@@ -221,7 +222,9 @@ class AbuseTest(unittest.TestCase):
                            b"/window/a.pyr.raw?window=0,0,%s,9", b"/window/a.pyr.raw?bands=%s",
                            b"/window/a.pyr.raw?window=0,0,1,1&level=%s", b"/point/a.pyr?x=%s&y=0",
                            b"/histogram/a.pyr?band=%s", b"/profile/a.pyr?line=0,0,%s",
-                           b"/profile/a.pyr?line=0,0,9,9&samples=%s"):
+                           b"/profile/a.pyr?line=0,0,9,9&samples=%s",
+                           b"/view/a.pyr?screen=%s,9", b"/view/a.pyr?screen=9,9&at=%s,1&zoom=1",
+                           b"/view/a.pyr?screen=9,9&at=1,1&zoom=%s"):
                 answer = self.get(target % number)
                 self.assertIsNotNone(answer, target % number)
                 if answer.status != 200:

@@ -10,7 +10,7 @@ import type { Level, Pixels, Pyramid } from "./index.js";
 
 /** How samples become colours. */
 export interface PictureOptions {
-  /** One band, shown in grey or by its palette, or three: red, green and blue. The first three by default, or the first. */
+  /** One band, shown in grey or, of integers, by its palette, or three: red, green and blue. The first three by default, or the first. */
   bands?: readonly number[];
   /** The values that are black and full; by default 0 and 255 for `Byte`, else the ends that the file's statistics tell. */
   range?: readonly [number, number];
@@ -90,7 +90,11 @@ export async function createTileSource(
   return new PyramidTileSource({ width, height, tileSize, minLevel: 0, maxLevel: levels.length - 1 });
 }
 
-async function lookOf(pyramid: Pyramid, options: PictureOptions): Promise<Look> {
+// Reals are values and no places in a palette, even if the file archives colours.
+const INDICES: readonly string[] = ["Byte", "Char", "UInt16", "Int16", "UInt32", "Int32", "UInt64", "Int64"];
+
+/** What the options come to for a pyramid. */
+export async function lookOf(pyramid: Pyramid, options: PictureOptions): Promise<Look> {
   const { bands: count, pixelType } = pyramid.header;
   const bands = options.bands ?? (count >= 3 ? [0, 1, 2] : [0]);
   const wrong = bands.find((band) => !(Number.isInteger(band) && band >= 0 && band < count));
@@ -106,7 +110,8 @@ async function lookOf(pyramid: Pyramid, options: PictureOptions): Promise<Look> 
       throw new RangeError(`the file tells no range of the values of band ${band}: one has to be given`);
     return [Number(minimum), Number(maximum)];
   });
-  const palette = bands.length === 1 && !range ? metadata?.palette(bands[0] as number) : undefined;
+  const isIndexed = bands.length === 1 && !range && INDICES.includes(pixelType);
+  const palette = isIndexed ? metadata?.palette(bands[0] as number) : undefined;
   return { bands, ranges, palette, noData };
 }
 

@@ -9,7 +9,7 @@ import type DataTileSource from "ol/source/DataTile.js";
 import TileState from "ol/TileState.js";
 import { Pyramid } from "zmcraster-web";
 import { createSource } from "zmcraster-web/openlayers";
-import { createTileSource, toRgba } from "zmcraster-web/openseadragon";
+import { createTileSource, lookOf, toRgba } from "zmcraster-web/openseadragon";
 
 import { headerOf, Pyramids } from "./support/pyramids.js";
 
@@ -109,6 +109,21 @@ test("a picture of a palette has its colors", async () => {
   const out = toRgba(pixels, { bands: [0], ranges: [[0, 255]], palette, noData: undefined });
   for (const [i, value] of pixels.data.entries())
     assert.deepEqual([...out.subarray(i * 4, i * 4 + 4)], [value, 1, 2, 255]);
+});
+
+test("a palette is for integers, and not for reals beside which the file has colours", async () => {
+  const known = await Pyramid.open(pyramids.bytes("colored"));
+  const metadata = await known.metadata();
+  const of = async (pixelType: string): Promise<Uint8Array | undefined> => {
+    const records = {
+      statistics: () => ({ minimum: 0, maximum: 1 }),
+      palette: (band: number) => metadata.palette(band),
+    };
+    const pyramid = { header: { bands: 1, pixelType }, metadata: () => Promise.resolve(records) };
+    return (await lookOf(pyramid as never, {})).palette;
+  };
+  for (const type of ["Byte", "Char", "Int16", "UInt64"]) assert.deepEqual(await of(type), metadata.palette(0));
+  for (const type of ["Single", "Double", "ComplexSingle", "ComplexDouble"]) assert.equal(await of(type), undefined);
 });
 
 test("OpenSeadragon gets no source of what cannot be shown", async () => {

@@ -1,5 +1,6 @@
-// Makes the viewer twice: viewer/dist/, a page with a script and a style, for servers; and viewer/single.html, the same in
-// one file, which can be opened from a disk too. A policy lets the browser run these and nothing else. With --tests,
+// Makes the viewer three times: viewer/dist/, a page with a script and a style, for servers; viewer/served/, the same with
+// a script for the first picture, for the program's own server, which makes it; and viewer/single.html, all in one
+// file, which can be opened from a disk too. A policy lets the browser run these and nothing else. With --tests,
 // the tests in build/viewer too. Started from the folder above.
 import { build } from "esbuild";
 import { createHash } from "node:crypto";
@@ -16,6 +17,7 @@ const made = async (entry, options) => {
 const hash = (text) => `'sha256-${createHash("sha256").update(text).digest("base64")}'`;
 
 const script = await made("viewer/src/main.ts", { format: "iife" });
+const first = await made("viewer/src/first.ts", { format: "iife" });
 const style = await made("viewer/style.css", {});
 const policyOf = (script, style) =>
   [
@@ -35,27 +37,28 @@ const licence = ["proj4/LICENSE.md", "mgrs/license.md", "wkt-parser/LICENSE.md"]
   .map((name) => readFileSync(`node_modules/${name}`, "utf8").trim())
   .join("\n\n");
 
-const page = (policy, styleElement, scriptElement) =>
+const page = (policy, styleElement, firstElement, scriptElement) =>
   readFileSync("viewer/index.html", "utf8")
     .replace("{policy}", () => policy)
     .replace("<!-- style -->", () => styleElement)
+    .replace(/ *<!-- first -->\n/, () => firstElement)
     .replace("<!-- script -->", () => scriptElement)
     .concat(`<!--\n${licence}\n-->\n`);
-rmSync("viewer/dist", { recursive: true, force: true });
-mkdirSync("viewer/dist");
-writeFileSync("viewer/dist/viewer.js", script);
-writeFileSync("viewer/dist/viewer.css", style);
-writeFileSync(
-  "viewer/dist/index.html",
-  page(
-    policyOf("'self'", "'self'"),
-    '<link rel="stylesheet" href="viewer.css" />',
-    '<script src="viewer.js"></script>',
-  ),
-);
+for (const [folder, own] of [
+  ["viewer/dist", {}],
+  ["viewer/served", { "first.js": first }],
+]) {
+  rmSync(folder, { recursive: true, force: true });
+  mkdirSync(folder);
+  const firstElement = Object.keys(own).map((name) => `    <script src="${name}"></script>\n`);
+  const link = '<link rel="stylesheet" href="viewer.css" />';
+  const whole = page(policyOf("'self'", "'self'"), link, firstElement.join(""), '<script src="viewer.js"></script>');
+  for (const [name, text] of Object.entries({ "index.html": whole, "viewer.js": script, "viewer.css": style, ...own }))
+    writeFileSync(`${folder}/${name}`, text);
+}
 writeFileSync(
   "viewer/single.html",
-  page(policyOf(hash(script), hash(style)), `<style>${style}</style>`, `<script>${script}</script>`),
+  page(policyOf(hash(script), hash(style)), `<style>${style}</style>`, "", `<script>${script}</script>`),
 );
 
 if (process.argv.includes("--tests")) {

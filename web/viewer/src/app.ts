@@ -4,10 +4,12 @@ import { aligned, levelFor, type Placement, toPixel } from "./camera.js";
 import { type Point } from "./coordinates.js";
 import { byId, h } from "./dom.js";
 import { type Gestures, listen } from "./gestures.js";
-import { type Line, readLink, type State, writeLink } from "./link.js";
+import type { FirstPicture } from "./first.js";
+import { asked, type Line, readLink, type State, writeLink } from "./link.js";
 import { Notices } from "./notices.js";
 import { chosen, opener } from "./opener.js";
 import { listenToSplit, Overlay } from "./overlay.js";
+import { Pace } from "./pace.js";
 import { showPanel } from "./panel.js";
 import { ProfileCard } from "./profilecard.js";
 import { type Origin, originOf } from "./raster.js";
@@ -36,6 +38,7 @@ export class App implements Gestures {
   private readonly address = new Address(() =>
     this.sides.length && !this.viewport.moving ? writeLink(this.state()) : undefined,
   );
+  private readonly pace = new Pace(() => this.draw());
   private readonly start = new Start((origin) => void this.open(origin));
   private swipe: number | undefined;
   private line: Line | undefined;
@@ -46,8 +49,18 @@ export class App implements Gestures {
   private stale = false; // the picture itself, not only what lies over it
   private saidTimer = 0;
 
-  constructor() {
+  /** Settles once the graphics processor is started; rejects where there is none. */
+  readonly begun: Promise<WebGL2RenderingContext>;
+
+  /**
+   * @param first What the server made of the first view, which is on the screen or will not be.
+   * @throws Error where the browser has no WebGL 2, and there is no first picture to be waited for.
+   */
+  constructor(private first?: FirstPicture) {
     this.renderer = new Renderer(byId<HTMLCanvasElement>("picture"));
+    this.begun = first
+      ? first.over.then(breath).then(() => this.startDrawing())
+      : Promise.resolve(this.renderer.begin());
     this.viewport = new Viewport(
       () => this.sides[0]?.raster,
       () => this.renderer.size,
@@ -59,15 +72,8 @@ export class App implements Gestures {
       (text) => this.notices.note(text),
     );
     this.listen();
-    void this.apply(this.asked());
-  }
-
-  // What the address says: the state behind the #, or a file behind the ?.
-  private asked(): State {
-    const state = readLink(location.hash);
-    const file = new URLSearchParams(location.search).get("file");
-    if (!state.sides.length && file) state.sides.push({ file, style: {} });
-    return state;
+    if (first) this.cover();
+    void this.apply(asked());
   }
 
   private listen(): void {
@@ -89,6 +95,22 @@ export class App implements Gestures {
     this.map.addEventListener("blur", () => this.keyboard(false));
     this.listenToButtons();
     this.listenToDrops();
+  }
+
+  private startDrawing(): WebGL2RenderingContext {
+    if (this.first && !this.first.image) this.uncover();
+    return this.renderer.begin();
+  }
+
+  // Until the view is drawn, its first picture is all that is seen: what comes piece by piece would be less. Whoever
+  // moves something sees the samples at once.
+  private cover(): void {
+    this.renderer.canvas.style.visibility = "hidden";
+    const end = (): void => {
+      if (this.first) this.uncover();
+    };
+    for (const kind of ["pointerdown", "wheel", "keydown", "popstate", "drop"])
+      addEventListener(kind, end, { capture: true, once: true, passive: true });
   }
 
   private listenToButtons(): void {
@@ -175,7 +197,7 @@ export class App implements Gestures {
   private newSide(origin: Origin): Side {
     return new Side(
       origin,
-      this.renderer.gl,
+      this.begun,
       () => this.draw(),
       () => {
         this.readout.forget();
@@ -190,6 +212,7 @@ export class App implements Gestures {
       side.error = new Error(`The link shows "${name}", a file on somebody's own disk. Choose it again to see it.`);
     else if (url !== undefined && !URL.canParse(url, document.baseURI)) side.error = new Error("This is no address.");
     else await side.open(style, known?.raster, known);
+    void side.known.then(() => this.first && this.refresh());
   }
 
   /** Opens a file on the side that is chosen, as it is usual for it. */
@@ -323,7 +346,10 @@ export class App implements Gestures {
 
   private async restyle(side: Side, style: Style, structure: boolean): Promise<void> {
     if (structure) await side.restyle(style);
-    else side.style = style;
+    else {
+      side.style = style;
+      this.pace.changed();
+    }
     if (structure) this.show();
     this.draw();
     this.remember(true);
@@ -367,6 +393,7 @@ export class App implements Gestures {
     const { width, height } = this.map.getBoundingClientRect();
     const size = { width: Math.round(width * devicePixelRatio), height: Math.round(height * devicePixelRatio) };
     const before = this.renderer.size;
+    if (this.first && JSON.stringify(size) !== JSON.stringify(this.first.screen)) this.uncover();
     const whole = !this.viewport.view || this.viewport.isFitting(before);
     this.renderer.resize(size);
     if (whole) this.viewport.fit();
@@ -406,8 +433,9 @@ export class App implements Gestures {
     requestAnimationFrame(() => {
       this.frameAsked = false;
       this.viewport.approach();
-      if (this.stale) this.frame();
+      if (this.stale) this.frame(this.pace.coarse ? 2 : 1);
       else this.showOverlay();
+      if (this.first && this.isWhole()) this.uncover();
       this.notices.show(this.sides);
     });
   }
@@ -420,12 +448,33 @@ export class App implements Gestures {
     return layers.filter((layer) => layer !== undefined && layer.to > layer.from) as Layer[];
   }
 
-  private frame(): void {
-    const { renderer } = this;
+  private frame(grain: 1 | 2 = 1): void {
+    const { renderer, pace } = this;
     const { placement } = this.viewport;
+    const start = performance.now();
     this.stale = false;
-    renderer.draw(placement ? this.layers() : [], placement ?? NOWHERE, !this.viewport.moving);
+    if (renderer.begun)
+      renderer.draw(placement ? this.layers() : [], placement ?? NOWHERE, !this.viewport.moving, grain);
+    if (grain === 1 && pace.matters) void renderer.done(start).then((milliseconds) => (pace.took = milliseconds));
     this.showOverlay();
+  }
+
+  // Whether all that belongs to the view is here: what a sidecar tells of colours, and the tiles, which are drawn then.
+  private isWhole(): boolean {
+    const { view } = this.viewport;
+    return this.sides.every(
+      ({ raster, store, error, complete }) =>
+        error !== undefined || (raster && view && complete && !store?.state.pending),
+    );
+  }
+
+  // The samples take the place of the first picture. It stays below them until they are on the screen.
+  private uncover(): void {
+    const { first } = this;
+    this.first = undefined;
+    this.renderer.canvas.style.visibility = "";
+    document.body.classList.remove("alone");
+    void shown().then(() => first?.end());
   }
 
   private showOverlay(): void {
@@ -607,6 +656,8 @@ export class App implements Gestures {
     const waits = (): boolean =>
       this.frameAsked ||
       this.viewport.moving ||
+      this.first !== undefined ||
+      this.pace.coarse ||
       this.sides.some(({ raster, error, store }) => (!raster && !error) || (store?.state.pending ?? 0) > 0);
     do await new Promise((resolve) => setTimeout(resolve, 10));
     while (waits());
@@ -618,14 +669,20 @@ export class App implements Gestures {
     return { ...this.renderer.size, pixels: this.renderer.pixels() };
   }
 
-  /** Milliseconds that a picture takes, until the graphics processor is done. */
-  time(): number {
+  /**
+   * Milliseconds that a picture takes, until the graphics processor is done: in all its pixels, or with a `grain` of 2 as
+   * while a handle is dragged where all take too long.
+   */
+  time(grain: 1 | 2 = 1): number {
     const start = performance.now();
-    this.frame();
+    this.frame(grain);
     this.renderer.finish();
     return performance.now() - start;
   }
 }
+
+// Once what was just asked for is on its way.
+const breath = (): Promise<void> => new Promise((resolve) => setTimeout(resolve));
 
 // Once what was drawn last is on the screen.
 const shown = async (): Promise<void> => {

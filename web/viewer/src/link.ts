@@ -61,6 +61,14 @@ export function writeLink({ sides, view, swipe, line, background }: State): stri
   return out.toString().replace(/%2C/g, ",").replace(/%2F/g, "/").replace(/%3A/g, ":").replace(/%3B/g, ";");
 }
 
+/** What the address of the page says: the state behind the #, or a file behind the ?. */
+export function asked(): State {
+  const state = readLink(location.hash);
+  const file = new URLSearchParams(location.search).get("file");
+  if (!state.sides.length && file) state.sides.push({ file, style: {} });
+  return state;
+}
+
 /** Numbers with commas between them, if they are as many as that. */
 function numbers(text: string | null, count: number): number[] | undefined {
   // A plus that was typed into an address comes as a blank.

@@ -68,7 +68,17 @@ export class Raster {
     const text = await this.sidecarText(signal).catch(() => undefined);
     if (!text || signal.aborted) return false;
     this.take(text);
+    await this.recount(signal).catch(() => {}); // what was counted stays
     return true;
+  }
+
+  // Values without data were counted before they were known to be such.
+  private async recount(signal: AbortSignal): Promise<void> {
+    for (const [key, { archived }] of this.distributions) {
+      const [band, part] = key.split(" ") as [string, Part | ""];
+      if (!archived && this.told(Number(band)).noData !== undefined)
+        this.distributions.set(key, await this.sample(Number(band), part || "magnitude", signal));
+    }
   }
 
   private async sidecarText(signal: AbortSignal): Promise<string | undefined> {
@@ -186,7 +196,8 @@ export class Raster {
     const rest = { ranges: {}, gamma: 1, noData: "file", part: "magnitude" as const, alpha: undefined };
     if (colors.every((band) => band >= 0))
       return { ...rest, bands: colors, colors: "grey", alpha: alpha < 0 ? undefined : alpha };
-    const palette = this.palette(0) !== undefined;
+    // Samples that are no integers are values and no indices, even if the file has colours.
+    const palette = !isReal(this.type) && this.palette(0) !== undefined;
     if (this.bands === 2 && alpha === 1) return { ...rest, bands: [0], colors: "grey", alpha };
     if (this.bands >= 3 && !palette) return { ...rest, bands: [0, 1, 2], colors: "grey" };
     return { ...rest, bands: [0], colors: palette ? "palette" : "grey" };

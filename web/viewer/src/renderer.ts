@@ -13,7 +13,8 @@ import { COLOR_MAPS } from "./colormaps.js";
 import type { Level } from "../../src/layout.js";
 import type { Raster } from "./raster.js";
 import { type Sampler } from "./samples.js";
-import { fragment, type Variant, VERTEX } from "./shaders.js";
+import { Lookup } from "./lookup.js";
+import { fragment, isTabled, type Variant, VERTEX } from "./shaders.js";
 import { isComplex, PARTS, type Range, rangeOfType, type Style } from "./style.js";
 import { type Channel, type Tile, type TileAddress, TileStore } from "./tiles.js";
 
@@ -43,28 +44,52 @@ interface Area {
 const UNIT_COLORS = 4;
 
 export class Renderer {
-  readonly gl: WebGL2RenderingContext;
+  private context: WebGL2RenderingContext | undefined;
   private programs = new Map<string, Program>();
   private tables = new Map<object, WebGLTexture>();
+  private lookups = new WeakMap<TileStore, Lookup>();
   private screen: Size = { width: 1, height: 1 };
+  private grain = 1;
 
-  /** @throws Error where the browser has no WebGL 2 */
-  constructor(readonly canvas: HTMLCanvasElement) {
-    const gl = canvas.getContext("webgl2", { antialias: false, depth: false, stencil: false });
+  constructor(readonly canvas: HTMLCanvasElement) {}
+
+  /**
+   * Starts the graphics processor, which takes long where there is none. Nothing can be drawn before.
+   * @throws Error where the browser has no WebGL 2
+   */
+  begin(): WebGL2RenderingContext {
+    const gl = this.context ?? this.canvas.getContext("webgl2", { antialias: false, depth: false, stencil: false });
     if (!gl) throw new Error("This browser has no WebGL 2, or it is switched off.");
-    this.gl = gl;
+    this.context = gl;
+    return gl;
+  }
+
+  get begun(): boolean {
+    return this.context !== undefined;
+  }
+
+  get gl(): WebGL2RenderingContext {
+    return this.begin();
   }
 
   /** After the graphics processor was lost: nothing that it had is there. */
   reset(): void {
     this.programs = new Map();
     this.tables = new Map();
+    this.lookups = new WeakMap();
   }
 
   resize({ width, height }: Size): void {
     this.screen = { width: Math.max(width, 1), height: Math.max(height, 1) };
-    if (this.canvas.width !== this.screen.width) this.canvas.width = this.screen.width;
-    if (this.canvas.height !== this.screen.height) this.canvas.height = this.screen.height;
+    this.fit();
+  }
+
+  // The picture has as many pixels as are drawn; the page enlarges it to the screen.
+  private fit(): void {
+    const { canvas, screen, grain } = this;
+    const [width, height] = [Math.ceil(screen.width / grain), Math.ceil(screen.height / grain)];
+    if (canvas.width !== width) canvas.width = width;
+    if (canvas.height !== height) canvas.height = height;
   }
 
   get size(): Size {
@@ -73,19 +98,33 @@ export class Renderer {
 
   /**
    * Draws all layers, and with `ask` asks for what they lack. No pixel is drawn twice, so nothing is blended here:
-   * what is transparent shows the page below.
+   * what is transparent shows the page below. With a `grain` of 2 each sample that is drawn fills two by two pixels.
    */
-  draw(layers: readonly Layer[], placement: Placement, ask: boolean): void {
+  draw(layers: readonly Layer[], placement: Placement, ask: boolean, grain: 1 | 2 = 1): void {
     const { gl, screen } = this;
-    gl.viewport(0, 0, screen.width, screen.height);
+    const of = (pixels: number): number => Math.ceil(pixels / grain);
+    this.grain = grain;
+    this.fit();
+    gl.viewport(0, 0, of(screen.width), of(screen.height));
     gl.disable(gl.SCISSOR_TEST);
     gl.clearColor(0, 0, 0, 0);
     gl.clear(gl.COLOR_BUFFER_BIT);
     gl.enable(gl.SCISSOR_TEST);
     for (const layer of layers) {
-      gl.scissor(layer.from, 0, Math.max(layer.to - layer.from, 0), screen.height);
+      gl.scissor(of(layer.from), 0, Math.max(of(layer.to) - of(layer.from), 0), of(screen.height));
       this.drawLayer(layer, aligned(placement, layer.alignment), ask);
     }
+  }
+
+  /** Tells the milliseconds from `start` until all that was asked of the graphics processor is done. Waits for nothing. */
+  async done(start: number): Promise<number> {
+    const { gl } = this;
+    const sync = gl.fenceSync(gl.SYNC_GPU_COMMANDS_COMPLETE, 0);
+    gl.flush();
+    while (sync && !gl.isContextLost() && gl.getSyncParameter(sync, gl.SYNC_STATUS) !== gl.SIGNALED)
+      await new Promise((resolve) => setTimeout(resolve, 1));
+    if (sync) gl.deleteSync(sync);
+    return performance.now() - start;
   }
 
   /** Has the programs made that a change of gamma or colours would need, before it comes. Draws nothing. */
@@ -107,7 +146,7 @@ export class Renderer {
 
   /** What was just drawn, row by row from the top: red, green, blue, alpha; colours are multiplied by alpha. */
   pixels(): Uint8Array {
-    const { width, height } = this.screen;
+    const { width, height } = this.canvas;
     const upward = new Uint8Array(4 * width * height);
     this.gl.readPixels(0, 0, width, height, this.gl.RGBA, this.gl.UNSIGNED_BYTE, upward);
     const out = new Uint8Array(upward.length);
@@ -179,7 +218,7 @@ export class Renderer {
     const bounds = bands.map((band, i) => boundsOf(raster, store, style, band, i === 3 && style.alpha !== undefined));
     const noData = bands.map((band) => comparable(store, raster.noData(band, style.noData)));
     const colors = this.colorsOf(raster, style);
-    const variant: Variant = {
+    const whole: Variant = {
       sampler: store.format.sampler,
       small: store.format.bytes <= 2 && store.format.sampler !== "sampler2D",
       complex: isComplex(raster.type),
@@ -194,10 +233,30 @@ export class Renderer {
       flat: bounds.some(({ minimum, maximum }) => minimum === maximum),
       colors: !colors ? "none" : style.colors === "palette" ? "palette" : "map",
     };
-    return { variant, channels, groups, bounds, noData, colors, style };
+    // What stands in a table is the same program.
+    const variant: Variant = isTabled(whole)
+      ? { ...whole, together: true, noData: false, power: false, flat: false, colors: "none" }
+      : whole;
+    return { raster, store, variant, channels, groups, bounds, noData, colors, style };
   }
 
-  private prepare({ variant, channels, groups, bounds, noData, colors, style }: Look): Prepared {
+  private prepareLookup({ variant, raster, store, channels, groups, ...look }: Look): Prepared {
+    const { gl } = this;
+    const program = this.use(variant);
+    const lookup = this.lookups.get(store) ?? new Lookup(gl, raster.type);
+    this.lookups.set(store, lookup);
+    gl.uniform1i(this.at(program, "tile0"), 0);
+    gl.uniform4i(this.at(program, "component"), channels[0]?.component ?? 0, 0, 0, 0);
+    gl.uniform1i(this.at(program, "lowest"), rangeOfType(raster.type).minimum);
+    gl.uniform1i(this.at(program, "colors"), UNIT_COLORS);
+    gl.activeTexture(gl.TEXTURE0 + UNIT_COLORS);
+    lookup.bind(look.bounds[0] as Range, look.noData[0], look.colors, look.style);
+    return { program, channels: channels.slice(0, 1), groups };
+  }
+
+  private prepare(look: Look): Prepared {
+    if (isTabled(look.variant)) return this.prepareLookup(look);
+    const { variant, channels, groups, bounds, noData, colors, style } = look;
     const { gl } = this;
     const program = this.use(variant);
     channels.forEach((_, i) => gl.uniform1i(this.at(program, `tile${i}`), i));
@@ -328,7 +387,10 @@ export class Renderer {
   }
 
   private quad(program: Program, { left, top, right, bottom }: Area): void {
-    this.gl.uniform2f(this.at(program, "screen"), this.screen.width, this.screen.height);
+    const { grain } = this;
+    // Where samples fill several pixels, the last of them may reach beyond the screen.
+    const [width, height] = [this.screen.width, this.screen.height].map((each) => Math.ceil(each / grain) * grain);
+    this.gl.uniform2f(this.at(program, "screen"), width as number, height as number);
     this.gl.uniform4f(this.at(program, "area"), left, top, right, bottom);
     this.gl.drawArrays(this.gl.TRIANGLE_STRIP, 0, 4);
   }
@@ -336,6 +398,8 @@ export class Renderer {
 
 /** What a style comes to for a raster. */
 interface Look {
+  raster: Raster;
+  store: TileStore;
   variant: Variant;
   channels: readonly Channel[];
   groups: readonly number[];

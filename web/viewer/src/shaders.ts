@@ -1,5 +1,7 @@
 // The formulas of a style, for the graphics processor. What does not change from pixel to pixel makes programs of its
-// own, and bands are computed side by side: both matter much where a processor without graphics does the work.
+// own, and the two that are drawn most do next to nothing for a pixel: one band of up to 16 bits is looked up in a table
+// of the colours of all its values (lookup.ts), and three are multiplied and added. That matters much where a processor
+// without graphics does the work, which takes each number of a vector by itself.
 import type { Sampler } from "./samples.js";
 
 /** What a program is made for. */
@@ -23,13 +25,23 @@ export interface Variant {
   colors: "none" | "map" | "palette";
 }
 
+/** Whether all that a style makes of a sample fits into a table of the type's values. */
+export const isTabled = ({ small, count, alpha }: Variant): boolean => small && count === 1 && !alpha;
+
+// Whether the screen's own rounding and bounds are all that is needed behind a product and a sum.
+const isLinear = ({ small, together, straight, count, alpha, noData, power, flat }: Variant): boolean =>
+  small && together && straight && count === 3 && !alpha && !noData && !power && !flat;
+
 export const VERTEX = `#version 300 es
 uniform vec4 area; // left, top, right, bottom in pixels of the screen
 uniform vec2 screen;
+uniform vec4 place; // of the tile: left, top, and samples that a pixel of the screen is wide and high
+out highp vec2 at; // in samples of the tile
 void main() {
-  vec2 corner = vec2(gl_VertexID & 1, gl_VertexID >> 1);
-  vec2 at = mix(area.xy, area.zw, corner) / screen * 2.0 - 1.0;
-  gl_Position = vec4(at.x, -at.y, 0.0, 1.0);
+  vec2 corner = mix(area.xy, area.zw, vec2(gl_VertexID & 1, gl_VertexID >> 1));
+  at = (corner - place.xy) * place.zw;
+  vec2 position = corner / screen * 2.0 - 1.0;
+  gl_Position = vec4(position.x, -position.y, 0.0, 1.0);
 }`;
 
 interface Words {
@@ -106,8 +118,49 @@ float partOf(vec2 both) {
   return most == 0.0 ? 0.0 : min(most * length(both / most), 3.4e38);
 }`;
 
+const head = (sampler: Sampler): string => `#version 300 es
+precision highp float;
+precision highp int;
+precision highp ${sampler};
+in highp vec2 at;
+uniform vec2 limit; // within the last sample of the tile
+out vec4 color;`;
+
+// The nearest sample; a place before the first is made whole upward.
+const TEXEL = "ivec2(min(at, limit))";
+
+/** The sample's colour out of the table of all values of its type, the least of which is `lowest`. */
+function tabled({ sampler, straight }: Variant): string {
+  return `${head(sampler)}
+uniform ${sampler} tile0;
+uniform ivec4 component;
+uniform int lowest;
+uniform sampler2D colors;
+void main() {
+  ${WORDS[sampler].vector} all = texelFetch(tile0, ${TEXEL}, 0);
+  int i = component.x;
+  int entry = int(${straight ? "all.x" : "i == 0 ? all.x : i == 1 ? all.y : i == 2 ? all.z : all.w"}) - lowest;
+  color = texelFetch(colors, ivec2(entry & 255, entry >> 8), 0);
+}`;
+}
+
+function linear({ sampler }: Variant): string {
+  return `${head(sampler)}
+uniform ${sampler} tile0;
+uniform ${WORDS[sampler].vector} base;
+uniform vec4 rest, inverse;
+void main() {
+  ivec3 value = ivec3(texelFetch(tile0, ${TEXEL}, 0).xyz);
+  color = vec4((vec3(value - ivec3(base.xyz)) - rest.xyz) * inverse.xyz, 1.0);
+}`;
+}
+
 /** The text of a program for pixels. Colours come out multiplied by alpha. */
 export function fragment(variant: Variant): string {
+  return isTabled(variant) ? tabled(variant) : isLinear(variant) ? linear(variant) : general(variant);
+}
+
+function general(variant: Variant): string {
   const { sampler, small, complex, count, alpha, noData, power, flat, colors } = variant;
   const { value, vector, above, missing, index } = WORDS[sampler];
   const stretched = power ? "pow(t, vec4(power))" : "t";
@@ -120,13 +173,7 @@ export function fragment(variant: Variant): string {
     count === 1
       ? `missing.x != 0u ? vec4(0.0) : ${single[colors]}`
       : `(missing.x & missing.y & missing.z) != 0u ? vec4(0.0) : vec4(entry.xyz * vec3(1u - missing.xyz) / 255.0, 1.0)`;
-  return `#version 300 es
-precision highp float;
-precision highp int;
-precision highp ${sampler};
-uniform vec2 screen;
-uniform vec4 place; // of the tile: left, top, and samples that a pixel of the screen is wide and high
-uniform vec2 limit; // within its last sample
+  return `${head(sampler)}
 uniform ${sampler} tile0, tile1, tile2, tile3;
 uniform ivec4 component;
 uniform ${vector} base;
@@ -139,7 +186,6 @@ uniform bool omit;
 uniform float omitted;
 uniform sampler2D colors;
 uniform int entries;
-out vec4 color;
 
 ${value} pick(${vector} all, int i) { return i == 0 ? all.x : i == 1 ? all.y : i == 2 ? all.z : all.w; }
 ${complex ? PARTS : ""}
@@ -148,8 +194,7 @@ vec4 inPalette(${vector} value) {
   return entry < 0 || entry >= entries ? vec4(0.0) : texelFetch(colors, ivec2(entry & 255, entry >> 8), 0);
 }
 void main() {
-  vec2 at = (vec2(gl_FragCoord.x, screen.y - gl_FragCoord.y) - place.xy) * place.zw;
-  ivec2 texel = ivec2(clamp(at, vec2(0.0), limit));
+  ivec2 texel = ${TEXEL};
   ${fetch(variant, vector)}
   uvec4 missing = ${missing}${noData && !complex ? " | (uvec4(equal(value, noData)) & hasNoData)" : ""};
   vec4 above = ${small ? ABOVE_SMALL : above};

@@ -11,15 +11,22 @@ export class Side {
   store: TileStore | undefined;
   style: Style | undefined;
   error: unknown;
+  /** Whether nothing is expected any more that would change how the file looks by itself. */
+  complete = false;
+  /** Settles then. */
+  readonly known: Promise<void>;
+  private settled: () => void = () => {};
   private readonly abort = new AbortController();
 
   /** @param changed Is called when there is something new to draw, `restyled` when there is something else to choose. */
   constructor(
     readonly origin: Origin,
-    private readonly gl: WebGL2RenderingContext,
+    private readonly begun: Promise<WebGL2RenderingContext>,
     private readonly changed: () => void,
     private readonly restyled: () => void,
-  ) {}
+  ) {
+    this.known = new Promise((resolve) => (this.settled = resolve));
+  }
 
   /**
    * Opens the file, or shares that of another side, or takes over all that a side had which is not shown any more.
@@ -32,16 +39,23 @@ export class Side {
       if (signal.aborted) return void (shared ?? (await raster.close()));
       if (before?.raster === raster) [this.store, before.store] = [before.store, undefined];
       await this.begin(raster, wanted);
-      if (!shared) void this.takeSidecar(raster, wanted);
+      if (!shared) void this.takeSidecar(raster, wanted).finally(() => this.finish());
+      else this.finish();
     } catch (error) {
       if (!signal.aborted) this.error = error;
     }
   }
 
+  private finish(): void {
+    this.complete = true;
+    this.settled();
+  }
+
   private async begin(raster: Raster, wanted: Partial<Style>): Promise<void> {
     const style = fitted(wanted, raster);
     await this.settle(raster, style);
-    this.store ??= new TileStore(this.gl, raster, this.changed);
+    const gl = await this.begun;
+    this.store ??= new TileStore(gl, raster, this.changed);
     this.style = style;
     this.raster = raster;
   }

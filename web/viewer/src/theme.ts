@@ -12,13 +12,20 @@ function stored(): string | null {
   }
 }
 
+const isDark = (choice: string | null): boolean => choice === "dark" || (choice !== "light" && system.matches);
+
+/** Takes up the choice of last time, or the system's. */
+export function takeTheme(): void {
+  document.documentElement.dataset["theme"] = isDark(stored()) ? "dark" : "light";
+}
+
 /** Takes up the choice of last time, and makes the button change it. The style knows one word for dark: of the page. */
 export function listenToTheme(): void {
   const button = byId("theme");
   const root = document.documentElement;
   let choice = stored();
   const refresh = (): void => {
-    const dark = choice === "dark" || (choice !== "light" && system.matches);
+    const dark = isDark(choice);
     root.dataset["theme"] = dark ? "dark" : "light";
     button.setAttribute("aria-pressed", String(dark));
   };

@@ -7,6 +7,8 @@ import type { Page } from "playwright-core";
 
 import { headerOf, Pyramids } from "../../test/support/pyramids.js";
 import type { App } from "../src/app.js";
+import { REST } from "../src/pace.js";
+import type { Renderer } from "../src/renderer.js";
 import { assertSame, Bench, findings, go, idle, link, picture } from "./support/browser.js";
 
 declare const viewer: App;
@@ -167,6 +169,58 @@ test("a change of style is drawn within 16 ms, on a processor without graphics t
   const times = await page.evaluate(() => Array.from({ length: 40 }, () => viewer.time()));
   const best = Math.min(...times);
   assert.ok(best < 16, `${best} ms at best of ${times.map((time) => time.toFixed(1)).join(" ")}`);
+});
+
+/**
+ * The grains of the pictures that are drawn while a handle is moved once in each of eight frames, and rests then. The
+ * clock is the test's own, as a busy machine's may show a hand at rest between any two frames.
+ */
+async function grainsOf(milliseconds: number): Promise<number[]> {
+  await page.evaluate((milliseconds) => {
+    const { renderer } = viewer as unknown as { renderer: Renderer };
+    const grains: number[] = ((globalThis as unknown as { grains: number[] }).grains = []);
+    const draw = renderer.draw.bind(renderer);
+    renderer.draw = (layers, placement, ask, grain) => {
+      grains.push(grain ?? 1);
+      draw(layers, placement, ask, grain);
+    };
+    renderer.done = () => Promise.resolve(milliseconds);
+  }, milliseconds);
+  await page.getByRole("slider", { name: "Minimum of Band 2", exact: true }).evaluate(async (slider, rest) => {
+    const { setTimeout } = window;
+    const start = performance.now();
+    let frame = 0;
+    let atRest = () => {};
+    performance.now = () => start + frame * 16;
+    window.setTimeout = ((call: () => void, delay?: number) => {
+      if (delay !== rest) return setTimeout(call, delay);
+      atRest = call;
+      return -1;
+    }) as typeof window.setTimeout;
+    for (; frame < 8; ++frame) {
+      slider.dispatchEvent(new KeyboardEvent("keydown", { key: "ArrowRight", bubbles: true }));
+      await new Promise((resolve) => requestAnimationFrame(resolve));
+    }
+    delete (performance as Partial<Performance>).now; // that of its class is left
+    window.setTimeout = setTimeout;
+    atRest();
+  }, REST);
+  await idle(page);
+  return page.evaluate(() => {
+    const { renderer } = viewer as unknown as { renderer: Partial<Renderer> };
+    delete renderer.draw; // those of its class are left
+    delete renderer.done;
+    return (globalThis as unknown as { grains: number[] }).grains;
+  });
+}
+
+test("while a handle moves, pictures that take too long have fewer pixels, and all once it rests", async () => {
+  await go(page, "file=three.pyr&bands=2&stretch=20,200");
+  const slow = await grainsOf(40);
+  assert.deepEqual(slow, [1, 2, 2, 2, 2, 2, 2, 2, 1]);
+  await page.waitForTimeout(2 * REST);
+  const quick = await grainsOf(4);
+  assert.deepEqual([...new Set(quick)], [1]);
 });
 
 test("complex samples are shown in all their parts", async () => {

@@ -8,8 +8,12 @@ import type { Page } from "playwright-core";
 import { type PixelType, Pyramid } from "zmcraster-web";
 
 import { documentOf, fileOf, headerOf, Pyramids } from "../../test/support/pyramids.js";
+import type { App } from "../src/app.js";
+import type { Renderer } from "../src/renderer.js";
 import { assertSame, Bench, go, picture } from "./support/browser.js";
 import { draw, type ModelStyle, type Picture } from "./support/model.js";
+
+declare const viewer: App;
 
 const bench = new Bench();
 const pyramids = new Pyramids();
@@ -146,6 +150,21 @@ test("the palette of a file is shown at once, and indices without a colour are t
   assert.equal(await page.getByLabel("Colours").inputValue(), "palette");
 });
 
+test("a palette beside reals is shown only where it is asked for", async () => {
+  const samples = Float32Array.from({ length: 6400 }, (_, i) => (i % 7) / 2);
+  const records =
+    "<DATASET><PALETTE><PALETTE_BAND>0</PALETTE_BAND><PALETTE_RGBA>1|2|3|255</PALETTE_RGBA></PALETTE></DATASET>";
+  bench.put("heights.pyr", fileWith("Single", 80, 80, 1, samples, records));
+  await go(page, "file=heights.pyr&at=40,40&zoom=1");
+  assert.equal(await page.getByLabel("Colours").inputValue(), "grey");
+  const pyramid = await Pyramid.open((bench.site.files.get("heights.pyr") as { bytes: Uint8Array }).bytes);
+  const shown = await picture(page);
+  const view = { x: 40, y: 40, zoom: 1, level: 0 };
+  assertSame(shown, await draw(pyramid, shown, view, { bands: [0], ranges: [[0, 3]] }), "stretched");
+  const style = { bands: [0], ranges: [[0, 3]] as [number, number][], colors: [[1, 2, 3, 255]], palette: true };
+  await compare("heights.pyr", "&colormap=palette", style);
+});
+
 const EDGES = [0, -0, 1, -1, 7, 7.5, 1e-30, 3e38, -3e38, NaN, Infinity, -Infinity];
 
 test("samples that are no numbers or infinite are transparent, and in some bands of a pixel black", async () => {
@@ -279,6 +298,38 @@ test("two rasters in one coordinate system lie over each other by their coordina
     await draw(pyramid, { width, height }, { x: 20, y: 15, zoom: 4, level: 0 }, style),
     "by coordinates",
   );
+});
+
+test("with fewer pixels each sample that is drawn fills two by two, from the upper left on", async () => {
+  // Where each sample has two by two pixels of the screen anyway, the picture is the same.
+  for (const [width, height] of [
+    [340, 300],
+    [341, 301],
+  ] as const) {
+    await page.setViewportSize({ width, height });
+    await go(page, "file=UInt16.pyr&at=60,50&zoom=2&bands=2&stretch=1000,60000");
+    const sharp = await picture(page);
+    // Its first sample has to begin with such a block.
+    const [left, top] = [Math.round(sharp.width / 2 - 120), Math.round(sharp.height / 2 - 100)];
+    const link = `at=${60 - (left % 2) / 2},${50 - (top % 2) / 2}`;
+    await go(page, `file=UInt16.pyr&${link}&zoom=2&bands=2&stretch=1000,60000`);
+    const aligned = await picture(page);
+    const pixels = await page.evaluate(() => {
+      viewer.time(2);
+      const { renderer } = viewer as unknown as { renderer: Renderer };
+      return [...renderer.pixels()];
+    });
+    const [columns, rows] = [Math.ceil(aligned.width / 2), Math.ceil(aligned.height / 2)];
+    const expected = new Uint8Array(4 * columns * rows);
+    for (let y = 0; y < rows; ++y)
+      for (let x = 0; x < columns; ++x) {
+        const from = 4 * (2 * y * aligned.width + 2 * x);
+        expected.set(aligned.pixels.subarray(from, from + 4), 4 * (y * columns + x));
+      }
+    const coarse = { width: columns, height: rows };
+    assertSame({ ...coarse, pixels: Uint8Array.from(pixels) }, { ...coarse, pixels: expected }, `${width} x ${height}`);
+  }
+  await page.setViewportSize({ width: 340, height: 300 });
 });
 
 test("a resampled view shows samples of the level that is nearest to the pixels of the screen", async () => {

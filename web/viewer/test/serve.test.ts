@@ -106,7 +106,8 @@ test(
     await card(page, "scene.pyr").click();
     await heading(page, "scene.pyr");
     await idle(page);
-    assert.ok(page.url().startsWith(`${served.url}/#file=files/scene.pyr`), page.url());
+    // The address follows a moment after the picture.
+    await page.waitForURL((url) => url.href.startsWith(`${served.url}/#file=files/scene.pyr`));
     await page.evaluate(() => (location.hash = "file=files/scene.pyr&at=352,160&zoom=1&bands=1,2,3"));
     await page.waitForTimeout(50);
     await idle(page);
