@@ -68,9 +68,13 @@ set(ZMC_PUBLIC_HEADERS
     host/file/Limits.h
     host/build/BuildFile.h
     host/build/FullStatistics.h
+    host/build/PartBuild.h
+    host/build/PartFolder.h
+    host/build/PartGrid.h
     host/build/PyramidBuilder.h
     host/file/PyramidFileInfo.h
     host/file/PyramidHeader.h
+    host/file/SideFile.h
     host/journal/JournalRecord.h
     host/journal/MetadataJournal.h
     host/raster/Module.h

@@ -34,6 +34,18 @@ if(TARGET zmcraster_cli)
         DESTINATION ${CMAKE_INSTALL_MANDIR}/man1 RENAME zmcraster.1)
     install(FILES ${documents}/zmcraster.completion
         DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions RENAME zmcraster)
+
+    # Many workers: the program for Dask with its module, and the scripts for other clusters. The program finds
+    # the module by its own place, since Python itself looks below /usr alone.
+    set(ZMC_INSTALL_PYTHONDIR "lib/python3/dist-packages")
+    file(RELATIVE_PATH ZMC_PYTHON_FROM_BIN "/${CMAKE_INSTALL_BINDIR}" "/${ZMC_INSTALL_PYTHONDIR}")
+    set(python ${PROJECT_SOURCE_DIR}/python)
+    configure_file(${python}/zmcraster-dask ${CMAKE_BINARY_DIR}/python/zmcraster-dask @ONLY)
+    install(PROGRAMS ${CMAKE_BINARY_DIR}/python/zmcraster-dask DESTINATION ${CMAKE_INSTALL_BINDIR})
+    install(FILES ${python}/zmcraster_dask.py DESTINATION ${ZMC_INSTALL_PYTHONDIR})
+    install(FILES ${python}/zmcraster-dask.1 DESTINATION ${CMAKE_INSTALL_MANDIR}/man1)
+    install(PROGRAMS ${PROJECT_SOURCE_DIR}/examples/slurm-pyramid ${PROJECT_SOURCE_DIR}/examples/mpi-pyramid
+        DESTINATION ${CMAKE_INSTALL_DOCDIR}/examples)
 endif()
 
 install(DIRECTORY ${ZMC_PUBLIC_INCLUDE}/zmcraster DESTINATION ${CMAKE_INSTALL_INCLUDEDIR})

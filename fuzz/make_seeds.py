@@ -454,6 +454,7 @@ def serve_seeds():
         b"/tiles/a.pyr/0/0/0.png?expression=(b1-b2)/(b1%2bb2)&stretch=-1,1&depth=16",
         b"/tiles/a.pyr/tile.json", b"/tiles/a.pyr/-1/4294967296/0x1.raw",
         b"/preview/a.pyr.png?size=40&window=1,2,30,20&legend=1&bands=1&colormap=viridis",
+        b"/view/a.pyr?screen=40,30", b"/view/sub/m.pyr?screen=9,9&at=1.5,-2e9&zoom=0.25&bands=9",
         b"/statistics/a.pyr", b"/histogram/sub/m.pyr?band=9", b"/info/a.pyr",
         b"/point/a.pyr?x=89&y=69&level=0&bands=1", b"/profile/a.pyr?line=0,0.5,90,70&samples=9",
         b"/window/a.pyr.npy?window=1,2,3,4&level=0&bands=2", b"/dzi/a.pyr.dzi?format=webp", b"/dzi/sub/m.pyr_files/3/0_0.png?bands=9&gamma=2",

@@ -62,6 +62,8 @@ bool RenameToNewName(const std::string& from, const std::string& to) noexcept;
 // Gives a file one more name; fails if anything bears it, or the file system has no such thing.
 bool LinkFile(const std::string& file, const std::string& name) noexcept;
 bool RemoveEntry(const std::string& path) noexcept;
+// Removes a folder that has no entries.
+bool RemoveFolder(const std::string& path) noexcept;
 
 // Waits until a file's bytes, or a folder's names, have reached the disk.
 bool SyncFile(const std::string& path) noexcept;

@@ -15,6 +15,9 @@ namespace platform {
 // loaded from; empty if not known. A file that was replaced or removed since has its old name.
 std::string FileOfCode(const void* code);
 
+// The same of the program of this process.
+std::string FileOfProgram();
+
 // The value of an environment variable; empty if it is not set, and in a program that runs with
 // rights which those who set the variable may not have.
 std::string EnvironmentValue(const char* name);

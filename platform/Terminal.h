@@ -3,6 +3,7 @@
 #define ZMC_PLATFORM_TERMINAL_H
 
 #include <cstddef>
+#include <string>
 #include <string_view>
 
 namespace platform {
@@ -24,6 +25,10 @@ std::size_t TerminalColumns(StandardStream stream, std::size_t otherwise);
 // Hands the text to the system in one call and unbuffered, so that lines of several threads or
 // processes do not mix. A stream that takes it no longer loses it: there is nobody left to tell.
 void WriteAtOnce(StandardStream stream, std::string_view text);
+
+// Takes that many bytes from standard input in one call, so that processes that have one pipe there
+// get whole pieces. Empty at its end, and where it is no whole piece.
+std::string ReadPiece(std::size_t size);
 
 }  // namespace platform
 

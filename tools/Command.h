@@ -47,6 +47,10 @@ std::unique_ptr<Command> MakePreviewCommand();
 std::unique_ptr<Command> MakeServeCommand();
 std::unique_ptr<Command> MakeStatsCommand();
 std::unique_ptr<Command> MakeRecoverCommand();
+std::unique_ptr<Command> MakePlanCommand();
+std::unique_ptr<Command> MakePartCommand();
+std::unique_ptr<Command> MakeFinishCommand();
+std::unique_ptr<Command> MakeStatusCommand();
 
 }  // namespace zmctools
 

@@ -4,11 +4,14 @@
 #include <cpl_error.h>
 #include <cpl_string.h>
 
+#include <algorithm>
 #include <mutex>
 #include <new>
+#include <string_view>
 
 #include "gdal/Driver.h"
 #include "host/base/Xerces.h"
+#include "host/build/PartGrid.h"
 #include "platform/FileSystem.h"
 #include "tools/Message.h"
 #include "tools/RegularFiles.h"
@@ -45,6 +48,16 @@ void CPL_STDCALL TakeError(CPLErr kind, CPLErrorNum, const char* text) noexcept 
     }
 }
 
+bool UserBoundsBlocks() { return CPLGetConfigOption("GDAL_CACHEMAX", nullptr) != nullptr; }
+
+// Whether all that is read of a source are blocks of its first band's size.
+bool HasBlocksOfItsOwn(GDALDataset& source) {
+    constexpr int kNoOtherFile = GMF_ALL_VALID | GMF_NODATA | GMF_ALPHA;
+    GDALDriver* const driver = source.GetDriver();
+    return driver && std::string_view(driver->GetDescription()) == "GTiff" &&
+           (source.GetRasterBand(1)->GetMaskFlags() & kNoOtherFile) != 0;
+}
+
 }  // namespace
 
 void StartGdal() {
@@ -53,11 +66,29 @@ void StartGdal() {
     GDALRegister_ZMCPyramid();
     GDALAllRegister();
     OpenRegularFilesOnly();
-    if (!CPLGetConfigOption("GDAL_CACHEMAX", nullptr)) GDALSetCacheMax64(kBlockCache);
+    if (!UserBoundsBlocks()) GDALSetCacheMax64(kBlockCache);
     if (GDALDriver* const memory = GetGDALDriverManager()->GetDriverByName("MEM")) {
         memory->pfnOpen = nullptr;
         memory->pfnIdentify = nullptr;
     }
+}
+
+void KeepBlocksForStrips(GDALDataset& source, std::uint64_t width) {
+    if (UserBoundsBlocks() || !HasBlocksOfItsOwn(source)) return;
+    int blockWidth = 1, blockHeight = 1;
+    source.GetRasterBand(1)->GetBlockSize(&blockWidth, &blockHeight);
+    std::uint64_t pixelBytes = 0;
+    for (int band = 1; band <= source.GetRasterCount(); ++band)
+        pixelBytes += static_cast<std::uint64_t>(
+            GDALGetDataTypeSizeBytes(source.GetRasterBand(band)->GetRasterDataType()));
+    // A strip may begin and end within a block, in either direction.
+    const std::uint64_t lines = zmchost::kTileSide + 2 * static_cast<std::uint64_t>(blockHeight);
+    const std::uint64_t columns = width + 2 * static_cast<std::uint64_t>(blockWidth);
+    const auto most = static_cast<std::uint64_t>(kBlockCache);
+    // Sizes of files are no sizes of memory: the product is bounded before it is made.
+    const bool fits = lines < most && columns < most && lines * columns < most / pixelBytes;
+    const std::uint64_t bytes = fits ? lines * columns * pixelBytes : most;
+    GDALSetCacheMax64(static_cast<GIntBig>(std::clamp(bytes, most / 24, most)));
 }
 
 void SetSubject(const std::string& file) {

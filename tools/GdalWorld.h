@@ -4,6 +4,7 @@
 
 #include <gdal_priv.h>
 
+#include <cstdint>
 #include <memory>
 #include <string>
 #include <vector>
@@ -22,6 +23,12 @@ void StartGdal();
 
 // Opens a raster for reading. Throws Failure with GDAL's reason.
 DatasetPtr OpenDataset(const std::string& name, const std::vector<std::string>& options = {});
+
+// Lets GDAL keep as many blocks of a source as strips of so many pixels need that are read one
+// below the other: memory that is touched for the first time costs more than blocks that come
+// again. The usual bound stays where blocks may not be those that the source tells of (masks, and
+// what is put together of other files), and where the environment tells a bound.
+void KeepBlocksForStrips(GDALDataset& source, std::uint64_t width);
 
 // Names the file that warnings are about from now on.
 void SetSubject(const std::string& file);

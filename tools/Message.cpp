@@ -48,10 +48,13 @@ Answer AnswerOfException() {
 
 // What several readers of one file find is said once.
 void Warn(const std::string& file, const std::string& what) {
+    WarnAgain(Visible(file) + ": warning: " + what);
+}
+
+void WarnAgain(const std::string& text) {
     static std::mutex mutex;
     static std::set<std::string> said;
     if (isQuiet) return;
-    const std::string text = Visible(file) + ": warning: " + what;
     const std::lock_guard lock(mutex);
     if (said.insert(text).second) Say(text);
 }

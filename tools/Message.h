@@ -50,6 +50,8 @@ Answer AnswerOfException();
 // Says of a file what does not keep a command from going on, each text once; silent after
 // SetQuiet(true). Any thread may call.
 void Warn(const std::string& file, const std::string& what);
+// The same of a whole text that another process of this program has said.
+void WarnAgain(const std::string& text);
 // Tells that a warning was lost for want of memory; takes none itself.
 void WarnOfLoss();
 void SetQuiet(bool quiet);

@@ -72,7 +72,8 @@ constexpr StyleOption kStyleOptions[] = {
     {"gamma", "G", "Exponent 1/G of brightness (default 1)"},
     {"colormap", "NAME|-NAME|palette",
      "Colours of one band: grey, viridis, magma, inferno, plasma, cividis, turbo or coolwarm, "
-     "reversed with a minus; palette: the file's own"},
+     "reversed with a minus; palette: the file's own (default of one band of integers that has "
+     "one)"},
     {"nodata", "auto|none|V",
      "Values that are transparent (default auto: the raster's no-data value)"},
     {"expression", "E", "Arithmetic of bands in place of bands: (b4-b3)/(b4+b3)"},

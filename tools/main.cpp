@@ -70,6 +70,10 @@ Program::Program() {
     OptionTable(app).Texts("--limit", limits, claims.c_str()).Named("NAME=N");
     app.require_subcommand(1);
     Add(MakeBuildCommand());
+    Add(MakePlanCommand());
+    Add(MakePartCommand());
+    Add(MakeFinishCommand());
+    Add(MakeStatusCommand());
     Add(MakeInfoCommand());
     Add(MakeExportCommand());
     Add(MakePreviewCommand());

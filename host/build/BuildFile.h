@@ -12,6 +12,7 @@
 #include <cstdint>
 #include <string>
 
+#include "host/file/SideFile.h"
 #include "platform/FileLock.h"
 #include "platform/FileSystem.h"
 
@@ -19,14 +20,35 @@ namespace zmchost {
 
 class BuildFile {
 public:
+    // What temporary files are called by: those of builds, which belong to a process, and those of
+    // plans, ".NAME.zmcplan-PROCESS-RANDOM.tmp", which stay until somebody finishes them.
+    enum class Kind { Build, Plan };
+
     // Refuses a target that is a folder, is read-only, or exists without `overwrite`; removes stale
     // temporary files of the target; makes an empty temporary file. Throws Error.
-    BuildFile(const std::string& target, bool overwrite);
+    explicit BuildFile(const std::string& target, bool overwrite, Kind kind = Kind::Build);
+    // Takes on a file of a plan: locks it, and cuts off what an attempt to finish it has stored
+    // behind its tiles. It stays if it is not committed. Throws Error, also while somebody else has
+    // it.
+    BuildFile(const std::string& target, bool overwrite, const std::string& planned);
     ~BuildFile();
     BuildFile(const BuildFile&) = delete;
     BuildFile& operator=(const BuildFile&) = delete;
 
     const std::string& Path() const { return path; }
+
+    // From now on the file stays when this object goes; its lock does not.
+    void Keep() { kept = true; }
+
+    // The path of a file of a plan under that name, in the folder of the target. Files of builds
+    // and plans may have companions, whose names are theirs with one of these behind.
+    static std::string PlannedPath(const std::string& target, const std::string& name);
+    static constexpr const char* kPlanEnding = ".plan";
+    static constexpr const char* kNewPlanEnding = ".new";
+    static constexpr const char* kPartsEnding = ".parts";
+    // Removes files of plans whose lock nobody has and that are not to be spared, and the
+    // companions of files that are gone.
+    static void RemoveAbandoned(const std::string& target, const SideFile::Spare& spare);
 
     // Throws Error if the disk has no room for `size` bytes.
     void CheckSpace(std::uint64_t size) const;
@@ -48,7 +70,7 @@ private:
     std::string target;  // where links led
     std::string path;
     platform::FileLock lock;  // of the temporary file, so that nobody takes it for a left-over
-    bool committed = false;
+    bool kept = false;        // it does not go with this object
 };
 
 }  // namespace zmchost

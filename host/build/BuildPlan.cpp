@@ -18,25 +18,43 @@ std::uint64_t ColumnMemory(const PlanInput& input, std::uint32_t levels, std::ui
                        input.pixelBytes, 2);
 }
 
+Span AllLines(const PlanInput& input, std::uint32_t base) {
+    const std::uint32_t height = input.height >> base;
+    return {0, height, 0, height};
+}
+
 Pass WholeWidth(const PlanInput& input, std::uint32_t base, std::uint32_t stripsAhead) {
     const std::uint32_t width = input.width >> base;
     const std::uint32_t levels = input.maxLevel - base;
-    Pass pass{base, input.maxLevel, stripsAhead, 0, {{0, width, 0, width}}};
+    Pass pass{base, input.maxLevel, stripsAhead, 0, {{0, width, 0, width}}, AllLines(input, base)};
     pass.memory = StripMemory(width, levels, input.halo, input.pixelBytes, stripsAhead);
     return pass;
 }
 
-void CutColumns(Pass& pass, const PlanInput& input, std::uint64_t columnWidth) {
+// What [begin, end) of `extent` pixels needs.
+Span WithMargin(std::uint64_t begin, std::uint64_t end, std::uint64_t margin,
+                std::uint64_t extent) {
+    return {static_cast<std::uint32_t>(begin), static_cast<std::uint32_t>(end),
+            static_cast<std::uint32_t>(begin - std::min(begin, margin)),
+            static_cast<std::uint32_t>(std::min(end + margin, extent))};
+}
+
+void CutColumns(Pass& pass, const PlanInput& input, std::uint64_t first, std::uint64_t last,
+                std::uint64_t columnWidth) {
     const std::uint64_t width = input.width >> pass.baseLevel;
     const std::uint64_t margin = HaloPixels(input, pass.topLevel - pass.baseLevel);
-    for (std::uint64_t begin = 0; begin < width; begin += columnWidth) {
-        const std::uint64_t end = std::min(begin + columnWidth, width);
-        const std::uint64_t readBegin = begin - std::min(begin, margin);
-        const std::uint64_t readEnd = std::min(end + margin, width);
-        pass.columns.push_back({static_cast<std::uint32_t>(begin), static_cast<std::uint32_t>(end),
-                                static_cast<std::uint32_t>(readBegin),
-                                static_cast<std::uint32_t>(readEnd)});
-    }
+    for (std::uint64_t begin = first; begin < last; begin += columnWidth)
+        pass.columns.push_back(
+            WithMargin(begin, std::min(begin + columnWidth, last), margin, width));
+}
+
+// The widest columns of whole tiles of each level that the budget has room for.
+std::uint64_t ColumnWidth(const PlanInput& input, std::uint32_t levels) {
+    const std::uint64_t unit = ColumnUnit(levels);
+    std::uint64_t width = unit;
+    while (width < input.width && ColumnMemory(input, levels, width + unit) <= input.budget)
+        width += unit;
+    return width;
 }
 
 // As many levels as the budget has room for, and then columns as wide as it has room for.
@@ -46,11 +64,10 @@ Pass InColumns(const PlanInput& input, std::uint32_t base) {
     while (levels < wanted &&
            ColumnMemory(input, levels + 1, ColumnUnit(levels + 1)) <= input.budget)
         ++levels;
-    const std::uint64_t unit = ColumnUnit(levels);
-    std::uint64_t width = unit;
-    while (ColumnMemory(input, levels, width + unit) <= input.budget) width += unit;
-    Pass pass{base, base + levels, 2, ColumnMemory(input, levels, width), {}};
-    CutColumns(pass, input, width);
+    const std::uint64_t width = ColumnWidth(input, levels);
+    Pass pass{base, base + levels,        2, ColumnMemory(input, levels, width),
+              {},   AllLines(input, base)};
+    CutColumns(pass, input, 0, input.width >> base, width);
     return pass;
 }
 
@@ -62,7 +79,72 @@ Pass PlanPass(const PlanInput& input, std::uint32_t base) {
     return InColumns(input, base);
 }
 
+std::uint32_t TilesFor(std::uint64_t pixels, std::uint64_t unit) {
+    return static_cast<std::uint32_t>((pixels + unit - 1) / unit);
+}
+
+// Whether a side of a part, of so many pixels of all, is made of such tiles without a margin of
+// more than a fiftieth and without becoming longer by more than a quarter.
+bool SuitsSide(std::uint64_t side, std::uint64_t all, std::uint64_t unit, std::uint64_t margins) {
+    if (unit > side || margins * 50 > side) return false;
+    return side == all || TilesFor(side, unit) * unit * 4 <= side * 5;
+}
+
+// Whether parts of that size could make one more level: there is one, a column of its tiles fits
+// the budget, and they suit the part.
+bool HasRoomForLevel(const PlanInput& input, std::uint32_t level, std::uint64_t partWidth,
+                     std::uint64_t partHeight) {
+    if (level > input.maxLevel) return false;
+    const std::uint64_t unit = ColumnUnit(level);
+    const std::uint64_t margins = 2 * HaloPixels(input, level);
+    return ColumnMemory(input, level, std::min<std::uint64_t>(unit, input.width)) <= input.budget &&
+           SuitsSide(partWidth, input.width, unit, margins) &&
+           SuitsSide(partHeight, input.height, unit, margins);
+}
+
 }  // namespace
+
+zelm::Rectangle PartGrid::Area(std::uint64_t part) const {
+    const std::uint64_t x = part % Across() * PartWidth();
+    const std::uint64_t y = part / Across() * PartHeight();
+    return {static_cast<std::uint32_t>(x), static_cast<std::uint32_t>(y),
+            static_cast<std::uint32_t>(std::min(PartWidth(), width - x)),
+            static_cast<std::uint32_t>(std::min(PartHeight(), height - y))};
+}
+
+PartGrid PlanParts(const PlanInput& input, std::uint32_t partWidth, std::uint32_t partHeight) {
+    const auto bounded = [](std::uint32_t wanted, std::uint32_t all) {
+        return std::uint64_t{std::clamp(wanted, std::min(kTileSide, all), all)};
+    };
+    std::uint64_t width = bounded(partWidth, input.width);
+    std::uint64_t height = bounded(partHeight, input.height);
+    PartGrid grid{input.width, input.height, 0, 1, 1};
+    do {
+        while (HasRoomForLevel(input, grid.level + 1, width, height)) ++grid.level;
+        grid.columns = TilesFor(width, ColumnUnit(grid.level));
+        grid.rows = TilesFor(height, ColumnUnit(grid.level));
+        width = std::min<std::uint64_t>(2 * width, input.width);
+        height = std::min<std::uint64_t>(2 * height, input.height);
+    } while (grid.Count() > kMostParts);
+    return grid;
+}
+
+Pass PlanPart(const PlanInput& input, const PartGrid& grid, std::uint64_t part) {
+    const zelm::Rectangle area = grid.Area(part);
+    const std::uint64_t width = ColumnWidth(input, grid.level);
+    Pass pass{0, grid.level, 2, 0, {}, {}};
+    CutColumns(pass, input, area.x, area.Right(), width);
+    std::uint64_t widest = 0;
+    for (const Column& column : pass.columns)
+        widest = std::max<std::uint64_t>(widest, column.readEnd - column.readBegin);
+    const auto memory = [&](std::uint32_t stripsAhead) {
+        return StripMemory(widest, grid.level, input.halo, input.pixelBytes, stripsAhead);
+    };
+    if (memory(3) <= input.budget) pass.stripsAhead = 3;
+    pass.memory = memory(pass.stripsAhead);
+    pass.lines = WithMargin(area.y, area.Bottom(), HaloPixels(input, grid.level), input.height);
+    return pass;
+}
 
 std::uint32_t MaxLevelOf(std::uint32_t width, std::uint32_t height) {
     const std::uint32_t least = std::min(width, height);
@@ -97,14 +179,13 @@ std::uint64_t LeastMemory(const PlanInput& input) {
     return std::min(narrow, WholeWidth(input, 0, 2).memory);
 }
 
-std::vector<Pass> PlanPasses(const PlanInput& input) {
+std::vector<Pass> PlanPasses(const PlanInput& input, std::uint32_t base) {
     std::vector<Pass> passes;
     if (input.budget < LeastMemory(input)) return passes;
-    std::uint32_t base = 0;
-    do {
+    for (bool more = base == 0 || base < input.maxLevel; more; more = base < input.maxLevel) {
         passes.push_back(PlanPass(input, base));
         base = passes.back().topLevel;
-    } while (base < input.maxLevel);
+    }
     return passes;
 }
 

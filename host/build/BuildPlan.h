@@ -10,16 +10,15 @@
 #ifndef ZMC_HOST_BUILD_BUILDPLAN_H
 #define ZMC_HOST_BUILD_BUILDPLAN_H
 
+#include <algorithm>
 #include <bit>
 #include <cstdint>
 #include <vector>
 
-#include "format/PyramidHeaderRecord.h"
+#include "host/build/PartGrid.h"
 
 namespace zmchost {
 
-// Side of the tiles of every file that the module creates.
-inline constexpr std::uint32_t kTileSide = zelm::kWrittenTileSize;
 // Coarsest level whose tiles have addresses in the Morton ordering: behind it they shrink to
 // nothing.
 inline constexpr std::uint32_t kMaxMortonLevel = std::bit_width(kTileSide) - 1;
@@ -34,22 +33,30 @@ std::uint32_t MaxLevelOf(std::uint32_t width, std::uint32_t height);
 // The first level that fits one tile, or the coarsest that there can be.
 std::uint32_t DefaultMaxLevel(std::uint32_t width, std::uint32_t height, std::uint32_t bands);
 
-// Pixels [begin, end) of a line of the base level that a column owns, and [readBegin, readEnd) that
-// it needs.
-struct Column {
+// Lines of a strip that begins at `first`, of a level or a part of it that ends at `end`: none has
+// lines of two rows of tiles.
+inline std::uint32_t StripLines(std::uint32_t first, std::uint32_t end) {
+    return std::min(kTileSide - first % kTileSide, end - first);
+}
+
+// Pixels [begin, end) of a line of the base level that a column owns, or lines that a pass owns,
+// and [readBegin, readEnd) that it needs.
+struct Span {
     std::uint32_t begin = 0;
     std::uint32_t end = 0;
     std::uint32_t readBegin = 0;
     std::uint32_t readEnd = 0;
 };
+using Column = Span;
 
-// One walk over a base level, from which the levels up to topLevel are made.
+// One walk over a base level or a part of it, from which the levels up to topLevel are made.
 struct Pass {
     std::uint32_t baseLevel = 0;
     std::uint32_t topLevel = 0;
     std::uint32_t stripsAhead = 2;  // strips of the base level that are under way at one time
     std::uint64_t memory = 0;       // bytes of all strips
     std::vector<Column> columns;
+    Span lines;
 };
 
 struct PlanInput {
@@ -69,8 +76,17 @@ std::uint64_t StripMemory(std::uint64_t width, std::uint32_t levels, std::uint32
 // The least budget that this raster can be built with.
 std::uint64_t LeastMemory(const PlanInput& input);
 
-// The passes, in order; empty if the budget is below LeastMemory.
-std::vector<Pass> PlanPasses(const PlanInput& input);
+// The passes that make what is above a level, in order; empty if the budget is below LeastMemory,
+// and where nothing is above it but for level 0, which is made itself.
+std::vector<Pass> PlanPasses(const PlanInput& input, std::uint32_t base = 0);
+
+// Parts of about that many pixels of level 0, at least of one tile each; larger ones where there
+// would be too many. They make as many levels as the budget and the size have room for without
+// kernels that read much twice. The budget is not below LeastMemory.
+PartGrid PlanParts(const PlanInput& input, std::uint32_t partWidth, std::uint32_t partHeight);
+
+// The pass of one part.
+Pass PlanPart(const PlanInput& input, const PartGrid& grid, std::uint64_t part);
 
 }  // namespace zmchost
 

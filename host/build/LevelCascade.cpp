@@ -25,7 +25,9 @@ LevelCascade::LevelCascade(const CascadeSetup& cascadeSetup, const Column& colum
     const std::uint32_t maskBytes = work.NeedsMasks() ? setup.bands : 0;
     for (std::uint32_t i = 0; i < levels.size(); ++i) {
         levels[i].width = (column.readEnd >> i) - (column.readBegin >> i);
-        levels[i].height = (setup.height >> setup.baseLevel) >> i;
+        levels[i].begin = setup.firstLine >> i;
+        levels[i].end = setup.endLine >> i;
+        levels[i].nextRow = setup.firstLine >> (i + 1);
         const bool keeps = setup.halo != 0 && i + 1 < levels.size();
         const std::uint32_t keptRows = keeps ? 2 * setup.halo + 2 : 0;
         levels[i].kept = std::make_unique<Strip>(meter, setup.baseLevel + i,
@@ -61,7 +63,7 @@ void LevelCascade::MakeRows(std::uint32_t level, const Strip& strip,
 
 std::uint32_t LevelCascade::RowsReady(const Level& level, const Strip& strip) const {
     const std::uint32_t end = strip.End();
-    if (end >= level.height) return level.height / 2;
+    if (end >= level.end) return level.end / 2;
     return end < setup.halo ? 0 : (end - setup.halo) / 2;
 }
 
@@ -70,7 +72,7 @@ Strip& LevelCascade::Filling(std::uint32_t level) {
     if (!coarser.filling) {
         const std::uint32_t first = At(level - 1).nextRow;
         coarser.filling = store.Take(level);
-        coarser.filling->Begin(first, std::min(kTileSide, coarser.height - first), coarser.width);
+        coarser.filling->Begin(first, StripLines(first, coarser.end), coarser.width);
     }
     return *coarser.filling;
 }
@@ -89,7 +91,7 @@ void LevelCascade::MakeRow(std::uint32_t level, const Strip& strip, Strip& targe
 
 void LevelCascade::TakeSourceRow(const Level& level, const Strip& strip, std::int64_t line,
                                  std::uint32_t place, RowWindow& window) const {
-    if (line < 0 || line >= level.height) return;
+    if (line < level.begin || line >= level.end) return;
     const auto known = static_cast<std::uint32_t>(line);
     const Strip& holder = known >= strip.firstLine ? strip : *level.kept;
     window.rows[place] = holder.Row(known);
@@ -98,7 +100,7 @@ void LevelCascade::TakeSourceRow(const Level& level, const Strip& strip, std::in
 }
 
 void LevelCascade::KeepRows(Level& level, const Strip& strip) const {
-    if (setup.halo == 0 || strip.End() >= level.height) return;
+    if (setup.halo == 0 || strip.End() >= level.end) return;
     const std::uint32_t needed = 2 * level.nextRow;
     const std::uint32_t first = std::max(needed - std::min(needed, setup.halo), strip.firstLine);
     Strip& kept = *level.kept;

@@ -2,7 +2,9 @@
 //
 // A row of a level is made as soon as the rows that it depends on are there; those that later rows
 // still need, and that leave with their strip, are kept. Full strips of coarser levels come out in
-// the order in which they are finished, the coarsest last.
+// the order in which they are finished, the coarsest last; none of them has lines of two rows of
+// tiles. Where the lines that pass are not all of the level, what lies beyond them counts as
+// outside: the first and last rows of the coarser levels are then of no use.
 #ifndef ZMC_HOST_BUILD_LEVELCASCADE_H
 #define ZMC_HOST_BUILD_LEVELCASCADE_H
 
@@ -19,7 +21,8 @@ namespace zmchost {
 struct CascadeSetup {
     std::uint32_t baseLevel = 0;
     std::uint32_t topLevel = 0;
-    std::uint32_t height = 0;  // of level 0
+    std::uint32_t firstLine = 0;  // of the base level, and the one behind the last: what passes
+    std::uint32_t endLine = 0;
     std::uint32_t bands = 0;
     std::uint32_t pixelBytes = 0;  // without masks
     std::uint32_t halo = 0;
@@ -39,7 +42,8 @@ private:
     // What is known of a level between two of its strips.
     struct Level {
         std::uint32_t width = 0;  // of the column, with its margins
-        std::uint32_t height = 0;
+        std::uint32_t begin = 0;  // first line that is known, and the one behind the last
+        std::uint32_t end = 0;
         std::uint32_t nextRow = 0;    // of the coarser level, to be made from this one
         std::unique_ptr<Strip> kept;  // last rows of the strip before
         StripStore::Loan filling;     // strip of this level that is being made

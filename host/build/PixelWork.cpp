@@ -46,10 +46,7 @@ public:
 
     void BeginSecondWalk() {
         MergeLanes(accumulators);
-        if constexpr (!zelm::kIsComplex<T>)
-            for (std::uint32_t lane = 0; lane < lanes; ++lane)
-                for (std::uint32_t band = 0; band < bands; ++band)
-                    histograms.emplace_back(BinsOf(band));
+        BeginCounts();
     }
 
     void TakeCounts(std::uint32_t lane, const T* row, const unsigned char* mask,
@@ -57,6 +54,47 @@ public:
         if constexpr (!zelm::kIsComplex<T>)
             for (std::uint32_t band = 0; band < bands; ++band)
                 histograms[Place(lane, band)].AddRow(row, mask, band, bands, width);
+    }
+
+    void ClearCounts() {
+        histograms.clear();
+        BeginCounts();
+    }
+
+    std::string SaveSums() {
+        NumberPacker packer;
+        packer.Put(Kind());
+        if constexpr (kCountsEveryValue<T>) SaveMerged(counters, packer);
+        if constexpr (!zelm::kIsComplex<T>) SaveMerged(accumulators, packer);
+        return packer.Bytes();
+    }
+
+    bool MergeSums(std::string_view packed) {
+        NumberUnpacker numbers(packed);
+        if (numbers.Take() != Kind()) return false;
+        if constexpr (kCountsEveryValue<T>)
+            if (!counters.empty()) return LoadInto(counters, numbers);
+        if constexpr (!zelm::kIsComplex<T>)
+            if (!accumulators.empty()) return LoadInto(accumulators, numbers);
+        return numbers.Good() && numbers.Rest().empty();
+    }
+
+    std::string SaveCounts() {
+        NumberPacker packer;
+        if constexpr (!zelm::kIsComplex<T>) SaveMerged(histograms, packer);
+        return packer.Bytes();
+    }
+
+    bool MergeCounts(std::string_view packed) {
+        NumberUnpacker numbers(packed);
+        if constexpr (!zelm::kIsComplex<T>) {
+            auto further = histograms;
+            for (std::uint32_t band = 0; band < bands; ++band)
+                if (!further[band].Load(numbers)) return false;
+            if (!numbers.Rest().empty()) return false;
+            histograms = std::move(further);
+        }
+        return true;
     }
 
     std::vector<FullStatistics> Store(Raster& target) {
@@ -119,6 +157,35 @@ private:
     void MergeLanes(std::vector<Gatherer>& gatherers) {
         for (std::size_t i = bands; i < gatherers.size(); ++i)
             gatherers[i % bands].Merge(gatherers[i]);
+    }
+
+    void BeginCounts() {
+        if constexpr (!zelm::kIsComplex<T>)
+            for (std::uint32_t lane = 0; lane < lanes; ++lane)
+                for (std::uint32_t band = 0; band < bands; ++band)
+                    histograms.emplace_back(BinsOf(band));
+    }
+
+    // What the sums of this object are, for those who take them.
+    std::uint64_t Kind() const {
+        if (!Active()) return 0;
+        return bands * std::uint64_t{4} + (counters.empty() ? 1 : 2);
+    }
+
+    template <class Gatherer>
+    void SaveMerged(std::vector<Gatherer>& gatherers, NumberPacker& packer) {
+        if (gatherers.empty()) return;
+        MergeLanes(gatherers);
+        for (std::uint32_t band = 0; band < bands; ++band) gatherers[band].Save(packer);
+    }
+
+    template <class Gatherer>
+    bool LoadInto(std::vector<Gatherer>& gatherers, NumberUnpacker& numbers) {
+        std::vector<Gatherer> further(bands);
+        for (Gatherer& one : further) one.Load(numbers);
+        if (!numbers.Good() || !numbers.Rest().empty()) return false;
+        for (std::uint32_t band = 0; band < bands; ++band) gatherers[band].Merge(further[band]);
+        return true;
     }
 
     HistogramBins<T> BinsOf(std::uint32_t band) const {
@@ -233,6 +300,12 @@ public:
             static_cast<std::int32_t>(tile.x), static_cast<std::int32_t>(tile.y), tile.width,
             tile.height, allBands, static_cast<std::int32_t>(level), Samples(pixels), cleanMask);
     }
+
+    std::string SaveSums() override { return harvest.SaveSums(); }
+    bool MergeSums(std::string_view packed) override { return harvest.MergeSums(packed); }
+    std::string SaveCounts() override { return harvest.SaveCounts(); }
+    bool MergeCounts(std::string_view packed) override { return harvest.MergeCounts(packed); }
+    void ClearCounts() override { harvest.ClearCounts(); }
 
     std::string Failure() override { return target.TakeFailure(); }
 

@@ -11,6 +11,7 @@
 #include <cstdint>
 #include <memory>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "host/build/BandWeights.h"
@@ -54,6 +55,15 @@ public:
     virtual void BeginSecondWalk() = 0;
     virtual void TakeCounts(std::uint32_t lane, const std::byte* row, const unsigned char* mask,
                             std::uint32_t width) = 0;
+
+    // For builds in parts: what the statistics have gathered as numbers, and what another object of
+    // the same setup has, taken in; false, and nothing is, where the numbers are of another kind.
+    // The same for the counts of the second walk, which can be begun anew.
+    virtual std::string SaveSums() = 0;
+    virtual bool MergeSums(std::string_view packed) = 0;
+    virtual std::string SaveCounts() = 0;
+    virtual bool MergeCounts(std::string_view packed) = 0;
+    virtual void ClearCounts() = 0;
 
     // Whole tiles with all bands, through the module's reader. False if the module says so, which
     // it does not where the disk failed: Failure tells why that did not do all that was asked of it

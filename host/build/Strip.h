@@ -85,6 +85,12 @@ public:
                std::uint64_t baseWidth, std::uint32_t bytesPerPixel,
                std::uint32_t maskBytesPerPixel);
 
+    // Whether its strips do for such levels and pixels.
+    bool Serves(std::uint32_t firstLevel, std::uint32_t lastLevel, std::uint64_t baseWidth) const {
+        return firstLevel == baseLevel && lastLevel - firstLevel + 1 == shelves.size() &&
+               baseWidth <= width;
+    }
+
     struct Return {
         StripStore* store = nullptr;
         void operator()(Strip* strip) const { store->Give(strip); }

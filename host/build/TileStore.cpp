@@ -3,6 +3,7 @@
 #include <cstring>
 
 #include "format/TileWalk.h"
+#include "host/base/Checksum.h"
 #include "host/base/Error.h"
 #include "host/build/BuildPlan.h"
 
@@ -60,7 +61,25 @@ void TileStore::WriteTile(const Strip& strip, std::uint32_t stripBegin, std::uin
     const std::byte* from =
         strip.Row(strip.firstLine) + std::size_t{tile.x - stripBegin} * setup.pixelBytes;
     CopyLines(buffer.Data(), lineBytes, from, strip.RowBytes(), lineBytes, tile.height);
+    if (summedLevel == strip.level) sum += SumOfTile(tile);
     Check("write a tile", work.WriteTile(strip.level, tile, buffer.Data(), cleanMask.data()));
+}
+
+// Of the tile in the buffer.
+std::uint64_t TileStore::SumOfTile(const Window& tile) const {
+    const std::uint64_t place = std::uint64_t{tile.y} << 32 | tile.x;
+    const std::size_t bytes = std::size_t{tile.width} * tile.height * setup.pixelBytes;
+    return PixelChecksum(place, {buffer.Data(), bytes});
+}
+
+std::uint64_t TileStore::SumOf(std::uint32_t level, const Window& tiles) {
+    const std::lock_guard<std::mutex> lock(mutex);
+    std::uint64_t total = 0;
+    zelm::VisitTiles(Geometry(level), tiles, [&](const zelm::TilePart& tile) {
+        Check("read a tile back", work.ReadTile(level, tile.tile, buffer.Data()));
+        total += SumOfTile(tile.tile);
+    });
+    return total;
 }
 
 void TileStore::Check(const char* operation, bool done) {

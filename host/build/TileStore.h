@@ -8,6 +8,7 @@
 
 #include <cstdint>
 #include <mutex>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -39,6 +40,13 @@ public:
     void Write(const Strip& strip, std::uint32_t stripBegin, std::uint32_t begin,
                std::uint32_t end);
 
+    // From now on the tiles of a level that are written are summed up; Sum is the same whatever
+    // their order. Of two tiles with the same pixels in other places it tells too.
+    void SumLevel(std::uint32_t level) { summedLevel = level; }
+    std::uint64_t Sum() const { return sum; }
+    // The same of tiles as they stand in the file. Throws Error.
+    std::uint64_t SumOf(std::uint32_t level, const Window& tiles);
+
     // Reads a window of a level whose tiles were all written. Throws Error, as the next does.
     void Read(std::uint32_t level, const Window& window, std::byte* pixels);
 
@@ -53,11 +61,14 @@ private:
     zelm::LevelGeometry Geometry(std::uint32_t level) const;
     void WriteTile(const Strip& strip, std::uint32_t stripBegin, std::uint32_t column,
                    std::uint32_t row);
+    std::uint64_t SumOfTile(const Window& tile) const;
     void Check(const char* operation, bool done);
 
     TileStoreSetup setup;
     PixelWork& work;
     std::mutex mutex;
+    std::optional<std::uint32_t> summedLevel;
+    std::uint64_t sum = 0;
     MeteredBytes buffer;
     std::vector<unsigned char> cleanMask;
 };

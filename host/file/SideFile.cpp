@@ -69,7 +69,7 @@ std::string SideFile::MakeTemporary(const std::string& file, const std::string& 
     return "";
 }
 
-void SideFile::RemoveStale(const std::string& file, const std::string& kind) {
+void SideFile::RemoveStale(const std::string& file, const std::string& kind, const Spare& spare) {
     using Result = platform::FileLock::Result;
     const std::string folder = platform::FolderOf(file);
     const std::string prefix = Prefix(file, kind);
@@ -77,7 +77,8 @@ void SideFile::RemoveStale(const std::string& file, const std::string& kind) {
         if (!IsTemporary(name, prefix)) continue;
         const std::string path = platform::JoinPath(folder, name);
         platform::FileLock lock;
-        if (lock.Take(path) == Result::Taken) platform::RemoveEntry(path);
+        if (lock.Take(path) == Result::Taken && !(spare && spare(name)))
+            platform::RemoveEntry(path);
     }
 }
 

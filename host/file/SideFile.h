@@ -7,6 +7,7 @@
 #ifndef ZMC_HOST_FILE_SIDEFILE_H
 #define ZMC_HOST_FILE_SIDEFILE_H
 
+#include <functional>
 #include <string>
 
 #include "platform/FileLock.h"
@@ -29,8 +30,11 @@ public:
     // LastErrorText, if that cannot be done.
     static std::string MakeTemporary(const std::string& file, const std::string& kind,
                                      platform::FileLock& lock);
+    // Whether a file of that name, whose lock is held by then, is to stay nevertheless.
+    using Spare = std::function<bool(const std::string& name)>;
     // Removes the temporary files of that kind whose lock nobody holds.
-    static void RemoveStale(const std::string& file, const std::string& kind);
+    static void RemoveStale(const std::string& file, const std::string& kind,
+                            const Spare& spare = {});
 };
 
 }  // namespace zmchost

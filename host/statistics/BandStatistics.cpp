@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cmath>
+#include <cstring>
 #include <limits>
 
 namespace zmchost {
@@ -24,6 +25,21 @@ void SetIfHeld(double& field, std::uint32_t& flags, std::uint32_t flag, long dou
     if (!std::isfinite(rounded)) return;
     field = rounded;
     flags |= flag;
+}
+
+// A sample as a number that keeps all of it, and back.
+template <class T>
+std::uint64_t BitsOf(T value) {
+    std::uint64_t bits = 0;
+    std::memcpy(&bits, &value, sizeof value);
+    return bits;
+}
+
+template <class T>
+T FromBits(std::uint64_t bits) {
+    T value{};
+    std::memcpy(&value, &bits, sizeof value);
+    return value;
 }
 
 // The sums of up to 65536 samples of at most 32 bits fit in 64, and so do the squares of 16 bits.
@@ -128,6 +144,29 @@ void BandAccumulator<T>::Merge(const BandAccumulator& other) {
         maximum = count != 0 ? std::max(maximum, other.maximum) : other.maximum;
     }
     count += other.count;
+}
+
+template <class T>
+void BandAccumulator<T>::Save(NumberPacker& packer) const {
+    packer.Put(count);
+    if constexpr (!zelm::kIsComplex<T>) {
+        if (count == 0) return;
+        packer.Put(BitsOf(minimum));
+        packer.Put(BitsOf(maximum));
+        sums.Save(packer);
+    }
+}
+
+template <class T>
+void BandAccumulator<T>::Load(NumberUnpacker& numbers) {
+    *this = BandAccumulator();
+    count = numbers.Take();
+    if constexpr (!zelm::kIsComplex<T>) {
+        if (count == 0) return;
+        minimum = FromBits<T>(numbers.Take());
+        maximum = FromBits<T>(numbers.Take());
+        sums.Load(numbers);
+    }
 }
 
 template <class T>

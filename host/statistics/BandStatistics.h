@@ -31,6 +31,11 @@ public:
     // Takes all that `other` has seen.
     void Merge(const BandAccumulator& other);
 
+    // All of it as numbers that are exact, and back; what is loaded replaces what was there.
+    // Complex types have nothing to keep but their count.
+    void Save(NumberPacker& packer) const;
+    void Load(NumberUnpacker& numbers);
+
     std::uint64_t Count() const { return count; }
 
     // The record: count, and the seven values with their flags. The standard deviation is that of

@@ -7,6 +7,7 @@
 #ifndef ZMC_HOST_STATISTICS_EXACTSUMS_H
 #define ZMC_HOST_STATISTICS_EXACTSUMS_H
 
+#include <algorithm>
 #include <bit>
 #include <cstdint>
 #include <type_traits>
@@ -15,6 +16,7 @@
 #include "core/ElementTypes.h"
 #include "host/base/BigInteger.h"
 #include "host/base/Int128.h"
+#include "host/base/PackedNumbers.h"
 
 namespace zmchost {
 
@@ -37,6 +39,14 @@ struct WideSum {
     void Merge(const WideSum& other) {
         Add(other.low);
         high += other.high;
+    }
+    void Save(NumberPacker& packer) const {
+        packer.Put(low);
+        packer.Put(high);
+    }
+    void Load(NumberUnpacker& numbers) {
+        low = numbers.TakeLong();
+        high = numbers.Take();
     }
     BigInteger Value(std::uint32_t shift = 0) const {
         BigInteger value(low, false, shift);
@@ -66,6 +76,15 @@ public:
     void Merge(const ExactSums& other) {
         sum += other.sum;
         squares.Merge(other.squares);
+    }
+    // As numbers, and back; what is loaded replaces what was there.
+    void Save(NumberPacker& packer) const {
+        packer.Put(static_cast<UInt128>(sum));
+        squares.Save(packer);
+    }
+    void Load(NumberUnpacker& numbers) {
+        sum = static_cast<Int128>(numbers.TakeLong());
+        squares.Load(numbers);
     }
     BigInteger Sum() const { return BigInteger::Signed(sum); }
     BigInteger SumOfSquares() const { return squares.Value(); }
@@ -121,6 +140,27 @@ public:
         }
     }
 
+    // As numbers, and back; of the exponents that occur alone.
+    void Save(NumberPacker& packer) const {
+        const auto used = [](const Slot& slot) { return !slot.Empty(); };
+        packer.Put(static_cast<std::uint64_t>(std::count_if(slots.begin(), slots.end(), used)));
+        for (std::uint32_t i = 0; i < slots.size(); ++i) {
+            if (slots[i].Empty()) continue;
+            packer.Put(std::uint64_t{i});
+            packer.Put(static_cast<UInt128>(slots[i].sum));
+            slots[i].squares.Save(packer);
+        }
+    }
+    void Load(NumberUnpacker& numbers) {
+        slots.assign(kExponents, Slot());
+        for (std::uint64_t left = numbers.Take(); left > 0 && numbers.Good(); --left) {
+            const std::uint64_t exponent = numbers.Take();
+            if (exponent >= kExponents) return numbers.Refuse();
+            slots[exponent].sum = static_cast<Int128>(numbers.TakeLong());
+            slots[exponent].squares.Load(numbers);
+        }
+    }
+
     BigInteger Sum() const {
         BigInteger total;
         for (std::uint32_t i = 0; i < slots.size(); ++i) {
@@ -141,6 +181,8 @@ private:
     struct Slot {
         Int128 sum = 0;
         WideSum squares;
+
+        bool Empty() const { return sum == 0 && squares.low == 0 && squares.high == 0; }
     };
     static constexpr Bits kSign = Bits{1} << (8 * sizeof(T) - 1);
 

@@ -1,6 +1,9 @@
 #include "host/statistics/Histogram.h"
 
 #include <algorithm>
+#include <span>
+
+#include "host/base/Checksum.h"
 
 namespace zmchost {
 
@@ -26,6 +29,30 @@ template <class T>
 void HistogramAccumulator<T>::Merge(const HistogramAccumulator& other) {
     const std::size_t n = std::min(counts.size(), other.counts.size());
     for (std::size_t i = 0; i < n; ++i) counts[i] += other.counts[i];
+}
+
+template <class T>
+void HistogramAccumulator<T>::Save(NumberPacker& packer) const {
+    packer.Put(DivisionSum());
+    packer.Put(std::uint64_t{counts.size()});
+    for (const std::uint64_t one : counts) packer.Put(one);
+}
+
+template <class T>
+bool HistogramAccumulator<T>::Load(NumberUnpacker& numbers) {
+    if (numbers.Take() != DivisionSum() || numbers.Take() != counts.size()) numbers.Refuse();
+    std::vector<std::uint64_t> further(numbers.Good() ? counts.size() : 0);
+    for (std::uint64_t& one : further) one = numbers.Take();
+    if (!numbers.Good()) return false;
+    for (std::size_t i = 0; i < further.size(); ++i) counts[i] += further[i];
+    return true;
+}
+
+// By which bins of another range are told from these.
+template <class T>
+std::uint64_t HistogramAccumulator<T>::DivisionSum() const {
+    const T ends[2] = {bins.Minimum(), bins.Maximum()};
+    return PixelChecksum(counts.size(), std::as_bytes(std::span(ends)));
 }
 
 template <class T>

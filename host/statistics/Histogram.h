@@ -12,6 +12,7 @@
 #include <vector>
 
 #include "core/ElementTypes.h"
+#include "host/base/PackedNumbers.h"
 #include "host/statistics/HistogramBins.h"
 #include "raster/RasterBandHistogram.h"
 
@@ -32,6 +33,11 @@ public:
     // Takes the counts of `other`, which has the same bins.
     void Merge(const HistogramAccumulator& other);
 
+    // Its bins and counts as numbers. Load adds those of the same bins; false, and nothing is
+    // added, where the numbers are of other bins or are none.
+    void Save(NumberPacker& packer) const;
+    bool Load(NumberUnpacker& numbers);
+
     const std::vector<std::uint64_t>& Counts() const { return counts; }
 
     // The record, for level 0 and of source ORVA, the one that a file keeps. If the memory for the
@@ -39,6 +45,8 @@ public:
     zelm::RasterBandHistogram<T> Histogram(std::uint32_t band) const;
 
 private:
+    std::uint64_t DivisionSum() const;
+
     HistogramBins<T> bins;
     std::vector<std::uint64_t> counts;
 };

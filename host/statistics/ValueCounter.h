@@ -58,6 +58,27 @@ public:
         for (std::size_t i = 0; i < counts.size(); ++i) counts[i] += other.counts[i];
     }
 
+    // The counts of the values that occur as numbers. Load adds them.
+    void Save(NumberPacker& packer) const {
+        std::uint64_t occurring = 0;
+        for (std::size_t i = 0; i < kValues; ++i) occurring += CountAt(i) != 0 ? 1u : 0u;
+        packer.Put(occurring);
+        for (std::size_t i = 0, before = 0; i < kValues; ++i) {
+            if (CountAt(i) == 0) continue;
+            packer.Put(std::uint64_t{i - before});
+            packer.Put(CountAt(i));
+            before = i;
+        }
+    }
+    void Load(NumberUnpacker& numbers) {
+        std::uint64_t place = 0;
+        for (std::uint64_t left = numbers.Take(); left > 0 && numbers.Good(); --left) {
+            place += numbers.Take();
+            if (place >= kValues) return numbers.Refuse();
+            counts[place] += numbers.Take();
+        }
+    }
+
     std::uint64_t Count(T value) const { return CountAt(static_cast<Index>(value)); }
 
     // Statistics and histogram of all that was seen, as the accumulators would have found them.

@@ -123,6 +123,8 @@ bool LinkFile(const std::string& file, const std::string& name) noexcept {
 
 bool RemoveEntry(const std::string& path) noexcept { return ::unlink(path.c_str()) == 0; }
 
+bool RemoveFolder(const std::string& path) noexcept { return ::rmdir(path.c_str()) == 0; }
+
 bool SyncFile(const std::string& path) noexcept { return Sync(path, O_RDONLY); }
 
 bool SyncFolder(const std::string& folder) noexcept { return Sync(folder, O_RDONLY | O_DIRECTORY); }

@@ -1,6 +1,9 @@
 #include "platform/Program.h"
 
+#include <unistd.h>
+
 #include <cinttypes>
+#include <climits>
 #include <cstdint>
 #include <cstdio>
 #include <cstdlib>
@@ -35,6 +38,12 @@ std::string FileOfCode(const void* code) {
     constexpr std::string_view kRemoved = " (deleted)";
     if (path.ends_with(kRemoved)) path.resize(path.size() - kRemoved.size());
     return path;
+}
+
+std::string FileOfProgram() {
+    char path[PATH_MAX];
+    const ssize_t length = ::readlink("/proc/self/exe", path, sizeof path);
+    return length > 0 ? std::string(path, static_cast<std::size_t>(length)) : std::string();
 }
 
 std::string EnvironmentValue(const char* name) {

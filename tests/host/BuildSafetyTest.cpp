@@ -11,6 +11,7 @@
 #include <stdexcept>
 
 #include "host/build/BuildFile.h"
+#include "host/build/PartFolder.h"
 #include "host/build/PyramidBuilder.h"
 #include "host/build/TileStore.h"
 #include "host/raster/Raster.h"
@@ -197,6 +198,23 @@ TEST_F(BuildSafety, OnlyLeavingsThatNobodyHoldsAreRemoved) {
     for (const std::string& name : kept) EXPECT_THAT(names, testing::Contains(name));
 }
 
+TEST_F(BuildSafety, CompanionsOfFilesThatAreGoneGoToo) {
+    const std::string gone = ".old.zmc.zmcbuild-99999999-5.tmp";
+    const std::string there = ".old.zmc.zmcplan-99999999-6.tmp";
+    for (const std::string& owner : {gone, there}) {
+        for (const char* const ending : {".plan", ".new"})
+            zmctest::WriteText(folder / (owner + ending), "");
+        const PartFolder records(folder / (owner + ".parts"), 1);
+        records.Make();
+        records.Keep(PartFolder::Kind::Part, 3, {});
+    }
+    zmctest::WriteText(folder / there, "");
+    builder.Build(source, target, Overwriting());
+    EXPECT_THAT(NamesIn(folder.String()),
+                testing::UnorderedElementsAre("old.zmc", there, there + ".plan", there + ".new",
+                                              there + ".parts"));
+}
+
 TEST_F(BuildSafety, FileUnderConstructionIsHeld) {
     BuildOptions options = Overwriting();
     std::size_t held = 0;
@@ -262,6 +280,11 @@ public:
                         std::uint32_t) override {}
     bool NeedsSecondWalk() const override { return false; }
     void BeginSecondWalk() override {}
+    std::string SaveSums() override { return ""; }
+    bool MergeSums(std::string_view) override { return false; }
+    std::string SaveCounts() override { return ""; }
+    bool MergeCounts(std::string_view) override { return false; }
+    void ClearCounts() override {}
     void TakeCounts(std::uint32_t, const std::byte*, const unsigned char*, std::uint32_t) override {
     }
     bool ReadTile(std::uint32_t, const Window&, std::byte*) override { return answer; }

@@ -1,6 +1,7 @@
-# Each header installed in ZMC_PREFIX compiles by itself with ZMC_CXX, from the prefix alone, though
-# folders of the same names as ours stand first in the search path; nothing but the list ZMC_HEADERS
-# is installed; and what the headers include of others is what the package brings.
+# The headers installed in ZMC_PREFIX compile with ZMC_CXX, from the prefix alone, though folders of the
+# same names as ours stand first in the search path: each by itself, or with ZMC_TOGETHER all of them,
+# twice, in one source. Nothing but the list ZMC_HEADERS is installed; and what the headers include of
+# others is what the package brings.
 cmake_minimum_required(VERSION 3.25)
 string(REPLACE "," ";" wanted "${ZMC_HEADERS}")
 list(SORT wanted)
@@ -13,6 +14,7 @@ endif()
 
 # Of the libraries that the interface stands on, one has a type in it.
 set(foreign "")
+set(all "")
 set(work ${ZMC_SCRATCH})
 file(REMOVE_RECURSE ${work})
 foreach(header IN LISTS headers)
@@ -21,8 +23,15 @@ foreach(header IN LISTS headers)
     list(APPEND foreign ${includes})
     file(WRITE ${work}/own/${header} "#error this is a header of the host's own\n")
     string(MAKE_C_IDENTIFIER ${header} name)
-    file(WRITE ${work}/sources/${name}.cpp "#include <zmcraster/${header}>\n")
+    set(include "#include <zmcraster/${header}>\n")
+    string(APPEND all "${include}")
+    if(NOT ZMC_TOGETHER)
+        file(WRITE ${work}/sources/${name}.cpp "${include}")
+    endif()
 endforeach()
+if(ZMC_TOGETHER)
+    file(WRITE ${work}/sources/all.cpp "${all}${all}")
+endif()
 list(REMOVE_DUPLICATES foreign)
 if(NOT foreign STREQUAL "#include <oneapi/tbb/mutex.h>")
     message(FATAL_ERROR "installed headers include ${foreign}")
@@ -34,5 +43,5 @@ execute_process(COMMAND sh -c
     -I${ZMC_PREFIX}/include
     RESULT_VARIABLE result ERROR_VARIABLE errors)
 if(NOT result EQUAL 0)
-    message(FATAL_ERROR "an installed header does not compile by itself:\n${errors}")
+    message(FATAL_ERROR "installed headers do not compile:\n${errors}")
 endif()

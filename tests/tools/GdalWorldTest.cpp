@@ -94,5 +94,40 @@ TEST_F(GdalWorld, DriversWriteAsTheyDoElsewhere) {
     EXPECT_NE(before, std::vector<int>(before.size(), 1)) << "GDAL refuses nothing by itself";
 }
 
+// What GDAL keeps of a file of bytes once strips of 4000 pixels are asked for.
+class Blocks : public GdalWorld {
+protected:
+    static GIntBig KeptOf(const char* driver, const std::vector<const char*>& options,
+                          bool masked) {
+        constexpr const char* kName = "/vsimem/blocks";
+        GDALDriver* const maker = GetGDALDriverManager()->GetDriverByName(driver);
+        std::vector<const char*> list = options;
+        list.push_back(nullptr);
+        const DatasetPtr made(
+            maker->Create(kName, 100000, 5000, 3, GDT_Byte, const_cast<char**>(list.data())));
+        EXPECT_TRUE(!masked || made->CreateMaskBand(GMF_PER_DATASET) == CE_None);
+        GDALSetCacheMax64(kUsual);
+        KeepBlocksForStrips(*made, 4000);
+        return GDALGetCacheMax64();
+    }
+
+    static constexpr GIntBig kUsual = GIntBig{96} << 20;
+};
+
+TEST_F(Blocks, AreKeptForStripsOfTiledFiles) {
+    const std::vector<const char*> tiled = {"TILED=YES", "SPARSE_OK=TRUE"};
+    const GIntBig kept = KeptOf("GTiff", tiled, false);
+    EXPECT_GE(kept, 4000 * 3 * (256 + 256));
+    EXPECT_LE(kept, 4000 * 3 * (256 + 256) * 2);
+    EXPECT_EQ(KeptOf("GTiff", tiled, true), kUsual) << "a mask has other blocks";
+}
+
+TEST_F(Blocks, AreKeptForWholeLinesWhereFilesHaveThem) {
+    EXPECT_GE(KeptOf("GTiff", {"SPARSE_OK=TRUE"}, false), 100000 * 3 * 256);
+    EXPECT_EQ(KeptOf("GTiff", {"SPARSE_OK=TRUE", "BLOCKYSIZE=5000"}, false), kUsual);
+}
+
+TEST_F(Blocks, AreKeptAsUsualOfOtherFormats) { EXPECT_EQ(KeptOf("VRT", {}, false), kUsual); }
+
 }  // namespace
 }  // namespace zmctools

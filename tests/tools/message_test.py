@@ -4,7 +4,7 @@ import re
 
 from frame import ToolTest, geotiff, samples
 
-COMMANDS = ["build", "info", "export", "hash", "verify", "compare", "recover",
+COMMANDS = ["build", "plan", "part", "finish", "status", "info", "export", "hash", "verify", "compare", "recover",
             "preview", "serve"]
 
 

@@ -1,6 +1,7 @@
 """What is drawn on a terminal, and only there."""
 import os
 import pty
+import re
 import subprocess
 
 from osgeo import gdal
@@ -48,6 +49,13 @@ class Terminal(ToolTest):
                                     r"(  \d+:\d\d left)?$")
             self.assertLess(len(shown), 100)
         # The bar is wiped, and the report stands alone on its line.
+        self.assertRegex(text.split("\r\x1b[K")[-1], r"^made\.pyr: 8000 x 6000 pixels")
+
+    def test_the_bar_of_processes_is_one(self):
+        text = self.record("build", "large.tif", "made.pyr", "--processes", "2")
+        shares = [int(share) for share in re.findall(r"\] +(\d+) %", text)]
+        self.assertGreater(len(shares), 1)
+        self.assertEqual(shares, sorted(shares))
         self.assertRegex(text.split("\r\x1b[K")[-1], r"^made\.pyr: 8000 x 6000 pixels")
 
     def test_no_bar_when_quiet_or_piped(self):

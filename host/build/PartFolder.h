@@ -1,0 +1,49 @@
+// PartFolder: what is kept of the parts of a build until it is finished, one small file for each.
+//
+//     FOLDER/17.part     what PartBuild::Make told of part 17
+//     FOLDER/17.count    what PartBuild::Count did
+//
+// A record appears whole or not at all, and replaces one that is there: processes that make the
+// same part write the same record. It tells which build it belongs to and carries a checksum; what
+// is damaged, of another build or of another part counts as missing. Any number of processes may
+// use the folder at once. Failures to write are thrown as Error.
+#ifndef ZMC_HOST_BUILD_PARTFOLDER_H
+#define ZMC_HOST_BUILD_PARTFOLDER_H
+
+#include <cstdint>
+#include <optional>
+#include <string>
+
+#include "host/build/PartBuild.h"
+
+namespace zmchost {
+
+class PartFolder {
+public:
+    enum class Kind { Part, Count };
+
+    // `build` is a number that no other build has. Where `durable`, a record that is there stays
+    // there when the power fails.
+    PartFolder(std::string folderPath, std::uint64_t build, bool durable = true);
+
+    const std::string& Path() const { return folder; }
+
+    // Makes the folder, which must not exist.
+    void Make() const;
+    void Keep(Kind kind, std::uint64_t part, const PartResult& result) const;
+    std::optional<PartResult> Find(Kind kind, std::uint64_t part) const;
+    // Removes all records, whole or not, and the folder if nothing else is in it.
+    void Remove() const noexcept;
+
+private:
+    std::string NameOf(Kind kind, std::uint64_t part) const;
+    std::string Encode(Kind kind, std::uint64_t part, const PartResult& result) const;
+
+    std::string folder;
+    std::uint64_t build;
+    bool durable;
+};
+
+}  // namespace zmchost
+
+#endif

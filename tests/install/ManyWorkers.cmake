@@ -1,0 +1,45 @@
+# Uses what stands in ZMC_PREFIX for builds by many workers: the program for Dask, which has to find its module
+# and the command, and the scripts for other clusters.
+cmake_minimum_required(VERSION 3.25)
+set(dask ${ZMC_PREFIX}/${ZMC_BINDIR}/zmcraster-dask)
+set(man ${ZMC_PREFIX}/${ZMC_MANDIR}/man1/zmcraster-dask.1)
+set(examples ${ZMC_PREFIX}/${ZMC_DOCDIR}/examples)
+foreach(variable ZMCRASTER_MODULE GDAL_DRIVER_PATH LD_LIBRARY_PATH PYTHONPATH)
+    unset(ENV{${variable}})
+endforeach()
+set(ENV{PATH} "${ZMC_PREFIX}/${ZMC_BINDIR}:$ENV{PATH}")
+
+# run(command...): the command succeeds; what it prints is in `output`.
+function(run)
+    execute_process(COMMAND ${ARGN} WORKING_DIRECTORY ${ZMC_SCRATCH} RESULT_VARIABLE result
+        OUTPUT_VARIABLE output ERROR_VARIABLE errors)
+    if(NOT result EQUAL 0)
+        message(FATAL_ERROR "${ARGN} ended with ${result}:\n${output}${errors}")
+    endif()
+    set(output "${output}" PARENT_SCOPE)
+endfunction()
+
+file(REMOVE_RECURSE ${ZMC_SCRATCH})
+file(MAKE_DIRECTORY ${ZMC_SCRATCH})
+run(${dask} --help)
+string(REGEX MATCHALL "--[a-z]+" options "${output}")
+file(READ ${man} page)
+string(REPLACE "\\" "" page "${page}")
+foreach(option ${options})
+    if(NOT page MATCHES "${option}")
+        message(FATAL_ERROR "${man} does not tell of ${option}")
+    endif()
+endforeach()
+
+file(WRITE ${ZMC_SCRATCH}/image.asc "ncols 3\nnrows 2\nxllcorner 0\nyllcorner 0\ncellsize 1\n1 2 3\n4 5 6\n")
+run(zmcraster build image.asc one.pyr)
+run(${dask} image.asc made.pyr --workers 1)
+run(${CMAKE_COMMAND} -E compare_files one.pyr made.pyr)
+
+file(WRITE ${ZMC_SCRATCH}/mpirun "#!/bin/sh\nshift 2\nOMPI_COMM_WORLD_RANK=0 exec \"$@\"\n")
+file(CHMOD ${ZMC_SCRATCH}/mpirun PERMISSIONS OWNER_READ OWNER_WRITE OWNER_EXECUTE)
+set(ENV{PATH} "${ZMC_SCRATCH}:$ENV{PATH}")
+run(${examples}/mpi-pyramid 1 image.asc mpi.pyr)
+run(${CMAKE_COMMAND} -E compare_files one.pyr mpi.pyr)
+run(sh -n ${examples}/slurm-pyramid)
+run(test -x ${examples}/slurm-pyramid)

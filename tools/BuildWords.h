@@ -1,0 +1,41 @@
+// BuildWords: what build and plan are told on the command line of source, target and what is to be
+// made of them; a plan keeps these words.
+#ifndef ZMC_TOOLS_BUILDWORDS_H
+#define ZMC_TOOLS_BUILDWORDS_H
+
+#include <string>
+
+#include "host/build/PyramidBuilder.h"
+#include "tools/GdalWorld.h"
+#include "tools/OptionTable.h"
+
+namespace zmctools {
+
+struct BuildWords {
+    std::string source;
+    std::string target;
+    std::string levels = "auto";
+    std::string resampling;
+    std::string weights = "auto";
+    std::string ordering = "auto";
+    std::string noData;
+    std::string bands;
+    std::string bins = "256";
+    std::string memory = "256M";
+    bool noStatistics = false;
+    bool overwrite = false;
+    bool embed = false;
+
+    // Adds all of them to the command line.
+    void Describe(OptionTable& table);
+    // What they mean for a source with these properties. Throws UsageError.
+    zmchost::BuildOptions Options(const zelm::RasterProps& props) const;
+    // Throws Failure for a target that cannot be made or is not to be replaced.
+    void CheckTarget() const;
+    // Throws Failure too for a source that is incomplete.
+    DatasetPtr OpenSource() const;
+};
+
+}  // namespace zmctools
+
+#endif

@@ -1,0 +1,95 @@
+#include "tools/PlannedBuild.h"
+
+#include <utility>
+
+#include "gdal/Dataset.h"
+#include "platform/FileSystem.h"
+#include "tools/Message.h"
+#include "tools/SourceState.h"
+
+namespace zmctools {
+
+std::string PartList(const std::vector<std::uint64_t>& parts) {
+    constexpr std::size_t kMost = 20;
+    std::string text;
+    std::size_t ranges = 0;
+    for (std::size_t i = 0; i < parts.size(); ++ranges) {
+        std::size_t last = i;
+        while (last + 1 < parts.size() && parts[last + 1] == parts[last] + 1) ++last;
+        if (ranges == kMost) return text + ", ...";
+        text += (i == 0 ? "" : ", ") + std::to_string(parts[i]);
+        if (last != i) text += '-' + std::to_string(parts[last]);
+        i = last + 1;
+    }
+    return text;
+}
+
+PlannedBuild::PlannedBuild(PyramidPlan openedPlan, std::uint32_t threads)
+    : plan(std::move(openedPlan)),
+      dataset(plan.words.OpenSource()),
+      pixels(*dataset),
+      options(plan.words.Options(pixels.Props())),
+      records(plan.Records()) {
+    options.threads = threads;
+    options.progress = [this](const zmchost::BuildProgress& state) {
+        return !progress || progress(state);
+    };
+    plan.CheckFile();
+    CheckSource();
+}
+
+void PlannedBuild::CheckSource() const {
+    if (SourceState(*dataset) != plan.sourceState)
+        throw Failure(plan.words.source, "it changed since the plan was made");
+}
+
+void PlannedBuild::Start() {
+    build.emplace(zmcgdal::SharedModule(), pixels, plan.words.target, options, plan.PyramidPath());
+    if (build->Facts() != plan.facts)
+        throw Failure(plan.words.source, "it is not what the plan was made for");
+    build->SetGrid(plan.grid);
+    KeepBlocksForStrips(*dataset, plan.grid.PartWidth() + plan.grid.PartWidth() / 50);
+}
+
+void PlannedBuild::Keep(Kind kind, std::uint64_t part, const zmchost::PartResult& result) const {
+    const bool written =
+        !plan.durable || kind == Kind::Count || platform::SyncFile(plan.PyramidPath());
+    const std::string reason = platform::LastErrorText();
+    CheckSource();
+    // What was finished meanwhile is not there to be written any more.
+    plan.CheckFile();
+    if (!written) throw Failure(plan.words.target, "it cannot be written to the disk: " + reason);
+    records.Keep(kind, part, result);
+}
+
+void PlannedBuild::Make(std::uint64_t part) {
+    CheckSource();
+    plan.CheckFile();
+    Keep(Kind::Part, part, build->Make(part));
+}
+
+void PlannedBuild::Gather() {
+    std::vector<std::uint64_t> missing;
+    for (std::uint64_t part = 0; part < plan.grid.Count(); ++part) {
+        const auto result = records.Find(Kind::Part, part);
+        if (!result || !build->Take(part, *result)) missing.push_back(part);
+    }
+    if (missing.empty()) return;
+    throw Failure(plan.path, std::to_string(missing.size()) + " of " +
+                                 std::to_string(plan.grid.Count()) +
+                                 " parts are missing: " + PartList(missing));
+}
+
+void PlannedBuild::Count(std::uint64_t part) { Keep(Kind::Count, part, {0, build->Count(part)}); }
+
+// What was not counted yet, or not with these minima and maxima, is counted now.
+zmchost::BuildReport PlannedBuild::Finish(zmchost::BuildFile& file) {
+    for (std::uint64_t part = 0; NeedsCounts() && part < plan.grid.Count(); ++part)
+        if (const auto counts = records.Find(Kind::Count, part))
+            build->TakeCounts(part, counts->sums);
+    const zmchost::BuildReport report = build->Finish(file);
+    CheckSource();
+    return report;
+}
+
+}  // namespace zmctools

@@ -1,0 +1,55 @@
+// PyramidPlan: a build that was laid out to be made in parts, as the file TARGET.zmcplan tells it.
+//
+// A plan names the source, and the target and its file by their names alone: both stand in the
+// plan's own folder. It carries the words of the command line that made it, the parts, what tells
+// its source, target and file again, and a checksum over all of that, which is the number of the
+// build in the records of its parts too: a plan that was changed has no record.
+#ifndef ZMC_TOOLS_PYRAMIDPLAN_H
+#define ZMC_TOOLS_PYRAMIDPLAN_H
+
+#include <cstdint>
+#include <string>
+
+#include "host/build/PartFolder.h"
+#include "host/build/PartGrid.h"
+#include "tools/BuildWords.h"
+
+namespace zmctools {
+
+inline constexpr const char* kPlanFileEnding = ".zmcplan";
+
+struct PyramidPlan {
+    BuildWords words;  // target: as it is reached from here
+    std::string sourceState;
+    std::uint64_t facts = 0;   // of PartBuild
+    std::string pyramid;       // name of the file that was laid out
+    std::uint64_t number = 0;  // of that file in the file system
+    std::string targetState;   // when the plan was made
+    zmchost::PartGrid grid;
+    bool durable = true;         // records and tiles are brought to the disk part by part
+    std::string path;            // of the plan itself
+    std::uint64_t checksum = 0;  // set by Write and Read
+
+    // Where the file is, and its records.
+    std::string PyramidPath() const;
+    zmchost::PartFolder Records() const;
+    // Whether the file is there, and the one that was laid out.
+    bool HasFile() const;
+    // Throws Failure if not.
+    void CheckFile() const;
+    // Whether the target is that file: it was finished.
+    bool IsFinished() const;
+
+    // Makes the folder of the records, and gives the plan its name, in one step; a plan of that
+    // name is not replaced. Throws Failure or Error, and leaves nothing then.
+    void Write();
+    // Throws Failure for what is no plan, one of another version or one that was changed.
+    static PyramidPlan Read(const std::string& file);
+
+    // Removes records and plan, and the file if it was not finished.
+    void Discard() const;
+};
+
+}  // namespace zmctools
+
+#endif
