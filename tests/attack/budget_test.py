@@ -11,7 +11,7 @@ import unittest
 import attack
 import hostile
 
-ASKS_AFTER = 0.5  # seconds of a command that goes through a large file
+ASKS_AFTER = 0.5  # seconds of processor time of a command that goes through a large file
 DRIVER = not attack.SANITIZED
 
 
