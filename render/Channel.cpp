@@ -58,15 +58,11 @@ public:
           tone(settings.tone) {
         if constexpr (kTabled)
             if (tone) settings.depth == 8 ? Tabulate(narrow) : Tabulate(wide);
+        plain = std::is_same_v<T, unsigned char> && !MayMissSamples() && LeavesSamples();
     }
 
-    bool MayMiss() const override { return rule.hasValue || !std::is_integral_v<T>; }
-    bool IsPlain() const override {
-        if (!std::is_same_v<T, unsigned char> || MayMiss() || narrow.empty()) return false;
-        for (std::size_t i = 0; i < narrow.size(); ++i)
-            if (narrow[i] != i) return false;
-        return true;
-    }
+    bool MayMiss() const override { return MayMissSamples(); }
+    bool IsPlain() const override { return plain; }
     void Levels(const SampleLine& line, std::uint8_t* levels, std::size_t step) const override {
         Fill(line, levels, step, narrow);
     }
@@ -110,6 +106,15 @@ private:
     std::shared_ptr<const Tone> tone;
     std::vector<std::uint8_t> narrow;  // by sample, of the types that have few
     std::vector<std::uint16_t> wide;
+    bool plain = false;
+
+    bool MayMissSamples() const { return rule.hasValue || !std::is_integral_v<T>; }
+
+    bool LeavesSamples() const {
+        for (std::size_t i = 0; i < narrow.size(); ++i)
+            if (narrow[i] != i) return false;
+        return !narrow.empty();
+    }
 
     static bool IsAbove(const Number& number, Value value) {
         if constexpr (kIsWide<T>) return Bound<T>(number).Below(value) < 0;

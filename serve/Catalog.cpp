@@ -158,11 +158,23 @@ std::optional<ServedFilePtr> Catalog::Sidecar(std::string_view name) try {
 
 ServedRasterPtr Catalog::RasterIfOpen(std::string_view name) { return TakeHeld(name, Find(name)); }
 
+ServedRasterPtr Catalog::TakeCurrent(std::string_view name, const Found& found,
+                                     const Companions& beside) {
+    ServedRasterPtr raster = TakeHeld(name, found);
+    return raster && raster->Beside() == beside ? raster : nullptr;
+}
+
+ServedRasterPtr Catalog::RasterIfCurrent(std::string_view name) {
+    const Found found = Find(name);
+    return TakeCurrent(name, found,
+                       CompanionsOf(found.root->folder, found.below, found.root->links));
+}
+
 ServedRasterPtr Catalog::Raster(std::string_view name) {
     const Found found = Find(name);
     Companions beside = CompanionsOf(found.root->folder, found.below, found.root->links);
-    ServedRasterPtr raster = TakeHeld(name, found);
-    if (raster && raster->Beside() == beside) return raster;
+    ServedRasterPtr raster = TakeCurrent(name, found, beside);
+    if (raster) return raster;
     raster = std::make_shared<ServedRaster>(Open(found, name), std::move(beside), module);
     if (raster->File().IsSettled()) Hold(std::string(name), raster);
     return raster;

@@ -55,6 +55,8 @@ public:
     // The same where it is open already and still is what the name stands for; else null. Takes no
     // more than a few calls of the system.
     ServedRasterPtr RasterIfOpen(std::string_view name);
+    // The same where what stands beside it is still what it was, too, as for Raster.
+    ServedRasterPtr RasterIfCurrent(std::string_view name);
 
     struct Listing {
         std::vector<std::string> names;  // sorted
@@ -82,6 +84,8 @@ private:
     ServedFilePtr Open(const Found& found, std::string_view name) const;
     ServedFilePtr FileOf(const Found& found, std::string_view name);
     ServedRasterPtr TakeHeld(std::string_view name, const Found& found);
+    ServedRasterPtr TakeCurrent(std::string_view name, const Found& found,
+                                const Companions& beside);
     void Hold(const std::string& name, ServedRasterPtr raster);
     void ListBelow(const Root& root, const std::string& folder, std::size_t depth,
                    std::size_t& looked, Listing& listing) const;

@@ -343,6 +343,9 @@ MHD_Result HttpServer::Server::Judge(MHD_Connection* connection, Exchange& excha
 }
 
 MHD_Result HttpServer::Server::TakeJudged(MHD_Connection* connection, Exchange& exchange) {
+    // Nobody waits behind more of them than may wait for workers.
+    exchange.request.mayCompute =
+        !ending && service.metrics.connections <= threads + options.waiting;
     if (auto quick = service.router.HandleQuickly(exchange.request, service))
         return Send(connection, exchange, std::move(*quick));
     if (ending || !work->Reserve()) {

@@ -2,8 +2,9 @@
 //
 // The library libmicrohttpd reads requests and sends answers on a few threads of its own, which
 // wait for all connections at once. What takes no more than a few calls of the system is answered
-// there: files, and raw tiles of an open raster. All other requests wait for a worker, and where
-// too many wait they are refused with 503, so that the others are still answered soon.
+// there: files, and raw tiles of an open raster; and small JPEG tiles while few connections are
+// open. All other requests wait for a worker, and where too many wait they are refused with 503, so
+// that the others are still answered soon.
 //
 // libmicrohttpd was chosen because it does just this much: it waits by epoll, sends ranges of files
 // by sendfile, lets a connection rest while others work for it, holds limits on connections, memory

@@ -56,6 +56,9 @@ public:
     std::vector<std::pair<std::string, std::string>> headers;
     std::string baseUrl;  // "http://127.0.0.1:8080", for links in answers
     Deadline deadline;
+    // Whether the thread that read the request may compute for about a millisecond: few wait for
+    // it, and to hand such a request to a worker and back takes a good part of its time.
+    bool mayCompute = false;
 
     // The value of a header, in any case of letters of its name; several are joined by ", ".
     std::optional<std::string> Header(std::string_view name) const;

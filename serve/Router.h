@@ -23,7 +23,8 @@ inline constexpr const char* kOtherMethods = "only GET, HEAD and OPTIONS are ans
 // GET and HEAD alone come here. May throw Refusal, zmchost::Error, zmcrender::StyleError and
 // std::bad_alloc.
 using Handler = Answer (*)(const Request& request, Service& service);
-// The same where it takes no longer than a few calls of the system; nothing where it would.
+// The same where it takes no longer than a few calls of the system, or where the request may
+// compute than about a millisecond; nothing where it would.
 using QuickHandler = std::optional<Answer> (*)(const Request& request, Service& service);
 
 // A URL as a template (RFC 6570) below the base: "/tiles/{name}/{z}/{x}/{y}.{format}".

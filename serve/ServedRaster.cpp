@@ -197,21 +197,25 @@ const zmcrender::RasterFacts& ServedRaster::Facts() { return Tell().facts; }
 
 const Georeference& ServedRaster::Place() { return Tell().place; }
 
+ServedRaster::RendererPtr ServedRaster::TakeRenderer(const zmcrender::Style& style) {
+    const std::lock_guard lock(mutex);
+    const auto at = std::find_if(renderers.begin(), renderers.end(),
+                                 [&](const auto& each) { return each.first == style; });
+    if (at == renderers.end()) return nullptr;
+    renderers.splice(renderers.begin(), renderers, at);
+    return renderers.front().second;
+}
+
+bool ServedRaster::HasRenderer(const zmcrender::Style& style) {
+    return TakeRenderer(style) != nullptr;
+}
+
 std::shared_ptr<const zmcrender::Renderer> ServedRaster::RendererFor(const zmcrender::Style& style,
                                                                      Reader& reader) {
-    const std::string key = style.Text();
-    {
-        const std::lock_guard lock(mutex);
-        const auto at = std::find_if(renderers.begin(), renderers.end(),
-                                     [&](const auto& each) { return each.first == key; });
-        if (at != renderers.end()) {
-            renderers.splice(renderers.begin(), renderers, at);
-            return renderers.front().second;
-        }
-    }
+    if (auto renderer = TakeRenderer(style)) return renderer;
     auto made = std::make_shared<const zmcrender::Renderer>(Facts(), style, reader.Pixels());
     const std::lock_guard lock(mutex);
-    renderers.emplace_front(key, made);
+    renderers.emplace_front(style, made);
     if (renderers.size() > kMostRenderers) renderers.pop_back();
     return made;
 }

@@ -129,6 +129,8 @@ public:
     // zmchost::Error.
     const zmcrender::RasterFacts& Facts();
     const Georeference& Place();
+    // Whether RendererFor has that of a style already, and only hands it out.
+    bool HasRenderer(const zmcrender::Style& style);
     // The renderer of a style, which is kept for the next request. Throws zmcrender::StyleError.
     std::shared_ptr<const zmcrender::Renderer> RendererFor(const zmcrender::Style& style,
                                                            Reader& reader);
@@ -138,7 +140,10 @@ private:
     static constexpr std::size_t kMostReaders = 16;  // that wait for the next request
     struct Told;
 
+    using RendererPtr = std::shared_ptr<const zmcrender::Renderer>;
+
     const Told& Tell();
+    RendererPtr TakeRenderer(const zmcrender::Style& style);  // null: there is none
 
     ServedFilePtr file;
     Companions companions;
@@ -151,7 +156,7 @@ private:
     std::unique_ptr<Told> told;
     std::mutex mutex;  // guards what follows
     std::vector<std::unique_ptr<Reader::Tools>> idle;
-    std::list<std::pair<std::string, std::shared_ptr<const zmcrender::Renderer>>> renderers;
+    std::list<std::pair<zmcrender::Style, RendererPtr>> renderers;
 };
 
 }  // namespace zmcserve

@@ -68,6 +68,18 @@ Answer SampleTile(const Request& request, Service& service, ServedRaster& raster
 
 // --- pictures ---
 
+// What a thread that reads requests may make: of a tile of 512 x 512 bytes this takes 1 ms.
+constexpr std::uint64_t kQuickBytes = std::uint64_t{1} << 20;
+constexpr std::uint64_t kQuickPixels = std::uint64_t{256} << 10;
+
+// Whether a tile is made in about a millisecond; other formats than JPEG take ten times as long.
+bool IsQuick(const Request& request, ServedRaster& raster, const TilePlace& tile) {
+    const std::uint64_t pixels = tile.window.Pixels();
+    if (pixels > kQuickPixels || pixels * raster.PixelBytes() > kQuickBytes) return false;
+    const zmcrender::Style style = StyleOf(request, {"quality"});
+    return style.expression.empty() && !style.hillshade && raster.HasRenderer(style);
+}
+
 Answer PictureTile(const Request& request, const Service& service, ServedRaster& raster,
                    const TilePlace& tile, PictureFormat format) {
     const zmcrender::Style style = StyleOf(request, {"quality"});
@@ -80,26 +92,43 @@ Validators ValidatorsOf(const ServedRaster& raster, bool isPicture) {
     return {isPicture ? raster.ETagWithCompanions("p") : raster.ETag("s"), std::nullopt};
 }
 
-Answer TileAnswer(const Request& request, Service& service) {
-    const Address address = AddressOf(request);
-    const auto picture = zmcrender::PictureFormatOfName(address.ending);
-    const auto samples = SampleFormatOfName(address.ending);
-    if (!picture && !samples)
-        throw Refusal(404, "the formats of tiles are jpg, png, webp, raw and npy");
-    const ServedRasterPtr raster = service.catalog.Raster(address.name);
-    const TilePlace tile = FindTile(*raster, address.z, address.x, address.y);
-    const Validators validators = ValidatorsOf(*raster, picture.has_value());
+Answer TileOfRaster(const Request& request, Service& service, ServedRaster& raster,
+                    const TilePlace& tile, std::string_view ending) {
+    const auto picture = zmcrender::PictureFormatOfName(ending);
+    const Validators validators = ValidatorsOf(raster, picture.has_value());
     if (auto answer = AnswerOfConditions(request, validators)) return std::move(*answer);
-    Answer answer = picture ? PictureTile(request, service, *raster, tile, *picture)
-                            : SampleTile(request, service, *raster, tile, *samples);
+    Answer answer = picture
+                        ? PictureTile(request, service, raster, tile, *picture)
+                        : SampleTile(request, service, raster, tile, *SampleFormatOfName(ending));
     SetValidators(answer, validators);
     return answer;
 }
 
-// Raw samples that lie in the file as they are sent.
+Answer TileAnswer(const Request& request, Service& service) {
+    const Address address = AddressOf(request);
+    if (!zmcrender::PictureFormatOfName(address.ending) && !SampleFormatOfName(address.ending))
+        throw Refusal(404, "the formats of tiles are jpg, png, webp, raw and npy");
+    const ServedRasterPtr raster = service.catalog.Raster(address.name);
+    const TilePlace tile = FindTile(*raster, address.z, address.x, address.y);
+    return TileOfRaster(request, service, *raster, tile, address.ending);
+}
+
+// Small tiles as JPEG, in a style that was asked for before.
+std::optional<Answer> QuickPicture(const Request& request, Service& service,
+                                   const Address& address) {
+    const ServedRasterPtr raster = service.catalog.RasterIfCurrent(address.name);
+    if (!raster) return std::nullopt;
+    const TilePlace tile = FindTile(*raster, address.z, address.x, address.y);
+    if (!IsQuick(request, *raster, tile)) return std::nullopt;
+    return TileOfRaster(request, service, *raster, tile, address.ending);
+}
+
 std::optional<Answer> QuickTile(const Request& request, Service& service) {
     if (WantsTileJson(request)) return std::nullopt;
     const Address address = AddressOf(request);
+    if (request.mayCompute && zmcrender::PictureFormatOfName(address.ending) == PictureFormat::Jpeg)
+        return QuickPicture(request, service, address);
+    // Raw samples that lie in the file as they are sent.
     if (address.ending != "raw" || !request.query.empty() || TakesCompressed(request))
         return std::nullopt;
     const ServedRasterPtr raster = service.catalog.RasterIfOpen(address.name);

@@ -140,6 +140,55 @@ TEST_F(ServicesTest, WhatNeedsNoWorkIsAnsweredAtOnce) {
     EXPECT_FALSE(quickly("/api"));
 }
 
+TEST_F(ServicesTest, SmallJpegTilesAreMadeAtOnceWhereNobodyWaitsForIt) {
+    Serve();
+    const auto quickly = [&](const std::string& target, bool mayCompute = true) {
+        Request request = Request::Parse(Method::Get, target);
+        request.mayCompute = mayCompute;
+        return service->router.HandleQuickly(request, *service);
+    };
+    const std::string tile = "/tiles/a.pyr/1/1/0.jpg", styled = tile + "?bands=1&colormap=turbo";
+    EXPECT_FALSE(quickly(tile));  // the raster is not open yet
+    service->catalog.Raster("a.pyr");
+    EXPECT_FALSE(quickly(tile));  // and then its style may need pixels of a coarser level
+    const Answer answer = Ask(tile);
+    EXPECT_EQ(quickly(tile)->Text(), answer.Text());
+    EXPECT_EQ(quickly(tile)->Header("ETag"), answer.Header("ETag"));
+    EXPECT_EQ(quickly(tile + "?quality=10")->Text(), Ask(tile + "?quality=10").Text());
+    EXPECT_FALSE(quickly(styled));
+    const std::string expected = Ask(styled).Text();
+    EXPECT_EQ(quickly(styled)->Text(), expected);
+    EXPECT_FALSE(quickly(tile, false));
+    EXPECT_EQ(quickly("/tiles/a.pyr/1/2/0.jpg")->status, 404);
+    EXPECT_EQ(quickly(tile + "?quality=0")->status, 400);
+    EXPECT_EQ(quickly(tile + "?nothing=1")->status, 400);
+    for (const char* const longer : {"/tiles/a.pyr/1/1/0.png", "/tiles/a.pyr/1/1/0.webp"}) {
+        EXPECT_EQ(Ask(longer).status, 200);
+        EXPECT_FALSE(quickly(longer)) << longer;
+    }
+    for (const std::string style : {"?expression=b1*2&stretch=0,9", "?bands=1&hillshade=1"}) {
+        EXPECT_EQ(Ask(tile + style).status, 200) << style;
+        EXPECT_FALSE(quickly(tile + style)) << style;
+    }
+    zmctest::WriteText(folder / "a.pyr.aux.xml", "<PAMDataset/>");
+    EXPECT_FALSE(quickly(tile));  // what stands beside it may tell other colours
+}
+
+TEST_F(ServicesTest, LargeJpegTilesAreLeftToWorkers) {
+    BuildNoise<std::uint8_t>(folder / "b.pyr", 300, 300, 8, 5, zmchost::Ordering::Scanline);
+    Serve();
+    const auto isQuick = [&](const std::string& tile) {
+        Request request = Request::Parse(Method::Get, tile);
+        request.mayCompute = true;
+        EXPECT_EQ(Ask(tile).status, 200);
+        return service->router.HandleQuickly(request, *service).has_value();
+    };
+    EXPECT_TRUE(isQuick("/tiles/b.pyr/1/0/0.jpg"));
+    BuildNoise<double>(folder / "c.pyr", 300, 300, 3, 5, zmchost::Ordering::Scanline);
+    Serve();
+    EXPECT_FALSE(isQuick("/tiles/c.pyr/1/0/0.jpg"));
+}
+
 TEST_F(ServicesTest, PictureTilesHaveTheSizeOfTheirTileAndAType) {
     const Answer png = Ask("/tiles/a.pyr/1/1/0.png");
     EXPECT_EQ(png.type, "image/png");

@@ -455,7 +455,8 @@ export class App implements Gestures {
     this.stale = false;
     if (renderer.begun)
       renderer.draw(placement ? this.layers() : [], placement ?? NOWHERE, !this.viewport.moving, grain);
-    if (grain === 1 && pace.matters) void renderer.done(start).then((milliseconds) => (pace.took = milliseconds));
+    // Tiles that arrive take time of their own.
+    if (grain === 1 && this.isWhole()) void renderer.done(start).then((milliseconds) => (pace.took = milliseconds));
     this.showOverlay();
   }
 
@@ -671,7 +672,7 @@ export class App implements Gestures {
 
   /**
    * Milliseconds that a picture takes, until the graphics processor is done: in all its pixels, or with a `grain` of 2 as
-   * while a handle is dragged where all take too long.
+   * just behind a change of style where all take too long.
    */
   time(grain: 1 | 2 = 1): number {
     const start = performance.now();
