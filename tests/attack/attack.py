@@ -6,7 +6,8 @@ good file, and as much again for each 32 MiB of what it is asked to go through o
 through all pixels of a complete file, holes included; where that is more than GOES_THROUGH, what is
 judged is that they end when they are asked to. So are levels that the driver makes; those that GDAL
 writes beside the file count as what was gone through. A store makes a tree of the document, which takes
-several times its text. The memory of a build is what it is told.
+several times its text, and an edit by the driver is three stores, which may take a second each. The memory
+of a build is what it is told.
 
     attack.py FOLDER [--files N] [--first K] [--jobs N]
 
@@ -36,6 +37,7 @@ TOOL = os.environ["ZMC_TOOL"]
 SANITIZED = os.environ.get("ZMC_ATTACK") == "sanitized"
 SECONDS = 1.0
 YARDSTICK = 20_000_000  # steps of a loop, which take a second of a processor of 2.3 GHz that is all ours
+STORES = 3  # of the document by driver_edits, each of which may take as long
 MEMORY = 64 << 20
 PATIENCE = 300 if SANITIZED else 60  # seconds of waiting, after which a run is taken to hang
 ENDS_WITHIN = 60 if SANITIZED else 5  # seconds of processor time, where it is asked to end
@@ -328,7 +330,7 @@ class Attacker:
         """`size` bytes may be gone through, of which `held` are no holes."""
         base = self.base[name]
         goes_through = size if name in LONG or name in DRIVER else held
-        longer = 1 + (goes_through + 8 * cost.printed) / PER_BYTES
+        longer = (STORES if name == "gdal-edit" else 1) + (goes_through + 8 * cost.printed) / PER_BYTES
         grants = 1 + ((size if name in LONG else held) + 8 * cost.printed) / PER_BYTES
         shown = bands * PER_BAND if name in DRIVER else 0
         if name == "gdal-edit":

@@ -7,7 +7,7 @@ import type { Page } from "playwright-core";
 
 import { headerOf, Pyramids } from "../../test/support/pyramids.js";
 import type { App } from "../src/app.js";
-import { REST } from "../src/pace.js";
+import { type Pace, REST } from "../src/pace.js";
 import type { Renderer } from "../src/renderer.js";
 import { assertSame, Bench, findings, go, idle, link, picture } from "./support/browser.js";
 
@@ -176,17 +176,15 @@ test("a change of style is drawn within 16 ms, on a processor without graphics t
  * picture takes so long. When it rests the test tells: on a busy machine it may between any two frames.
  */
 async function grainsOf(milliseconds: number): Promise<number[]> {
-  await page.evaluate(async (milliseconds) => {
-    const { renderer } = viewer as unknown as { renderer: Renderer };
+  await page.evaluate((milliseconds) => {
+    const { renderer, pace } = viewer as unknown as { renderer: Renderer; pace: Pace };
     const grains: number[] = ((globalThis as unknown as { grains: number[] }).grains = []);
     const draw = renderer.draw.bind(renderer);
-    renderer.done = () => Promise.resolve(milliseconds);
-    viewer.picture(); // takes so long too
-    await Promise.resolve();
     renderer.draw = (layers, placement, ask, grain) => {
       grains.push(grain ?? 1);
       draw(layers, placement, ask, grain);
     };
+    Object.defineProperty(pace, "took", { get: () => milliseconds, set() {}, configurable: true });
   }, milliseconds);
   await page.getByRole("slider", { name: "Minimum of Band 2", exact: true }).evaluate(async (slider, rest) => {
     const { setTimeout } = window;
@@ -206,16 +204,20 @@ async function grainsOf(milliseconds: number): Promise<number[]> {
   await idle(page);
   return page.evaluate(() => {
     const { renderer } = viewer as unknown as { renderer: Partial<Renderer> };
-    delete renderer.draw; // those of its class are left
-    delete renderer.done;
+    delete renderer.draw; // that of its class is left
     return (globalThis as unknown as { grains: number[] }).grains;
   });
 }
 
 test("changes of style are drawn in fewer pixels where all take too long, and in all once there are no more", async () => {
   await go(page, "file=three.pyr&bands=2&stretch=20,200");
-  assert.deepEqual(await grainsOf(40), [2, 2, 2, 2, 2, 2, 2, 2, 1]);
-  assert.deepEqual(await grainsOf(4), [1, 1, 1, 1, 1, 1, 1, 1]);
+  // What a picture takes is known before the first change.
+  await page.waitForFunction(() => (viewer as unknown as { pace: Pace }).pace.took > 0);
+  const slow = await grainsOf(40);
+  // Once the programs of other styles are made, all is drawn once more, whenever that is.
+  assert.ok(slow.filter((grain) => grain === 2).length >= 7 && slow.length <= 10, `${slow}`);
+  assert.equal(slow.at(-1), 1);
+  assert.deepEqual([...new Set(await grainsOf(4))], [1]);
 });
 
 test("complex samples are shown in all their parts", async () => {
