@@ -119,7 +119,7 @@ class Records:
         return found
 
     def no_data(self, band):
-        """The value of samples without data, out of the sidecar or what the file has in its place, or None."""
+        """The value of samples without data, out of the sidecar or the file itself, or None."""
         sidecars = []
         if os.path.isfile(self.sidecar):
             with open(self.sidecar, "rb") as file:

@@ -1,13 +1,9 @@
 #!/usr/bin/python3
-"""Reads pyramid files with NumPy alone, after docs/format.md. Bands and levels count from 0.
-
-Usage: read_pyramid.py FILE [--level N] [--window X,Y,W,H] [--out FILE.npy]
-"""
+"""Reads pyramid files with NumPy alone, after docs/format.md. Bands and levels count from 0."""
 import argparse
 import os
 import struct
-import sys
-from itertools import product
+from functools import cached_property
 from math import prod
 
 import numpy as np
@@ -15,14 +11,14 @@ from pyramid_documents import MOST_TEXT, Records, decimal, parse, texts
 
 TYPES = dict(Byte="u1", Char="i1", UInt16="<u2", USHORT="<u2", Int16="<i2", UInt32="<u4", Int32="<i4",
              UInt64="<u8", Int64="<i8", Single="<f4", Double="<f8", ComplexSingle="<c8", ComplexDouble="<c16")
-MOST_BYTES, MOST_TILES = 1 << 30, 1 << 20  # of a window; of all bands in Morton order
+MOST_BYTES, MOST_TILES = 1 << 30, 1 << 20  # of a window; of all bands or levels in Morton order
 
 
 class Pyramid:
     def __init__(self, path):
         if not os.path.isfile(path):
             raise ValueError("there is no such file")
-        self.file, self.file_size = open(path, "rb"), os.path.getsize(path)
+        self.path, self.file_size = path, os.path.getsize(path)
         magic, self.start = struct.unpack("<4sQ", self.bytes(0, 12))
         if magic != b"KOBT" or not 20 <= self.start <= min(self.file_size, MOST_TEXT):
             raise ValueError("it is no pyramid file")
@@ -34,22 +30,21 @@ class Pyramid:
             [*fields.get("HEADER_" + name, "").split(), ""][0] for name in ("PIXEL_TYPE", "BUILD_METHOD"))
         self.dtype = np.dtype(TYPES[self.type]) if self.type in TYPES else None
         self.sample, self.levels = self.dtype.itemsize if self.dtype else 1, range(first, last + 1)
-        if self.tile == 0 or last > 1023:
-            raise ValueError(f"its header tells tiles of {self.tile} pixels and a last level {last}")
-        self.morton, self.places, self.offsets, self.end = self.ordering == "Morton", None, {}, self.start
-        for level in reversed(self.levels):
+        self.morton, self.offsets, self.end = self.ordering == "Morton", {}, self.start
+        for level in reversed(self.levels[:32]):
             self.offsets[level] = self.end
             self.end += prod(self.size(level)) * self.sample * self.bands
-        if self.end - self.start > 1 << 62:
-            raise ValueError("its tiles would take more than 2^62 bytes")
+        if self.tile == 0 or last > 1023 or self.end - self.start > 1 << 62:
+            raise ValueError("its header tells tiles of no pixels, or more than 1024 levels or 2^62 bytes")
         self.complete = version >= [1, 1] and self.file_size >= self.end
         document = self.bytes(self.end, max(0, min(self.file_size - self.end, MOST_TEXT + 1)))
         self.records = Records(document, self.dtype, path + ".aux.xml")
 
     def bytes(self, offset, count):
         """Bytes of the file, and zeros behind its end."""
-        self.file.seek(min(offset, self.file_size))
-        return self.file.read(count).ljust(count, b"\0")
+        with open(self.path, "rb") as file:
+            file.seek(min(offset, self.file_size))
+            return file.read(count).ljust(count, b"\0")
 
     def size(self, level):
         return (self.width >> level, self.height >> level) if level < 32 else (0, 0)
@@ -80,29 +75,30 @@ class Pyramid:
 
     def tiles(self, level, x, y, width, height, band):
         """Column, row, columns, rows and offset of a window's tiles, until the file ends."""
-        side, (columns, rows), (places, band_bytes) = self.tile, self.size(level), self.morton_places()
+        side, (columns, rows) = self.tile, self.size(level)
+        places, band_bytes = self.morton_places if self.morton else ({}, 0)
         for top in range(y // side * side, y + height, side):
             for left in range(x // side * side, x + width, side):
                 wide, high = min(side, columns - left), min(side, rows - top)
                 at = self.offsets[level] + (columns * top + left * high) * self.bands * self.sample
-                if self.morton and (level, left // side, top // side) not in places:
-                    raise ValueError(f"a tile of level {level} has no place in it")
                 if self.morton:
+                    if (level, left // side, top // side) not in places:
+                        raise ValueError(f"a tile of level {level} has no place in it")
                     at = self.start + band * band_bytes + places[level, left // side, top // side]
                 elif at >= self.file_size:
                     return
                 yield left, top, wide, high, at
 
+    @cached_property
     def morton_places(self):
         """Offsets of a band's tiles by (level, column, row), from its start, and its bytes."""
-        if self.places or not self.morton:
-            return self.places or ({}, 0)
         across, down = (-(-size // self.tile) for size in self.size(0))
-        if max(across, down) > 65536 or across * down * self.bands > MOST_TILES:
+        levels = range(self.levels.start, min(self.levels.stop, 32))
+        if max(across, down) > 65536 or across * down * max(self.bands, len(levels)) > MOST_TILES:
             raise ValueError(f"it has {across} x {down} tiles in Morton order, which are too many")
         sides = [[min(self.tile, size - i) for i in range(0, size, self.tile)] for size in self.size(0)]
         bits = [int(f"{number:b}", 4) for number in range(max(across, down))]
-        grid = sorted(product(range(across), range(down)), key=lambda tile: bits[tile[0]] + 2 * bits[tile[1]])
+        grid = sorted(np.ndindex(across, down), key=lambda tile: bits[tile[0]] + 2 * bits[tile[1]])
         cursor, places, opened = 0, {}, {}
 
         def place(level, *block):
@@ -114,16 +110,14 @@ class Pyramid:
                 cursor += wide * high * self.sample
 
         for x, y in grid:
-            for level in [level for level in self.levels if level < 32]:
+            for level in levels:
                 block = (level, x >> level, y >> level)
                 if opened.get(level, block) != block:
                     place(*opened[level])
+                opened[level] = block
                 if level == 0 or (x, y) == grid[-1]:
-                    place(*block)
-                else:
-                    opened[level] = block
-        self.places = places, cursor
-        return self.places
+                    place(*opened.pop(level))
+        return places, cursor
 
 
 def main():
@@ -145,12 +139,11 @@ def main():
             print(f"band {band}:", *(f"{k} {v:.10g}" for k, v in pyramid.records.statistics(band).items()))
         if given.out or given.window or given.level is not None:
             pixels = pyramid.read(given.level or 0, given.window)
-            mean = pixels.mean(dtype=np.result_type(pixels, "f8"))
-            print(f"read {pixels.shape} of {pixels.dtype}, mean {mean:.10g}")
+            print(f"read {' x '.join(map(str, pixels.shape))} samples of {pixels.dtype}")
             if given.out:
                 np.save(given.out, pixels)
     except (OSError, ValueError, MemoryError) as error:
-        sys.exit(f"{sys.argv[0]}: {given.file}: {error}")
+        raise SystemExit(f"read_pyramid.py: {given.file}: {error}") from None
 
 
 if __name__ == "__main__":

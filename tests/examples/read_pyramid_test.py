@@ -59,6 +59,11 @@ def assembled(header, rest):
     return struct.pack("<4sQQ", b"KOBT", 20 + len(header), 20 + len(header)) + header + rest
 
 
+def content_of(name):
+    with open(name, "rb") as file:
+        return file.read()
+
+
 def parts(content):
     """Header document, and what stands behind it."""
     start = struct.unpack_from("<Q", content, 4)[0]
@@ -157,7 +162,7 @@ class ReaderTest(unittest.TestCase):
     def laid_out_anew(self, luck, name):
         """The file with another side of its tiles, ordering, first level, samples of any bits, and records."""
         made = Pyramid(name)
-        header, _ = parts(open(name, "rb").read())
+        header, _ = parts(content_of(name))
         side, ordering = luck.choice(SIDES), luck.choice(["Scanline", "Blocked", "Morton"])
         first = luck.choice([0, 0, 0, min(1, made.levels[-1])])
         if made.width * made.height > 4000 * side * side:
@@ -293,7 +298,7 @@ class ReaderTest(unittest.TestCase):
             name = self.make(luck, number)
             if number % 2:
                 self.laid_out_anew(luck, name)
-            sources.append(open(name, "rb").read())
+            sources.append(content_of(name))
         name = self.path("damaged.pyr")
         for number in range(DAMAGED):
             luck = random.Random(f"damage {PHASE} {number}")
