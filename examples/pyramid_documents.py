@@ -1,6 +1,7 @@
 """The XML documents of a pyramid file and their numbers, after docs/format.md; for read_pyramid.py."""
 import ctypes
 import os
+import re
 import struct
 from xml.etree import ElementTree
 from xml.parsers import expat
@@ -47,16 +48,22 @@ class Tree(ElementTree.TreeBuilder):
         return super().end(name)
 
 
+def check_declaration(version, _encoding, _standalone):
+    if not re.fullmatch(r"1\.\d+", version, re.ASCII):
+        raise ValueError(f"a document is of XML {version}")
+
+
 def parse(text):
     """The root of a document, which is believed whole or not at all."""
     if b"\0" in text or b"<!DOCTYPE" in text or len(text) > MOST_TEXT:
         raise ValueError("a document has a NUL or a document type, or is too long")
     tree, parser = Tree(), expat.ParserCreate()
+    parser.XmlDeclHandler = check_declaration
     parser.StartElementHandler, parser.EndElementHandler = tree.start, tree.end
     parser.CharacterDataHandler = tree.data
     try:
         parser.Parse(text, True)
-    except expat.ExpatError as error:
+    except (expat.ExpatError, LookupError) as error:  # the latter of an encoding that is not known
         raise ValueError(f"a document is malformed: {error}") from error
     return tree.close()
 
@@ -93,12 +100,13 @@ class Records:
             bins, counts, pairs = 0, [], texts(record)
             for name, text in pairs:
                 if name == "HIST_BINCOUNT":
-                    bins, counts = decimal(text), []
-                elif name == "HIST_COUNTS" and bins:
-                    counts = text.split("|")[:bins]
-                    spare -= bins - len(counts)
-                    counts = [int(pixel_value(count, "u8")) for count in counts] if spare >= 0 else []
-                    counts += [0] * (bins - len(counts)) if spare >= 0 else []
+                    bins = decimal(text)
+                elif name == "HIST_COUNTS":
+                    entries = text.split("|")
+                    if not counts and bins - len(entries) <= spare:
+                        counts, spare = [0] * bins, spare - max(0, bins - len(entries))
+                    entries = [int(pixel_value(entry, "u8")) for entry in entries[: min(bins, len(counts))]]
+                    counts[: len(entries)] = entries
             get = {name[5:]: text for name, text in pairs}.get
             found.append(dict(
                 band=decimal(get("BAND", "")), level=decimal(get("LEVEL", "")), source=get("SOURCE", ""),

@@ -95,7 +95,9 @@ def metadata(luck, bands, kind):
                   element("HIST_MIN", number()), element("HIST_MAX", number())]
         luck.shuffle(middle)
         lists = [element("HIST_BINCOUNT", luck.randrange(9)), element("HIST_COUNTS", counts)]
-        middle[luck.randrange(6):0] = lists if luck.random() < 0.8 else lists[::-1]
+        lists += luck.choice([[], [], [element("HIST_COUNTS", number())], lists[:1], lists])
+        luck.shuffle(lists)
+        middle[luck.randrange(6):0] = lists
         records.append("<HISTOGRAMS>" + "".join(middle) + "</HISTOGRAMS>")
     for _ in range(luck.randrange(3)):
         colours = ["|".join(number() for _ in range(luck.randrange(1, 6))) for _ in range(luck.randrange(1, 5))]
