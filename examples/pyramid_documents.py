@@ -147,7 +147,8 @@ class Records:
         """Which samples of a band are no data: those of its value, and those that are not finite."""
         value, kind = self.no_data(band), pixels.dtype.kind
         if kind in "fc":
-            same = False if value is None else pixels == np.array(value).astype(pixels.dtype)
+            with np.errstate(invalid="ignore", over="ignore"):
+                same = False if value is None else pixels == np.array(value).astype(pixels.dtype)
             return ~np.isfinite(pixels) | same
         ends = np.iinfo(pixels.dtype)
         held = value is not None and value == value // 1 and ends.min <= value <= ends.max
