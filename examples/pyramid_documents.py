@@ -68,6 +68,14 @@ def parse(text):
     return tree.close()
 
 
+def believed(text):
+    """The root of a document, or an empty one where it is damaged or there is none."""
+    try:
+        return parse(text)
+    except ValueError:
+        return ElementTree.Element("DATASET")
+
+
 def texts(parent):
     """Names and texts of an element and those inside of it that have a text, in their order."""
     pairs = ((e.tag, "".join([e.text or "", *(child.tail or "" for child in e)])) for e in parent.iter())
@@ -79,10 +87,7 @@ class Records:
 
     def __init__(self, document, dtype, sidecar):
         self.document, self.dtype, self.sidecar = document, np.dtype(dtype or "u1"), sidecar
-        try:
-            self.root = parse(document)
-        except ValueError:
-            self.root = ElementTree.Element("DATASET")
+        self.root = believed(document)
         self.all_statistics = [dict(texts(record)) for record in self.root.iter("BANDSTATISTICS")]
 
     def statistics(self, band):
@@ -131,10 +136,10 @@ class Records:
         sidecars = []
         if os.path.isfile(self.sidecar):
             with open(self.sidecar, "rb") as file:
-                sidecars.append(parse(file.read(MOST_TEXT + 1)))
+                sidecars.append(believed(file.read(MOST_TEXT + 1)))
         domains = [e.get("domain") for tree in sidecars for e in tree.iter("Metadata")]
         if self.document.startswith(EMBEDDED) and len(self.root) and "ZMCPYRAMID_SIDECAR" not in domains:
-            sidecars.append(parse((self.root[0].text or "").encode()))
+            sidecars.append(believed((self.root[0].text or "").encode()))
         where = f"PAMRasterBand[@band='{band + 1}']/NoDataValue"
         for element in (element for tree in sidecars for element in tree.findall(where)):
             exact, text = element.get("le_hex_equiv"), element.text or ""
