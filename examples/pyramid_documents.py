@@ -121,10 +121,10 @@ class Records:
 
     def palettes(self):
         """Colours (red, green, blue, alpha) of the bands that have some."""
-        band, found, bands = 0, {}, ("RSTC_BAND", "HIST_BAND", "PALETTE_BAND")
+        band, found = 0, {}
         for element in self.root.iter():
-            if element.tag in bands or element.tag == "PALETTE":
-                band = ([band] + [decimal(text) for name, text in texts(element) if name in bands])[-1]
+            if element.tag in ("PALETTE", "PALETTE_BAND"):
+                band = ([band] + [decimal(text) for name, text in texts(element) if name == "PALETTE_BAND"])[-1]
             if element.tag == "PALETTE":
                 colours = [text.split("|") for name, text in texts(element) if name == "PALETTE_RGBA"]
                 found[band] = [tuple(int(pixel_value(part, "u1")) for part in (colour + [""] * 3)[:4])
