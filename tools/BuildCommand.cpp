@@ -6,6 +6,7 @@
 #include "tools/BuildEnd.h"
 #include "tools/Command.h"
 #include "tools/Interrupt.h"
+#include "tools/MosaicSource.h"
 #include "tools/ProcessBuild.h"
 #include "tools/TerminalProgress.h"
 
@@ -85,7 +86,7 @@ zmchost::BuildReport BuildCommand::BuildBy(GDALDataset& dataset, zmcgdal::GdalRa
 }
 
 ExitStatus BuildCommand::Run() {
-    const DatasetPtr dataset = words.OpenSource();
+    const DatasetPtr dataset = words.OpenSource(!quiet);
     zmcgdal::GdalRasterSource pixels(*dataset);
     const zelm::RasterProps props = pixels.Props();
     const zmchost::BuildOptions options = words.Options(props);
@@ -95,9 +96,10 @@ ExitStatus BuildCommand::Run() {
         Warn(words.source, "a pyramid does not keep " + loss);
     const zmchost::BuildReport report = BuildBy(*dataset, pixels, options);
     if (json)
-        PrintDocument(BuildDocument(words, report, props.pixelType));
+        PrintDocument(BuildDocument(words, report, props.pixelType, *dataset));
     else if (!quiet)
         PrintReport(words, report, props.pixelType);
+    TellLeftOut(*dataset);
     return ExitStatus::Done;
 }
 

@@ -10,6 +10,7 @@
 #include "describe/JsonNumbers.h"
 #include "gdal/Dataset.h"
 #include "gdal/Sidecar.h"
+#include "tools/MosaicSource.h"
 
 namespace zmctools {
 namespace {
@@ -78,8 +79,8 @@ void BuildEnd::WriteSidecar(const std::string& built, const std::string& base) c
 }
 
 Json BuildDocument(const BuildWords& words, const zmchost::BuildReport& report,
-                   std::uint32_t pixelType) {
-    return {{"schema", zmcdescribe::kSchema},
+                   std::uint32_t pixelType, const GDALDataset& source) {
+    Json document = {{"schema", zmcdescribe::kSchema},
             {"source", words.source},
             {"file", words.target},
             {"width", report.width},
@@ -91,6 +92,8 @@ Json BuildDocument(const BuildWords& words, const zmchost::BuildReport& report,
             {"resampling", zmchost::ResamplingName(report.resampling)},
             {"bytes", zmcdescribe::JsonNumber(report.fileSize)},
             {"seconds", zmcdescribe::JsonNumber(report.seconds)}};
+    AddScenes(document, source);
+    return document;
 }
 
 void PrintReport(const BuildWords& words, const zmchost::BuildReport& report,
