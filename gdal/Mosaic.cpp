@@ -274,18 +274,9 @@ void Mosaic::Combine(const Area& area, const Rectangle& block) {
             const bool holds = value && zmchost::HoldsValue<T>(*value);
             rules.push_back({holds, holds ? zelm::FromDouble<T>(*value) : T{}});
         }
-        const std::size_t count = static_cast<std::size_t>(block.width) * area.chosen.size();
-        std::vector<T> made(count * block.height);
-        auto* const target = reinterpret_cast<T*>(area.pixels);
-        const auto line = [&](std::uint32_t y) {
-            return target + (std::size_t{block.y + y - area.window.y} * area.window.width +
-                             block.x - area.window.x) * area.chosen.size();
-        };
-        for (std::uint32_t y = 0; y < block.height; ++y)
-            std::copy_n(line(y), count, made.data() + y * count);
-        zmcgdal::Combine<T>(layout.overlap, layers, block, rules, made.data());
-        for (std::uint32_t y = 0; y < block.height; ++y)
-            std::copy_n(made.data() + y * count, count, line(y));
+        zmcgdal::Combine<T>(layout.overlap, layers, block, rules,
+                            reinterpret_cast<T*>(area.At(block)),
+                            area.window.width * area.chosen.size());
     });
 }
 

@@ -4,6 +4,7 @@
 #include <bit>
 #include <limits>
 
+#include "core/ElementTypes.h"
 #include "core/PixelVocabulary.h"
 #include "gdal/FileState.h"
 #include "host/base/Checksum.h"

@@ -19,6 +19,7 @@
 #include "core/PixelVocabulary.h"
 #include "gdal/ErrorCatcher.h"
 #include "gdal/GdalRasterSource.h"
+#include "gdal/GeoKeys.h"
 #include "gdal/NoDataValues.h"
 #include "gdal/SampleType.h"
 #include "gdal/SceneFile.h"
@@ -29,7 +30,7 @@ namespace zmcgdal {
 namespace {
 
 constexpr double kTolerance = 0.01;  // of a pixel
-constexpr double kMostSide = std::numeric_limits<std::int32_t>::max();
+constexpr double kLongestSide = std::numeric_limits<std::int32_t>::max();
 
 std::string LowerCase(std::string text) {
     for (char& c : text)
@@ -102,6 +103,7 @@ bool IsPlace(const GeoTransform& t) {
 
 bool IsUpright(const GeoTransform& t) { return t[2] == 0 && t[4] == 0 && t[1] > 0 && t[5] < 0; }
 
+// All but the unit, which may follow from the coordinate system and then takes long.
 MosaicBand TellBand(GDALRasterBand& band) {
     MosaicBand told;
     told.interpretation = band.GetColorInterpretation();
@@ -110,7 +112,6 @@ MosaicBand TellBand(GDALRasterBand& band) {
         for (int i = 0; i < table->GetColorEntryCount(); ++i)
             told.colors.push_back(*table->GetColorEntry(i));
     told.description = band.GetDescription();
-    told.unit = band.GetUnitType();
     told.offset = band.GetOffset();
     told.scale = band.GetScale();
     return told;
@@ -173,18 +174,31 @@ private:
         for (int number = 1; number <= dataset.GetRasterCount(); ++number)
             kind.bands.push_back(TellBand(*dataset.GetRasterBand(number)));
         std::string packed = PackBands(pixelType, kind.bands);
-        std::string system;
-        if (const OGRSpatialReference* const reference = dataset.GetSpatialRef()) {
-            char* text = nullptr;
-            const char* const form[] = {"FORMAT=WKT2_2019", nullptr};
-            if (reference->exportToWkt(&text, form) == OGRERR_NONE) system = text;
-            CPLFree(text);
-        }
+        const std::string* const system = SystemOf(dataset, finding.scene);
         const GDALDriver* const driver = dataset.GetDriver();
         const std::lock_guard lock(mutex);
         finding.kind = &kinds.try_emplace(std::move(packed), std::move(kind)).first->second;
-        finding.system = &*texts.insert(std::move(system)).first;
+        finding.system = system;
         finding.driver = &*texts.insert(driver ? driver->GetDescription() : "").first;
+    }
+
+    const std::string* SystemOf(GDALDataset& dataset, const MosaicScene& scene) {
+        const auto keys = scene.alone ? GeoKeysOf(scene.name) : std::nullopt;
+        if (keys) {
+            const std::lock_guard lock(mutex);
+            const auto known = systems.find(*keys);
+            if (known != systems.end()) return known->second;
+        }
+        std::string system;
+        if (const OGRSpatialReference* const reference = dataset.GetSpatialRef()) {
+            char* text = nullptr;
+            if (reference->exportToWkt(&text) == OGRERR_NONE) system = text;
+            CPLFree(text);
+        }
+        const std::lock_guard lock(mutex);
+        const std::string* const kept = &*texts.insert(std::move(system)).first;
+        if (keys) systems[*keys] = kept;
+        return kept;
     }
 
     static void ReadAll(GdalRasterSource& source, const zelm::RasterProps& props) {
@@ -213,6 +227,7 @@ private:
     std::mutex mutex;  // guards what follows
     std::map<std::string, Kind> kinds;
     std::set<std::string> texts;
+    std::map<std::string, const std::string*> systems;  // by what tells them in GeoTIFFs
 };
 
 struct Bounds {
@@ -311,6 +326,7 @@ public:
         layout.system = *first.system;
         layout.pixelType = first.kind->pixelType;
         TakeBands();
+        TakeUnits();
         CheckScenes();
         FindGrid();
         PlaceScenes();
@@ -357,12 +373,19 @@ private:
                                 return c.c1 == d.c1 && c.c2 == d.c2 && c.c3 == d.c3 && c.c4 == d.c4;
                             }))
                 return "its palette is not that of " + name;
-            if (a.unit != b.unit || a.offset != b.offset || a.scale != b.scale)
-                return "its unit, offset or scale is not that of " + name;
+            if (a.offset != b.offset || a.scale != b.scale)
+                return "its offset or scale is not that of " + name;
             if ((a.interpretation == GCI_AlphaBand) != (b.interpretation == GCI_AlphaBand))
                 return "its alpha band is not that of " + name;
         }
         return "";
+    }
+
+    void TakeUnits() {
+        const ScenePtr opened = OpenScene(first.scene.name, *first.driver, first.scene.alone);
+        for (std::size_t i = 0; i < layout.bands.size(); ++i)
+            layout.bands[i].unit =
+                opened->GetRasterBand(static_cast<int>(i) + 1)->GetUnitType();
     }
 
     void CheckScenes() const {
@@ -433,7 +456,7 @@ private:
                               std::max(all.right, place.right), std::max(all.bottom, place.bottom)}
                       : place;
             any = true;
-            if (all.right - all.left > kMostSide || all.bottom - all.top > kMostSide)
+            if (all.right - all.left > kLongestSide || all.bottom - all.top > kLongestSide)
                 FailScene(each.scene.name, "it lies too far from those before it");
             each.scene.warped = !fits;
             places.push_back(place);

@@ -111,33 +111,62 @@ void LayOver(const Layer& layer, const zelm::Rectangle& window, std::size_t band
     }
 }
 
-// Makes of all layers, in the order of the scenes, what a window has; samples that no layer shows
-// stay as they are. `rules` are the no-data values of the window's bands.
+// The samples of a layer from a pixel on, and which of them are shown.
+template <class T>
+struct Run {
+    const T* samples;
+    const unsigned char* shown;
+};
+
+// Samples [0, count) of a line that all of these layers have.
+template <class T>
+void CombineRun(Overlap overlap, std::span<const Run<T>> runs, std::size_t count,
+                std::span<const zelm::NoDataRule<T>> rules, std::vector<T>& values, T* target) {
+    if (runs.size() == 1) {
+        for (std::size_t i = 0; i < count; ++i)
+            if (runs[0].shown[i]) target[i] = runs[0].samples[i];
+        return;
+    }
+    for (std::size_t i = 0; i < count; ++i) {
+        values.clear();
+        for (const Run<T>& run : runs)
+            if (run.shown[i]) values.push_back(run.samples[i]);
+        if (!values.empty()) target[i] = Combined<T>(overlap, values, rules[i % rules.size()]);
+    }
+}
+
+// Makes of all layers, in the order of the scenes, what a window has, whose lines are `stride`
+// samples apart; samples that no layer shows stay as they are. `rules` are the no-data values of
+// the window's bands.
 template <class T>
 void Combine(Overlap overlap, std::span<const Layer> layers, const zelm::Rectangle& window,
-             std::span<const zelm::NoDataRule<T>> rules, T* target) {
+             std::span<const zelm::NoDataRule<T>> rules, T* target, std::size_t stride) {
     const std::size_t bands = rules.size();
-    std::vector<const Layer*> here;
     std::vector<T> values;
-    for (std::uint32_t y = window.y; y < window.Bottom(); ++y) {
-        here.clear();
-        for (const Layer& layer : layers)
-            if (y >= layer.part.y && y < layer.part.Bottom()) here.push_back(&layer);
-        for (std::uint32_t x = window.x; x < window.Right(); ++x)
-            for (std::size_t band = 0; band < bands; ++band, ++target) {
-                values.clear();
-                for (const Layer* const layer : here) {
-                    const zelm::Rectangle& part = layer->part;
-                    if (x < part.x || x >= part.Right()) continue;
-                    const std::size_t place =
-                        (std::size_t{y - part.y} * part.width + x - part.x) * bands + band;
-                    if (layer->shown[place])
-                        values.push_back(
-                            reinterpret_cast<const T*>(layer->samples.data())[place]);
-                }
-                if (!values.empty()) *target = Combined<T>(overlap, values, rules[band]);
+    std::vector<Run<T>> runs;
+    // Between two edges of layers a line has the same ones everywhere.
+    std::vector<std::uint32_t> edges = {window.x};
+    for (const Layer& layer : layers)
+        edges.insert(edges.end(),
+                     {layer.part.x, static_cast<std::uint32_t>(layer.part.Right())});
+    std::sort(edges.begin(), edges.end());
+    edges.erase(std::unique(edges.begin(), edges.end()), edges.end());
+    for (std::uint32_t y = window.y; y < window.Bottom(); ++y, target += stride)
+        for (std::size_t edge = 0; edge + 1 < edges.size(); ++edge) {
+            const std::uint32_t x = edges[edge];
+            runs.clear();
+            for (const Layer& layer : layers) {
+                const zelm::Rectangle& part = layer.part;
+                if (y < part.y || y >= part.Bottom() || x < part.x || x >= part.Right()) continue;
+                const std::size_t place =
+                    (std::size_t{y - part.y} * part.width + x - part.x) * bands;
+                runs.push_back({reinterpret_cast<const T*>(layer.samples.data()) + place,
+                                layer.shown.data() + place});
             }
-    }
+            if (!runs.empty())
+                CombineRun<T>(overlap, runs, (edges[edge + 1] - x) * bands, rules, values,
+                              target + (x - window.x) * bands);
+        }
 }
 
 }  // namespace zmcgdal
