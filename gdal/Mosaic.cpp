@@ -62,9 +62,10 @@ protected:
     CPLErr IReadBlock(int column, int row, void* data) override {
         return Reporting(CE_Failure, [&] {
             const int x = column * nBlockXSize, y = row * nBlockYSize;
-            const Rectangle window{static_cast<std::uint32_t>(x), static_cast<std::uint32_t>(y),
-                                   static_cast<std::uint32_t>(std::min(nBlockXSize, nRasterXSize - x)),
-                                   static_cast<std::uint32_t>(std::min(nBlockYSize, nRasterYSize - y))};
+            const Rectangle window{
+                static_cast<std::uint32_t>(x), static_cast<std::uint32_t>(y),
+                static_cast<std::uint32_t>(std::min(nBlockXSize, nRasterXSize - x)),
+                static_cast<std::uint32_t>(std::min(nBlockYSize, nRasterYSize - y))};
             const std::size_t line = window.width * mosaic.sampleSize;
             std::vector<std::byte> pixels(line * window.height);
             const int chosen[] = {nBand};
@@ -126,13 +127,12 @@ Mosaic::Mosaic(const std::string& name, MosaicLayout mosaicLayout, std::size_t m
     const CPLRectObj everything{0, 0, static_cast<double>(layout.width),
                                 static_cast<double>(layout.height)};
     tree.reset(CPLQuadTreeCreate(&everything, nullptr));
-    CPLQuadTreeSetMaxDepth(tree.get(), CPLQuadTreeGetAdvisedMaxDepth(
-                                           static_cast<int>(layout.scenes.size())));
+    CPLQuadTreeSetMaxDepth(tree.get(),
+                           CPLQuadTreeGetAdvisedMaxDepth(static_cast<int>(layout.scenes.size())));
     for (const MosaicScene& scene : layout.scenes) {
-        const CPLRectObj bounds{static_cast<double>(scene.place.x),
-                                static_cast<double>(scene.place.y),
-                                static_cast<double>(scene.place.Right()),
-                                static_cast<double>(scene.place.Bottom())};
+        const CPLRectObj bounds{
+            static_cast<double>(scene.place.x), static_cast<double>(scene.place.y),
+            static_cast<double>(scene.place.Right()), static_cast<double>(scene.place.Bottom())};
         CPLQuadTreeInsertWithBounds(tree.get(), const_cast<MosaicScene*>(&scene), &bounds);
     }
 }
@@ -223,8 +223,7 @@ Layer Mosaic::ReadLayer(std::uint32_t scene, const Rectangle& part, std::span<co
 void Mosaic::Paint(std::uint32_t scene, const Area& area) {
     const Rectangle part = Intersection(layout.scenes[scene].place, area.window);
     if (SceneFile& file = FileOf(scene); file.IsOpaque(area.chosen))
-        return file.Read(part, area.chosen, area.At(part),
-                         static_cast<GSpacing>(area.PixelBytes()),
+        return file.Read(part, area.chosen, area.At(part), static_cast<GSpacing>(area.PixelBytes()),
                          static_cast<GSpacing>(area.LineBytes()),
                          static_cast<GSpacing>(sampleSize));
     const std::uint64_t line = part.width * std::uint64_t{area.PixelBytes()};
@@ -265,8 +264,8 @@ void Mosaic::Combine(const Area& area, const Rectangle& block) {
     }
     std::vector<Layer> layers;
     for (const std::uint32_t scene : scenes)
-        layers.push_back(ReadLayer(scene, Intersection(layout.scenes[scene].place, block),
-                                   area.chosen));
+        layers.push_back(
+            ReadLayer(scene, Intersection(layout.scenes[scene].place, block), area.chosen));
     zelm::VisitElementType(layout.pixelType, [&]<class T>(std::type_identity<T>) {
         std::vector<zelm::NoDataRule<T>> rules;
         for (const int band : area.chosen) {

@@ -1,10 +1,10 @@
 // Mosaic: a dataset that shows many rasters as one, by a layout.
 //
 // A window opens the scenes that it touches and no other; as many stay open as were asked for, and
-// those that were not wanted for longest are closed. What is asked for in the mosaic's own type goes
-// from the scenes to the caller's buffer without blocks between, and a pixel is the same whatever
-// window it is asked for in. A scene that cannot be read, or is not what it was when it was
-// surveyed, fails the window by its name. One thread at a time.
+// those that were not wanted for longest are closed. What is asked for in the mosaic's own type
+// goes from the scenes to the caller's buffer without blocks between, and a pixel is the same
+// whatever window it is asked for in. A scene that cannot be read, or is not what it was when it
+// was surveyed, fails the window by its name. One thread at a time.
 #ifndef ZMC_GDAL_MOSAIC_H
 #define ZMC_GDAL_MOSAIC_H
 

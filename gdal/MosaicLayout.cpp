@@ -161,9 +161,8 @@ std::uint64_t MosaicScene::StateNow() const {
 bool MosaicLayout::IsSigned() const { return pixelType == zelm::PixelTypeCode::Char; }
 
 bool MosaicLayout::HasAlpha() const {
-    return std::any_of(bands.begin(), bands.end(), [](const MosaicBand& band) {
-        return band.interpretation == GCI_AlphaBand;
-    });
+    return std::any_of(bands.begin(), bands.end(),
+                       [](const MosaicBand& band) { return band.interpretation == GCI_AlphaBand; });
 }
 
 bool MosaicLayout::HasGaps() const {

@@ -64,12 +64,12 @@ struct MosaicLayout {
     std::string system;           // as WKT; empty: unknown
     std::uint32_t pixelType = 0;  // code, of all bands
     Overlap overlap = Overlap::Last;
-    std::string resampling;             // of scenes that are warped, as GDAL calls it
-    std::optional<double> hidden;       // marks samples of scenes that have no mark of their own
-    std::vector<MosaicBand> bands;      // of the whole: no-data values are what gaps are filled with
-    std::vector<std::string> drivers;   // of GDAL
-    std::vector<MosaicScene> scenes;    // in the order given
-    std::vector<LeftOut> leftOut;       // that could not be read, in the order given
+    std::string resampling;            // of scenes that are warped, as GDAL calls it
+    std::optional<double> hidden;      // marks samples of scenes that have no mark of their own
+    std::vector<MosaicBand> bands;     // of the whole: no-data values are what gaps are filled with
+    std::vector<std::string> drivers;  // of GDAL
+    std::vector<MosaicScene> scenes;   // in the order given
+    std::vector<LeftOut> leftOut;      // that could not be read, in the order given
 
     // The signed byte, which GDAL has no type of its own for.
     bool IsSigned() const;

@@ -266,8 +266,8 @@ public:
         const ErrorCatcher errors(CE_Failure);
         way.reset(OGRCreateCoordinateTransformation(&source, &target));
         if (!way)
-            FailScene(finding.scene.name, "its coordinate system does not lead to that of " +
-                                              first.scene.name);
+            FailScene(finding.scene.name,
+                      "its coordinate system does not lead to that of " + first.scene.name);
         return way.get();
     }
 
@@ -342,8 +342,9 @@ private:
     void TakeBands() {
         layout.bands = first.kind->bands;
         const auto marked = std::find_if(findings.begin(), findings.end(), [](const Finding& each) {
-            return each.kind && std::any_of(each.kind->bands.begin(), each.kind->bands.end(),
-                                            [](const MosaicBand& b) { return b.noData.has_value(); });
+            return each.kind &&
+                   std::any_of(each.kind->bands.begin(), each.kind->bands.end(),
+                               [](const MosaicBand& b) { return b.noData.has_value(); });
         });
         for (std::size_t i = 0; i < layout.bands.size(); ++i) {
             std::optional<double>& value = layout.bands[i].noData;
@@ -384,8 +385,7 @@ private:
     void TakeUnits() {
         const ScenePtr opened = OpenScene(first.scene.name, *first.driver, first.scene.alone);
         for (std::size_t i = 0; i < layout.bands.size(); ++i)
-            layout.bands[i].unit =
-                opened->GetRasterBand(static_cast<int>(i) + 1)->GetUnitType();
+            layout.bands[i].unit = opened->GetRasterBand(static_cast<int>(i) + 1)->GetUnitType();
     }
 
     void CheckScenes() const {
@@ -412,7 +412,7 @@ private:
                 }
         if (wishes.resolution) width = height = *wishes.resolution;
         layout.transform = {IsUpright(t) ? t[0] : bounds.left, width, 0,
-                            IsUpright(t) ? t[3] : bounds.top, 0, -height};
+                            IsUpright(t) ? t[3] : bounds.top,  0,     -height};
     }
 
     Place ToGrid(const Bounds& bounds) const {
@@ -447,7 +447,8 @@ private:
         const std::string reason = WhyNotWarped(layout.pixelType);
         for (Finding& each : findings) {
             if (!each.kind) {
-                if (!each.failure.empty()) layout.leftOut.push_back({each.scene.name, each.failure});
+                if (!each.failure.empty())
+                    layout.leftOut.push_back({each.scene.name, each.failure});
                 continue;
             }
             const auto [place, fits] = PlaceOf(each);
@@ -501,8 +502,8 @@ MosaicLayout SurveyMosaic(const std::string& name, std::vector<std::string> scen
     constexpr const char* kMake = "make a mosaic of it";
     if (scenes.empty()) throw zmchost::Error(name, kMake, "it names no scene");
     if (scenes.size() > kMostScenes)
-        throw zmchost::Error(name, kMake, "it names more than " + std::to_string(kMostScenes) +
-                                              " scenes");
+        throw zmchost::Error(name, kMake,
+                             "it names more than " + std::to_string(kMostScenes) + " scenes");
     std::vector<Finding> findings(scenes.size());
     for (std::size_t i = 0; i < scenes.size(); ++i) findings[i].scene.name = std::move(scenes[i]);
     Surveyor surveyor(wishes.skipBroken);
@@ -526,10 +527,10 @@ MosaicLayout SurveyMosaic(const std::string& name, std::vector<std::string> scen
     const auto first = std::find_if(findings.begin(), findings.end(),
                                     [](const Finding& each) { return each.kind != nullptr; });
     if (first == findings.end())
-        throw zmchost::Error(name, kMake,
-                             "none of its " + std::to_string(findings.size()) +
-                                 " scenes can be read; of the first one: " +
-                                 findings.front().failure);
+        throw zmchost::Error(
+            name, kMake,
+            "none of its " + std::to_string(findings.size()) +
+                " scenes can be read; of the first one: " + findings.front().failure);
     const bool ordered = wishes.overlap == Overlap::Minimum || wishes.overlap == Overlap::Maximum ||
                          wishes.overlap == Overlap::Median;
     bool isComplex = false;

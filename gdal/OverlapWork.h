@@ -102,8 +102,8 @@ void LayOver(const Layer& layer, const zelm::Rectangle& window, std::size_t band
     const unsigned char* shown = layer.shown.data();
     const std::size_t count = layer.part.width * bands;
     for (std::uint32_t y = layer.part.y; y < layer.part.Bottom(); ++y) {
-        T* const line = target + (std::size_t{y - window.y} * window.width + layer.part.x -
-                                  window.x) * bands;
+        T* const line =
+            target + (std::size_t{y - window.y} * window.width + layer.part.x - window.x) * bands;
         for (std::size_t i = 0; i < count; ++i)
             if (shown[i]) line[i] = from[i];
         from += count;
@@ -147,8 +147,7 @@ void Combine(Overlap overlap, std::span<const Layer> layers, const zelm::Rectang
     // Between two edges of layers a line has the same ones everywhere.
     std::vector<std::uint32_t> edges = {window.x};
     for (const Layer& layer : layers)
-        edges.insert(edges.end(),
-                     {layer.part.x, static_cast<std::uint32_t>(layer.part.Right())});
+        edges.insert(edges.end(), {layer.part.x, static_cast<std::uint32_t>(layer.part.Right())});
     std::sort(edges.begin(), edges.end());
     edges.erase(std::unique(edges.begin(), edges.end()), edges.end());
     for (std::uint32_t y = window.y; y < window.Bottom(); ++y, target += stride)

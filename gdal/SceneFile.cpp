@@ -68,8 +68,8 @@ void MarkShown(const std::optional<double>& value, const T* samples, std::size_t
 
 bool IsWhole(std::uint32_t pixelType) {
     bool whole = false;
-    zelm::VisitElementType(
-        pixelType, [&]<class T>(std::type_identity<T>) { whole = std::is_integral_v<T>; });
+    zelm::VisitElementType(pixelType,
+                           [&]<class T>(std::type_identity<T>) { whole = std::is_integral_v<T>; });
     return whole;
 }
 
@@ -131,8 +131,8 @@ void SceneFile::Warp() {
          "-ts", std::to_string(place.width), std::to_string(place.height)});
     if (!layout.system.empty()) add({"-t_srs", layout.system});
     const Hiding hiding = HidingOf(*file->GetRasterBand(1));
-    const bool hasAlpha = file->GetRasterBand(file->GetRasterCount())->GetColorInterpretation() ==
-                          GCI_AlphaBand;
+    const bool hasAlpha =
+        file->GetRasterBand(file->GetRasterCount())->GetColorInterpretation() == GCI_AlphaBand;
     if (hiding.value && layout.hidden)
         add({"-srcnodata", Exact(*hiding.value), "-dstnodata", Exact(*hiding.value)});
     else if (!hiding.value && !hasAlpha)
@@ -142,15 +142,15 @@ void SceneFile::Warp() {
     const ErrorCatcher errors(CE_Failure);
     GDALDatasetH source = GDALDataset::ToHandle(file.get());
     int misused = FALSE;
-    warped.reset(GDALDataset::FromHandle(
-        GDALWarp("", nullptr, 1, &source, options.get(), &misused)));
+    warped.reset(
+        GDALDataset::FromHandle(GDALWarp("", nullptr, 1, &source, options.get(), &misused)));
     if (!warped) FailScene(scene.name, ReasonOr(errors, scene.name));
 }
 
 SceneFile::Hiding SceneFile::HidingOf(GDALRasterBand& band) const {
     const int flags = band.GetMaskFlags();
-    const bool exact = band.GetRasterDataType() != GDT_Int64 &&
-                       band.GetRasterDataType() != GDT_UInt64;
+    const bool exact =
+        band.GetRasterDataType() != GDT_Int64 && band.GetRasterDataType() != GDT_UInt64;
     if (flags == GMF_NODATA && exact) return {NoDataAsDouble(band), nullptr};
     if ((flags & GMF_ALL_VALID) == 0) return {std::nullopt, band.GetMaskBand()};
     return {layout.hidden, nullptr};
@@ -214,10 +214,10 @@ void SceneFile::ReadShown(const Rectangle& part, std::span<const int> bands, con
             GDALRasterIOExtraArg extra;
             INIT_RASTERIO_EXTRA_ARG(extra);
             const ErrorCatcher errors(CE_Failure);
-            const CPLErr result = hiding.mask->RasterIO(
-                GF_Read, static_cast<int>(part.x - scene.place.x),
-                static_cast<int>(part.y - scene.place.y), width, height, mask.data(), width, height,
-                GDT_Byte, 0, 0, &extra);
+            const CPLErr result =
+                hiding.mask->RasterIO(GF_Read, static_cast<int>(part.x - scene.place.x),
+                                      static_cast<int>(part.y - scene.place.y), width, height,
+                                      mask.data(), width, height, GDT_Byte, 0, 0, &extra);
             if (result != CE_None || !errors.Text().empty())
                 FailScene(scene.name, ReasonOr(errors, scene.name));
             known = hiding.mask;

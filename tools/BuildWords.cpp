@@ -35,9 +35,10 @@ void CheckComplete(GDALDataset& dataset, const std::string& source) {
 
 void BuildWords::Describe(OptionTable& table) {
     table
-        .Text("SOURCE", source,
-              "Raster to read: a file or any other name that GDAL knows; many of them as one: @FILE, "
-              "a list of names, or a pattern as 'FOLDER/*.tif'")
+        .Text(
+            "SOURCE", source,
+            "Raster to read: a file or any other name that GDAL knows; many of them as one: @FILE, "
+            "a list of names, or a pattern as 'FOLDER/*.tif'")
         .Required();
     table.Text("TARGET", target, "Pyramid file to make").Required();
     table
@@ -82,8 +83,9 @@ void BuildWords::Describe(OptionTable& table) {
         .Named("RULE")
         .OneOf({"last", "first", "mean", "min", "max", "median"});
     table
-        .Text("--scene-resampling", sceneResampling,
-              "How scenes are warped that do not lie on the grid of the first one (default nearest)")
+        .Text(
+            "--scene-resampling", sceneResampling,
+            "How scenes are warped that do not lie on the grid of the first one (default nearest)")
         .Named("METHOD")
         .OneOf({"nearest", "bilinear", "cubic", "cubicspline", "lanczos", "average", "mode"});
     table

@@ -55,9 +55,8 @@ zmcgdal::MosaicWishes WishesOf(const BuildWords& words) {
 // A value that nothing marks as none.
 bool FillsWithZeros(const zmcgdal::MosaicLayout& layout) {
     bool whole = false;
-    zelm::VisitElementType(layout.pixelType, [&]<class T>(std::type_identity<T>) {
-        whole = std::is_integral_v<T>;
-    });
+    zelm::VisitElementType(layout.pixelType,
+                           [&]<class T>(std::type_identity<T>) { whole = std::is_integral_v<T>; });
     return whole && !layout.HasAlpha() && !layout.bands.front().noData;
 }
 
@@ -78,8 +77,9 @@ DatasetPtr SurveyScenes(const BuildWords& words, std::vector<std::string> scenes
         zmcgdal::MosaicLayout layout =
             zmcgdal::SurveyMosaic(words.source, std::move(scenes), wishes);
         if (FillsWithZeros(layout) && layout.HasGaps())
-            Warn(words.source, "there are gaps between its scenes, which are filled with 0; --nodata "
-                               "tells another value");
+            Warn(words.source,
+                 "there are gaps between its scenes, which are filled with 0; --nodata "
+                 "tells another value");
         return OpenMosaic(words.source, std::move(layout));
     } catch (const zmchost::Cancelled&) {
         throw Interruption(words.target);

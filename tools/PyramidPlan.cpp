@@ -47,21 +47,21 @@ Json DocumentOf(const PyramidPlan& plan) {
     Json options = Json::object();
     VisitWords(plan.words, [&](const char* key, const auto& value) { options[key] = value; });
     Json document = {{kVersionKey, kPlanVersion},
-            {"source", plan.words.source},
-            {"sourceState", plan.sourceState},
-            {"facts", HexText(plan.facts)},
-            {"target", platform::NameOf(plan.words.target)},
-            {"targetState", plan.targetState},
-            {"pyramid", plan.pyramid},
-            {"pyramidNumber", HexText(plan.number)},
-            {"durable", plan.durable},
-            {"options", options},
-            {"width", plan.grid.width},
-            {"height", plan.grid.height},
-            {"partLevel", plan.grid.level},
-            {"partColumns", plan.grid.columns},
-            {"partRows", plan.grid.rows},
-            {"parts", plan.grid.Count()}};
+                     {"source", plan.words.source},
+                     {"sourceState", plan.sourceState},
+                     {"facts", HexText(plan.facts)},
+                     {"target", platform::NameOf(plan.words.target)},
+                     {"targetState", plan.targetState},
+                     {"pyramid", plan.pyramid},
+                     {"pyramidNumber", HexText(plan.number)},
+                     {"durable", plan.durable},
+                     {"options", options},
+                     {"width", plan.grid.width},
+                     {"height", plan.grid.height},
+                     {"partLevel", plan.grid.level},
+                     {"partColumns", plan.grid.columns},
+                     {"partRows", plan.grid.rows},
+                     {"parts", plan.grid.Count()}};
     if (plan.sceneCount > 0) document["scenes"] = plan.sceneCount;
     return document;
 }

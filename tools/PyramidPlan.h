@@ -21,12 +21,12 @@ inline constexpr const char* kPlanFileEnding = ".zmcplan";
 struct PyramidPlan {
     BuildWords words;  // target: as it is reached from here
     std::string sourceState;
-    std::string scenes;            // of a source of many rasters, its layout; not read with the plan
+    std::string scenes;  // of a source of many rasters, its layout; not read with the plan
     std::uint64_t sceneCount = 0;  // 0: the source is one raster
-    std::uint64_t facts = 0;   // of PartBuild
-    std::string pyramid;       // name of the file that was laid out
-    std::uint64_t number = 0;  // of that file in the file system
-    std::string targetState;   // when the plan was made
+    std::uint64_t facts = 0;       // of PartBuild
+    std::string pyramid;           // name of the file that was laid out
+    std::uint64_t number = 0;      // of that file in the file system
+    std::string targetState;       // when the plan was made
     zmchost::PartGrid grid;
     bool durable = true;         // records and tiles are brought to the disk part by part
     std::string path;            // of the plan itself

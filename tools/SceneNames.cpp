@@ -31,8 +31,7 @@ bool IsList(const std::string& source) { return source.starts_with('@'); }
 // Names of databases and services have a colon in front of any slash, and stars of their own.
 bool IsPattern(const std::string& source) {
     const std::string name = platform::NameOf(source);
-    return name.find_first_of("*?") != name.npos &&
-           source.find(':') >= source.find('/') &&
+    return name.find_first_of("*?") != name.npos && source.find(':') >= source.find('/') &&
            platform::StatusOf(platform::FolderOf(source)).isFolder;
 }
 
@@ -94,12 +93,12 @@ std::vector<std::string> NamesInList(const std::string& source) {
         if (line.ends_with('\r')) line.pop_back();
         if (line.starts_with('#') || line.find_first_not_of(" \t") == line.npos) continue;
         if (names.size() == zmcgdal::kMostScenes)
-            throw Failure(source, "it names more than " + std::to_string(zmcgdal::kMostScenes) +
-                                      " rasters");
+            throw Failure(
+                source, "it names more than " + std::to_string(zmcgdal::kMostScenes) + " rasters");
         std::string name = Found(folder, line);
         if (IsList(line) && !platform::StatusOf(name).exists)
-            throw Failure(source, "line " + std::to_string(number) +
-                                      " names a list; a list names rasters");
+            throw Failure(source,
+                          "line " + std::to_string(number) + " names a list; a list names rasters");
         names.push_back(std::move(name));
     }
     if (names.empty()) throw Failure(source, "the list names no raster");

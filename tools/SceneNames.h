@@ -4,7 +4,8 @@
 //                        passed over, and names are looked up from the folder of the file
 //     FOLDER/*.tif       what lies in the folder and fits, * for any bytes and ? for one, sorted
 //
-// A raster that has such a name itself is that raster, and a folder alone is what GDAL takes it for.
+// A raster that has such a name itself is that raster, and a folder alone is what GDAL takes it
+// for.
 #ifndef ZMC_TOOLS_SCENENAMES_H
 #define ZMC_TOOLS_SCENENAMES_H
 
