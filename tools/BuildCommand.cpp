@@ -49,6 +49,7 @@ void BuildCommand::Describe(OptionTable& table) {
         "  zmcraster build scene.tif scene.pyr\n"
         "  zmcraster build landsat.vrt rgb.pyr --bands 3,2,1 --nodata 0 --threads 4\n"
         "  zmcraster build classes.tif classes.pyr --resampling mode --overwrite\n"
+        "  zmcraster build 'scenes/*.tif' all.pyr --overlap mean --nodata 0\n"
         "\n"
         "The target appears when it is finished, and never half done: a build that fails or is\n"
         "interrupted leaves the old file as it was. Georeference, no-data values, descriptions "

@@ -112,6 +112,8 @@ class Sources(MosaicTest):
         gdal.BuildVRT(self.path("all.vrt"), [self.path(name) for name in names])
         self.build("all.vrt")
         self.assertEqual(self.result(), first)
+        self.assertPartsMakeIt("all.vrt")
+        self.assertPartsMakeIt("@list.txt")
 
     def test_names_are_looked_up_from_the_folder_of_the_list(self):
         whole = self.tiles(2, 1, folder="deep/in")
@@ -192,7 +194,9 @@ class Overlaps(MosaicTest):
         layers = []
         for number, (x, y) in enumerate(((0, 0), (150, 100), (80, 220))):
             pixels = self.noise(300, 400)
-            self.scene(f"in/{number}.tif", x, y, pixels)
+            # Scenes need not be stored alike.
+            self.scene(f"in/{number}.tif", x, y, pixels,
+                       options=("COMPRESS=DEFLATE", "TILED=YES") if number == 1 else ())
             layer = np.full((520, 550), -1, dtype=np.int64)
             layer[y:y + 300, x:x + 400] = pixels[0]
             layers.append(layer)
