@@ -47,7 +47,7 @@ private:
     class Area;
 
     struct CloseTree {
-        void operator()(CPLQuadTree* tree) const { CPLQuadTreeDestroy(tree); }
+        void operator()(CPLQuadTree* unused) const { CPLQuadTreeDestroy(unused); }
     };
     struct OpenScene {
         std::uint32_t scene;

@@ -204,7 +204,7 @@ private:
     static void ReadAll(GdalRasterSource& source, const zelm::RasterProps& props) {
         std::vector<std::uint32_t> bands(props.bands);
         std::iota(bands.begin(), bands.end(), 0);
-        std::uint64_t size = 0;
+        std::uint64_t size = 1;
         zelm::VisitElementType(props.pixelType,
                                [&]<class T>(std::type_identity<T>) { size = sizeof(T); });
         const std::uint64_t line = size * props.samples * props.bands;
