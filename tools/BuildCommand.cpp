@@ -6,6 +6,7 @@
 #include "tools/BuildEnd.h"
 #include "tools/Command.h"
 #include "tools/Interrupt.h"
+#include "tools/MosaicSource.h"
 #include "tools/ProcessBuild.h"
 #include "tools/TerminalProgress.h"
 
@@ -48,6 +49,7 @@ void BuildCommand::Describe(OptionTable& table) {
         "  zmcraster build scene.tif scene.pyr\n"
         "  zmcraster build landsat.vrt rgb.pyr --bands 3,2,1 --nodata 0 --threads 4\n"
         "  zmcraster build classes.tif classes.pyr --resampling mode --overwrite\n"
+        "  zmcraster build 'scenes/*.tif' all.pyr --overlap mean --nodata 0\n"
         "\n"
         "The target appears when it is finished, and never half done: a build that fails or is\n"
         "interrupted leaves the old file as it was. Georeference, no-data values, descriptions "
@@ -85,7 +87,7 @@ zmchost::BuildReport BuildCommand::BuildBy(GDALDataset& dataset, zmcgdal::GdalRa
 }
 
 ExitStatus BuildCommand::Run() {
-    const DatasetPtr dataset = words.OpenSource();
+    const DatasetPtr dataset = words.OpenSource(!quiet);
     zmcgdal::GdalRasterSource pixels(*dataset);
     const zelm::RasterProps props = pixels.Props();
     const zmchost::BuildOptions options = words.Options(props);
@@ -95,9 +97,10 @@ ExitStatus BuildCommand::Run() {
         Warn(words.source, "a pyramid does not keep " + loss);
     const zmchost::BuildReport report = BuildBy(*dataset, pixels, options);
     if (json)
-        PrintDocument(BuildDocument(words, report, props.pixelType));
+        PrintDocument(BuildDocument(words, report, props.pixelType, *dataset));
     else if (!quiet)
         PrintReport(words, report, props.pixelType);
+    TellLeftOut(*dataset);
     return ExitStatus::Done;
 }
 

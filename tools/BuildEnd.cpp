@@ -10,6 +10,7 @@
 #include "describe/JsonNumbers.h"
 #include "gdal/Dataset.h"
 #include "gdal/Sidecar.h"
+#include "tools/MosaicSource.h"
 
 namespace zmctools {
 namespace {
@@ -78,19 +79,21 @@ void BuildEnd::WriteSidecar(const std::string& built, const std::string& base) c
 }
 
 Json BuildDocument(const BuildWords& words, const zmchost::BuildReport& report,
-                   std::uint32_t pixelType) {
-    return {{"schema", zmcdescribe::kSchema},
-            {"source", words.source},
-            {"file", words.target},
-            {"width", report.width},
-            {"height", report.height},
-            {"bands", report.bands},
-            {"pixelType", zelm::PixelTypeName(pixelType)},
-            {"tileOrdering", zelm::TileOrderName(report.tileOrdering)},
-            {"levelMax", report.maxLevel},
-            {"resampling", zmchost::ResamplingName(report.resampling)},
-            {"bytes", zmcdescribe::JsonNumber(report.fileSize)},
-            {"seconds", zmcdescribe::JsonNumber(report.seconds)}};
+                   std::uint32_t pixelType, const GDALDataset& source) {
+    Json document = {{"schema", zmcdescribe::kSchema},
+                     {"source", words.source},
+                     {"file", words.target},
+                     {"width", report.width},
+                     {"height", report.height},
+                     {"bands", report.bands},
+                     {"pixelType", zelm::PixelTypeName(pixelType)},
+                     {"tileOrdering", zelm::TileOrderName(report.tileOrdering)},
+                     {"levelMax", report.maxLevel},
+                     {"resampling", zmchost::ResamplingName(report.resampling)},
+                     {"bytes", zmcdescribe::JsonNumber(report.fileSize)},
+                     {"seconds", zmcdescribe::JsonNumber(report.seconds)}};
+    AddScenes(document, source);
+    return document;
 }
 
 void PrintReport(const BuildWords& words, const zmchost::BuildReport& report,

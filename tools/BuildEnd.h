@@ -34,9 +34,10 @@ private:
     std::vector<zmchost::FullStatistics> statistics;
 };
 
-// A finished build, as a document and for people; the last one where others have made the parts.
+// A finished build of a source, as a document and for people; the last one where others have made
+// the parts.
 Json BuildDocument(const BuildWords& words, const zmchost::BuildReport& report,
-                   std::uint32_t pixelType);
+                   std::uint32_t pixelType, const GDALDataset& source);
 void PrintReport(const BuildWords& words, const zmchost::BuildReport& report,
                  std::uint32_t pixelType);
 void PrintFinished(const BuildWords& words, const zmchost::BuildReport& report,

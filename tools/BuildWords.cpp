@@ -9,7 +9,9 @@
 #include "tools/GdalWorld.h"
 #include "tools/Message.h"
 #include "tools/Methods.h"
+#include "tools/MosaicSource.h"
 #include "tools/RasterView.h"
+#include "tools/SceneNames.h"
 
 namespace zmctools {
 namespace {
@@ -32,7 +34,11 @@ void CheckComplete(GDALDataset& dataset, const std::string& source) {
 }  // namespace
 
 void BuildWords::Describe(OptionTable& table) {
-    table.Text("SOURCE", source, "Raster to read: a file or any other name that GDAL knows")
+    table
+        .Text(
+            "SOURCE", source,
+            "Raster to read: a file or any other name that GDAL knows; many of them as one: @FILE, "
+            "a list of names, or a pattern as 'FOLDER/*.tif'")
         .Required();
     table.Text("TARGET", target, "Pyramid file to make").Required();
     table
@@ -70,6 +76,25 @@ void BuildWords::Describe(OptionTable& table) {
         .Filled(kNoBands);
     table.Text("--bins", bins, "Bins of a histogram; 8-bit types have one per value (default 256)")
         .Named("N");
+    table
+        .Text("--overlap", overlap,
+              "Where scenes of many lie over each other: which of them is seen, or what is made of "
+              "all (default last)")
+        .Named("RULE")
+        .OneOf({"last", "first", "mean", "min", "max", "median"});
+    table
+        .Text(
+            "--scene-resampling", sceneResampling,
+            "How scenes are warped that do not lie on the grid of the first one (default nearest)")
+        .Named("METHOD")
+        .OneOf({"nearest", "bilinear", "cubic", "cubicspline", "lanczos", "average", "mode"});
+    table
+        .Text("--resolution", resolution,
+              "Side of a pixel of many scenes as one; first, finest: that of such a scene (default "
+              "first)")
+        .Named("first|finest|N");
+    table.Flag("--skip-broken", skipBroken,
+               "Leave out scenes of many that cannot be read; reads all of them for that");
     table.Flag("--no-statistics", noStatistics, "Leave out statistics and histograms");
     const std::string memoryHelp = "Memory for pixels, such as 64M or 2G (default " + memory + ')';
     table.Text("--memory", memory, memoryHelp.c_str()).Named("SIZE");
@@ -125,8 +150,10 @@ void BuildWords::CheckTarget() const {
     if (!overwrite) throw Failure(target, "the file exists already; --overwrite replaces it");
 }
 
-DatasetPtr BuildWords::OpenSource() const {
-    DatasetPtr dataset = OpenDataset(source);
+DatasetPtr BuildWords::OpenSource(bool showsBar) const {
+    auto scenes = SceneNames(source);
+    if (scenes && scenes->size() > 1) return SurveyScenes(*this, std::move(*scenes), showsBar);
+    DatasetPtr dataset = OpenDataset(scenes ? scenes->front() : source);
     CheckComplete(*dataset, source);
     return dataset;
 }

@@ -22,6 +22,10 @@ struct BuildWords {
     std::string bands;
     std::string bins = "256";
     std::string memory = "256M";
+    std::string overlap = "last";
+    std::string sceneResampling = "nearest";
+    std::string resolution = "first";
+    bool skipBroken = false;
     bool noStatistics = false;
     bool overwrite = false;
     bool embed = false;
@@ -32,8 +36,9 @@ struct BuildWords {
     zmchost::BuildOptions Options(const zelm::RasterProps& props) const;
     // Throws Failure for a target that cannot be made or is not to be replaced.
     void CheckTarget() const;
-    // Throws Failure too for a source that is incomplete.
-    DatasetPtr OpenSource() const;
+    // Throws Failure too for a source that is incomplete. One of many rasters is surveyed, with a
+    // bar where that is wanted; Interruption then.
+    DatasetPtr OpenSource(bool showsBar = false) const;
 };
 
 }  // namespace zmctools

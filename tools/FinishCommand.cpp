@@ -5,6 +5,7 @@
 #include "tools/Arguments.h"
 #include "tools/BuildEnd.h"
 #include "tools/Command.h"
+#include "tools/MosaicSource.h"
 #include "tools/PlannedBuild.h"
 #include "tools/SourceState.h"
 #include "tools/TerminalProgress.h"
@@ -80,7 +81,7 @@ zmchost::BuildReport FinishCommand::Finish(PlannedBuild& build) const {
 void FinishCommand::Report(const PlannedBuild& build, const zmchost::BuildReport& report) const {
     const std::uint32_t pixelType = build.pixels.Props().pixelType;
     if (json)
-        PrintDocument(BuildDocument(build.plan.words, report, pixelType));
+        PrintDocument(BuildDocument(build.plan.words, report, pixelType, *build.dataset));
     else if (!quiet)
         PrintFinished(build.plan.words, report, pixelType);
 }
@@ -101,6 +102,7 @@ ExitStatus FinishCommand::Run() {
     const zmchost::BuildReport report = Finish(build);
     plan.Discard();
     Report(build, report);
+    TellLeftOut(*build.dataset);
     return ExitStatus::Done;
 }
 

@@ -3,11 +3,12 @@
 #include <filesystem>
 
 #include "gdal/Dataset.h"
-#include "platform/Program.h"
 #include "tools/Arguments.h"
 #include "tools/Command.h"
 #include "tools/Interrupt.h"
+#include "tools/MosaicSource.h"
 #include "tools/PlanMaking.h"
+#include "tools/SceneNames.h"
 #include "tools/SourceState.h"
 
 namespace zmctools {
@@ -30,7 +31,7 @@ private:
     std::string partSize;
 
     void ClearTheWay() const;
-    void Report(const PyramidPlan& plan) const;
+    void Report(const PyramidPlan& plan, GDALDataset& dataset) const;
 };
 
 void PlanCommand::Describe(OptionTable& table) {
@@ -54,14 +55,6 @@ void PlanCommand::Describe(OptionTable& table) {
         "was done of the one before, and finish --discard does so for good.");
 }
 
-// From any folder the same file; what is no file is left as it stands.
-std::string FromAnywhere(const std::string& source) {
-    std::error_code error;
-    if (platform::IsAbsolutePath(source) || !fs::exists(source, error)) return source;
-    const fs::path path = fs::absolute(source, error);
-    return error ? source : path.lexically_normal().string();
-}
-
 // What is left of plans that were given up, and with --overwrite the plan itself.
 void PlanCommand::ClearTheWay() const {
     const std::string path = words.target + kPlanFileEnding;
@@ -76,10 +69,10 @@ void PlanCommand::ClearTheWay() const {
     });
 }
 
-void PlanCommand::Report(const PyramidPlan& plan) const {
+void PlanCommand::Report(const PyramidPlan& plan, GDALDataset& dataset) const {
     const zmchost::PartGrid& grid = plan.grid;
     if (json) {
-        PrintDocument({{"schema", kSchema},
+        Json document({{"schema", kSchema},
                        {"plan", plan.path},
                        {"source", plan.words.source},
                        {"target", plan.words.target},
@@ -89,6 +82,8 @@ void PlanCommand::Report(const PyramidPlan& plan) const {
                        {"partWidth", std::min<std::uint64_t>(grid.PartWidth(), grid.width)},
                        {"partHeight", std::min<std::uint64_t>(grid.PartHeight(), grid.height)},
                        {"partLevel", grid.level}});
+        AddScenes(document, dataset);
+        PrintDocument(document);
     } else if (!quiet) {
         std::printf(
             "%s: %llu part%s of %llu x %llu pixels at the most, levels 0 to %u of each\n",
@@ -102,7 +97,7 @@ void PlanCommand::Report(const PyramidPlan& plan) const {
 }
 
 ExitStatus PlanCommand::Run() {
-    const DatasetPtr dataset = words.OpenSource();
+    const DatasetPtr dataset = words.OpenSource(!quiet);
     zmcgdal::GdalRasterSource pixels(*dataset);
     zmchost::BuildOptions options = words.Options(pixels.Props());
     options.threads = 1;
@@ -119,7 +114,8 @@ ExitStatus PlanCommand::Run() {
     plan.words.source = FromAnywhere(words.source);
     plan.Write();
     file.Keep();
-    Report(plan);
+    Report(plan, *dataset);
+    TellLeftOut(*dataset);
     return ExitStatus::Done;
 }
 

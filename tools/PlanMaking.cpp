@@ -4,6 +4,8 @@
 #include <bit>
 
 #include "gdal/Dataset.h"
+#include "gdal/Mosaic.h"
+#include "host/base/Checksum.h"
 #include "host/build/PartBuild.h"
 #include "platform/FileSystem.h"
 #include "tools/Arguments.h"
@@ -54,7 +56,13 @@ PyramidPlan MakePlan(const BuildWords& words, GDALDataset& dataset,
     zmchost::PartBuild build(zmcgdal::SharedModule(), pixels, words.target, options, file.Path());
     PyramidPlan plan;
     plan.words = words;
-    plan.sourceState = SourceState(dataset);
+    if (const auto* const mosaic = dynamic_cast<const zmcgdal::Mosaic*>(&dataset)) {
+        plan.scenes = mosaic->Layout().Pack();
+        plan.sceneCount = mosaic->Layout().scenes.size();
+        plan.sourceState = HexText(zmchost::Checksum(plan.scenes));
+    } else {
+        plan.sourceState = SourceState(dataset);
+    }
     plan.facts = build.Facts();
     plan.pyramid = platform::NameOf(file.Path());
     plan.number = platform::StatusOf(file.Path()).number;

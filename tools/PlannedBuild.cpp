@@ -26,7 +26,8 @@ std::string PartList(const std::vector<std::uint64_t>& parts) {
 
 PlannedBuild::PlannedBuild(PyramidPlan openedPlan, std::uint32_t threads)
     : plan(std::move(openedPlan)),
-      dataset(plan.words.OpenSource()),
+      dataset(plan.OpenSource()),
+      mosaic(dynamic_cast<zmcgdal::Mosaic*>(dataset.get())),
       pixels(*dataset),
       options(plan.words.Options(pixels.Props())),
       records(plan.Records()) {
@@ -38,7 +39,9 @@ PlannedBuild::PlannedBuild(PyramidPlan openedPlan, std::uint32_t threads)
     CheckSource();
 }
 
+// Of many rasters those that were read since the last call.
 void PlannedBuild::CheckSource() const {
+    if (mosaic) return mosaic->CheckRead();
     if (SourceState(*dataset) != plan.sourceState)
         throw Failure(plan.words.source, "it changed since the plan was made");
 }
@@ -88,7 +91,10 @@ zmchost::BuildReport PlannedBuild::Finish(zmchost::BuildFile& file) {
         if (const auto counts = records.Find(Kind::Count, part))
             build->TakeCounts(part, counts->sums);
     const zmchost::BuildReport report = build->Finish(file);
-    CheckSource();
+    if (mosaic)
+        mosaic->CheckAll();
+    else
+        CheckSource();
     return report;
 }
 

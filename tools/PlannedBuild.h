@@ -2,7 +2,8 @@
 // finish it.
 //
 // All of it is looked at before it is used: the file is the one that was laid out, and the source
-// is what it was when the plan was made, before each part and behind it.
+// is what it was when the plan was made, before each part and behind it: of many rasters those that
+// the part needs, and all of them in the end.
 #ifndef ZMC_TOOLS_PLANNEDBUILD_H
 #define ZMC_TOOLS_PLANNEDBUILD_H
 
@@ -13,6 +14,7 @@
 #include <vector>
 
 #include "gdal/GdalRasterSource.h"
+#include "gdal/Mosaic.h"
 #include "host/build/PartBuild.h"
 #include "host/build/PartFolder.h"
 #include "tools/PyramidPlan.h"
@@ -48,6 +50,7 @@ public:
 
     const PyramidPlan plan;
     const DatasetPtr dataset;
+    zmcgdal::Mosaic* const mosaic;  // the dataset, if it is one
     zmcgdal::GdalRasterSource pixels;
     zmchost::BuildOptions options;  // what Start makes of it is fixed
 

@@ -12,6 +12,7 @@
 #include "host/build/BuildPlan.h"
 #include "platform/FileSystem.h"
 #include "tools/Message.h"
+#include "tools/MosaicSource.h"
 #include "tools/SourceState.h"
 
 namespace zmctools {
@@ -45,22 +46,24 @@ void VisitWords(Words& words, const Visit& visit) {
 Json DocumentOf(const PyramidPlan& plan) {
     Json options = Json::object();
     VisitWords(plan.words, [&](const char* key, const auto& value) { options[key] = value; });
-    return {{kVersionKey, kPlanVersion},
-            {"source", plan.words.source},
-            {"sourceState", plan.sourceState},
-            {"facts", HexText(plan.facts)},
-            {"target", platform::NameOf(plan.words.target)},
-            {"targetState", plan.targetState},
-            {"pyramid", plan.pyramid},
-            {"pyramidNumber", HexText(plan.number)},
-            {"durable", plan.durable},
-            {"options", options},
-            {"width", plan.grid.width},
-            {"height", plan.grid.height},
-            {"partLevel", plan.grid.level},
-            {"partColumns", plan.grid.columns},
-            {"partRows", plan.grid.rows},
-            {"parts", plan.grid.Count()}};
+    Json document = {{kVersionKey, kPlanVersion},
+                     {"source", plan.words.source},
+                     {"sourceState", plan.sourceState},
+                     {"facts", HexText(plan.facts)},
+                     {"target", platform::NameOf(plan.words.target)},
+                     {"targetState", plan.targetState},
+                     {"pyramid", plan.pyramid},
+                     {"pyramidNumber", HexText(plan.number)},
+                     {"durable", plan.durable},
+                     {"options", options},
+                     {"width", plan.grid.width},
+                     {"height", plan.grid.height},
+                     {"partLevel", plan.grid.level},
+                     {"partColumns", plan.grid.columns},
+                     {"partRows", plan.grid.rows},
+                     {"parts", plan.grid.Count()}};
+    if (plan.sceneCount > 0) document["scenes"] = plan.sceneCount;
+    return document;
 }
 
 std::uint64_t FromHex(const Json& value) {
@@ -104,6 +107,7 @@ PyramidPlan PlanFrom(const std::string& file, const Json& document) {
     if (zelm::files::LooksLent(plan.words.source))
         throw Failure(file, "names of lent sources are not taken here");
     plan.sourceState = document.at("sourceState");
+    if (document.contains("scenes")) plan.sceneCount = document.at("scenes");
     plan.facts = FromHex(document.at("facts"));
     plan.words.target =
         platform::JoinPath(platform::FolderOf(file), PlainName(file, document.at("target")));
@@ -183,6 +187,7 @@ void PyramidPlan::Write() {
         throw Failure(path, "a plan keeps no name that is not UTF-8");
     }
     Records().Make();
+    if (sceneCount > 0) Records().KeepScenes(scenes);
     const std::string made = PyramidPath() + zmchost::BuildFile::kNewPlanEnding;
     int error = 0;
     const auto file = FileSource::Open(zmchost::WideFileName(made), OpenMode::Create, &error);
@@ -210,6 +215,17 @@ PyramidPlan PyramidPlan::Read(const std::string& file) {
     } catch (const Json::exception&) {
         throw Failure(file, "it is no plan of a build, or a damaged one");
     }
+}
+
+DatasetPtr PyramidPlan::OpenSource() const {
+    if (sceneCount == 0) return words.OpenSource();
+    const std::string kept = Records().Scenes();
+    if (HexText(zmchost::Checksum(kept)) != sourceState)
+        throw Failure(path, "what it knows of the scenes of its source is damaged or gone");
+    auto layout = zmcgdal::MosaicLayout::Unpack(kept);
+    if (!layout || layout->scenes.size() != sceneCount)
+        throw Failure(path, "what it knows of the scenes of its source cannot be");
+    return OpenMosaic(words.source, std::move(*layout));
 }
 
 void PyramidPlan::Discard() const {

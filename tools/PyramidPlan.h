@@ -21,10 +21,12 @@ inline constexpr const char* kPlanFileEnding = ".zmcplan";
 struct PyramidPlan {
     BuildWords words;  // target: as it is reached from here
     std::string sourceState;
-    std::uint64_t facts = 0;   // of PartBuild
-    std::string pyramid;       // name of the file that was laid out
-    std::uint64_t number = 0;  // of that file in the file system
-    std::string targetState;   // when the plan was made
+    std::string scenes;  // of a source of many rasters, its layout; not read with the plan
+    std::uint64_t sceneCount = 0;  // 0: the source is one raster
+    std::uint64_t facts = 0;       // of PartBuild
+    std::string pyramid;           // name of the file that was laid out
+    std::uint64_t number = 0;      // of that file in the file system
+    std::string targetState;       // when the plan was made
     zmchost::PartGrid grid;
     bool durable = true;         // records and tiles are brought to the disk part by part
     std::string path;            // of the plan itself
@@ -45,6 +47,10 @@ struct PyramidPlan {
     void Write();
     // Throws Failure for what is no plan, one of another version or one that was changed.
     static PyramidPlan Read(const std::string& file);
+
+    // As it was when the plan was made, as far as that can be told of a source of many rasters
+    // without a look at them. Throws Failure.
+    DatasetPtr OpenSource() const;
 
     // Removes records and plan, and the file if it was not finished.
     void Discard() const;

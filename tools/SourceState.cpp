@@ -1,12 +1,12 @@
 #include "tools/SourceState.h"
 
 #include <cpl_string.h>
-#include <cpl_vsi.h>
 
 #include <cinttypes>
 #include <cstdio>
 
 #include "files/FileSource.h"
+#include "gdal/FileState.h"
 #include "host/base/Checksum.h"
 #include "host/base/Error.h"
 #include "host/base/Text.h"
@@ -18,24 +18,12 @@ namespace {
 using zelm::files::FileSource;
 using zelm::files::Identity;
 
-// Of a file that the system knows; unknown otherwise, as of those of GDAL's virtual file systems.
 Identity FileIdentity(const std::string& path) {
     try {
         return FileSource::IdentifyName(zmchost::WideFileName(path));
     } catch (const zmchost::Error&) {
         return {};
     }
-}
-
-// The file's number and its last change of any kind differ from machine to machine, or with a copy.
-std::string StateOf(const std::string& path) {
-    const Identity identity = FileIdentity(path);
-    if (identity.known)
-        return std::to_string(identity.size) + '@' + std::to_string(identity.modified);
-    VSIStatBufL status;
-    if (VSIStatExL(path.c_str(), &status, VSI_STAT_EXISTS_FLAG | VSI_STAT_SIZE_FLAG) != 0)
-        return "";
-    return std::to_string(status.st_size) + '@' + std::to_string(status.st_mtime);
 }
 
 }  // namespace
@@ -50,7 +38,7 @@ std::string SourceState(GDALDataset& dataset) {
     std::string all = platform::NameOf(dataset.GetDescription()) + '\n';
     const CPLStringList files(dataset.GetFileList());
     for (int i = 0; i < files.Count(); ++i)
-        all += platform::NameOf(files[i]) + '\n' + StateOf(files[i]) + '\n';
+        all += platform::NameOf(files[i]) + '\n' + zmcgdal::FileState(files[i]) + '\n';
     return HexText(zmchost::Checksum(all));
 }
 

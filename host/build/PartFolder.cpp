@@ -18,6 +18,7 @@ namespace {
 using zelm::files::FileSource;
 using zelm::files::OpenMode;
 
+constexpr const char* kScenes = "scenes";
 constexpr std::string_view kPartMagic = "ZMCPART1";
 // Tables of every value of as many bands as the largest budget has room for.
 constexpr std::uint64_t kMaxPartBytes = std::uint64_t{256} << 20;
@@ -28,6 +29,7 @@ const char* EndingOf(PartFolder::Kind kind) {
 
 // Records, and those that never got their name.
 bool IsPartRecord(std::string_view name) {
+    if (name == kScenes) return true;
     if (name.starts_with('.')) name.remove_prefix(1);
     const std::size_t digits = std::min(name.find_first_not_of("0123456789"), name.size());
     const std::string_view rest = name.substr(digits);
@@ -106,6 +108,14 @@ std::optional<PartResult> PartFolder::Find(Kind kind, std::uint64_t part) const 
     result.sums = record.Rest();
     return ours && record.Good() ? std::optional(std::move(result)) : std::nullopt;
 }
+
+void PartFolder::KeepScenes(const std::string& bytes) const {
+    const std::string path = platform::JoinPath(folder, kScenes);
+    const std::string reason = WriteWhole(path, bytes, durable);
+    if (!reason.empty()) throw Error(path, "keep what the source is made of", reason);
+}
+
+std::string PartFolder::Scenes() const { return ReadWhole(platform::JoinPath(folder, kScenes)); }
 
 void PartFolder::Remove() const noexcept try {
     for (const std::string& name : platform::ListFolder(folder))

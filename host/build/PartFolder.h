@@ -2,6 +2,7 @@
 //
 //     FOLDER/17.part     what PartBuild::Make told of part 17
 //     FOLDER/17.count    what PartBuild::Count did
+//     FOLDER/scenes      what a source of many rasters is made of, if it is one
 //
 // A record appears whole or not at all, and replaces one that is there: processes that make the
 // same part write the same record. It tells which build it belongs to and carries a checksum; what
@@ -32,6 +33,9 @@ public:
     void Make() const;
     void Keep(Kind kind, std::uint64_t part, const PartResult& result) const;
     std::optional<PartResult> Find(Kind kind, std::uint64_t part) const;
+    // Bytes that tell all of the source, and what was kept; empty if nothing was.
+    void KeepScenes(const std::string& bytes) const;
+    std::string Scenes() const;
     // Removes all records, whole or not, and the folder if nothing else is in it.
     void Remove() const noexcept;
 
