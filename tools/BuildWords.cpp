@@ -5,6 +5,7 @@
 
 #include "core/PixelVocabulary.h"
 #include "host/raster/NoData.h"
+#include "platform/Program.h"
 #include "tools/Arguments.h"
 #include "tools/GdalWorld.h"
 #include "tools/Message.h"
@@ -35,6 +36,11 @@ void BuildWords::Describe(OptionTable& table) {
     table.Text("SOURCE", source, "Raster to read: a file or any other name that GDAL knows")
         .Required();
     table.Text("TARGET", target, "Pyramid file to make").Required();
+    DescribeMaking(table);
+    table.Flag("--overwrite", overwrite, "Replace TARGET if it exists");
+}
+
+void BuildWords::DescribeMaking(OptionTable& table) {
     table
         .Text("--levels", levels,
               "Coarsest level; 0 makes the finest only, auto goes on until a level fits one "
@@ -75,7 +81,6 @@ void BuildWords::Describe(OptionTable& table) {
     table.Text("--memory", memory, memoryHelp.c_str()).Named("SIZE");
     table.Flag("--embed", embed,
                "Keep georeference, no-data values and other metadata in TARGET itself");
-    table.Flag("--overwrite", overwrite, "Replace TARGET if it exists");
 }
 
 zmchost::BuildOptions BuildWords::Options(const zelm::RasterProps& props) const {
@@ -129,6 +134,13 @@ DatasetPtr BuildWords::OpenSource() const {
     DatasetPtr dataset = OpenDataset(source);
     CheckComplete(*dataset, source);
     return dataset;
+}
+
+std::string BuildWords::SourceFromAnywhere() const {
+    std::error_code error;
+    if (platform::IsAbsolutePath(source) || !fs::exists(source, error)) return source;
+    const fs::path path = fs::absolute(source, error);
+    return error ? source : path.lexically_normal().string();
 }
 
 }  // namespace zmctools

@@ -26,15 +26,35 @@ struct BuildWords {
     bool overwrite = false;
     bool embed = false;
 
-    // Adds all of them to the command line.
+    // Adds all of them to the command line, or those that are neither source nor target and mean
+    // something where the target is there already.
     void Describe(OptionTable& table);
+    void DescribeMaking(OptionTable& table);
     // What they mean for a source with these properties. Throws UsageError.
     zmchost::BuildOptions Options(const zelm::RasterProps& props) const;
     // Throws Failure for a target that cannot be made or is not to be replaced.
     void CheckTarget() const;
     // Throws Failure too for a source that is incomplete.
     DatasetPtr OpenSource() const;
+    // The source as it is named from any folder; what is no file as it stands.
+    std::string SourceFromAnywhere() const;
 };
+
+// Lets `visit(name, word)` have the words that are options, by their names in plans and records.
+template <class Words, class Visit>
+void VisitOptions(Words& words, const Visit& visit) {
+    visit("levels", words.levels);
+    visit("resampling", words.resampling);
+    visit("weights", words.weights);
+    visit("ordering", words.ordering);
+    visit("nodata", words.noData);
+    visit("bands", words.bands);
+    visit("bins", words.bins);
+    visit("memory", words.memory);
+    visit("noStatistics", words.noStatistics);
+    visit("overwrite", words.overwrite);
+    visit("embed", words.embed);
+}
 
 }  // namespace zmctools
 

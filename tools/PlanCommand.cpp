@@ -3,7 +3,6 @@
 #include <filesystem>
 
 #include "gdal/Dataset.h"
-#include "platform/Program.h"
 #include "tools/Arguments.h"
 #include "tools/Command.h"
 #include "tools/Interrupt.h"
@@ -52,14 +51,6 @@ void PlanCommand::Describe(OptionTable& table) {
         "target appears when it is finished, and is then the one that build would make, byte for\n"
         "byte. --memory is for each process; a plan that is made anew with --overwrite drops what\n"
         "was done of the one before, and finish --discard does so for good.");
-}
-
-// From any folder the same file; what is no file is left as it stands.
-std::string FromAnywhere(const std::string& source) {
-    std::error_code error;
-    if (platform::IsAbsolutePath(source) || !fs::exists(source, error)) return source;
-    const fs::path path = fs::absolute(source, error);
-    return error ? source : path.lexically_normal().string();
 }
 
 // What is left of plans that were given up, and with --overwrite the plan itself.
@@ -116,7 +107,7 @@ ExitStatus PlanCommand::Run() {
     zmchost::BuildFile file(words.target, words.overwrite, zmchost::BuildFile::Kind::Plan);
     PyramidPlan plan = MakePlan(words, *dataset, pixels, options, file, size);
     plan.path = words.target + kPlanFileEnding;
-    plan.words.source = FromAnywhere(words.source);
+    plan.words.source = words.SourceFromAnywhere();
     plan.Write();
     file.Keep();
     Report(plan);
