@@ -39,6 +39,8 @@ bool TouchesWindow(const Window& block, const std::vector<Window>& windows) {
 
 void BuildRun::OpenUpdate(std::shared_ptr<zelm::files::ByteSource> pyramid) {
     inParts = true;
+    // Statistics come from blocks, not from the strips that pass.
+    gathered = true;
     raster.emplace(Raster::Open(module, std::move(pyramid), name));
     CheckLayout();
     Prepare();

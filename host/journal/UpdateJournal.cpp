@@ -178,6 +178,8 @@ public:
             Sync();
             Write(document, std::string_view(&*first, 1));
         }
+        // Behind this nothing counts as a write any more, so that records can be stamped.
+        platform::ReleaseReserve(name);
         Sync();
     }
 
@@ -365,11 +367,12 @@ void UpdateJournal::Seal() {
     if (journal->WriteAt(end, tail.data(), tail.size(), &error) != tail.size() ||
         !journal->Sync(&error))
         fail(platform::ErrorText(error));
-    // The module would not tell that the disk had no room for a longer document.
-    if (changes.newSize > opened.size && !platform::ReserveSpace(file, changes.newSize))
-        fail(platform::LastErrorText());
     if (!base->NameStillMeansThis() || !base->Identify().SameContent(opened))
         fail("somebody else has written to it meanwhile");
+    // What has its journal under its name should not fail for want of room. Reserving counts as a
+    // write, so it comes behind the look.
+    if (changes.newSize > opened.size && !platform::ReserveSpace(file, changes.newSize))
+        fail(platform::LastErrorText());
     if (!platform::RenameToNewName(path, PathFor(file))) fail(platform::LastErrorText());
     sealed = true;
 }
@@ -384,7 +387,6 @@ void UpdateJournal::Commit() {
             throw Error(given, kUpdateIt, "its journal cannot be used: " + fault);
         redo.Apply();
         redo.SettleCompanions();
-        platform::ReleaseReserve(file);
     } catch (const Error& error) {
         throw Error(given, kUpdateIt, error.Reason() + "; zmcraster recover goes on with it");
     }

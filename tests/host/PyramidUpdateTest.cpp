@@ -200,18 +200,18 @@ TEST(StagedSources, ReadAsIfWritten) {
     };
     for (int round = 0; round < 30; ++round) {
         zelm::files::MemorySource::Bytes first(200);
-        std::generate(first.begin(), first.end(), [&] { return std::byte(upTo(255)); });
+        std::generate(first.begin(), first.end(), [&] { return static_cast<unsigned char>(upTo(255)); });
         auto model = std::make_shared<zelm::files::MemorySource>(first);
         auto base = std::make_shared<zelm::files::MemorySource>(first);
         StagedSource staged(base, std::make_shared<zelm::files::MemorySource>());
         for (int step = 0; step < 60; ++step) {
             const std::size_t offset = upTo(300), size = upTo(90);
-            std::vector<std::byte> bytes(size + 1), seen(size + 1);
+            zelm::files::MemorySource::Bytes bytes(size + 1), seen(size + 1);
             if (step % 7 == 0) {
                 model->Truncate(offset);
                 staged.Truncate(offset);
             } else if (step % 2 == 0) {
-                std::generate(bytes.begin(), bytes.end(), [&] { return std::byte(upTo(255)); });
+                std::generate(bytes.begin(), bytes.end(), [&] { return static_cast<unsigned char>(upTo(255)); });
                 model->WriteAt(offset, bytes.data(), bytes.size());
                 staged.WriteAt(offset, bytes.data(), bytes.size());
             }
@@ -219,7 +219,9 @@ TEST(StagedSources, ReadAsIfWritten) {
             const std::size_t from = upTo(300);
             ASSERT_EQ(staged.ReadAt(from, seen.data(), seen.size()),
                       model->ReadAt(from, bytes.data(), bytes.size()));
-            if (step % 2 != 0) ASSERT_EQ(seen, bytes);
+            if (step % 2 != 0) {
+                ASSERT_EQ(seen, bytes);
+            }
         }
         EXPECT_EQ(base->Content(), first);
     }
