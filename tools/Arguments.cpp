@@ -83,18 +83,19 @@ std::vector<std::uint32_t> ParseBands(const std::string& text, std::uint32_t ban
     return list;
 }
 
-zmchost::Window ParseWindow(const std::string& text, std::uint32_t width, std::uint32_t height) {
+zmchost::Window ParseWindow(const std::string& text, std::uint32_t width, std::uint32_t height,
+                            const std::string& option) {
     if (text.empty()) return {0, 0, width, height};
     std::vector<std::uint64_t> numbers;
     for (const std::string& part : SplitAtCommas(text))
         if (const auto number = WholeNumber(part)) numbers.push_back(*number);
     if (numbers.size() != 4 || SplitAtCommas(text).size() != 4)
-        throw UsageError("--window", "\"" + text + "\" is not X,Y,WIDTH,HEIGHT");
+        throw UsageError(option, "\"" + text + "\" is not X,Y,WIDTH,HEIGHT");
     const bool fits = numbers[2] > 0 && numbers[3] > 0 && numbers[0] < width &&
                       numbers[1] < height && numbers[2] <= width - numbers[0] &&
                       numbers[3] <= height - numbers[1];
     if (!fits)
-        throw UsageError("--window", text + " is not inside the level, which has " +
+        throw UsageError(option, text + " is not inside the level, which has " +
                                          std::to_string(width) + " x " + std::to_string(height) +
                                          " pixels");
     return {static_cast<std::uint32_t>(numbers[0]), static_cast<std::uint32_t>(numbers[1]),

@@ -30,7 +30,8 @@ inline constexpr const char* kNoBands = "an empty list names no band";
 std::vector<std::uint32_t> ParseBands(const std::string& text, std::uint32_t bands);
 
 // "X,Y,WIDTH,HEIGHT" inside width x height. An empty text means all of it.
-zmchost::Window ParseWindow(const std::string& text, std::uint32_t width, std::uint32_t height);
+zmchost::Window ParseWindow(const std::string& text, std::uint32_t width, std::uint32_t height,
+                            const std::string& option = "--window");
 
 }  // namespace zmctools
 

@@ -9,6 +9,7 @@
 #include "tools/MosaicSource.h"
 #include "tools/ProcessBuild.h"
 #include "tools/TerminalProgress.h"
+#include "tools/UpdateNote.h"
 
 namespace zmctools {
 namespace {
@@ -26,6 +27,7 @@ private:
     BuildWords words;
     std::string threads;
     std::string processes = "0";
+    bool keepRecords = false;
 
     zmchost::BuildReport Build(GDALDataset& dataset, zmcgdal::GdalRasterSource& pixels,
                                zmchost::BuildOptions options) const;
@@ -44,6 +46,9 @@ void BuildCommand::Describe(OptionTable& table) {
         .Text("--processes", processes,
               "Processes to work with, which share the memory; 0: this one alone (default 0)")
         .Named("N");
+    table.Flag("--keep-records", keepRecords,
+               "Leave TARGET.zmcrecords, by which update renews statistics without looking at all "
+               "pixels");
     table.Footer(
         "Examples:\n"
         "  zmcraster build scene.tif scene.pyr\n"
@@ -96,6 +101,7 @@ ExitStatus BuildCommand::Run() {
     for (const std::string& loss : pixels.Losses())
         Warn(words.source, "a pyramid does not keep " + loss);
     const zmchost::BuildReport report = BuildBy(*dataset, pixels, options);
+    if (keepRecords) KeepRecords(words, pixels, options);
     if (json)
         PrintDocument(BuildDocument(words, report, props.pixelType, *dataset));
     else if (!quiet)

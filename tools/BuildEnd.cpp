@@ -4,6 +4,7 @@
 #include <gdal_utils.h>
 
 #include <cstdio>
+#include <utility>
 
 #include "core/PixelVocabulary.h"
 #include "describe/Description.h"
@@ -46,13 +47,19 @@ BuildEnd::BuildEnd(GDALDataset& source, const BuildWords& buildWords,
     : dataset(source), words(buildWords), bands(options.bands), stage(words.target) {
     options.takeStatistics = [this](const auto& stored) { Take(stored); };
     options.beforeNaming = [this](const std::string& built) {
-        WriteSidecar(built, stage.Begin(built));
+        const std::string base = stage.Begin(built);
+        WriteSidecar(dataset, words, bands, statistics,
+                     std::make_shared<zmcgdal::OpenFile>(built, GA_Update, zmcgdal::OpenOptions{}),
+                     base);
         stage.Complete();
     };
 }
 
 // A virtual raster selects the bands; only its metadata are looked at.
-void BuildEnd::WriteSidecar(const std::string& built, const std::string& base) const {
+void WriteSidecar(GDALDataset& dataset, const BuildWords& words,
+                  const std::vector<std::uint32_t>& bands,
+                  const std::vector<zmchost::FullStatistics>& statistics,
+                  std::shared_ptr<zmcgdal::OpenFile> built, const std::string& base) {
     CPLStringList list;
     for (const std::string& word : TranslateArguments(bands, words.noData))
         list.AddString(word.c_str());
@@ -60,8 +67,7 @@ void BuildEnd::WriteSidecar(const std::string& built, const std::string& base) c
         GDALTranslateOptionsNew(list.List(), nullptr), &GDALTranslateOptionsFree);
     const DatasetPtr selected(GDALDataset::FromHandle(
         GDALTranslate("", GDALDataset::ToHandle(&dataset), translate.get(), nullptr)));
-    auto pyramid = zmcgdal::Dataset::FromFile(
-        std::make_shared<zmcgdal::OpenFile>(built, GA_Update, zmcgdal::OpenOptions{}), GA_Update);
+    auto pyramid = zmcgdal::Dataset::FromFile(std::move(built), GA_Update);
     pyramid->LoadSidecar(base.c_str(), nullptr);
     bool kept = selected && zmcgdal::CopySidecar(*selected, *pyramid, true) == CE_None;
     if (kept) {

@@ -4,9 +4,11 @@
 #define ZMC_TOOLS_BUILDEND_H
 
 #include <cstdint>
+#include <memory>
 #include <string>
 #include <vector>
 
+#include "gdal/Dataset.h"
 #include "gdal/SidecarStage.h"
 #include "tools/BuildWords.h"
 #include "tools/Command.h"
@@ -25,7 +27,6 @@ public:
 
 private:
     void Take(const std::vector<zmchost::FullStatistics>& stored) { statistics = stored; }
-    void WriteSidecar(const std::string& built, const std::string& base) const;
 
     GDALDataset& dataset;
     const BuildWords& words;
@@ -33,6 +34,13 @@ private:
     zmcgdal::SidecarStage stage;
     std::vector<zmchost::FullStatistics> statistics;
 };
+
+// Puts what a pyramid of those bands of `source` has no place for beside it, as files whose names
+// begin with `base`, or into it. `statistics` are those that were stored in it. Throws Failure.
+void WriteSidecar(GDALDataset& source, const BuildWords& words,
+                  const std::vector<std::uint32_t>& bands,
+                  const std::vector<zmchost::FullStatistics>& statistics,
+                  std::shared_ptr<zmcgdal::OpenFile> built, const std::string& base);
 
 // A finished build of a source, as a document and for people; the last one where others have made
 // the parts.

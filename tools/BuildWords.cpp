@@ -41,6 +41,11 @@ void BuildWords::Describe(OptionTable& table) {
             "a list of names, or a pattern as 'FOLDER/*.tif'")
         .Required();
     table.Text("TARGET", target, "Pyramid file to make").Required();
+    DescribeMaking(table);
+    table.Flag("--overwrite", overwrite, "Replace TARGET if it exists");
+}
+
+void BuildWords::DescribeMaking(OptionTable& table) {
     table
         .Text("--levels", levels,
               "Coarsest level; 0 makes the finest only, auto goes on until a level fits one "
@@ -100,7 +105,6 @@ void BuildWords::Describe(OptionTable& table) {
     table.Text("--memory", memory, memoryHelp.c_str()).Named("SIZE");
     table.Flag("--embed", embed,
                "Keep georeference, no-data values and other metadata in TARGET itself");
-    table.Flag("--overwrite", overwrite, "Replace TARGET if it exists");
 }
 
 zmchost::BuildOptions BuildWords::Options(const zelm::RasterProps& props) const {

@@ -30,8 +30,10 @@ struct BuildWords {
     bool overwrite = false;
     bool embed = false;
 
-    // Adds all of them to the command line.
+    // Adds all of them to the command line, or those that are neither source nor target and mean
+    // something where the target is there already.
     void Describe(OptionTable& table);
+    void DescribeMaking(OptionTable& table);
     // What they mean for a source with these properties. Throws UsageError.
     zmchost::BuildOptions Options(const zelm::RasterProps& props) const;
     // Throws Failure for a target that cannot be made or is not to be replaced.
@@ -40,6 +42,30 @@ struct BuildWords {
     // bar where that is wanted; Interruption then.
     DatasetPtr OpenSource(bool showsBar = false) const;
 };
+
+// Lets `visit(name, word)` have the words that are options, by their names in plans and records.
+template <class Words, class Visit>
+void VisitOptions(Words& words, const Visit& visit) {
+    visit("levels", words.levels);
+    visit("resampling", words.resampling);
+    visit("weights", words.weights);
+    visit("ordering", words.ordering);
+    visit("nodata", words.noData);
+    visit("bands", words.bands);
+    visit("bins", words.bins);
+    visit("memory", words.memory);
+    visit("overlap", words.overlap);
+    visit("sceneResampling", words.sceneResampling);
+    visit("resolution", words.resolution);
+    visit("skipBroken", words.skipBroken);
+    visit("overlap", words.overlap);
+    visit("sceneResampling", words.sceneResampling);
+    visit("resolution", words.resolution);
+    visit("skipBroken", words.skipBroken);
+    visit("noStatistics", words.noStatistics);
+    visit("overwrite", words.overwrite);
+    visit("embed", words.embed);
+}
 
 }  // namespace zmctools
 

@@ -51,6 +51,7 @@ std::unique_ptr<Command> MakePlanCommand();
 std::unique_ptr<Command> MakePartCommand();
 std::unique_ptr<Command> MakeFinishCommand();
 std::unique_ptr<Command> MakeStatusCommand();
+std::unique_ptr<Command> MakeUpdateCommand();
 
 }  // namespace zmctools
 

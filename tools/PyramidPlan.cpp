@@ -27,25 +27,9 @@ constexpr const char* kVersionKey = "zmcrasterPlan";
 constexpr std::uint64_t kMaxPlanBytes = 1 << 20;
 constexpr int kMostDepth = 4;  // of what a plan holds inside each other
 
-// The words that stand in a plan, by the names of their options.
-template <class Words, class Visit>
-void VisitWords(Words& words, const Visit& visit) {
-    visit("levels", words.levels);
-    visit("resampling", words.resampling);
-    visit("weights", words.weights);
-    visit("ordering", words.ordering);
-    visit("nodata", words.noData);
-    visit("bands", words.bands);
-    visit("bins", words.bins);
-    visit("memory", words.memory);
-    visit("noStatistics", words.noStatistics);
-    visit("overwrite", words.overwrite);
-    visit("embed", words.embed);
-}
-
 Json DocumentOf(const PyramidPlan& plan) {
     Json options = Json::object();
-    VisitWords(plan.words, [&](const char* key, const auto& value) { options[key] = value; });
+    VisitOptions(plan.words, [&](const char* key, const auto& value) { options[key] = value; });
     Json document = {{kVersionKey, kPlanVersion},
                      {"source", plan.words.source},
                      {"sourceState", plan.sourceState},
@@ -115,7 +99,7 @@ PyramidPlan PlanFrom(const std::string& file, const Json& document) {
     plan.pyramid = PlainName(file, document.at("pyramid"));
     plan.number = FromHex(document.at("pyramidNumber"));
     plan.durable = document.at("durable");
-    VisitWords(plan.words, [&](const char* key, auto& value) {
+    VisitOptions(plan.words, [&](const char* key, auto& value) {
         value = document.at("options").at(key).get<std::remove_reference_t<decltype(value)>>();
     });
     plan.grid = GridOf(file, document);

@@ -74,6 +74,7 @@ Program::Program() {
     Add(MakePartCommand());
     Add(MakeFinishCommand());
     Add(MakeStatusCommand());
+    Add(MakeUpdateCommand());
     Add(MakeInfoCommand());
     Add(MakeExportCommand());
     Add(MakePreviewCommand());

@@ -7,8 +7,10 @@
 #include "host/base/Text.h"
 #include "host/build/PartFolder.h"
 #include "host/file/PyramidHeader.h"
+#include "host/file/PyramidRecords.h"
 #include "host/file/SideFile.h"
 #include "host/journal/MetadataJournal.h"
+#include "host/journal/UpdateJournal.h"
 #include "platform/FileSystem.h"
 #include "platform/Rights.h"
 
@@ -130,8 +132,11 @@ void BuildFile::Commit() {
         throw Error(given, "give the finished file its name", platform::LastErrorText());
     kept = true;
     lock.Release();
-    // What may be left of a store into the old file has no file any more.
+    // What may be left of a store into the old file, or of an update of it, has no file any more,
+    // nor have its records.
     platform::RemoveEntry(MetadataJournal::PathFor(target));
+    platform::RemoveEntry(UpdateJournal::PathFor(target));
+    platform::RemoveEntry(PyramidRecords::PathFor(target));
     if (!platform::SyncFolder(platform::FolderOf(target)))
         throw Error(given, "write its name to the disk", platform::LastErrorText());
 }

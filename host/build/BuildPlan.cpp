@@ -146,6 +146,92 @@ Pass PlanPart(const PlanInput& input, const PartGrid& grid, std::uint64_t part) 
     return pass;
 }
 
+namespace {
+
+// Tiles [first, last) of a row of tiles.
+struct TileRun {
+    std::uint32_t row = 0;
+    std::uint32_t first = 0;
+    std::uint32_t last = 0;
+};
+
+// The tiles that areas of a level touch, each once, from the top and the left.
+std::vector<TileRun> RunsOf(const std::vector<zelm::Rectangle>& areas) {
+    std::vector<TileRun> all;
+    for (const zelm::Rectangle& area : areas)
+        for (std::uint64_t row = area.y / kTileSide; row * kTileSide < area.Bottom(); ++row)
+            all.push_back({static_cast<std::uint32_t>(row), area.x / kTileSide,
+                           TilesFor(area.Right(), kTileSide)});
+    std::sort(all.begin(), all.end(), [](const TileRun& a, const TileRun& b) {
+        return a.row != b.row ? a.row < b.row : a.first < b.first;
+    });
+    std::vector<TileRun> runs;
+    for (const TileRun& run : all)
+        if (!runs.empty() && runs.back().row == run.row && run.first <= runs.back().last)
+            runs.back().last = std::max(runs.back().last, run.last);
+        else
+            runs.push_back(run);
+    return runs;
+}
+
+zelm::Rectangle WholeTiles(const zelm::Rectangle& area, const zelm::Rectangle& level) {
+    const std::uint32_t x = area.x / kTileSide * kTileSide, y = area.y / kTileSide * kTileSide;
+    const std::uint64_t right = std::uint64_t{TilesFor(area.Right(), kTileSide)} * kTileSide;
+    const std::uint64_t bottom = std::uint64_t{TilesFor(area.Bottom(), kTileSide)} * kTileSide;
+    return {x, y, static_cast<std::uint32_t>(std::min<std::uint64_t>(right, level.width) - x),
+            static_cast<std::uint32_t>(std::min<std::uint64_t>(bottom, level.height) - y)};
+}
+
+// Cells [first, last) of a coarser level, of so many, that come from pixels [begin, end) of a row or
+// column: a cell from its two pixels and those of the halo around them.
+Span DependentCells(std::uint32_t begin, std::uint64_t end, std::uint32_t halo,
+                    std::uint32_t cells) {
+    const std::uint32_t first = begin > halo ? (begin - halo) / 2 : 0;
+    const auto last =
+        static_cast<std::uint32_t>(std::min<std::uint64_t>((end - 1 + halo) / 2 + 1, cells));
+    return {first, std::max(first, last), 0, 0};
+}
+
+std::vector<zelm::Rectangle> Dependents(const std::vector<zelm::Rectangle>& areas,
+                                        const PlanInput& input, std::uint32_t coarser) {
+    std::vector<zelm::Rectangle> cells;
+    for (const zelm::Rectangle& area : areas) {
+        const Span x = DependentCells(area.x, area.Right(), input.halo, input.width >> coarser);
+        const Span y = DependentCells(area.y, area.Bottom(), input.halo, input.height >> coarser);
+        const zelm::Rectangle made{x.begin, y.begin, x.end - x.begin, y.end - y.begin};
+        if (!made.IsEmpty()) cells.push_back(made);
+    }
+    return cells;
+}
+
+// The pass that makes tiles of `top`, which is the base or one above it.
+Pass PlanRun(const PlanInput& input, std::uint32_t base, std::uint32_t top, const TileRun& run) {
+    const std::uint64_t unit = ColumnUnit(top - base);
+    const std::uint64_t width = input.width >> base, height = input.height >> base;
+    Pass pass{base, top, 2, 0, {}, {}};
+    CutColumns(pass, input, run.first * unit, std::min(run.last * unit, width),
+               ColumnWidth(input, top - base));
+    pass.lines = WithMargin(run.row * unit, std::min((run.row + std::uint64_t{1}) * unit, height),
+                            HaloPixels(input, top - base), height);
+    return pass;
+}
+
+}  // namespace
+
+std::vector<Pass> PlanUpdate(const PlanInput& input, const std::vector<zelm::Rectangle>& changed) {
+    const zelm::Rectangle all{0, 0, input.width, input.height};
+    std::vector<zelm::Rectangle> areas;
+    for (const zelm::Rectangle& window : changed) areas.push_back(WholeTiles(window, all));
+    std::vector<Pass> passes;
+    for (const TileRun& run : RunsOf(areas)) passes.push_back(PlanRun(input, 0, 0, run));
+    for (std::uint32_t base = 0; base < input.maxLevel; ++base) {
+        areas = Dependents(areas, input, base + 1);
+        for (const TileRun& run : RunsOf(areas))
+            passes.push_back(PlanRun(input, base, base + 1, run));
+    }
+    return passes;
+}
+
 std::uint32_t MaxLevelOf(std::uint32_t width, std::uint32_t height) {
     const std::uint32_t least = std::min(width, height);
     return least == 0 ? 0 : static_cast<std::uint32_t>(std::bit_width(least)) - 1;

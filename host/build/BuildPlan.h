@@ -88,6 +88,11 @@ PartGrid PlanParts(const PlanInput& input, std::uint32_t partWidth, std::uint32_
 // The pass of one part.
 Pass PlanPart(const PlanInput& input, const PartGrid& grid, std::uint64_t part);
 
+// The passes that renew what depends on windows of level 0, each of which lies in the raster: whole
+// tiles of level 0, which have the same base and top, and then of one level after the other the
+// tiles with a cell whose value comes from them. The budget is not below LeastMemory.
+std::vector<Pass> PlanUpdate(const PlanInput& input, const std::vector<zelm::Rectangle>& changed);
+
 }  // namespace zmchost
 
 #endif

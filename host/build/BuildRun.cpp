@@ -250,6 +250,10 @@ void BuildRun::LayOut() {
 
 void BuildRun::Open(const std::string& path) {
     raster.emplace(Raster::Open(module, path));
+    CheckLayout();
+}
+
+void BuildRun::CheckLayout() const {
     const PyramidHeader& header = raster->Header();
     if (header.width != props.samples || header.height != props.lines ||
         header.bandCount != props.bands || header.pixelType != props.pixelType ||
@@ -388,7 +392,10 @@ void BuildRun::WriteStrip(const Pass& pass, const Column& column, const Strip& s
 
 // Level 0 once more, for the types whose bins depend on minimum and maximum; of an area of whole
 // tiles.
-void BuildRun::CountLevel0(const Window& area) {
+void BuildRun::CountLevel0(const Window& area) { WalkLevel0(area, *work, &PixelWork::TakeCounts); }
+
+// The tiles of an area as they stand in the file, for one who gathers something of their rows.
+void BuildRun::WalkLevel0(const Window& area, PixelWork& gatherer, TakeRow take) {
     const std::size_t tileBytes = std::size_t{kTileSide} * kTileSide * pixelBytes;
     const std::size_t atOnce = std::max<std::size_t>(1, kChunkBytes / tileBytes);
     const MeteredBytes pixels(meter, atOnce * tileBytes);
@@ -416,7 +423,7 @@ void BuildRun::CountLevel0(const Window& area) {
                                 std::size_t{line} * chunk[i].width * pixelBytes;
                             const bool any =
                                 work->NeedsMasks() && work->MarkRow(samples, mask, chunk[i].width);
-                            work->TakeCounts(lane, samples, any ? mask : nullptr, chunk[i].width);
+                            (gatherer.*take)(lane, samples, any ? mask : nullptr, chunk[i].width);
                         }
                 });
             for (const Window& tile : chunk) Advance(std::uint64_t{tile.width} * tile.height);

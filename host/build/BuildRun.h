@@ -1,5 +1,5 @@
 // BuildRun: one run of a builder, step by step: a whole build, or what one process does of a build
-// in parts (PartBuild.h).
+// in parts (PartBuild.h), or an update (PyramidUpdate.h).
 //
 // Made for one source and one target. One thread; the work is done on as many as the options say.
 #ifndef ZMC_HOST_BUILD_BUILDRUN_H
@@ -21,6 +21,7 @@
 #include "host/build/PixelWork.h"
 #include "host/build/PyramidBuilder.h"
 #include "host/build/TileStore.h"
+#include "host/file/PyramidRecords.h"
 #include "host/raster/Raster.h"
 
 namespace zmchost {
@@ -56,6 +57,18 @@ public:
     BuildReport FinishParts(BuildFile& laidOut, const PartGrid& grid,
                             const std::vector<std::uint64_t>& uncounted);
 
+    // What PyramidUpdate does, in this order (BuildRunUpdate.cpp). The first opens the pyramid, from
+    // a source that takes what is written.
+    void OpenUpdate(std::shared_ptr<zelm::files::ByteSource> pyramid);
+    // Makes what depends on windows of the source anew; the number of tiles.
+    std::uint64_t RenewTiles(const std::vector<Window>& changed);
+    // Statistics of level 0: those of blocks without a window as `before` has them, if it is there.
+    // What the blocks gave goes into `after`, unless that is null. The number of blocks looked at.
+    std::uint64_t GatherStatistics(const std::vector<Window>& changed, PyramidRecords* before,
+                                   RecordsWriter* after);
+    // Stores what was gathered and the palettes into a file that has no document, and lets it go.
+    void StoreRenewed();
+
 private:
     // A strip on its way through the pipeline, and what it completes.
     struct Job {
@@ -74,6 +87,7 @@ private:
 
     void LayOut();
     void Open(const std::string& path);
+    void CheckLayout() const;
     void Reopen();
     void Prepare();
     void PrepareOnce();
@@ -88,6 +102,10 @@ private:
     void LookAtStrip(const Pass& pass, const Column& column, Strip& strip);
     void WriteStrip(const Pass& pass, const Column& column, const Strip& strip);
     void CountLevel0(const Window& area);
+    using TakeRow = void (PixelWork::*)(std::uint32_t lane, const std::byte* row,
+                                        const unsigned char* mask, std::uint32_t width);
+    void WalkLevel0(const Window& area, PixelWork& gatherer, TakeRow take);
+    std::vector<Window> StatisticsBlocks() const;
     void StoreRecords();
     void Check();
     void Advance(std::uint64_t pixels);

@@ -61,6 +61,12 @@ public:
         BeginCounts();
     }
 
+    void ClearSums() {
+        counters.assign(counters.size(), {});
+        accumulators.assign(accumulators.size(), {});
+        histograms.clear();
+    }
+
     std::string SaveSums() {
         NumberPacker packer;
         packer.Put(Kind());
@@ -302,6 +308,7 @@ public:
     }
 
     std::string SaveSums() override { return harvest.SaveSums(); }
+    void ClearSums() override { harvest.ClearSums(); }
     bool MergeSums(std::string_view packed) override { return harvest.MergeSums(packed); }
     std::string SaveCounts() override { return harvest.SaveCounts(); }
     bool MergeCounts(std::string_view packed) override { return harvest.MergeCounts(packed); }

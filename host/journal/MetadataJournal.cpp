@@ -13,6 +13,7 @@
 #include "host/base/Text.h"
 #include "host/file/MetadataDocument.h"
 #include "host/file/SideFile.h"
+#include "host/journal/UpdateJournal.h"
 #include "platform/FileSystem.h"
 
 namespace zmchost {
@@ -236,14 +237,7 @@ Recovery WithCopy(const std::string& file, FileLock::Kind kind, Settle&& settle)
     }
 }
 
-}  // namespace
-
-std::string MetadataJournal::PathFor(const std::string& file) {
-    const std::string target = platform::ResolveLinks(file);
-    return platform::JoinPath(platform::FolderOf(target), SideFile::Stem(target) + '.' + kKind);
-}
-
-Recovery RecoverMetadata(const std::string& file) {
+Recovery RecoverStore(const std::string& file) {
     return WithCopy(
         file, FileLock::Kind::Alone,
         [](const Target& target, const std::string& copy, const JournalRecord& record) -> Recovery {
@@ -258,7 +252,7 @@ Recovery RecoverMetadata(const std::string& file) {
         });
 }
 
-Recovery LookForCopy(const std::string& file) {
+Recovery LookForStore(const std::string& file) {
     return WithCopy(file, FileLock::Kind::Shared, [](const auto&...) -> Recovery {
         return {Outcome::Pending,
                 "a store into it did not end; zmcraster recover puts its metadata document in "
@@ -266,10 +260,31 @@ Recovery LookForCopy(const std::string& file) {
     });
 }
 
+}  // namespace
+
+std::string MetadataJournal::PathFor(const std::string& file) {
+    const std::string target = platform::ResolveLinks(file);
+    return platform::JoinPath(platform::FolderOf(target), SideFile::Stem(target) + '.' + kKind);
+}
+
+Recovery RecoverMetadata(const std::string& file) {
+    // An update goes first: it brings the document of the file with it.
+    Recovery update = RecoverUpdate(file);
+    if (update.outcome != Outcome::Nothing && update.outcome != Outcome::Complete) return update;
+    Recovery stored = RecoverStore(file);
+    return stored.outcome == Outcome::Nothing ? update : stored;
+}
+
+Recovery LookForCopy(const std::string& file) {
+    Recovery update = LookForUpdate(file);
+    return update.outcome == Outcome::Nothing ? LookForStore(file) : update;
+}
+
 void DiscardMetadata(const std::string& file) {
     const auto refuse = [&](const std::string& why) {
         throw Error(file, "discard its metadata document", why);
     };
+    const bool hadUpdate = DiscardUpdate(file);
     const std::string name = platform::ResolveLinks(file);
     const std::string copy = MetadataJournal::PathFor(file);
     FileLock lock;
@@ -282,7 +297,7 @@ void DiscardMetadata(const std::string& file) {
     if (hasCopy && ReadCopy(lock, target).unused.empty())
         refuse("there is a copy of it, which can be put back");
     const bool damaged = !JudgeMetadata(target.Source(), name, target.Header()).empty();
-    if (!damaged && !hasCopy) refuse("it is not damaged");
+    if (!damaged && !hasCopy && !hadUpdate) refuse("it is not damaged");
     if (damaged) {
         const Target changed(name, OpenMode::Update);
         if (!changed.IsSameAs(target)) refuse("another file has taken its name");
