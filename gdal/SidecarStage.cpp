@@ -187,6 +187,11 @@ void SidecarStage::Complete() {
     }
 }
 
+std::string SidecarStage::Written(const char* ending) const {
+    const std::string path = base + ending;
+    return IsFile(path) && !SaysNothing(path) ? path : "";
+}
+
 void SidecarStage::Settle() {
     SettleBase(target, base);
     base.clear();

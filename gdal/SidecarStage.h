@@ -57,6 +57,8 @@ public:
     void Complete();
     // The file has its name.
     void Settle();
+    // The path of one that was written, by the ending of its name; empty if the pyramid needs none.
+    std::string Written(const char* ending) const;
 
 private:
     std::string target;

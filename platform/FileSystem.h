@@ -74,6 +74,9 @@ void BeginSync(const std::string& path) noexcept;
 
 // Bytes that this process can still write in a folder.
 std::optional<std::uint64_t> FreeSpace(const std::string& folder) noexcept;
+// Gives the disk back what a range of a file takes there, which then reads as zeros; where the file
+// system does not do that, it stays.
+void DropRange(const std::string& path, std::uint64_t offset, std::uint64_t size) noexcept;
 // Takes `size` bytes of the disk for a file without changing its size. False only if the space is
 // not there: file systems without the service give true.
 bool ReserveSpace(const std::string& path, std::uint64_t size) noexcept;

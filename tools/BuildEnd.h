@@ -24,6 +24,8 @@ public:
 
     // The file has its name.
     void Settle() { stage.Settle(); }
+    // What stands beside it until it has, and belongs to it.
+    const zmcgdal::SidecarStage& Companions() const { return stage; }
 
 private:
     void Take(const std::vector<zmchost::FullStatistics>& stored) { statistics = stored; }

@@ -1,5 +1,6 @@
 #include <filesystem>
 
+#include "gdal/Sidecar.h"
 #include "gdal/SidecarStage.h"
 #include "host/base/Error.h"
 #include "tools/Arguments.h"
@@ -8,6 +9,7 @@
 #include "tools/MosaicSource.h"
 #include "tools/PlannedBuild.h"
 #include "tools/SourceState.h"
+#include "tools/StoreTarget.h"
 #include "tools/TerminalProgress.h"
 
 namespace zmctools {
@@ -28,8 +30,15 @@ private:
     bool overwrite = false;
     bool discard = false;
 
+    std::uint32_t Threads() const {
+        return static_cast<std::uint32_t>(ParseCount("--threads", threads, 1024));
+    }
     void CheckTarget(const PyramidPlan& plan) const;
     zmchost::BuildReport Finish(PlannedBuild& build) const;
+    zmchost::BuildReport FinishFile(PlannedBuild& build) const;
+    zmchost::BuildReport FinishInStore(PlannedBuild& build) const;
+    bool IsInStoreAlready(const PyramidPlan& plan) const;
+    ExitStatus RunInStore(const PyramidPlan& plan) const;
     void Report(const PlannedBuild& build, const zmchost::BuildReport& report) const;
 };
 
@@ -58,21 +67,68 @@ void FinishCommand::CheckTarget(const PyramidPlan& plan) const {
                   "the file has changed since the plan was made; --overwrite replaces it");
 }
 
+zmchost::BuildReport FinishCommand::FinishFile(PlannedBuild& build) const {
+    const BuildWords& words = build.plan.words;
+    zmchost::BuildFile made(words.target, words.overwrite || overwrite, build.plan.PyramidPath());
+    BuildEnd end(*build.dataset, words, build.options);
+    build.Start();
+    build.Gather();
+    zmchost::BuildReport report = build.Finish(made);
+    made.Commit();
+    end.Settle();
+    return report;
+}
+
+// Also by one who was ended right behind that. Throws Failure where the object is somebody else's.
+bool FinishCommand::IsInStoreAlready(const PyramidPlan& plan) const {
+    const zmcstore::ObjectState state = OpenStore(plan.words.target)->Look();
+    if (state.exists && state.mark == plan.upload.mark) return true;
+    if (state.exists && state.tag != plan.targetState && !overwrite && !plan.words.overwrite)
+        throw Failure(plan.words.target,
+                      "the object has changed since the plan was made; --overwrite replaces it");
+    return false;
+}
+
+// What stands beside the object goes up before it appears.
+zmchost::BuildReport FinishCommand::FinishInStore(PlannedBuild& build) const {
+    BuildWords local = build.plan.words;
+    local.target = build.plan.LocalName();
+    zmchost::BuildFile made(local.target, true, build.plan.PyramidPath());
+    BuildEnd end(*build.dataset, local, build.options);
+    build.Start();
+    build.Gather();
+    zmchost::BuildReport report = build.Finish(made);
+    build.Store().SendRest();
+    for (const char* const ending : {zmcgdal::kSidecarEnding, zmcgdal::kMaskEnding})
+        build.Store().PutBeside(ending, end.Companions().Written(ending));
+    build.Store().Complete();
+    return report;
+}
+
+ExitStatus FinishCommand::RunInStore(const PyramidPlan& plan) const {
+    if (discard) {
+        DropPlan(plan);
+        return ExitStatus::Done;
+    }
+    if (IsInStoreAlready(plan)) {
+        plan.Discard();
+        return ExitStatus::Done;
+    }
+    PlannedBuild build(plan, Threads());
+    const zmchost::BuildReport report = Finish(build);
+    plan.Discard();
+    Report(build, report);
+    return ExitStatus::Done;
+}
+
 zmchost::BuildReport FinishCommand::Finish(PlannedBuild& build) const {
     const BuildWords& words = build.plan.words;
     TerminalProgress bar(std::filesystem::path(words.target).filename().string(), !quiet);
     build.progress = [&](const zmchost::BuildProgress& state) {
         return bar.Show(state.done, state.total);
     };
-    zmchost::BuildFile made(words.target, words.overwrite || overwrite, build.plan.PyramidPath());
-    BuildEnd end(*build.dataset, words, build.options);
-    build.Start();
     try {
-        build.Gather();
-        const zmchost::BuildReport report = build.Finish(made);
-        made.Commit();
-        end.Settle();
-        return report;
+        return build.plan.IsInStore() ? FinishInStore(build) : FinishFile(build);
     } catch (const zmchost::Cancelled&) {
         throw Interruption(words.target);
     }
@@ -88,6 +144,7 @@ void FinishCommand::Report(const PlannedBuild& build, const zmchost::BuildReport
 
 ExitStatus FinishCommand::Run() {
     const PyramidPlan plan = PyramidPlan::Read(file);
+    if (plan.IsInStore()) return RunInStore(plan);
     const bool finished = plan.IsFinished();
     if (finished) {
         // By one who was ended right behind that: what stands beside it has yet to get its names.
@@ -98,7 +155,7 @@ ExitStatus FinishCommand::Run() {
         return ExitStatus::Done;
     }
     CheckTarget(plan);
-    PlannedBuild build(plan, static_cast<std::uint32_t>(ParseCount("--threads", threads, 1024)));
+    PlannedBuild build(plan, Threads());
     const zmchost::BuildReport report = Finish(build);
     plan.Discard();
     Report(build, report);

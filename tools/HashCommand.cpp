@@ -2,11 +2,11 @@
 #include <cstdio>
 
 #include "core/PixelVocabulary.h"
+#include "store/Sha256.h"
 #include "tools/Arguments.h"
 #include "tools/Command.h"
 #include "tools/PartOptions.h"
 #include "tools/RasterView.h"
-#include "tools/Sha256.h"
 
 namespace zmctools {
 namespace {
@@ -54,7 +54,7 @@ Json HashCommand::Hash(const std::string& file) const {
         ParseWindow(part.window, view->Width(selection.level), view->Height(selection.level));
     selection.bands = ParseBands(part.bands, view->Bands());
 
-    Sha256 sha;
+    zmcstore::Sha256 sha;
     std::uint64_t bytes = 0;
     std::vector<unsigned char> samples;
     {

@@ -21,6 +21,7 @@ private:
     std::string file;
     std::vector<std::string> names;
     std::string threads = "1";
+    std::string scratch;
     bool count = false;
     bool queue = false;
 
@@ -40,6 +41,11 @@ void PartCommand::Describe(OptionTable& table) {
                "Take the numbers from standard input, eight digits and an end of line each, until "
                "it ends; processes may share one pipe");
     table.Text("--threads", threads, "Threads to work with (default 1)").Named("N");
+    table
+        .Text("--scratch", scratch,
+              "Folder for the file that a part of a target in a store is made in (default: that of "
+              "the plan)")
+        .Named("FOLDER");
     table.Footer(
         "Examples:\n"
         "  zmcraster part scene.pyr.zmcplan 0 1 2\n"
@@ -124,6 +130,7 @@ ExitStatus PartCommand::Run() {
     const PyramidPlan plan = PyramidPlan::Read(file);
     if (!queue) Numbers(plan.grid);
     PlannedBuild build(plan, workers);
+    build.UseScratch(scratch);
     build.Start();
     if (count) build.Gather();
     const bool wanted = !count || build.NeedsCounts();

@@ -3,6 +3,7 @@
 #include <filesystem>
 
 #include "gdal/Dataset.h"
+#include "platform/FileSystem.h"
 #include "tools/Arguments.h"
 #include "tools/Command.h"
 #include "tools/Interrupt.h"
@@ -10,11 +11,15 @@
 #include "tools/PlanMaking.h"
 #include "tools/SceneNames.h"
 #include "tools/SourceState.h"
+#include "tools/StoreParts.h"
+#include "tools/StoreTarget.h"
 
 namespace zmctools {
 namespace {
 
 namespace fs = std::filesystem;
+
+constexpr const char* kRangeOption = "--upload-part";
 
 class PlanCommand final : public Command {
 public:
@@ -29,8 +34,19 @@ public:
 private:
     BuildWords words;
     std::string partSize;
+    std::string planFile;
+    std::string rangeSize;
+    bool inStore = false;
+    std::unique_ptr<zmcstore::ObjectStore> store;
 
+    void CheckOptions();
+    std::uint64_t LeastRange() const;
+    PartSize Size(GDALDataset& dataset, const zelm::RasterProps& props,
+                  const zmchost::BuildOptions& options) const;
+    std::string StateInStore() const;
     void ClearTheWay() const;
+    void BeginUpload(PyramidPlan& plan, const std::string& pyramid) const;
+    void Write(PyramidPlan& plan) const;
     void Report(const PyramidPlan& plan, GDALDataset& dataset) const;
 };
 
@@ -41,12 +57,22 @@ void PlanCommand::Describe(OptionTable& table) {
               "Pixels of a side of a part, or WIDTHxHEIGHT (default 8192, and whole lines of a "
               "source that is stored by lines)")
         .Named("N|WxH");
+    table
+        .Text("--plan", planFile,
+              "File of the plan, for a target in a store (default: the name of the target with "
+              ".zmcplan behind, in this folder)")
+        .Named("FILE");
+    table
+        .Text(kRangeOption, rangeSize,
+              "Least bytes of a part of the upload, for a target in a store (default 5M)")
+        .Named("SIZE");
     table.Footer(
         "Examples:\n"
         "  zmcraster plan scene.tif scene.pyr\n"
         "  zmcraster part scene.pyr.zmcplan 0-7     # on one machine\n"
         "  zmcraster part scene.pyr.zmcplan 8-15    # on another one\n"
         "  zmcraster finish scene.pyr.zmcplan\n"
+        "  zmcraster plan scene.tif s3://maps/scene.pyr\n"
         "\n"
         "The plan is TARGET.zmcplan; hidden files beside it hold what is done of the pyramid. "
         "The\n"
@@ -57,16 +83,17 @@ void PlanCommand::Describe(OptionTable& table) {
 
 // What is left of plans that were given up, and with --overwrite the plan itself.
 void PlanCommand::ClearTheWay() const {
-    const std::string path = words.target + kPlanFileEnding;
+    const std::string& path = planFile;
     std::error_code ignored;
     if (fs::exists(path, ignored)) {
         if (!words.overwrite)
             throw Failure(path, "there is a plan already; finish it, or drop it with --overwrite");
-        PyramidPlan::Read(path).Discard();
+        DropPlan(PyramidPlan::Read(path));
     }
-    zmchost::BuildFile::RemoveAbandoned(words.target, [&](const std::string& name) {
-        return fs::exists(path) && PyramidPlan::Read(path).pyramid == name;
-    });
+    zmchost::BuildFile::RemoveAbandoned(
+        inStore ? path : words.target, [&](const std::string& name) {
+            return fs::exists(path) && PyramidPlan::Read(path).pyramid == name;
+        });
 }
 
 void PlanCommand::Report(const PyramidPlan& plan, GDALDataset& dataset) const {
@@ -96,27 +123,85 @@ void PlanCommand::Report(const PyramidPlan& plan, GDALDataset& dataset) const {
     }
 }
 
+// What a target in a store needs besides, once the file is laid out.
+void PlanCommand::BeginUpload(PyramidPlan& plan, const std::string& pyramid) const {
+    plan.upload.bounds =
+        UploadBounds(words.target, zmchost::PyramidHeader::Read(pyramid), plan.grid, LeastRange());
+    plan.upload.mark = HexText(platform::RandomNumber());
+    plan.upload.id = store->Begin(plan.upload.mark);
+}
+
+std::uint64_t PlanCommand::LeastRange() const {
+    if (rangeSize.empty()) return zmcstore::kUsualLeastRange;
+    const std::uint64_t size = ParseSize(kRangeOption, rangeSize);
+    if (size == 0 || size > zmcstore::kMostRangeBytes / 2)
+        throw UsageError(kRangeOption, "a part of an upload has from 1 byte to 2.5 GiB at least");
+    return size;
+}
+
+// Throws Failure for an object that is not to be replaced; else gives what tells its state.
+std::string PlanCommand::StateInStore() const {
+    const zmcstore::ObjectState state = store->Look();
+    if (state.exists && !words.overwrite)
+        throw Failure(words.target, "the object exists already; --overwrite replaces it");
+    return state.tag;
+}
+
+void PlanCommand::CheckOptions() {
+    inStore = IsObjectName(words.target);
+    if (!inStore && !(planFile.empty() && rangeSize.empty()))
+        throw UsageError(planFile.empty() ? kRangeOption : "--plan",
+                         "the target is a file, and its plan stands beside it");
+    if (inStore)
+        store = OpenStore(words.target);
+    else
+        words.CheckTarget();
+    if (inStore && planFile.empty()) planFile = LastNameOf(words.target) + kPlanFileEnding;
+    if (!inStore) planFile = words.target + kPlanFileEnding;
+}
+
+PartSize PlanCommand::Size(GDALDataset& dataset, const zelm::RasterProps& props,
+                           const zmchost::BuildOptions& options) const {
+    if (!partSize.empty()) return ParsePartSize(partSize);
+    if (!inStore) return UsualPartSize(dataset);
+    return StorePartSize(
+        props,
+        options.bands.empty() ? props.bands : static_cast<std::uint32_t>(options.bands.size()),
+        LeastRange());
+}
+
 ExitStatus PlanCommand::Run() {
     const DatasetPtr dataset = words.OpenSource(!quiet);
     zmcgdal::GdalRasterSource pixels(*dataset);
     zmchost::BuildOptions options = words.Options(pixels.Props());
     options.threads = 1;
-    const PartSize size = partSize.empty() ? UsualPartSize(*dataset) : ParsePartSize(partSize);
-    words.CheckTarget();
+    CheckOptions();
+    const PartSize size = Size(*dataset, pixels.Props(), options);
     CheckInterrupt(words.target);
     zmchost::PyramidBuilder(zmcgdal::SharedModule()).Check(pixels, words.target, options);
     for (const std::string& loss : pixels.Losses())
         Warn(words.source, "a pyramid does not keep " + loss);
+    const std::string state = inStore ? StateInStore() : "";
     ClearTheWay();
-    zmchost::BuildFile file(words.target, words.overwrite, zmchost::BuildFile::Kind::Plan);
+    using Kind = zmchost::BuildFile::Kind;
+    zmchost::BuildFile file(inStore ? planFile : words.target, words.overwrite,
+                            inStore ? Kind::Outline : Kind::Plan);
     PyramidPlan plan = MakePlan(words, *dataset, pixels, options, file, size);
-    plan.path = words.target + kPlanFileEnding;
+    if (inStore) plan.targetState = state;
+    plan.path = planFile;
     plan.words.source = FromAnywhere(words.source);
-    plan.Write();
+    if (inStore) BeginUpload(plan, file.Path());
+    Write(plan);
     file.Keep();
     Report(plan, *dataset);
     TellLeftOut(*dataset);
     return ExitStatus::Done;
+}
+
+// An upload that no plan tells of would stay in the store for good.
+void PlanCommand::Write(PyramidPlan& plan) const try { plan.Write(); } catch (...) {
+    if (inStore) store->Abort(plan.upload.id);
+    throw;
 }
 
 }  // namespace

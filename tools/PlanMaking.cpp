@@ -3,6 +3,8 @@
 #include <algorithm>
 #include <bit>
 
+#include "core/PixelVocabulary.h"
+#include "format/PyramidHeaderRecord.h"
 #include "gdal/Dataset.h"
 #include "gdal/Mosaic.h"
 #include "host/base/Checksum.h"
@@ -47,6 +49,22 @@ PartSize PartSizeFor(const zelm::RasterProps& props, std::uint32_t processes) {
     const std::uint32_t height = props.lines / (4 * processes) + 1;
     // Of a power of two tiles, so that a part can make as many levels.
     return {props.samples, std::clamp(std::bit_floor(height), kLeastHeight, kUsualSide)};
+}
+
+PartSize StorePartSize(const zelm::RasterProps& props, std::uint32_t bands,
+                       std::uint64_t leastRange) {
+    // Of these bytes the levels up to the second have enough for ranges of their own.
+    const std::uint64_t bytes = 24 * leastRange;
+    const std::uint64_t sample = zelm::PixelSize(props.pixelType);
+    constexpr std::uint64_t kLeast = 1024, kMost = 1 << 30;
+    if (bands > zelm::kMaxInterleavedBands) {
+        std::uint64_t side = kLeast;
+        while (side * side * sample < 4 * leastRange && side < kMost) side *= 2;
+        return {static_cast<std::uint32_t>(side), static_cast<std::uint32_t>(side)};
+    }
+    const std::uint64_t lines = bytes / (sample * bands * props.samples);
+    return {props.samples,
+            static_cast<std::uint32_t>(std::clamp(std::bit_ceil(lines + 1), kLeast, kMost))};
 }
 
 PyramidPlan MakePlan(const BuildWords& words, GDALDataset& dataset,

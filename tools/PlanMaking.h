@@ -28,6 +28,11 @@ PartSize UsualPartSize(GDALDataset& source);
 // for the last.
 PartSize PartSizeFor(const zelm::RasterProps& props, std::uint32_t processes);
 
+// Of a target in a store: about so many bytes of level 0, in parts that fill long ranges of the
+// file, whole lines or, in the ordering Morton, squares of a power of two tiles.
+PartSize StorePartSize(const zelm::RasterProps& props, std::uint32_t bands,
+                       std::uint64_t leastRange);
+
 // Lays the file out and makes a plan of it, all but its path; nothing is written of that.
 PyramidPlan MakePlan(const BuildWords& words, GDALDataset& dataset,
                      zmcgdal::GdalRasterSource& pixels, const zmchost::BuildOptions& options,

@@ -37,6 +37,14 @@ PlannedBuild::PlannedBuild(PyramidPlan openedPlan, std::uint32_t threads)
     };
     plan.CheckFile();
     CheckSource();
+    if (plan.IsInStore()) store.emplace(plan);
+}
+
+void PlannedBuild::UseScratch(const std::string& folder) {
+    if (store)
+        store->UseScratch(folder);
+    else if (!folder.empty())
+        throw UsageError("--scratch", "the target is a file, which is written in its place");
 }
 
 // Of many rasters those that were read since the last call.
@@ -46,11 +54,16 @@ void PlannedBuild::CheckSource() const {
         throw Failure(plan.words.source, "it changed since the plan was made");
 }
 
+void PlannedBuild::Open(std::optional<zmchost::PartBuild>& opened) {
+    opened.emplace(zmcgdal::SharedModule(), pixels, plan.words.target, options,
+                   store ? store->Path() : plan.PyramidPath());
+    opened->SetGrid(plan.grid);
+}
+
 void PlannedBuild::Start() {
-    build.emplace(zmcgdal::SharedModule(), pixels, plan.words.target, options, plan.PyramidPath());
+    Open(build);
     if (build->Facts() != plan.facts)
         throw Failure(plan.words.source, "it is not what the plan was made for");
-    build->SetGrid(plan.grid);
     KeepBlocksForStrips(*dataset, plan.grid.PartWidth() + plan.grid.PartWidth() / 50);
 }
 
@@ -68,28 +81,55 @@ void PlannedBuild::Keep(Kind kind, std::uint64_t part, const zmchost::PartResult
 void PlannedBuild::Make(std::uint64_t part) {
     CheckSource();
     plan.CheckFile();
-    Keep(Kind::Part, part, build->Make(part));
+    if (store) store->Clear();
+    const zmchost::PartResult result = build->Make(part);
+    if (store) store->Send(part);
+    Keep(Kind::Part, part, result);
+}
+
+bool PlannedBuild::IsWhole(std::uint64_t part) {
+    const auto result = records.Find(Kind::Part, part);
+    return result && (!store || store->Restore(part)) && build->Take(part, *result);
 }
 
 void PlannedBuild::Gather() {
     std::vector<std::uint64_t> missing;
-    for (std::uint64_t part = 0; part < plan.grid.Count(); ++part) {
-        const auto result = records.Find(Kind::Part, part);
-        if (!result || !build->Take(part, *result)) missing.push_back(part);
-    }
+    for (std::uint64_t part = 0; part < plan.grid.Count(); ++part)
+        if (!IsWhole(part)) missing.push_back(part);
     if (missing.empty()) return;
     throw Failure(plan.path, std::to_string(missing.size()) + " of " +
                                  std::to_string(plan.grid.Count()) +
                                  " parts are missing: " + PartList(missing));
 }
 
-void PlannedBuild::Count(std::uint64_t part) { Keep(Kind::Count, part, {0, build->Count(part)}); }
+// The tiles that a store has are made once more to be counted.
+void PlannedBuild::Count(std::uint64_t part) {
+    if (store) {
+        std::optional<zmchost::PartBuild> again;
+        Open(again);
+        again->Make(part);
+    }
+    Keep(Kind::Count, part, {0, build->Count(part)});
+    if (store) store->Drop(part);
+}
+
+// All of it before any is taken.
+void PlannedBuild::CountInStore() {
+    for (std::uint64_t part = 0; part < plan.grid.Count(); ++part)
+        if (!records.Find(Kind::Count, part)) Count(part);
+}
 
 // What was not counted yet, or not with these minima and maxima, is counted now.
 zmchost::BuildReport PlannedBuild::Finish(zmchost::BuildFile& file) {
-    for (std::uint64_t part = 0; NeedsCounts() && part < plan.grid.Count(); ++part)
-        if (const auto counts = records.Find(Kind::Count, part))
-            build->TakeCounts(part, counts->sums);
+    if (store && NeedsCounts()) CountInStore();
+    for (std::uint64_t part = 0; NeedsCounts() && part < plan.grid.Count(); ++part) {
+        const auto counts = records.Find(Kind::Count, part);
+        const bool taken = counts && build->TakeCounts(part, counts->sums);
+        if (store && !taken)
+            throw Failure(plan.path, "the counts of part " + std::to_string(part) +
+                                         " are of other pixels; make them anew with part " +
+                                         std::to_string(part) + " --count");
+    }
     const zmchost::BuildReport report = build->Finish(file);
     if (mosaic)
         mosaic->CheckAll();

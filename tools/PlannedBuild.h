@@ -18,6 +18,7 @@
 #include "host/build/PartBuild.h"
 #include "host/build/PartFolder.h"
 #include "tools/PyramidPlan.h"
+#include "tools/StoreParts.h"
 
 namespace zmctools {
 
@@ -38,6 +39,10 @@ public:
 
     // Makes a part and leaves its record.
     void Make(std::uint64_t part);
+    // Of a plan into a store, before Start: parts are made in a file of this process, in that
+    // folder or, if it is empty, in the plan's. Throws UsageError for a folder that no plan into a
+    // file has a use for.
+    void UseScratch(const std::string& folder);
     // Takes the records of all parts. Throws Failure with those that are missing, damaged or not
     // what the file holds.
     void Gather();
@@ -56,12 +61,19 @@ public:
 
     // Opens the file for Make, Gather and Finish, with the options as they are by then.
     void Start();
+    // Of a plan into a store, and behind Finish: what sends the file there.
+    StoreParts& Store() { return *store; }
 
 private:
     void CheckSource() const;
     void Keep(Kind kind, std::uint64_t part, const zmchost::PartResult& result) const;
 
+    void Open(std::optional<zmchost::PartBuild>& opened);
+    bool IsWhole(std::uint64_t part);
+    void CountInStore();
+
     zmchost::PartFolder records;
+    std::optional<StoreParts> store;  // of a plan into one
     std::optional<zmchost::PartBuild> build;
 };
 

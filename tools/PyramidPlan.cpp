@@ -1,5 +1,6 @@
 #include "tools/PyramidPlan.h"
 
+#include <algorithm>
 #include <cstdlib>
 #include <utility>
 
@@ -11,6 +12,7 @@
 #include "host/build/BuildFile.h"
 #include "host/build/BuildPlan.h"
 #include "platform/FileSystem.h"
+#include "store/UploadRanges.h"
 #include "tools/Message.h"
 #include "tools/MosaicSource.h"
 #include "tools/SourceState.h"
@@ -30,23 +32,27 @@ constexpr int kMostDepth = 4;  // of what a plan holds inside each other
 Json DocumentOf(const PyramidPlan& plan) {
     Json options = Json::object();
     VisitOptions(plan.words, [&](const char* key, const auto& value) { options[key] = value; });
-    Json document = {{kVersionKey, kPlanVersion},
-                     {"source", plan.words.source},
-                     {"sourceState", plan.sourceState},
-                     {"facts", HexText(plan.facts)},
-                     {"target", platform::NameOf(plan.words.target)},
-                     {"targetState", plan.targetState},
-                     {"pyramid", plan.pyramid},
-                     {"pyramidNumber", HexText(plan.number)},
-                     {"durable", plan.durable},
-                     {"options", options},
-                     {"width", plan.grid.width},
-                     {"height", plan.grid.height},
-                     {"partLevel", plan.grid.level},
-                     {"partColumns", plan.grid.columns},
-                     {"partRows", plan.grid.rows},
-                     {"parts", plan.grid.Count()}};
+    Json document{
+        {kVersionKey, kPlanVersion},
+        {"source", plan.words.source},
+        {"sourceState", plan.sourceState},
+        {"facts", HexText(plan.facts)},
+        {"target", plan.IsInStore() ? plan.words.target : platform::NameOf(plan.words.target)},
+        {"targetState", plan.targetState},
+        {"pyramid", plan.pyramid},
+        {"pyramidNumber", HexText(plan.number)},
+        {"durable", plan.durable},
+        {"options", options},
+        {"width", plan.grid.width},
+        {"height", plan.grid.height},
+        {"partLevel", plan.grid.level},
+        {"partColumns", plan.grid.columns},
+        {"partRows", plan.grid.rows},
+        {"parts", plan.grid.Count()}};
     if (plan.sceneCount > 0) document["scenes"] = plan.sceneCount;
+    if (plan.IsInStore())
+        document["upload"] = {
+            {"id", plan.upload.id}, {"mark", plan.upload.mark}, {"bounds", plan.upload.bounds}};
     return document;
 }
 
@@ -84,6 +90,14 @@ zmchost::PartGrid GridOf(const std::string& plan, const Json& document) {
     return grid;
 }
 
+PlannedUpload UploadOf(const std::string& plan, const Json& document) {
+    PlannedUpload upload{document.at("id"), document.at("mark"), document.at("bounds")};
+    if (upload.id.empty() || upload.bounds.size() >= zmcstore::kMostRanges ||
+        !std::ranges::is_sorted(upload.bounds))
+        throw Failure(plan, "the parts of its upload cannot be");
+    return upload;
+}
+
 PyramidPlan PlanFrom(const std::string& file, const Json& document) {
     PyramidPlan plan;
     plan.path = file;
@@ -93,8 +107,13 @@ PyramidPlan PlanFrom(const std::string& file, const Json& document) {
     plan.sourceState = document.at("sourceState");
     if (document.contains("scenes")) plan.sceneCount = document.at("scenes");
     plan.facts = FromHex(document.at("facts"));
-    plan.words.target =
-        platform::JoinPath(platform::FolderOf(file), PlainName(file, document.at("target")));
+    if (document.contains("upload")) {
+        plan.upload = UploadOf(file, document.at("upload"));
+        plan.words.target = document.at("target");
+    } else {
+        plan.words.target =
+            platform::JoinPath(platform::FolderOf(file), PlainName(file, document.at("target")));
+    }
     plan.targetState = document.at("targetState");
     plan.pyramid = PlainName(file, document.at("pyramid"));
     plan.number = FromHex(document.at("pyramidNumber"));
@@ -137,7 +156,7 @@ Json ParsePlan(const std::string& file) {
 }  // namespace
 
 std::string PyramidPlan::PyramidPath() const {
-    return zmchost::BuildFile::PlannedPath(words.target, pyramid);
+    return zmchost::BuildFile::PlannedPath(LocalName(), pyramid);
 }
 
 zmchost::PartFolder PyramidPlan::Records() const {
@@ -156,6 +175,7 @@ void PyramidPlan::CheckFile() const {
 }
 
 bool PyramidPlan::IsFinished() const {
+    if (IsInStore()) return false;
     const platform::FileStatus status = platform::StatusOf(words.target);
     return !HasFile() && status.isRegular && status.number == number;
 }

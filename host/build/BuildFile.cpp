@@ -49,7 +49,10 @@ std::string BytesText(std::uint64_t size) { return std::to_string(size) + " byte
 }  // namespace
 
 BuildFile::BuildFile(const std::string& targetName, bool mayOverwrite, Kind kind)
-    : given(targetName), overwrite(mayOverwrite), target(platform::ResolveLinks(targetName)) {
+    : given(targetName),
+      overwrite(mayOverwrite),
+      target(platform::ResolveLinks(targetName)),
+      outline(kind == Kind::Outline) {
     CheckTarget();
     SideFile::RemoveStale(target, kBuildKind);
     RemoveOrphans(target, kBuildKind);
@@ -107,6 +110,7 @@ void BuildFile::CheckTarget() const {
 }
 
 void BuildFile::CheckSpace(std::uint64_t size) const {
+    if (outline) return;
     const auto space = platform::FreeSpace(platform::FolderOf(path));
     if (space && *space < size)
         throw Error(given, "build it",
@@ -115,7 +119,7 @@ void BuildFile::CheckSpace(std::uint64_t size) const {
 }
 
 void BuildFile::Reserve(std::uint64_t size) const {
-    if (!platform::ReserveSpace(path, size))
+    if (!outline && !platform::ReserveSpace(path, size))
         throw Error(given, "take " + BytesText(size) + " of disk space", platform::LastErrorText());
 }
 

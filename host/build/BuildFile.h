@@ -21,8 +21,9 @@ namespace zmchost {
 class BuildFile {
 public:
     // What temporary files are called by: those of builds, which belong to a process, and those of
-    // plans, ".NAME.zmcplan-PROCESS-RANDOM.tmp", which stay until somebody finishes them.
-    enum class Kind { Build, Plan };
+    // plans, ".NAME.zmcplan-PROCESS-RANDOM.tmp", which stay until somebody finishes them. An
+    // outline is one of a plan whose tiles go elsewhere: no room is taken for them.
+    enum class Kind { Build, Plan, Outline };
 
     // Refuses a target that is a folder, is read-only, or exists without `overwrite`; removes stale
     // temporary files of the target; makes an empty temporary file. Throws Error.
@@ -70,7 +71,8 @@ private:
     std::string target;  // where links led
     std::string path;
     platform::FileLock lock;  // of the temporary file, so that nobody takes it for a left-over
-    bool kept = false;        // it does not go with this object
+    bool outline = false;
+    bool kept = false;  // it does not go with this object
 };
 
 }  // namespace zmchost

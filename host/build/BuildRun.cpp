@@ -531,7 +531,10 @@ std::string BuildRun::CountPart(const PartGrid& grid, std::uint64_t part) {
     work->ClearCounts();
     progress = {0, area.Pixels()};
     RunWithThreads(threads, [&] { CountLevel0(area); });
-    return work->SaveCounts();
+    std::string counts = work->SaveCounts();
+    // Whoever takes them takes them once.
+    work->ClearCounts();
+    return counts;
 }
 
 BuildReport BuildRun::FinishParts(BuildFile& laidOut, const PartGrid& grid,

@@ -19,12 +19,20 @@ using zelm::files::FileSource;
 using zelm::files::OpenMode;
 
 constexpr const char* kScenes = "scenes";
+constexpr const char* kPiecesEnding = ".pieces";
 constexpr std::string_view kPartMagic = "ZMCPART1";
 // Tables of every value of as many bands as the largest budget has room for.
 constexpr std::uint64_t kMaxPartBytes = std::uint64_t{256} << 20;
 
 const char* EndingOf(PartFolder::Kind kind) {
-    return kind == PartFolder::Kind::Part ? ".part" : ".count";
+    switch (kind) {
+        case PartFolder::Kind::Count:
+            return ".count";
+        case PartFolder::Kind::Store:
+            return ".store";
+        default:
+            return ".part";
+    }
 }
 
 // Records, and those that never got their name.
@@ -33,7 +41,8 @@ bool IsPartRecord(std::string_view name) {
     if (name.starts_with('.')) name.remove_prefix(1);
     const std::size_t digits = std::min(name.find_first_not_of("0123456789"), name.size());
     const std::string_view rest = name.substr(digits);
-    return digits != 0 && (rest.starts_with(".part") || rest.starts_with(".count"));
+    return digits != 0 && (rest.starts_with(".part") || rest.starts_with(".count") ||
+                           rest.starts_with(".store") || rest.starts_with(kPiecesEnding));
 }
 
 std::string ReadWhole(const std::string& path) {
@@ -67,6 +76,20 @@ std::string PartFolder::NameOf(Kind kind, std::uint64_t part) const {
     return platform::JoinPath(folder, std::to_string(part) + EndingOf(kind));
 }
 
+std::string PartFolder::NewPath(const std::string& name) const {
+    return platform::JoinPath(folder, '.' + name + '-' +
+                                          std::to_string(platform::CurrentProcess()) + '-' +
+                                          std::to_string(platform::RandomNumber()) + ".tmp");
+}
+
+std::string PartFolder::PiecesPath(std::uint64_t part) const {
+    return platform::JoinPath(folder, std::to_string(part) + kPiecesEnding);
+}
+
+std::string PartFolder::NewPiecesPath(std::uint64_t part) const {
+    return NewPath(std::to_string(part) + kPiecesEnding);
+}
+
 std::string PartFolder::Encode(Kind kind, std::uint64_t part, const PartResult& result) const {
     NumberPacker body;
     body.Put(build);
@@ -83,10 +106,7 @@ std::string PartFolder::Encode(Kind kind, std::uint64_t part, const PartResult& 
 
 void PartFolder::Keep(Kind kind, std::uint64_t part, const PartResult& result) const {
     const std::string path = NameOf(kind, part);
-    const std::string made =
-        platform::JoinPath(folder, '.' + std::to_string(part) + EndingOf(kind) + '-' +
-                                       std::to_string(platform::CurrentProcess()) + '-' +
-                                       std::to_string(platform::RandomNumber()) + ".tmp");
+    const std::string made = NewPath(std::to_string(part) + EndingOf(kind));
     std::string reason = WriteWhole(made, Encode(kind, part, result), durable);
     if (reason.empty() && !platform::RenameFile(made, path)) reason = platform::LastErrorText();
     if (reason.empty() && durable && !platform::SyncFolder(folder))

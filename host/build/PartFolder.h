@@ -2,6 +2,8 @@
 //
 //     FOLDER/17.part     what PartBuild::Make told of part 17
 //     FOLDER/17.count    what PartBuild::Count did
+//     FOLDER/17.store    what a store took of part 17
+//     FOLDER/17.pieces   bytes of part 17 that it did not take yet
 //     FOLDER/scenes      what a source of many rasters is made of, if it is one
 //
 // A record appears whole or not at all, and replaces one that is there: processes that make the
@@ -21,7 +23,7 @@ namespace zmchost {
 
 class PartFolder {
 public:
-    enum class Kind { Part, Count };
+    enum class Kind { Part, Count, Store };
 
     // `build` is a number that no other build has. Where `durable`, a record that is there stays
     // there when the power fails.
@@ -32,6 +34,10 @@ public:
     // Makes the folder, which must not exist.
     void Make() const;
     void Keep(Kind kind, std::uint64_t part, const PartResult& result) const;
+    // Where bytes of a part are kept that are no record; who writes them sees to all of it. A file
+    // is written under the second name and gets the first when it is whole.
+    std::string PiecesPath(std::uint64_t part) const;
+    std::string NewPiecesPath(std::uint64_t part) const;
     std::optional<PartResult> Find(Kind kind, std::uint64_t part) const;
     // Bytes that tell all of the source, and what was kept; empty if nothing was.
     void KeepScenes(const std::string& bytes) const;
@@ -41,6 +47,7 @@ public:
 
 private:
     std::string NameOf(Kind kind, std::uint64_t part) const;
+    std::string NewPath(const std::string& name) const;
     std::string Encode(Kind kind, std::uint64_t part, const PartResult& result) const;
 
     std::string folder;

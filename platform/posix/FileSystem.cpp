@@ -160,6 +160,19 @@ bool ReserveSpace(const std::string& path, std::uint64_t size) noexcept {
 #endif
 }
 
+void DropRange(const std::string& path, std::uint64_t offset, std::uint64_t size) noexcept {
+    const Descriptor file(path, O_WRONLY);
+    if (!file || size == 0) return;
+#if defined(__linux__)
+    static_cast<void>(Uninterrupted([&] {
+        return ::fallocate(file.value, FALLOC_FL_PUNCH_HOLE | FALLOC_FL_KEEP_SIZE,
+                           static_cast<off_t>(offset), static_cast<off_t>(size));
+    }));
+#else
+    static_cast<void>(offset);
+#endif
+}
+
 bool ReleaseReserve(const std::string& path) noexcept {
     const Descriptor file(path, O_WRONLY);
     struct stat info {};

@@ -1,12 +1,12 @@
 // Sha256: the digest of bytes that come in pieces.
-#ifndef ZMC_TOOLS_SHA256_H
-#define ZMC_TOOLS_SHA256_H
+#ifndef ZMC_STORE_SHA256_H
+#define ZMC_STORE_SHA256_H
 
 #include <cstddef>
 #include <memory>
 #include <string>
 
-namespace zmctools {
+namespace zmcstore {
 
 class Sha256 {
 public:
@@ -22,6 +22,6 @@ private:
     std::unique_ptr<State> state;
 };
 
-}  // namespace zmctools
+}  // namespace zmcstore
 
 #endif

@@ -1,10 +1,10 @@
-#include "tools/Sha256.h"
+#include "store/Sha256.h"
 
 #include <openssl/evp.h>
 
 #include <stdexcept>
 
-namespace zmctools {
+namespace zmcstore {
 
 struct Sha256::State {
     std::unique_ptr<EVP_MD_CTX, decltype(&EVP_MD_CTX_free)> context{EVP_MD_CTX_new(),
@@ -37,4 +37,4 @@ std::string Sha256::Finish() {
     return text;
 }
 
-}  // namespace zmctools
+}  // namespace zmcstore
