@@ -70,7 +70,8 @@ void UpdateCommand::Describe(OptionTable& table) {
         "  zmcraster update classes.pyr classes.tif --resampling mode --changed 0,0,512,512\n"
         "\n"
         "The result is the file that build would make, byte for byte, as long as nothing else has\n"
-        "changed. With records, source and options are those of the build, and statistics come from\n"
+        "changed. With records, source and options are those of the build, and statistics come "
+        "from\n"
         "what was kept of each block; without, tell both as build was told, and statistics take a\n"
         "look at all of level 0. Nothing is written into TARGET before all of it is on the disk\n"
         "beside it; an update that is cut off behind that is finished by recover or by the next "
@@ -108,8 +109,7 @@ void UpdateCommand::TakeRecordedWords() {
                 given = given || (key == other && now != value);
         });
         if (given && key != "memory")
-            throw UsageError(OptionOf(key),
-                             "without SOURCE the options are those of the build");
+            throw UsageError(OptionOf(key), "without SOURCE the options are those of the build");
     });
     if (keepRecords)
         throw UsageError("--keep-records", "without SOURCE the records are kept anyway");
@@ -131,8 +131,7 @@ void UpdateCommand::CheckSource(GDALDataset& dataset) const {
     SetSubject(words.source);
 }
 
-zmchost::UpdateReport UpdateCommand::Update(GDALDataset& dataset,
-                                            zmcgdal::GdalRasterSource& pixels,
+zmchost::UpdateReport UpdateCommand::Update(GDALDataset& dataset, zmcgdal::GdalRasterSource& pixels,
                                             const std::vector<zmchost::Window>& windows,
                                             const zmchost::UpdateRecords& records) const {
     TerminalProgress bar(fs::path(words.target).filename().string(), !quiet);
@@ -146,10 +145,10 @@ zmchost::UpdateReport UpdateCommand::Update(GDALDataset& dataset,
     const std::string state = SourceState(dataset);
     zmchost::PyramidUpdate update(zmcgdal::SharedModule(), pixels, words.target, options);
     update.beforeCommit = [&](const auto& updated, const std::string& beside) {
-        WriteSidecar(dataset, words, options.bands, statistics,
-                     std::make_shared<zmcgdal::OpenFile>(words.target, updated,
-                                                         zmcgdal::OpenOptions{}),
-                     beside);
+        WriteSidecar(
+            dataset, words, options.bands, statistics,
+            std::make_shared<zmcgdal::OpenFile>(words.target, updated, zmcgdal::OpenOptions{}),
+            beside);
         CheckUnchanged(dataset, words.source, state);
         CheckInterrupt(words.target);
     };
