@@ -96,8 +96,8 @@ zmchost::Window ParseWindow(const std::string& text, std::uint32_t width, std::u
                       numbers[3] <= height - numbers[1];
     if (!fits)
         throw UsageError(option, text + " is not inside the level, which has " +
-                                         std::to_string(width) + " x " + std::to_string(height) +
-                                         " pixels");
+                                     std::to_string(width) + " x " + std::to_string(height) +
+                                     " pixels");
     return {static_cast<std::uint32_t>(numbers[0]), static_cast<std::uint32_t>(numbers[1]),
             static_cast<std::uint32_t>(numbers[2]), static_cast<std::uint32_t>(numbers[3])};
 }

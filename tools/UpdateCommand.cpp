@@ -69,7 +69,8 @@ void UpdateCommand::Describe(OptionTable& table) {
         "  zmcraster update classes.pyr classes.tif --resampling mode --changed 0,0,512,512\n"
         "\n"
         "The result is the file that build would make, byte for byte, as long as nothing else has\n"
-        "changed. With records, source and options are those of the build, and statistics come from\n"
+        "changed. With records, source and options are those of the build, and statistics come "
+        "from\n"
         "what was kept of each block; without, tell both as build was told, and statistics take a\n"
         "look at all of level 0. Nothing is written into TARGET before all of it is on the disk\n"
         "beside it; an update that is cut off behind that is finished by recover or by the next "
@@ -114,8 +115,7 @@ void UpdateCommand::CheckSource(GDALDataset& dataset) const {
     SetSubject(words.source);
 }
 
-zmchost::UpdateReport UpdateCommand::Update(GDALDataset& dataset,
-                                            zmcgdal::GdalRasterSource& pixels,
+zmchost::UpdateReport UpdateCommand::Update(GDALDataset& dataset, zmcgdal::GdalRasterSource& pixels,
                                             const std::vector<zmchost::Window>& windows,
                                             const zmchost::UpdateRecords& records) const {
     TerminalProgress bar(fs::path(words.target).filename().string(), !quiet);
@@ -129,10 +129,10 @@ zmchost::UpdateReport UpdateCommand::Update(GDALDataset& dataset,
     const std::string state = SourceState(dataset);
     zmchost::PyramidUpdate update(zmcgdal::SharedModule(), pixels, words.target, options);
     update.beforeCommit = [&](const auto& updated, const std::string& beside) {
-        WriteSidecar(dataset, words, options.bands, statistics,
-                     std::make_shared<zmcgdal::OpenFile>(words.target, updated,
-                                                         zmcgdal::OpenOptions{}),
-                     beside);
+        WriteSidecar(
+            dataset, words, options.bands, statistics,
+            std::make_shared<zmcgdal::OpenFile>(words.target, updated, zmcgdal::OpenOptions{}),
+            beside);
         if (SourceState(dataset) != state)
             throw Failure(words.source, "it changed while it was read");
         CheckInterrupt(words.target);

@@ -21,8 +21,8 @@ constexpr const char* kOption = "--changed";
 constexpr int kEdgePoints = 21;
 
 bool LooksLikeWindow(const std::string& text) {
-    return text.empty() || (text.find_first_not_of("0123456789,+-. ") == text.npos &&
-                            text.find(',') != text.npos);
+    return text.empty() ||
+           (text.find_first_not_of("0123456789,+-. ") == text.npos && text.find(',') != text.npos);
 }
 
 struct GeoTransform {
@@ -127,11 +127,11 @@ std::vector<zmchost::Window> ChangedWindows(const std::vector<std::string>& text
     std::vector<zmchost::Window> windows;
     for (const std::string& text : texts) {
         if (text.empty()) throw UsageError(kOption, "\"\" is not X,Y,WIDTH,HEIGHT");
-        windows.push_back(LooksLikeWindow(text)
-                              ? ParseWindow(text, static_cast<std::uint32_t>(source.GetRasterXSize()),
-                                            static_cast<std::uint32_t>(source.GetRasterYSize()),
-                                            kOption)
-                              : WindowOfScene(text, source, sourceName));
+        windows.push_back(
+            LooksLikeWindow(text)
+                ? ParseWindow(text, static_cast<std::uint32_t>(source.GetRasterXSize()),
+                              static_cast<std::uint32_t>(source.GetRasterYSize()), kOption)
+                : WindowOfScene(text, source, sourceName));
     }
     return windows;
 }

@@ -182,8 +182,8 @@ zelm::Rectangle WholeTiles(const zelm::Rectangle& area, const zelm::Rectangle& l
             static_cast<std::uint32_t>(std::min<std::uint64_t>(bottom, level.height) - y)};
 }
 
-// Cells [first, last) of a coarser level, of so many, that come from pixels [begin, end) of a row or
-// column: a cell from its two pixels and those of the halo around them.
+// Cells [first, last) of a coarser level, of so many, that come from pixels [begin, end) of a row
+// or column: a cell from its two pixels and those of the halo around them.
 Span DependentCells(std::uint32_t begin, std::uint64_t end, std::uint32_t halo,
                     std::uint32_t cells) {
     const std::uint32_t first = begin > halo ? (begin - halo) / 2 : 0;

@@ -57,8 +57,8 @@ public:
     BuildReport FinishParts(BuildFile& laidOut, const PartGrid& grid,
                             const std::vector<std::uint64_t>& uncounted);
 
-    // What PyramidUpdate does, in this order (BuildRunUpdate.cpp). The first opens the pyramid, from
-    // a source that takes what is written.
+    // What PyramidUpdate does, in this order (BuildRunUpdate.cpp). The first opens the pyramid,
+    // from a source that takes what is written.
     void OpenUpdate(std::shared_ptr<zelm::files::ByteSource> pyramid);
     // Makes what depends on windows of the source anew; the number of tiles.
     std::uint64_t RenewTiles(const std::vector<Window>& changed);

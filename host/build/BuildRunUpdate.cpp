@@ -79,11 +79,13 @@ std::vector<Window> BuildRun::StatisticsBlocks() const {
     return blocks;
 }
 
-std::uint64_t BuildRun::GatherStatistics(const std::vector<Window>& changed,
-                                         PyramidRecords* before, RecordsWriter* after) {
+std::uint64_t BuildRun::GatherStatistics(const std::vector<Window>& changed, PyramidRecords* before,
+                                         RecordsWriter* after) {
     if (work->StatisticsMemory() == 0) return 0;
     const std::vector<Window> blocks = StatisticsBlocks();
-    const auto foreign = [&] { throw Error(name, kRenewIt, "its records are those of another build"); };
+    const auto foreign = [&] {
+        throw Error(name, kRenewIt, "its records are those of another build");
+    };
     if (before && before->Pieces() != blocks.size() && before->Pieces() != 2 * blocks.size())
         foreign();
     std::vector<bool> looks;

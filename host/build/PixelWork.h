@@ -58,7 +58,8 @@ public:
 
     // For builds in parts: what the statistics have gathered as numbers, and what another object of
     // the same setup has, taken in; false, and nothing is, where the numbers are of another kind.
-    // Both, and the counts of the second walk, which are saved and merged likewise, can be begun anew.
+    // Both, and the counts of the second walk, which are saved and merged likewise, can be begun
+    // anew.
     virtual std::string SaveSums() = 0;
     virtual void ClearSums() = 0;
     virtual bool MergeSums(std::string_view packed) = 0;

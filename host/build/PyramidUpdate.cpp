@@ -66,8 +66,8 @@ UpdateReport PyramidUpdate::Run(const std::vector<Window>& changed, const Update
 void PyramidUpdate::KeepRecords(const std::string& note) {
     BuildRun run(module, source, target, options);
     int error = 0;
-    auto pyramid = zelm::files::FileSource::Open(WideFileName(target),
-                                                 zelm::files::OpenMode::Read, &error);
+    auto pyramid =
+        zelm::files::FileSource::Open(WideFileName(target), zelm::files::OpenMode::Read, &error);
     const auto fail = [&](const std::string& why) {
         throw Error(target, "keep records of its statistics", why);
     };

@@ -53,7 +53,8 @@ bool PyramidRecords::ReadIndex(std::string_view index, std::uint64_t end) {
     std::uint64_t offset = kRecordsHead;
     for (std::uint64_t i = 0; i < count; ++i) {
         const Place place{offset, numbers.Take(), numbers.Take()};
-        if (!numbers.Good() || place.size > kMaxRecordsPiece || place.size > end - offset) return false;
+        if (!numbers.Good() || place.size > kMaxRecordsPiece || place.size > end - offset)
+            return false;
         pieces.push_back(place);
         offset += place.size;
     }
@@ -78,9 +79,13 @@ std::unique_ptr<PyramidRecords> PyramidRecords::Find(const std::string& pyramid)
     if (size == FileSource::kUnknownSize || size < kRecordsHead + kRecordsTail) fail(damaged);
     const std::string head = ReadRange(source, 0, kRecordsHead);
     const std::string tail = ReadRange(source, size - kRecordsTail, kRecordsTail);
-    if (head.size() != kRecordsHead || tail.size() != kRecordsTail || !head.starts_with(kRecordsMagic)) fail(damaged);
+    if (head.size() != kRecordsHead || tail.size() != kRecordsTail ||
+        !head.starts_with(kRecordsMagic))
+        fail(damaged);
     const std::uint64_t end = FixedNumberAt(tail, 0);
-    if (end < kRecordsHead || end > size - kRecordsTail || size - kRecordsTail - end > kMaxRecordsIndex) fail(damaged);
+    if (end < kRecordsHead || end > size - kRecordsTail ||
+        size - kRecordsTail - end > kMaxRecordsIndex)
+        fail(damaged);
     const std::string index = ReadRange(source, end, size - kRecordsTail - end);
     if (Checksum(index) != FixedNumberAt(tail, 8) || !found->ReadIndex(index, end)) fail(damaged);
     if (head.substr(kRecordsMagic.size()) != StateOfPyramid(pyramid))
@@ -100,7 +105,8 @@ void PyramidRecords::Stamp(const std::string& records, const std::string& pyrami
     int error = 0;
     const auto file = FileSource::Open(WideFileName(records), OpenMode::Update, &error);
     const std::string state = StateOfPyramid(pyramid);
-    if (!file || file->WriteAt(kRecordsMagic.size(), state.data(), state.size(), &error) != state.size() ||
+    if (!file ||
+        file->WriteAt(kRecordsMagic.size(), state.data(), state.size(), &error) != state.size() ||
         !file->Sync(&error))
         throw Error(pyramid, kKeepRecords, platform::ErrorText(error));
 }

@@ -70,16 +70,17 @@ struct Recovery {
     std::string text;  // what was found and done, for people; empty for Nothing and UnderWay
 };
 
-// Finishes an update that was cut off (UpdateJournal.h), looks for a left-over copy, and does what is
-// to be done. Never throws, but for memory.
+// Finishes an update that was cut off (UpdateJournal.h), looks for a left-over copy, and does what
+// is to be done. Never throws, but for memory.
 Recovery RecoverMetadata(const std::string& file);
 
-// Looks for an update that was cut off or a left-over copy and changes nothing, the lock of a store included: Nothing, UnderWay,
-// Unusable, Failed or Pending. Never throws, but for memory.
+// Looks for an update that was cut off or a left-over copy and changes nothing, the lock of a store
+// included: Nothing, UnderWay, Unusable, Failed or Pending. Never throws, but for memory.
 Recovery LookForCopy(const std::string& file);
 
 // Cuts off the metadata document of a file and removes its copy, so that statistics can be stored
-// anew; the journal of an update that cannot be finished too. Throws Error where nothing is damaged, a copy can be put back, or it cannot be done.
+// anew; the journal of an update that cannot be finished too. Throws Error where nothing is
+// damaged, a copy can be put back, or it cannot be done.
 void DiscardMetadata(const std::string& file);
 
 }  // namespace zmchost

@@ -53,8 +53,8 @@ struct UpdateChanges {
 
 std::string UpdateChanges::Encode() const {
     NumberPacker packer;
-    for (const std::uint64_t number :
-         {fileNumber, frontSize, frontSum, document, newSize, endings, std::uint64_t{pieces.size()}})
+    for (const std::uint64_t number : {fileNumber, frontSize, frontSum, document, newSize, endings,
+                                       std::uint64_t{pieces.size()}})
         packer.Put(number);
     for (const Piece& piece : pieces)
         for (const std::uint64_t number : {piece.offset, piece.size, piece.place, piece.sum})
@@ -67,9 +67,8 @@ std::string UpdateChanges::Encode() const {
 std::optional<UpdateChanges> UpdateChanges::Decode(std::string_view bytes, std::uint64_t end) {
     NumberUnpacker numbers(bytes);
     UpdateChanges changes;
-    for (std::uint64_t* number :
-         {&changes.fileNumber, &changes.frontSize, &changes.frontSum, &changes.document,
-          &changes.newSize, &changes.endings})
+    for (std::uint64_t* number : {&changes.fileNumber, &changes.frontSize, &changes.frontSum,
+                                  &changes.document, &changes.newSize, &changes.endings})
         *number = numbers.Take();
     const std::uint64_t count = numbers.Take();
     if (changes.newSize < changes.document ||
@@ -106,8 +105,8 @@ void ReadByPieces(zelm::files::ByteSource& source, const std::string& name, std:
     }
 }
 
-std::uint64_t SumOfRange(zelm::files::ByteSource& source, const std::string& name, std::uint64_t offset,
-                    std::uint64_t size) {
+std::uint64_t SumOfRange(zelm::files::ByteSource& source, const std::string& name,
+                         std::uint64_t offset, std::uint64_t size) {
     std::uint64_t sum = size;
     ReadByPieces(source, name, offset, size, [&](std::uint64_t, std::string_view bytes) {
         sum = PixelChecksum(sum, std::as_bytes(std::span(bytes)));
@@ -117,7 +116,7 @@ std::uint64_t SumOfRange(zelm::files::ByteSource& source, const std::string& nam
 
 // Of a pyramid, so that a journal is known to be of it.
 std::uint64_t FrontSumOf(zelm::files::ByteSource& source, const std::string& name,
-                       std::uint64_t size) {
+                         std::uint64_t size) {
     return SumOfRange(source, name, 0, size);
 }
 
@@ -126,8 +125,8 @@ class Redo {
 public:
     Redo(std::string pyramid, OpenMode mode) : name(std::move(pyramid)) {
         int error = 0;
-        journal = FileSource::Open(WideFileName(UpdateJournal::PathFor(name)), OpenMode::Read,
-                                   &error);
+        journal =
+            FileSource::Open(WideFileName(UpdateJournal::PathFor(name)), OpenMode::Read, &error);
         if (!journal) throw Error(name, kUpdateIt, platform::ErrorText(error));
         file = FileSource::Open(WideFileName(name), mode, &error);
         if (!file) throw Error(name, kUpdateIt, platform::ErrorText(error));
@@ -145,7 +144,8 @@ public:
         tail.resize(journal->ReadAt(size - kUpdateTail, tail.data(), tail.size()));
         if (tail.size() != kUpdateTail || !tail.ends_with(kUpdateMagic)) return "it is torn";
         const std::uint64_t end = FixedNumberAt(tail, 0);
-        if (end > size - kUpdateTail || size - kUpdateTail - end > kMaxUpdateIndex) return "it is torn";
+        if (end > size - kUpdateTail || size - kUpdateTail - end > kMaxUpdateIndex)
+            return "it is torn";
         std::string index(static_cast<std::size_t>(size - kUpdateTail - end), '\0');
         index.resize(journal->ReadAt(end, index.data(), index.size()));
         if (Checksum(index) != FixedNumberAt(tail, 8)) return "it is torn";
@@ -153,7 +153,8 @@ public:
         if (!read) return "it is torn";
         changes = std::move(*read);
         for (const UpdateChanges::Piece& piece : changes.pieces)
-            if (SumOfRange(*journal, name, piece.place, piece.size) != piece.sum) return "it is torn";
+            if (SumOfRange(*journal, name, piece.place, piece.size) != piece.sum)
+                return "it is torn";
         return Mismatch();
     }
 
@@ -214,7 +215,9 @@ private:
         return header.fileSize < changes.document ? "the file has lost tiles since" : "";
     }
 
-    [[noreturn]] void Fail(const std::string& reason) const { throw Error(name, kUpdateIt, reason); }
+    [[noreturn]] void Fail(const std::string& reason) const {
+        throw Error(name, kUpdateIt, reason);
+    }
     void Write(std::uint64_t offset, std::string_view bytes) {
         int error = 0;
         if (file->WriteAt(offset, bytes.data(), bytes.size(), &error) != bytes.size())
@@ -283,7 +286,8 @@ const std::vector<std::string> UpdateJournal::kEndings = {".msk", ".aux.xml",
 
 std::string UpdateJournal::PathFor(const std::string& file) {
     const std::string target = platform::ResolveLinks(file);
-    return platform::JoinPath(platform::FolderOf(target), SideFile::Stem(target) + '.' + kUpdateKind);
+    return platform::JoinPath(platform::FolderOf(target),
+                              SideFile::Stem(target) + '.' + kUpdateKind);
 }
 
 UpdateJournal::UpdateJournal(const std::string& fileName)
@@ -307,8 +311,7 @@ UpdateJournal::UpdateJournal(const std::string& fileName)
     if (!base) refuse(platform::ErrorText(error));
     header = PyramidHeader::Read(*base, given);
     if (header.BytesMissing() != 0)
-        refuse("it is incomplete, " + std::to_string(header.BytesMissing()) +
-               " bytes are missing");
+        refuse("it is incomplete, " + std::to_string(header.BytesMissing()) + " bytes are missing");
     opened = base->Identify();
     RemoveAbandonedUpdates(file);
     path = SideFile::MakeTemporary(file, kUpdateKind, lock);
@@ -362,7 +365,8 @@ void UpdateJournal::Seal() {
     }
     const std::uint64_t end = staged->AsideSize();
     const std::string index = changes.Encode();
-    const std::string tail = index + FixedNumber(end) + FixedNumber(Checksum(index)) + std::string(kUpdateMagic);
+    const std::string tail =
+        index + FixedNumber(end) + FixedNumber(Checksum(index)) + std::string(kUpdateMagic);
     int error = 0;
     if (journal->WriteAt(end, tail.data(), tail.size(), &error) != tail.size() ||
         !journal->Sync(&error))
@@ -415,8 +419,7 @@ bool DiscardUpdate(const std::string& file) {
     if (found.outcome == Outcome::UnderWay) refuse("another process is updating the file");
     if (found.outcome == Outcome::Pending) refuse("the update can be finished");
     if (found.outcome == Outcome::Failed) refuse(found.text);
-    if (!platform::RemoveEntry(UpdateJournal::PathFor(file)))
-        refuse(platform::LastErrorText());
+    if (!platform::RemoveEntry(UpdateJournal::PathFor(file))) refuse(platform::LastErrorText());
     return true;
 }
 

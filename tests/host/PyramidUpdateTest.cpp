@@ -139,10 +139,10 @@ TEST_F(Updates, RandomWindowsAreThoseOfBuild) {
     for (std::size_t i = 0; i < CampaignLength(std::size_t{6}, std::size_t{100}); ++i) {
         BuildOptions options;
         options.resampling = static_cast<Resampling>(random() % kResamplings);
-        MemorySource<unsigned short> source = NoiseOf<unsigned short>(
-            1 + static_cast<std::uint32_t>(random() % 2600),
-            1 + static_cast<std::uint32_t>(random() % 1600),
-            1 + static_cast<std::uint32_t>(random() % 3));
+        MemorySource<unsigned short> source =
+            NoiseOf<unsigned short>(1 + static_cast<std::uint32_t>(random() % 2600),
+                                    1 + static_cast<std::uint32_t>(random() % 1600),
+                                    1 + static_cast<std::uint32_t>(random() % 3));
         ExpectThatOfBuild(source, options, random() % 2 == 0);
     }
 }
@@ -162,7 +162,9 @@ TEST_F(Refusals, NameWhatIsWrongAndChangeNothing) {
         {0, 0, 0, 5}, {700, 0, 1, 1}, {0, 599, 1, 2}, {0xFFFFFFFF, 0, 0xFFFFFFFF, 1}};
     for (const Window& window : outside)
         EXPECT_THAT(FailureOf([&] { update.Run({window}); }), HasSubstr("not inside the raster"));
-    EXPECT_THAT(FailureOf([&] { update.Run({{0, 0, 1, 1}}, {true, true, ""}); }),
+    EXPECT_THAT(FailureOf([&] {
+                    update.Run({{0, 0, 1, 1}}, {true, true, ""});
+                }),
                 HasSubstr("it has none"));
     MemorySource<unsigned char> larger = NoiseOf<unsigned char>(701, 600, 1);
     EXPECT_THAT(FailureOf([&] {
@@ -170,7 +172,9 @@ TEST_F(Refusals, NameWhatIsWrongAndChangeNothing) {
                 }),
                 HasSubstr("laid out for another raster"));
     const UpdateJournal other(target);
-    EXPECT_THAT(FailureOf([&] { update.Run({{0, 0, 1, 1}}); }),
+    EXPECT_THAT(FailureOf([&] {
+                    update.Run({{0, 0, 1, 1}});
+                }),
                 HasSubstr("another process is updating it"));
     EXPECT_EQ(zmctest::ReadText(target), before);
 }
@@ -200,7 +204,8 @@ TEST(StagedSources, ReadAsIfWritten) {
     };
     for (int round = 0; round < 30; ++round) {
         zelm::files::MemorySource::Bytes first(200);
-        std::generate(first.begin(), first.end(), [&] { return static_cast<unsigned char>(upTo(255)); });
+        std::generate(first.begin(), first.end(),
+                      [&] { return static_cast<unsigned char>(upTo(255)); });
         auto model = std::make_shared<zelm::files::MemorySource>(first);
         auto base = std::make_shared<zelm::files::MemorySource>(first);
         StagedSource staged(base, std::make_shared<zelm::files::MemorySource>());
@@ -211,7 +216,8 @@ TEST(StagedSources, ReadAsIfWritten) {
                 model->Truncate(offset);
                 staged.Truncate(offset);
             } else if (step % 2 == 0) {
-                std::generate(bytes.begin(), bytes.end(), [&] { return static_cast<unsigned char>(upTo(255)); });
+                std::generate(bytes.begin(), bytes.end(),
+                              [&] { return static_cast<unsigned char>(upTo(255)); });
                 model->WriteAt(offset, bytes.data(), bytes.size());
                 staged.WriteAt(offset, bytes.data(), bytes.size());
             }
