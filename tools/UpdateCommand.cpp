@@ -64,11 +64,11 @@ void UpdateCommand::Describe(OptionTable& table) {
                "With SOURCE: leave TARGET.zmcrecords for the next update");
     table.Footer(
         "Examples:\n"
-        "  zmcraster build mosaic.vrt mosaic.pyr --keep-records\n"
         "  zmcraster update mosaic.pyr --changed 4096,2048,1000,1000\n"
         "  zmcraster update mosaic.pyr --changed scenes/17.tif --changed scenes/18.tif\n"
         "  zmcraster update classes.pyr classes.tif --resampling mode --changed 0,0,512,512\n"
         "\n"
+        "Records are what zmcraster build --keep-records leaves beside the pyramid.\n"
         "The result is the file that build would make, byte for byte, as long as nothing else has\n"
         "changed. With records, source and options are those of the build, and statistics come "
         "from\n"

@@ -281,6 +281,7 @@ public:
     bool NeedsSecondWalk() const override { return false; }
     void BeginSecondWalk() override {}
     std::string SaveSums() override { return ""; }
+    void ClearSums() override {}
     bool MergeSums(std::string_view) override { return false; }
     std::string SaveCounts() override { return ""; }
     bool MergeCounts(std::string_view) override { return false; }

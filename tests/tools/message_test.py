@@ -4,8 +4,8 @@ import re
 
 from frame import ToolTest, geotiff, samples
 
-COMMANDS = ["build", "plan", "part", "finish", "status", "info", "export", "hash", "verify", "compare", "recover",
-            "preview", "serve"]
+COMMANDS = ["build", "plan", "part", "finish", "status", "info", "export", "hash", "verify", "compare", "update",
+            "recover", "preview", "serve"]
 
 
 class Help(ToolTest):
