@@ -93,7 +93,7 @@ MemorySource<T> NoiseOf(std::uint32_t width, std::uint32_t height, std::uint32_t
 TEST_F(Updates, TypesAreThoseOfBuild) {
     const auto all = [&]<class T>(std::type_identity<T>) {
         for (const bool records : {false, true}) {
-            MemorySource<T> source = NoiseOf<T>(1100, 1030, 2);
+            MemorySource<T> source = NoiseOf<T>(600, 530, 2);
             ExpectThatOfBuild(source, {}, records);
         }
     };
@@ -106,10 +106,10 @@ TEST_F(Updates, MethodsAreThoseOfBuild) {
     for (std::size_t number = 0; number < kResamplings; ++number) {
         BuildOptions options;
         options.resampling = static_cast<Resampling>(number);
-        MemorySource<float> reals = NoiseOf<float>(2070, 1541, 1);
+        MemorySource<float> reals = NoiseOf<float>(1050, 771, 1);
         if (SupportsElementType(*options.resampling, reals.props.pixelType))
             ExpectThatOfBuild(reals, options, number % 2 == 0);
-        MemorySource<unsigned char> bytes = NoiseOf<unsigned char>(1537, 2051, 3);
+        MemorySource<unsigned char> bytes = NoiseOf<unsigned char>(777, 1035, 3);
         options.levels = 10;
         if (SupportsElementType(*options.resampling, bytes.props.pixelType))
             ExpectThatOfBuild(bytes, options, number % 2 != 0);
