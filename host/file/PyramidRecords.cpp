@@ -72,7 +72,7 @@ std::unique_ptr<PyramidRecords> PyramidRecords::Find(const std::string& pyramid)
     found->name = pyramid;
     int error = 0;
     found->source = FileSource::Open(WideFileName(path), OpenMode::Read, &error);
-    if (!found->source) fail(platform::ErrorText(error));
+    if (!found->source) throw Error(pyramid, kUseRecords, platform::ErrorText(error));
     FileSource& source = *found->source;
     const std::uint64_t size = source.Size();
     const std::string damaged = "they are damaged";
@@ -115,7 +115,8 @@ RecordsWriter::RecordsWriter(const std::string& path, const std::string& pyramid
     int error = 0;
     file = FileSource::Open(WideFileName(path), OpenMode::Create, &error);
     if (!file) throw Error(name, kKeepRecords, platform::ErrorText(error));
-    Write(std::string(kRecordsMagic) + FixedNumber(0) + FixedNumber(0));
+    const std::string front = std::string(kRecordsMagic) + FixedNumber(0) + FixedNumber(0);
+    Write(front);
 }
 
 void RecordsWriter::Write(std::string_view bytes) {

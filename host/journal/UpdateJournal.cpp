@@ -308,7 +308,7 @@ UpdateJournal::UpdateJournal(const std::string& fileName)
     if (!TakeFileLock(fileLock, file)) refuse("another process is updating it");
     int error = 0;
     base = FileSource::Open(WideFileName(file), OpenMode::Read, &error);
-    if (!base) refuse(platform::ErrorText(error));
+    if (!base) throw Error(given, kUpdateIt, platform::ErrorText(error));
     header = PyramidHeader::Read(*base, given);
     if (header.BytesMissing() != 0)
         refuse("it is incomplete, " + std::to_string(header.BytesMissing()) + " bytes are missing");
