@@ -110,7 +110,7 @@ TEST_F(Updates, MethodsAreThoseOfBuild) {
         if (SupportsElementType(*options.resampling, reals.props.pixelType))
             ExpectThatOfBuild(reals, options, number % 2 == 0);
         MemorySource<unsigned char> bytes = NoiseOf<unsigned char>(777, 1035, 3);
-        options.levels = 10;
+        options.levels = 9;
         if (SupportsElementType(*options.resampling, bytes.props.pixelType))
             ExpectThatOfBuild(bytes, options, number % 2 != 0);
     }
