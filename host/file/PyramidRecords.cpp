@@ -111,10 +111,19 @@ void PyramidRecords::Stamp(const std::string& records, const std::string& pyrami
         throw Error(pyramid, kKeepRecords, platform::ErrorText(error));
 }
 
-RecordsWriter::RecordsWriter(const std::string& path, const std::string& pyramid) : name(pyramid) {
+namespace {
+
+std::shared_ptr<FileSource> Created(const std::string& path, const std::string& pyramid) {
     int error = 0;
-    file = FileSource::Open(WideFileName(path), OpenMode::Create, &error);
-    if (!file) throw Error(name, kKeepRecords, platform::ErrorText(error));
+    auto file = FileSource::Open(WideFileName(path), OpenMode::Create, &error);
+    if (!file) throw Error(pyramid, kKeepRecords, platform::ErrorText(error));
+    return file;
+}
+
+}  // namespace
+
+RecordsWriter::RecordsWriter(const std::string& path, const std::string& pyramid)
+    : name(pyramid), file(Created(path, pyramid)) {
     const std::string front = std::string(kRecordsMagic) + FixedNumber(0) + FixedNumber(0);
     Write(front);
 }
