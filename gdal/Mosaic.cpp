@@ -215,7 +215,7 @@ Layer Mosaic::ReadLayer(std::uint32_t scene, const Rectangle& part, std::span<co
     layer.shown.resize(samples);
     SceneFile& file = FileOf(scene);
     file.Read(part, chosen, layer.samples.data(), static_cast<GSpacing>(pixelBytes),
-              static_cast<GSpacing>(pixelBytes * part.width), static_cast<GSpacing>(sampleSize));
+              static_cast<GSpacing>(pixelBytes) * part.width, static_cast<GSpacing>(sampleSize));
     file.ReadShown(part, chosen, layer.samples.data(), layer.shown.data());
     return layer;
 }
@@ -227,8 +227,8 @@ void Mosaic::Paint(std::uint32_t scene, const Area& area) {
                          static_cast<GSpacing>(area.LineBytes()),
                          static_cast<GSpacing>(sampleSize));
     const std::uint64_t line = part.width * std::uint64_t{area.PixelBytes()};
-    const auto lines = static_cast<std::uint32_t>(
-        std::clamp<std::uint64_t>(kMostAside / 8 / line, 1, part.height));
+    const auto lines = static_cast<std::uint32_t>(std::clamp<std::uint64_t>(
+        kMostAside / 8 / std::max<std::uint64_t>(line, 1), 1, part.height));
     for (std::uint32_t y = part.y; y < part.Bottom(); y += lines) {
         const Rectangle some{part.x, y, part.width,
                              std::min(lines, static_cast<std::uint32_t>(part.Bottom() - y))};
