@@ -43,8 +43,8 @@ T GapValue(const std::optional<double>& noData) {
 template <class T>
 void FillPixels(std::span<const T> pixel, std::size_t pixels, T* target) {
     const auto same = [&](const T& sample) {
-        // NOLINTNEXTLINE(bugprone-suspicious-memory-comparison): bytes are meant, of -0 and NaN
-        // too.
+        // Bytes are meant, of -0 and of what is not a number too.
+        // NOLINTNEXTLINE(bugprone-suspicious-memory-comparison)
         return std::memcmp(&sample, &pixel[0], sizeof(T)) == 0;
     };
     if (std::all_of(pixel.begin(), pixel.end(), same)) {
