@@ -544,4 +544,47 @@ MosaicLayout SurveyMosaic(const std::string& name, std::vector<std::string> scen
     return Laying(wishes, findings, leading).Lay();
 }
 
+std::optional<MosaicLayout> RenewLayout(MosaicLayout known, const std::vector<std::string>& scenes,
+                                        const MosaicWishes& wishes) {
+    const auto isOf = [](const MosaicScene& scene, const std::string& name) {
+        return scene.name == name;
+    };
+    if (wishes.skipBroken || !known.leftOut.empty() ||
+        !std::equal(known.scenes.begin(), known.scenes.end(), scenes.begin(), scenes.end(), isOf))
+        return std::nullopt;
+    std::vector<std::size_t> changed{0};
+    for (std::size_t i = 0; i < scenes.size(); ++i) {
+        if (known.scenes[i].StateNow() == known.scenes[i].state) continue;
+        if (i == 0) return std::nullopt;
+        changed.push_back(i);
+    }
+    if (changed.size() == 1) return known;
+    std::vector<std::string> names;
+    for (const std::size_t i : changed) names.push_back(scenes[i]);
+    // The first scene makes the grid of both.
+    const MosaicLayout seen = SurveyMosaic(scenes.front(), std::move(names), wishes);
+    if (seen.system != known.system || seen.transform[1] != known.transform[1] ||
+        seen.transform[5] != known.transform[5] ||
+        PackBands(seen.pixelType, seen.bands) != PackBands(known.pixelType, known.bands))
+        return std::nullopt;
+    const zelm::Rectangle& before = known.scenes.front().place;
+    const zelm::Rectangle& now = seen.scenes.front().place;
+    for (std::size_t k = 1; k < changed.size(); ++k) {
+        MosaicScene scene = seen.scenes[k];
+        MosaicScene& old = known.scenes[changed[k]];
+        // Differences of places, as both count from corners of their own.
+        const bool lies = scene.place.x - now.x == old.place.x - before.x &&
+                          scene.place.y - now.y == old.place.y - before.y &&
+                          scene.place.width == old.place.width &&
+                          scene.place.height == old.place.height;
+        if (!lies || scene.warped != old.warped ||
+            seen.drivers[scene.driver] != known.drivers[old.driver])
+            return std::nullopt;
+        scene.place = old.place;
+        scene.driver = old.driver;
+        old = std::move(scene);
+    }
+    return known;
+}
+
 }  // namespace zmcgdal

@@ -37,6 +37,13 @@ struct MosaicWishes {
 MosaicLayout SurveyMosaic(const std::string& name, std::vector<std::string> scenes,
                           const MosaicWishes& wishes);
 
+// The layout that a survey would find, of what was found before: opens the scenes whose files have
+// changed since, and the first one, and no other. Nothing where that does not do, and all are to be
+// surveyed: names are added or gone, the first scene has changed, or one that has changed has
+// another place. Throws what SurveyMosaic does.
+std::optional<MosaicLayout> RenewLayout(MosaicLayout known, const std::vector<std::string>& scenes,
+                                        const MosaicWishes& wishes);
+
 }  // namespace zmcgdal
 
 #endif

@@ -101,7 +101,7 @@ ExitStatus BuildCommand::Run() {
     for (const std::string& loss : pixels.Losses())
         Warn(words.source, "a pyramid does not keep " + loss);
     const zmchost::BuildReport report = BuildBy(*dataset, pixels, options);
-    if (keepRecords) KeepRecords(words, pixels, options);
+    if (keepRecords) KeepRecords(words, *dataset, pixels, options);
     if (json)
         PrintDocument(BuildDocument(words, report, props.pixelType, *dataset));
     else if (!quiet)

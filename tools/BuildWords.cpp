@@ -154,9 +154,10 @@ void BuildWords::CheckTarget() const {
     if (!overwrite) throw Failure(target, "the file exists already; --overwrite replaces it");
 }
 
-DatasetPtr BuildWords::OpenSource(bool showsBar) const {
+DatasetPtr BuildWords::OpenSource(bool showsBar, std::string_view known) const {
     auto scenes = SceneNames(source);
-    if (scenes && scenes->size() > 1) return SurveyScenes(*this, std::move(*scenes), showsBar);
+    if (scenes && scenes->size() > 1)
+        return SurveyScenes(*this, std::move(*scenes), showsBar, known);
     DatasetPtr dataset = OpenDataset(scenes ? scenes->front() : source);
     CheckComplete(*dataset, source);
     return dataset;

@@ -4,6 +4,7 @@
 #define ZMC_TOOLS_BUILDWORDS_H
 
 #include <string>
+#include <string_view>
 
 #include "host/build/PyramidBuilder.h"
 #include "tools/GdalWorld.h"
@@ -39,8 +40,9 @@ struct BuildWords {
     // Throws Failure for a target that cannot be made or is not to be replaced.
     void CheckTarget() const;
     // Throws Failure too for a source that is incomplete. One of many rasters is surveyed, with a
-    // bar where that is wanted; Interruption then.
-    DatasetPtr OpenSource(bool showsBar = false) const;
+    // bar where that is wanted; Interruption then. What `known` has of it (KnownScenes) is taken
+    // from there.
+    DatasetPtr OpenSource(bool showsBar = false, std::string_view known = {}) const;
 };
 
 // Lets `visit(name, word)` have the words that are options, by their names in plans and records.
@@ -54,10 +56,6 @@ void VisitOptions(Words& words, const Visit& visit) {
     visit("bands", words.bands);
     visit("bins", words.bins);
     visit("memory", words.memory);
-    visit("overlap", words.overlap);
-    visit("sceneResampling", words.sceneResampling);
-    visit("resolution", words.resolution);
-    visit("skipBroken", words.skipBroken);
     visit("overlap", words.overlap);
     visit("sceneResampling", words.sceneResampling);
     visit("resolution", words.resolution);

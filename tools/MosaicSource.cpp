@@ -67,13 +67,17 @@ const zmcgdal::MosaicLayout* LayoutOf(const GDALDataset& source) {
 
 }  // namespace
 
-DatasetPtr SurveyScenes(const BuildWords& words, std::vector<std::string> scenes, bool showsBar) {
+DatasetPtr SurveyScenes(const BuildWords& words, std::vector<std::string> scenes, bool showsBar,
+                        std::string_view known) {
     zmcgdal::MosaicWishes wishes = WishesOf(words);
     TerminalProgress bar(words.source, showsBar);
     wishes.progress = [&](double share) { return bar.ShowShare(share); };
     TakeGdalError(words.source);
     SetSubject(words.source);
     try {
+        if (auto before = zmcgdal::MosaicLayout::Unpack(known))
+            if (auto renewed = zmcgdal::RenewLayout(std::move(*before), scenes, wishes))
+                return OpenMosaic(words.source, std::move(*renewed));
         zmcgdal::MosaicLayout layout =
             zmcgdal::SurveyMosaic(words.source, std::move(scenes), wishes);
         if (FillsWithZeros(layout) && layout.HasGaps())
@@ -84,6 +88,11 @@ DatasetPtr SurveyScenes(const BuildWords& words, std::vector<std::string> scenes
     } catch (const zmchost::Cancelled&) {
         throw Interruption(words.target);
     }
+}
+
+std::string KnownScenes(const GDALDataset& source) {
+    const zmcgdal::MosaicLayout* const layout = LayoutOf(source);
+    return layout ? layout->Pack() : std::string();
 }
 
 DatasetPtr OpenMosaic(const std::string& name, zmcgdal::MosaicLayout layout) {

@@ -3,6 +3,7 @@
 #define ZMC_TOOLS_MOSAICSOURCE_H
 
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "gdal/MosaicLayout.h"
@@ -11,8 +12,13 @@
 
 namespace zmctools {
 
-// Looks at all scenes and opens them as one. Throws what SurveyMosaic does, and Interruption.
-DatasetPtr SurveyScenes(const BuildWords& words, std::vector<std::string> scenes, bool showsBar);
+// Looks at all scenes, or of those that `known` has as they are now at none, and opens them as one.
+// Throws what SurveyMosaic does, and Interruption.
+DatasetPtr SurveyScenes(const BuildWords& words, std::vector<std::string> scenes, bool showsBar,
+                        std::string_view known);
+
+// What was learnt of the scenes of a source, as bytes; empty for other sources.
+std::string KnownScenes(const GDALDataset& source);
 
 // The same of what was surveyed before.
 DatasetPtr OpenMosaic(const std::string& name, zmcgdal::MosaicLayout layout);

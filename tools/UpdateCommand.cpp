@@ -1,5 +1,6 @@
 #include <cstdio>
 #include <filesystem>
+#include <utility>
 
 #include "describe/JsonNumbers.h"
 #include "gdal/Mosaic.h"
@@ -39,7 +40,7 @@ private:
     bool keepRecords = false;
 
     void CheckTarget() const;
-    void TakeRecordedWords();
+    std::string TakeRecordedWords();
     void CheckSource(GDALDataset& dataset) const;
     zmchost::UpdateReport Update(GDALDataset& dataset, zmcgdal::GdalRasterSource& pixels,
                                  const std::vector<zmchost::Window>& windows,
@@ -99,8 +100,9 @@ void CheckUnchanged(GDALDataset& dataset, const std::string& source, const std::
     if (SourceState(dataset) != state) throw Failure(source, "it changed while it was read");
 }
 
-// Words that are given must not be silently others than those of the build.
-void UpdateCommand::TakeRecordedWords() {
+// Words that are given must not be silently others than those of the build. What was known of its
+// scenes then.
+std::string UpdateCommand::TakeRecordedWords() {
     const BuildWords usual;
     VisitOptions(usual, [&](const std::string& key, const auto& value) {
         bool given = false;
@@ -117,7 +119,9 @@ void UpdateCommand::TakeRecordedWords() {
     if (!records)
         throw Failure(words.target,
                       "it has no records; name SOURCE and the options that it was built with");
-    words = WordsOfNote(words.target, records->Note());
+    Noted noted = ReadNote(words.target, records->Note());
+    words = std::move(noted.words);
+    return std::move(noted.scenes);
 }
 
 void UpdateCommand::CheckSource(GDALDataset& dataset) const {
@@ -192,12 +196,13 @@ ExitStatus UpdateCommand::Run() {
     zmchost::UpdateRecords records;
     records.use = words.source.empty();
     records.keep = records.use || keepRecords;
-    if (records.use) TakeRecordedWords();
-    const DatasetPtr dataset = words.OpenSource(!quiet);
+    std::string scenes;
+    if (records.use) scenes = TakeRecordedWords();
+    const DatasetPtr dataset = words.OpenSource(!quiet, scenes);
     zmcgdal::GdalRasterSource pixels(*dataset);
     CheckSource(*dataset);
     const std::vector<zmchost::Window> windows = ChangedWindows(changed, *dataset, words.source);
-    if (records.keep) records.note = NoteOf(words);
+    if (records.keep) records.note = NoteOf(words, *dataset);
     CheckInterrupt(words.target);
     Report(Update(*dataset, pixels, windows, records), windows);
     return ExitStatus::Done;

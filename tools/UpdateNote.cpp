@@ -1,5 +1,7 @@
 #include "tools/UpdateNote.h"
 
+#include <algorithm>
+#include <cstddef>
 #include <nlohmann/json.hpp>
 #include <utility>
 
@@ -9,6 +11,7 @@
 #include "platform/Interrupts.h"
 #include "tools/Interrupt.h"
 #include "tools/Message.h"
+#include "tools/MosaicSource.h"
 #include "tools/SceneNames.h"
 
 namespace zmctools {
@@ -18,30 +21,39 @@ using Json = nlohmann::ordered_json;
 
 constexpr const char* kVersionKey = "zmcrasterRecords";
 constexpr int kNoteVersion = 1;
+constexpr char kBehindWords = '\n';  // which no word of the document has as it stands
+constexpr std::size_t kMostSceneBytes = std::size_t{128} << 20;
 
 }  // namespace
 
-std::string NoteOf(const BuildWords& words) {
+std::string NoteOf(const BuildWords& words, const GDALDataset& source) {
     Json options = Json::object();
     VisitOptions(words, [&](const char* key, const auto& value) { options[key] = value; });
+    std::string scenes = KnownScenes(source);
+    // Without them the next update looks at all.
+    if (scenes.size() > kMostSceneBytes) scenes.clear();
     try {
         return Json{{kVersionKey, kNoteVersion},
                     {"source", FromAnywhere(words.source)},
                     {"options", options}}
-            .dump();
+                   .dump() +
+               kBehindWords + scenes;
     } catch (const Json::exception&) {
         throw Failure(words.target, "records keep no name that is not UTF-8");
     }
 }
 
-BuildWords WordsOfNote(const std::string& target, const std::string& note) {
+Noted ReadNote(const std::string& target, const std::string& note) {
     constexpr std::size_t kMostBytes = 1 << 20;
     const char* const strange = "its records do not tell what it was built from";
-    if (note.size() > kMostBytes) throw Failure(target, strange);
+    const std::size_t size = std::min(note.find(kBehindWords), note.size());
+    if (size > kMostBytes) throw Failure(target, strange);
     try {
-        const Json document = Json::parse(note);
+        const Json document = Json::parse(note.begin(), note.begin() + std::ptrdiff_t(size));
         if (document.at(kVersionKey) != kNoteVersion) throw Failure(target, strange);
-        BuildWords words;
+        Noted noted;
+        noted.scenes = note.substr(std::min(size + 1, note.size()));
+        BuildWords& words = noted.words;
         words.target = target;
         words.source = document.at("source");
         VisitOptions(words, [&](const char* key, auto& value) {
@@ -49,18 +61,18 @@ BuildWords WordsOfNote(const std::string& target, const std::string& note) {
         });
         if (zelm::files::LooksLent(words.source))
             throw Failure(target, "names of lent sources are not taken here");
-        return words;
+        return noted;
     } catch (const Json::exception&) {
         throw Failure(target, strange);
     }
 }
 
-void KeepRecords(const BuildWords& words, zmcgdal::GdalRasterSource& pixels,
-                 zmchost::BuildOptions options) {
+void KeepRecords(const BuildWords& words, const GDALDataset& source,
+                 zmcgdal::GdalRasterSource& pixels, zmchost::BuildOptions options) {
     options.progress = [](const zmchost::BuildProgress&) { return !platform::IsInterrupted(); };
     try {
         zmchost::PyramidUpdate(zmcgdal::SharedModule(), pixels, words.target, std::move(options))
-            .KeepRecords(NoteOf(words));
+            .KeepRecords(NoteOf(words, source));
     } catch (const zmchost::Cancelled&) {
         throw Interruption(words.target);
     }

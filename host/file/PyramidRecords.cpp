@@ -20,7 +20,7 @@ using zelm::files::OpenMode;
 constexpr std::string_view kRecordsMagic = "ZMCRECS1";
 constexpr std::uint64_t kRecordsHead = 24;
 constexpr std::uint64_t kRecordsTail = 16;
-constexpr std::uint64_t kMaxRecordsIndex = std::uint64_t{16} << 20;
+constexpr std::uint64_t kMaxRecordsIndex = std::uint64_t{256} << 20;
 constexpr std::uint64_t kMaxRecordsPiece = std::uint64_t{256} << 20;
 constexpr const char* kUseRecords = "use the records of its statistics";
 constexpr const char* kKeepRecords = "keep records of its statistics";

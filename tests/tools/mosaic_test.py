@@ -490,3 +490,72 @@ class Many(MosaicTest):
                     os.remove(self.path(f"in/{row:03d}-{column:03d}.tif"))
         self.good("part", PLAN, "0", "-q")
         self.assertEqual(self.status()["done"], 1)
+
+
+class Updates(MosaicTest):
+    """With records an update knows the scenes, and opens those that changed and those that it reads."""
+
+    def setUp(self):
+        super().setUp()
+        self.tiles(6, 6, 400, 400)
+        self.good("build", "in/*.tif", "made.pyr", "--keep-records")
+
+    def change(self, row, column, x=None, y=None):
+        x, y = column * 400 if x is None else x, row * 400 if y is None else y
+        os.remove(self.path(f"in/{row:03d}-{column:03d}.tif"))
+        self.scene(f"in/{row:03d}-{column:03d}.tif", x, y, self.noise(400, 400))
+
+    def expect_full(self):
+        self.good("build", "in/*.tif", "full.pyr", "--overwrite")
+        for end in ("", ".aux.xml"):
+            with open(self.path("made.pyr" + end), "rb") as made, open(self.path("full.pyr" + end), "rb") as full:
+                self.assertTrue(made.read() == full.read(), end)
+
+    def expect_refusal(self, words, *arguments):
+        done = self.run_tool("update", "made.pyr", *arguments)
+        self.assertEqual((done.returncode, done.stdout, done.stderr.count("\n")), (1, "", 1), done)
+        self.assertIn(words, done.stderr)
+
+    def test_scenes_far_from_what_changed_are_not_opened(self):
+        far = self.path("in/005-005.tif")
+        with open(far, "rb") as file:
+            kept = file.read()
+        times = os.stat(far)
+
+        def put(content):
+            with open(far, "wb") as file:
+                file.write(content)
+            os.utime(far, ns=(times.st_atime_ns, times.st_mtime_ns))
+        put(b"\0" * len(kept))
+        for row, column in ((1, 2), (2, 1)):
+            self.change(row, column)
+            self.good("update", "made.pyr", "--changed", f"in/{row:03d}-{column:03d}.tif")
+        # Without what the records know of it all are surveyed.
+        self.expect_refusal("005-005.tif: ", "in/*.tif", "--changed", "0,0,1,1")
+        put(kept)
+        self.expect_full()
+
+    def test_scenes_that_moved_came_or_are_the_first_are_surveyed_anew(self):
+        whole = "0,0,2400,2400"
+        self.change(3, 3, 1100, 1250)
+        self.good("update", "made.pyr", "--changed", whole)
+        self.expect_full()
+        self.scene("in/more.tif", 700, 300, self.noise(200, 900))
+        self.good("update", "made.pyr", "--changed", "in/more.tif")
+        self.expect_full()
+        self.change(0, 0)
+        self.good("update", "made.pyr", "--changed", "in/000-000.tif")
+        self.expect_full()
+        os.remove(self.path("in/more.tif"))
+        self.good("update", "made.pyr", "--changed", whole)
+        self.expect_full()
+
+    def test_scene_that_is_another_raster_now_is_refused(self):
+        os.remove(self.path("in/002-002.tif"))
+        self.scene("in/002-002.tif", 800, 800, self.noise(400, 400, 2))
+        self.expect_refusal("002-002.tif: cannot take it into the mosaic: it has 2 bands", "--changed", "800,800,9,9")
+
+    def test_scene_that_changed_without_a_word_is_read_as_it_is(self):
+        self.change(4, 4)
+        self.good("update", "made.pyr", "--changed", "1600,1600,400,400")
+        self.expect_full()
