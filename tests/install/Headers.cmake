@@ -38,8 +38,8 @@ if(NOT foreign STREQUAL "#include <oneapi/tbb/mutex.h>")
 endif()
 
 execute_process(COMMAND sh -c
-    "ls ${work}/sources/*.cpp | xargs -P 2 -n 4 \"$@\"" sh
-    ${ZMC_CXX} -std=c++20 -fsigned-char -fsyntax-only -Wall -Wextra -Werror -I${work}/own
+    "ls ${work}/sources/*.cpp | xargs -P 2 -I SOURCE \"$@\" -c SOURCE -o SOURCE.o" sh
+    ${ZMC_LAUNCHER} ${ZMC_CXX} -std=c++20 -fsigned-char -Wall -Wextra -Werror -I${work}/own
     -I${ZMC_PREFIX}/include
     RESULT_VARIABLE result ERROR_VARIABLE errors)
 if(NOT result EQUAL 0)

@@ -520,7 +520,7 @@ class ClosedStreams(ToolTest):
             file.write(data)
         before = self.content()
         expected = Pyramid(self.path("picture.pyr")).read(0)
-        for closed in ((0,), (1,), (2,), (0, 1), (0, 2), (1, 2), (0, 1, 2)):
+        for closed in ((0,), (1,), (2,), (0, 1, 2)):
             for words in (["info", "picture.pyr"], ["info", "damaged.pyr"], ["hash", "picture.pyr"],
                           ["hash", "picture.tif"], ["verify", "damaged.pyr"],
                           ["verify", "picture.pyr", "--against", "picture.tif"],
@@ -651,7 +651,7 @@ class Endings(ToolTest):
         self.assertGreater(n, 30)
 
     def test_with_other_sidecars(self):
-        self.every_ending((10, 3, None), (20, 4, None))
+        self.every_ending((10, 3, None), (20, 4, None), step=2)
 
     def test_with_a_mask_before_and_after(self):
         self.every_ending((10, None, 0), (20, None, 255), step=3)

@@ -29,7 +29,7 @@ export class Bench {
     ] as const)
       this.site.files.set(name, { bytes: Uint8Array.from(readFileSync(`viewer/dist/${name}`)), type });
     this.base = await this.site.start();
-    const executablePath = process.env["CHROMIUM"] ?? "/usr/bin/chromium";
+    const executablePath = process.env["CHROMIUM"] ?? "/usr/bin/chromium-headless-shell";
     this.browser = await chromium.launch({ executablePath, headless: true, args: ARGUMENTS });
   }
 
