@@ -28,6 +28,7 @@ private:
     std::string threads;
     std::string processes = "0";
     bool keepRecords = false;
+    bool noFlush = false;
 
     zmchost::BuildReport Build(GDALDataset& dataset, zmcgdal::GdalRasterSource& pixels,
                                zmchost::BuildOptions options) const;
@@ -46,6 +47,9 @@ void BuildCommand::Describe(OptionTable& table) {
         .Text("--processes", processes,
               "Processes to work with, which share the memory; 0: this one alone (default 0)")
         .Named("N");
+    table.Flag("--no-flush", noFlush,
+               "Do not wait for the disk; a system that stops soon after may leave TARGET without "
+               "pixels");
     table.Flag("--keep-records", keepRecords,
                "Leave TARGET.zmcrecords, by which update renews statistics without looking at all "
                "pixels");
@@ -83,6 +87,7 @@ zmchost::BuildReport BuildCommand::BuildBy(GDALDataset& dataset, zmcgdal::GdalRa
     const auto count = static_cast<std::uint32_t>(ParseCount("--processes", processes, 256));
     if (!threads.empty())
         options.threads = static_cast<std::uint32_t>(ParseCount("--threads", threads, 1024));
+    options.flush = !noFlush;
     try {
         if (count == 0) return Build(dataset, pixels, options);
         return BuildInProcesses(words, dataset, pixels, options, count, !quiet);

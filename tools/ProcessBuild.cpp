@@ -69,6 +69,7 @@ zmchost::BuildReport BuildInProcesses(const BuildWords& words, GDALDataset& data
     const BuildWords shared = WithShare(words, options.memory, processes);
     const zelm::RasterProps props = pixels.Props();
     zmchost::BuildFile file(words.target, words.overwrite);
+    if (!options.flush) file.LeaveToSystem();
     const PassingPlan passing(MakePlan(shared, dataset, pixels, shared.Options(props), file,
                                        PartSizeFor(props, processes)),
                               file);

@@ -124,7 +124,7 @@ void BuildFile::Reserve(std::uint64_t size) const {
 }
 
 void BuildFile::Flush() const {
-    if (!platform::ReleaseReserve(path) || !platform::SyncFile(path))
+    if (!platform::ReleaseReserve(path) || (durable && !platform::SyncFile(path)))
         throw Error(given, "write it to the disk", platform::LastErrorText());
 }
 
@@ -141,7 +141,7 @@ void BuildFile::Commit() {
     platform::RemoveEntry(MetadataJournal::PathFor(target));
     platform::RemoveEntry(UpdateJournal::PathFor(target));
     platform::RemoveEntry(PyramidRecords::PathFor(target));
-    if (!platform::SyncFolder(platform::FolderOf(target)))
+    if (durable && !platform::SyncFolder(platform::FolderOf(target)))
         throw Error(given, "write its name to the disk", platform::LastErrorText());
 }
 

@@ -56,8 +56,12 @@ public:
     // Takes them, once the file has its beginning; the module would not tell that they ran out.
     void Reserve(std::uint64_t size) const;
 
+    // From now on nothing here waits for the disk: the system writes the file when it likes.
+    void LeaveToSystem() { durable = false; }
     // Lets the disk begin with what the file has; Flush waits for less then.
-    void BeginFlush() const { platform::BeginSync(path); }
+    void BeginFlush() const {
+        if (durable) platform::BeginSync(path);
+    }
     // Waits until the file is on the disk, giving back what was reserved and not used.
     void Flush() const;
     // Gives the file its name. A target that came into being meanwhile is refused as at the start.
@@ -72,6 +76,7 @@ private:
     std::string path;
     platform::FileLock lock;  // of the temporary file, so that nobody takes it for a left-over
     bool outline = false;
+    bool durable = true;
     bool kept = false;  // it does not go with this object
 };
 

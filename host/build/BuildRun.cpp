@@ -179,6 +179,7 @@ void BuildRun::Plan() {
 
 BuildReport BuildRun::Run() {
     BuildFile made(name, options.overwrite);
+    if (!options.flush) made.LeaveToSystem();
     LayOut(made);
     Finish();
     made.Commit();

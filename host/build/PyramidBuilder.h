@@ -68,6 +68,11 @@ struct BuildOptions {
                                 // most 1024, which more are taken for
     std::uint64_t memory = std::uint64_t{256} << 20;  // budget in bytes
     bool overwrite = false;
+    // Whether Build waits until the file is on the disk before it gives it its name. Without, a
+    // system that stops within the next minute or so may be left with the name and a file that
+    // lacks pixels or all of it, where an older file with that name may be gone too; what ends the
+    // process alone harms nothing.
+    bool flush = true;
     // Called now and then, one call at a time, on one of the build's threads; false cancels.
     std::function<bool(const BuildProgress&)> progress;
     // Called once, before beforeNaming, with the statistics that were stored, of all bands.

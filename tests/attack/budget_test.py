@@ -20,7 +20,7 @@ def many(count):
     return count // 10 if attack.SANITIZED else count
 
 
-GENERATED_FILES = 4 if attack.SANITIZED else 12
+GENERATED_FILES = 4 if attack.SANITIZED else 6
 
 
 def plain(**fields):

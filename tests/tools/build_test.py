@@ -297,3 +297,32 @@ class Beside(ToolTest):
         pixels = self.pyramid("first.pyr")
         self.good("build", "first.pyr", "second.pyr")
         np.testing.assert_array_equal(Pyramid(self.path("second.pyr")).read(0), pixels)
+
+
+class WithoutFlush(ToolTest):
+    SYNC = 16
+
+    def synced(self, *options):
+        """A build, and how many calls there were that wait for the disk."""
+        preload = os.environ.get("ZMC_FILE_FAULTS_LIBRARY")
+        if not preload:
+            self.skipTest("no library that counts calls")
+        done = self.run_tool("build", "picture.tif", "made.pyr", "--overwrite", "--quiet", *options,
+                             env={**os.environ, "LD_PRELOAD": preload, "ZMC_FILE_FAULTS_COUNT": self.path("calls"),
+                                  "ZMC_FILE_FAULTS": f"{self.SYNC} 0 0 0 0 {self.folder}"})
+        self.assertEqual((done.returncode, done.stderr), (0, ""))
+        with open(self.path("calls"), encoding="utf-8") as file:
+            calls = int(file.read().split()[0])
+        os.remove(self.path("calls"))
+        with open(self.path("made.pyr"), "rb") as file:
+            return calls, file.read()
+
+    def test_the_file_is_the_same_and_is_not_waited_for(self):
+        self.picture()
+        for options in ((), ("--processes", "2")):
+            with self.subTest(options):
+                calls, expected = self.synced(*options)
+                fewer, content = self.synced(*options, "--no-flush")
+                self.assertTrue(content == expected)
+                # Neither the file nor the name in its folder; what stands beside it still is.
+                self.assertEqual(fewer, calls - 2)
