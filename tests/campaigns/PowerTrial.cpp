@@ -20,7 +20,7 @@ namespace fs = std::filesystem;
 DiskEffort Effort() {
     using Count = std::size_t;
     if (IsFullCampaign()) return {WithSanitizers<Count>(8, 12), WithSanitizers<Count>(50, 500)};
-    return {WithSanitizers<Count>(3, 7), WithSanitizers<Count>(2, 8)};
+    return {WithSanitizers<Count>(3, 7), WithSanitizers<Count>(2, 16)};
 }
 
 // To find one complaint some states are enough.
@@ -69,6 +69,7 @@ void PowerTrial::Put(const DiskState& state) const {
 
 void PowerTrial::Record(const std::function<void()>& work) {
     KeepFiles();
+    std::fflush(stdout);
     const pid_t child = fork();
     if (child == 0) {
         int status = 1;
@@ -119,11 +120,13 @@ std::string PowerTrial::Try(const DiskModel& played, const DiskEffort& effort, c
 
 std::string PowerTrial::Try(const Judge& judge) { return Try(model, Effort(), judge); }
 
-std::size_t PowerTrial::NeededFlushes(const Judge& judge) {
+void PowerTrial::ReportNeededFlushes(const char* what, const Judge& judge) {
+    const std::vector<std::size_t> flushes = model.Flushes();
     std::size_t needed = 0;
-    for (const std::size_t place : model.Flushes())
+    for (const std::size_t place : flushes)
         if (!Try(model.Without({place}), kSearch, judge).empty()) ++needed;
-    return needed;
+    std::printf("campaign: %s: without any one of %zu of its %zu flushes a promise is broken\n",
+                what, needed, flushes.size());
 }
 
 bool PowerTrial::FailsWithoutFlushes(const Judge& judge) {

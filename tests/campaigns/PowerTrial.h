@@ -35,10 +35,10 @@ public:
     // Puts each state that the disk may be in into the folder and asks for it; the first complaint.
     std::string Try(const Judge& judge);
     const DiskFigures& Figures() const { return figures; }
-    // Of how many flushes of the recording there is a complaint if that one is left out; and
-    // whether there is one if all are.
-    std::size_t NeededFlushes(const Judge& judge);
+    // Whether there is a complaint if all flushes of the recording are left out.
     bool FailsWithoutFlushes(const Judge& judge);
+    // Prints for how many of them there is one if that one alone is left out. Takes its time.
+    void ReportNeededFlushes(const char* what, const Judge& judge);
 
     // Makes the folder hold that.
     void Put(const DiskState& state) const;

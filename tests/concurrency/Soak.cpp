@@ -65,6 +65,7 @@ public:
         options.overwrite = true;
         options.threads = 1 + dice.UpTo(1);
         options.memory = std::uint64_t{64} << 20;
+        options.statistics = dice.Once(2);
         if (!many && dice.Once(2)) options.ordering = zmchost::Ordering::Blocked;
         zmchost::PyramidBuilder(module).Build(*model, file, options);
         if (dice.Once(2)) Update(module).KeepRecords("");
@@ -93,14 +94,15 @@ public:
         if (++stores > 20) return Build(module);
         Raster raster = Raster::Open(module, file);
         raster.KeepCopies(dice.Once(2));
-        zelm::RasterBandStats<T> record;
-        record.flags = zelm::StatsFlag::Mean;
-        record.mean = dice.UpTo(1000);
-        raster.SetStatistics<T>({record});
-        zelm::Palette palette;
-        for (std::uint32_t i = 0; i <= dice.UpTo(50); ++i) palette.AddColor(zelm::Color());
-        raster.SetBandPalette(0, palette);
-        Expect(raster.HasStatistics(0) && raster.HasPalette(0), "what was stored is not there");
+        if (!raster.HasStatistics(0)) StoreStatistics(raster);
+        if (!raster.HasPalette(0)) StorePalette(raster);
+        zelm::RasterBandHistogram<T> histogram;
+        histogram.binCount = 1 + dice.UpTo(40);
+        for (std::uint32_t bin = 0; bin < histogram.binCount; ++bin)
+            histogram.counts.Append(std::uint64_t{dice.UpTo(1000)});
+        const std::size_t before = raster.Histograms<T>().size();
+        raster.SetHistograms<T>({histogram});
+        Expect(raster.Histograms<T>().size() == before + 1, "a histogram was not stored");
     }
 
     void UpdateWindow(const ModulePtr& module) {
@@ -133,6 +135,22 @@ public:
 private:
     zmchost::PyramidUpdate Update(const ModulePtr& module) {
         return {module, *model, file, options};
+    }
+    void StoreStatistics(Raster& raster) {
+        std::vector<zelm::RasterBandStats<T>> records(raster.Bands());
+        for (std::uint32_t band = 0; band < raster.Bands(); ++band) {
+            records[band].band = band;
+            records[band].flags = zelm::StatsFlag::Mean;
+            records[band].mean = dice.UpTo(1000);
+        }
+        raster.SetStatistics<T>(records);
+        Expect(raster.HasStatistics(0), "statistics were not stored");
+    }
+    void StorePalette(Raster& raster) {
+        zelm::Palette palette;
+        for (std::uint32_t i = 0; i <= dice.UpTo(50); ++i) palette.AddColor(zelm::Color());
+        raster.SetBandPalette(0, palette);
+        Expect(raster.HasPalette(0), "a palette was not stored");
     }
     static void Expect(bool holds, const char* complaint) {
         if (!holds) throw std::runtime_error(complaint);

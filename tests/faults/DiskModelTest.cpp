@@ -92,7 +92,7 @@ TEST(DiskModel, SectorsAndPagesAreTorn) {
                                    {256, 4096},
                                    {4096, 8448}})
         EXPECT_EQ(found.count(with(from, to)), 1u) << from << " to " << to;
-    EXPECT_GT(found.size(), 40u);
+    EXPECT_GT(found.size(), 30u);
 }
 
 TEST(DiskRecording, TellsWhatWasDone) {
@@ -123,9 +123,9 @@ TEST(DiskRecording, TellsWhatWasDone) {
 TEST(DiskRecording, ProgramsAreRecordedAndSeeAnotherRunOfTheSystem) {
     const ScratchDirectory folder, elsewhere;
     const std::string log = elsewhere / "log";
-    const ChildResult result =
-        RunChild({"/bin/cp", "/proc/sys/kernel/random/boot_id", folder / "copy"},
-                 DiskRecording::ForChild(folder.String(), log));
+    const ChildResult result = RunChild(
+        {"/bin/dd", "if=/proc/sys/kernel/random/boot_id", "of=" + (folder / "copy"), "status=none"},
+        DiskRecording::ForChild(folder.String(), log));
     ASSERT_EQ(result.status, 0) << result.err;
     const auto steps = DiskRecording::Read(log);
     ASSERT_FALSE(steps.empty());

@@ -22,7 +22,8 @@ void Apply(const DiskStep& step, std::size_t block, std::string& file, Keep&& ke
         if (!keep(number++)) continue;
         const std::uint64_t from = std::max(at, step.offset);
         const std::uint64_t to = std::min<std::uint64_t>(at + block, end);
-        std::copy_n(step.bytes.data() + (from - step.offset), to - from, file.data() + from);
+        if (from < to)
+            std::copy_n(step.bytes.data() + (from - step.offset), to - from, file.data() + from);
     }
 }
 

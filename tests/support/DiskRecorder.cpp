@@ -20,7 +20,7 @@ namespace zmctest {
 namespace {
 
 constexpr const char* kRunOfSystem = "/proc/sys/kernel/random/boot_id";
-constexpr const char* kOrderName = "ZMC_DISK_RECORDING";
+constexpr const char* kRecordingName = "ZMC_DISK_RECORDING";
 
 // Calls of the recorder's own are none of the process.
 thread_local bool ownCall = false;
@@ -177,7 +177,7 @@ void Begin(const std::string& folder, const std::string& log) {
 
 // Takes the order of the environment: the folder and, behind a line's end, the log.
 [[gnu::constructor]] void TakeRecordingOrder() {
-    const char* const order = std::getenv(kOrderName);
+    const char* const order = std::getenv(kRecordingName);
     const char* const end = order ? std::strchr(order, '\n') : nullptr;
     if (end) Begin(std::string(order, end), end + 1);
 }
@@ -196,7 +196,7 @@ std::vector<std::string> DiskRecording::ForChild(const std::string& folder,
     Dl_info self{};
     dladdr(reinterpret_cast<const void*>(&Begin), &self);
     return {"LD_PRELOAD=" + std::string(self.dli_fname ? self.dli_fname : ""),
-            std::string(kOrderName) + '=' + folder + '\n' + log};
+            std::string(kRecordingName) + '=' + folder + '\n' + log};
 }
 
 std::vector<DiskStep> DiskRecording::Read(const std::string& log) {
