@@ -42,9 +42,9 @@ public:
     Walk(const DiskEffort& howMuch, const std::function<bool(const DiskState&)>& visitor)
         : effort(howMuch), visit(visitor) {}
 
-    DiskFigures Run(const std::vector<DiskStep>& steps, std::size_t beginning) {
-        for (std::size_t i = 0; i < steps.size() && goesOn; ++i) {
-            const DiskStep& step = steps[i];
+    DiskFigures Run(const std::vector<DiskStep>& recorded, std::size_t beginning) {
+        for (std::size_t i = 0; i < recorded.size() && goesOn; ++i) {
+            const DiskStep& step = recorded[i];
             if (i >= beginning) Count(step);
             if (step.IsFlush() && i >= beginning) Look(false);
             Take(step);
