@@ -2,13 +2,10 @@
 // of it stays behind, neither descriptors nor mappings nor memory.
 #include <dlfcn.h>
 #include <gtest/gtest.h>
-#include <malloc.h>
 #include <unistd.h>
 
-#include <algorithm>
 #include <cstdio>
 #include <cstdlib>
-#include <filesystem>
 #include <functional>
 #include <optional>
 
@@ -17,6 +14,7 @@
 #include "tests/support/CampaignLength.h"
 #include "tests/support/ChildProcess.h"
 #include "tests/support/CountingGeoRef.h"
+#include "tests/support/Holdings.h"
 #include "tests/support/MemoryRaster.h"
 #include "tests/support/Sanitizers.h"
 #include "tests/support/ScratchDirectory.h"
@@ -42,29 +40,6 @@ int Rounds() { return IsSanitized() ? CampaignLength(30, 300) : CampaignLength(2
 
 bool IsModuleMapped() {
     return zmctest::ReadText("/proc/self/maps").find("libzmcraster.so") != std::string::npos;
-}
-
-// What the process holds: descriptors, mappings, bytes on the heap.
-struct Holdings {
-    std::ptrdiff_t descriptors, mappings, heap;
-};
-
-std::ptrdiff_t HeapBytes() {
-    // The sanitizers keep a heap of their own, and count it.
-    using Count = std::size_t (*)();
-    static const auto count =
-        reinterpret_cast<Count>(dlsym(RTLD_DEFAULT, "__sanitizer_get_current_allocated_bytes"));
-    return static_cast<std::ptrdiff_t>(count ? count() : mallinfo2().uordblks);
-}
-
-Holdings HeldNow() {
-    Holdings held{};
-    for ([[maybe_unused]] const auto& entry : std::filesystem::directory_iterator("/proc/self/fd"))
-        ++held.descriptors;
-    const std::string maps = zmctest::ReadText("/proc/self/maps");
-    held.mappings = std::count(maps.begin(), maps.end(), '\n');
-    held.heap = HeapBytes();
-    return held;
 }
 
 // The module as a host has it that takes its two functions itself.

@@ -78,7 +78,7 @@ protected:
         EXPECT_EQ(PyramidRecords::Find(target) != nullptr, records);
     }
 
-    const ScratchDirectory folder;
+    const ScratchDirectory folder{zmctest::MemoryFolder()};
     const PyramidBuilder builder{TestModule()};
     std::mt19937 random{11};
 };

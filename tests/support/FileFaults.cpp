@@ -21,6 +21,8 @@
 #include <cstdlib>
 #include <cstring>
 
+#include "tests/support/DiskRecorder.h"
+
 namespace zmctest {
 namespace {
 
@@ -96,10 +98,28 @@ bool CallFails(FileCall kind, Place place) {
     return true;
 }
 
+// What has changed, or reached the disk, by a call that did not fail.
+void Note(FileCall kind) {
+    if ((kind & (kChangingCall | kOpenCall | kCloseCall)) != 0) recorder::Changed();
+}
+int Noted(FileCall kind, int result, const char*) {
+    if (result >= 0) Note(kind);
+    return result;
+}
+int Noted(FileCall kind, int result, int descriptor) {
+    if (result >= 0 && kind == kSyncCall) recorder::Flushed(descriptor);
+    if (result >= 0) Note(kind);
+    return result;
+}
+
 // A transfer of `size` bytes by `move(size)`.
 template <class Move>
 ssize_t Transfer(FileCall kind, int descriptor, std::size_t size, Move move) {
-    if (!ShallFail(kind, descriptor)) return move(size);
+    if (!ShallFail(kind, descriptor)) {
+        const ssize_t moved = move(size);
+        if (moved > 0) Note(kind);
+        return moved;
+    }
     const std::size_t half = size > 1 ? size / 2 : size;
     switch (orders.action) {
         case FileFaultAction::Short:
@@ -189,20 +209,22 @@ std::vector<std::string> FileFaults::ForChild(const FileFault& fault,
 using zmctest::CallFails;
 using zmctest::FileCall;
 using zmctest::Next;
+using zmctest::Noted;
 using zmctest::Transfer;
 
 // The C library has most functions under several names: with and without 64, and fortified.
 #define ZMC_EXPORT extern "C" __attribute__((visibility("default")))
 
-#define ZMC_OPEN(name)                                                                  \
-    ZMC_EXPORT int name(const char* path, int flags, ...) {                             \
-        va_list rest;                                                                   \
-        va_start(rest, flags);                                                          \
-        const mode_t mode = (flags & (O_CREAT | O_TMPFILE)) ? va_arg(rest, mode_t) : 0; \
-        va_end(rest);                                                                   \
-        if (CallFails(zmctest::kOpenCall, path)) return -1;                             \
-        static const auto next = Next<int (*)(const char*, int, ...)>(#name);           \
-        return next(path, flags, mode);                                                 \
+#define ZMC_OPEN(name)                                                                       \
+    ZMC_EXPORT int name(const char* path, int flags, ...) {                                  \
+        va_list rest;                                                                        \
+        va_start(rest, flags);                                                               \
+        const mode_t mode = (flags & (O_CREAT | O_TMPFILE)) ? va_arg(rest, mode_t) : 0;      \
+        va_end(rest);                                                                        \
+        if (CallFails(zmctest::kOpenCall, path)) return -1;                                  \
+        static const auto next = Next<int (*)(const char*, int, ...)>(#name);                \
+        return Noted(zmctest::kOpenCall, next(zmctest::recorder::Opened(path), flags, mode), \
+                     path);                                                                  \
     }
 ZMC_OPEN(open)
 ZMC_OPEN(open64)
@@ -215,16 +237,16 @@ ZMC_OPEN(open64)
         va_end(rest);                                                                   \
         if (CallFails(zmctest::kOpenCall, path)) return -1;                             \
         static const auto next = Next<int (*)(int, const char*, int, ...)>(#name);      \
-        return next(folder, path, flags, mode);                                         \
+        return Noted(zmctest::kOpenCall, next(folder, path, flags, mode), path);        \
     }
 ZMC_OPEN_AT(openat)
 ZMC_OPEN_AT(openat64)
 
-#define ZMC_FORTIFIED_OPEN(name)                                         \
-    ZMC_EXPORT int name(const char* path, int flags) {                   \
-        if (CallFails(zmctest::kOpenCall, path)) return -1;              \
-        static const auto next = Next<int (*)(const char*, int)>(#name); \
-        return next(path, flags);                                        \
+#define ZMC_FORTIFIED_OPEN(name)                                                              \
+    ZMC_EXPORT int name(const char* path, int flags) {                                        \
+        if (CallFails(zmctest::kOpenCall, path)) return -1;                                   \
+        static const auto next = Next<int (*)(const char*, int)>(#name);                      \
+        return Noted(zmctest::kOpenCall, next(zmctest::recorder::Opened(path), flags), path); \
     }
 ZMC_FORTIFIED_OPEN(__open_2)
 ZMC_FORTIFIED_OPEN(__open64_2)
@@ -233,7 +255,9 @@ ZMC_FORTIFIED_OPEN(__open64_2)
     ZMC_EXPORT std::FILE* name(const char* path, const char* mode) {                    \
         if (CallFails(zmctest::kOpenCall, path)) return nullptr;                        \
         static const auto next = Next<std::FILE* (*)(const char*, const char*)>(#name); \
-        return next(path, mode);                                                        \
+        std::FILE* const stream = next(path, mode);                                     \
+        if (stream) zmctest::Note(zmctest::kOpenCall);                                  \
+        return stream;                                                                  \
     }
 ZMC_FOPEN(fopen)
 ZMC_FOPEN(fopen64)
@@ -300,7 +324,7 @@ ZMC_PWRITE(pwrite64)
     ZMC_EXPORT int name parameters promise {                        \
         if (CallFails(zmctest::kind, place)) return -1;             \
         static const auto next = Next<int(*) parameters>(#name);    \
-        return next arguments;                                      \
+        return Noted(zmctest::kind, next arguments, place);         \
     }
 ZMC_CALL(kResizeCall, ftruncate, file, (int file, off_t size), (file, size), noexcept)
 ZMC_CALL(kResizeCall, ftruncate64, file, (int file, off64_t size), (file, size), noexcept)
@@ -328,7 +352,7 @@ ZMC_EXPORT int close(int file) {
     static const auto next = Next<int (*)(int)>("close");
     const bool fails = CallFails(zmctest::kCloseCall, file);
     const int error = errno;
-    const int result = next(file);
+    const int result = Noted(zmctest::kCloseCall, next(file), file);
     if (!fails) return result;
     errno = error;
     return -1;
@@ -339,6 +363,7 @@ ZMC_EXPORT int fclose(std::FILE* stream) {
     const bool fails = CallFails(zmctest::kCloseCall, fileno(stream));
     const int error = errno;
     const int result = next(stream);
+    if (result == 0) zmctest::Note(zmctest::kCloseCall);
     if (!fails) return result;
     errno = error;
     return EOF;
