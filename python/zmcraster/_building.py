@@ -284,7 +284,7 @@ def build(source: Any, target: Path, *, levels: Union[None, int, str] = "auto", 
     elif _is_rasterio(source):
         named = _named(source)
     if named is not None:
-        if told._replace(nodata=None) != _Facts(metadata={}):
+        if descriptions or metadata or any(each is not None for each in (crs, transform, alpha, palette)):
             raise ArgumentError("what the bands stand for is told of arrays alone")
         return BuildReport(name, **named.build(words, progress))
     if _is_rasterio(source):
