@@ -127,7 +127,9 @@ std::unique_ptr<OpenRaster> OpenRaster::Create(const std::string& name, const Ne
     CPLStringList options;
     for (const std::string& option : raster.options) options.AddString(option.c_str());
     if (flagged) options.AddString("PIXELTYPE=SIGNEDBYTE");
-    std::unique_ptr<OpenRaster> made(new OpenRaster(name, {.update = true}));
+    Manner manner;
+    manner.update = true;
+    std::unique_ptr<OpenRaster> made(new OpenRaster(name, manner));
     GDALDataset* const created = zmcgdal::CreateNew(
         name.c_str(), static_cast<int>(raster.width), static_cast<int>(raster.height),
         static_cast<int>(raster.bands), type, options.List());
