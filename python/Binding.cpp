@@ -182,7 +182,8 @@ FilePtr OpenObject(const py::object& object, const std::string& name, std::uint3
 std::uint32_t CheckedPixelType(const py::dtype& type) {
     const std::uint32_t pixelType = PixelTypeOf(type);
     if (pixelType == 0)
-        throw BadArgument("no pyramid holds samples of type " + std::string(py::str(py::handle(type))));
+        throw BadArgument("no pyramid holds samples of type " +
+                          std::string(py::str(py::handle(type))));
     return pixelType;
 }
 

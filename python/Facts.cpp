@@ -12,9 +12,8 @@ namespace {
 std::string WktOf(GDALDataset& dataset) {
     const OGRSpatialReference* const reference = dataset.GetSpatialRef();
     if (!reference) return "";
-    const char* const options[] = {"FORMAT=WKT2_2019", nullptr};
     char* text = nullptr;
-    reference->exportToWkt(&text, options);
+    reference->exportToWkt(&text);
     const std::unique_ptr<char, decltype(&CPLFree)> owned(text, &CPLFree);
     return text ? text : "";
 }

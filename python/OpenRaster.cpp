@@ -6,9 +6,11 @@
 #include <numeric>
 #include <utility>
 
+#include "core/ElementTypes.h"
 #include "core/PixelVocabulary.h"
 #include "gdal/Create.h"
 #include "gdal/Driver.h"
+#include "gdal/ErrorCatcher.h"
 #include "gdal/Fetcher.h"
 #include "host/base/Error.h"
 #include "host/base/Xerces.h"
@@ -60,6 +62,15 @@ std::pair<GDALDataType, bool> TypeToCreate(std::uint32_t pixelType) {
     return {flagged ? GDT_Byte : type, flagged};
 }
 
+// Complex samples have no statistics.
+bool HasOrder(const std::string& name) {
+    bool hasOrder = false;
+    zelm::VisitElementType(
+        zmchost::PyramidHeader::Read(name).pixelType,
+        [&]<class T>(std::type_identity<T>) { hasOrder = !zelm::kIsComplex<T>; });
+    return hasOrder;
+}
+
 GDALRasterIOExtraArg UsualWay() {
     GDALRasterIOExtraArg extra;
     INIT_RASTERIO_EXTRA_ARG(extra);
@@ -85,8 +96,9 @@ std::unique_ptr<OpenRaster> OpenRaster::Open(const std::string& given, const Man
     zmcgdal::OpenOptions options;
     options.threads = manner.threads;
     options.missingAsZeros = manner.missingAsZeros;
-    options.statistics = manner.renews;
+    if (manner.update) options.statistics = manner.renews && HasOrder(name);
     options.shared = !manner.update;
+    options.keepsTiles = manner.update;
     std::unique_ptr<OpenRaster> raster(new OpenRaster(given, manner));
     const GDALAccess access = manner.update ? GA_Update : GA_ReadOnly;
     raster->Show(std::make_shared<zmcgdal::OpenFile>(name, access, options), name, false);
@@ -101,6 +113,7 @@ std::unique_ptr<OpenRaster> OpenRaster::Open(std::shared_ptr<zelm::files::ByteSo
     options.threads = manner.threads;
     options.missingAsZeros = manner.missingAsZeros;
     options.shared = true;
+    options.keepsTiles = false;
     std::unique_ptr<OpenRaster> raster(new OpenRaster(name, manner));
     raster->Show(std::make_shared<zmcgdal::OpenFile>(name, std::move(source), options), kNameless,
                  true);
@@ -324,8 +337,13 @@ void OpenRaster::Renew() {
 void OpenRaster::Close(bool keep) {
     const std::lock_guard lock(mutex);
     if (!dataset || !manner.update) return;
+    if (created && !keep) {
+        // That there will be no target is what was asked for.
+        const zmcgdal::ErrorCatcher quiet(CE_Failure);
+        dataset->UnderCreation()->MarkLost(0, 0);
+        return dataset.reset();
+    }
     try {
-        if (created && !keep) dataset->UnderCreation()->MarkLost(0, 0);
         if (!created && written && manner.renews) Renew();
     } catch (...) {
         dataset.reset();

@@ -93,6 +93,9 @@ class _Array:
         if np.ma.isMaskedArray(planes):
             if nodata is None and np.ma.is_masked(planes):
                 self.nodata = exact(planes.fill_value.item(), planes.dtype)
+                if planes.dtype.kind in "iu" and not (
+                        np.iinfo(planes.dtype).min <= self.nodata <= np.iinfo(planes.dtype).max):
+                    raise ArgumentError(f"masked samples need a no-data value: no sample can be {self.nodata}")
             self._fill = 0 if self.nodata is None else self.nodata
         self.planes = planes
         self.bands, self.height, self.width = planes.shape

@@ -37,6 +37,9 @@ class _Pixels(BackendArray):
         self.dtype = raster.dtype
 
     def __getitem__(self, key: indexing.ExplicitIndexer) -> np.ndarray:
+        # xarray takes slices with a step backwards apart, and some versions lose pixels of them.
+        if isinstance(key, indexing.BasicIndexer):
+            return self._read(key.tuple)
         return indexing.explicit_indexing_adapter(key, self.shape, indexing.IndexingSupport.BASIC, self._read)
 
     def _read(self, key: Tuple[Union[int, slice], ...]) -> np.ndarray:

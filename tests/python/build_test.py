@@ -91,9 +91,12 @@ def test_masked_arrays(folder):
         back = raster.read(1, masked=True)
         np.testing.assert_array_equal(back.mask, array.mask)
         np.testing.assert_array_equal(back.compressed(), array.compressed())
+    with pytest.raises(zmcraster.ArgumentError, match="no-data"):
+        zmcraster.build(array, "filled.pyr")
+    array.fill_value = -9
     zmcraster.build(array, "filled.pyr")
     with zmcraster.open("filled.pyr") as raster:
-        assert raster.nodata == array.fill_value % 2**16 or raster.nodata == array.fill_value
+        assert raster.nodata == -9
 
 
 def test_a_warped_dataset(folder):

@@ -170,8 +170,7 @@ class Ranges(http.server.SimpleHTTPRequestHandler):
         asked = re.fullmatch(r"bytes=(\d+)-(\d+)", self.headers.get("Range", ""))
         path = self.translate_path(self.path)
         if not asked or not os.path.isfile(path):
-            self.send_error(404)
-            return None
+            return super().send_head()
         size = os.path.getsize(path)
         first, last = int(asked[1]), min(int(asked[2]), size - 1)
         with open(path, "rb") as file:
