@@ -114,10 +114,14 @@ bool TileReader::LoadSamples(std::uint32_t level, const Rectangle& area, const i
                              int bandCount) {
     const std::size_t samples = area.Pixels() * static_cast<std::size_t>(bandCount);
     held = TileKey();
-    scratch.resize(samples * sampleSize);
-    if (sampleSize == rawSampleSize) return ReadRaw(level, area, bands, bandCount, scratch);
-    raw.resize(samples * rawSampleSize);
-    if (!ReadRaw(level, area, bands, bandCount, raw)) return false;
+    const auto room = [samples](std::vector<unsigned char>& buffer, std::size_t size) {
+        // What would be cut off now and made anew for the next part would be filled with zeros.
+        buffer.resize(std::max(buffer.size(), samples * size));
+        return std::span(buffer).first(samples * size);
+    };
+    const std::span<unsigned char> shown = room(scratch, sampleSize);
+    if (sampleSize == rawSampleSize) return ReadRaw(level, area, bands, bandCount, shown);
+    if (!ReadRaw(level, area, bands, bandCount, room(raw, rawSampleSize))) return false;
     Widen(raw.data(), samples, scratch.data());
     return true;
 }

@@ -69,12 +69,13 @@ def _is_url(name: str) -> bool:
 
 def whole(number: Any, what: str) -> int:
     """An integer that may come as any kind of number without a fraction."""
-    if isinstance(number, (float, np.floating)) and float(number).is_integer():
-        number = int(number)
     try:
         return operator.index(number)
     except TypeError:
-        raise ArgumentError(f"{what} is a whole number, not {number!r}") from None
+        pass
+    if isinstance(number, (float, np.floating)) and float(number).is_integer():
+        return int(number)
+    raise ArgumentError(f"{what} is a whole number, not {number!r}")
 
 
 def _range_of(part: slice, size: int, what: str) -> Tuple[int, int]:
