@@ -19,10 +19,10 @@ namespace zmcpython {
 // NumPy's letter of a kind, and the bytes of a sample: "u1", "f8", "c16".
 template <class T>
 std::string ArrayTypeName() {
-    char kind = std::is_signed_v<T> ? 'i' : 'u';
-    if (std::is_floating_point_v<T>) kind = 'f';
-    if (zelm::kIsComplex<T>) kind = 'c';
-    return kind + std::to_string(sizeof(T));
+    const std::string size = std::to_string(sizeof(T));
+    if (zelm::kIsComplex<T>) return 'c' + size;
+    if (std::is_floating_point_v<T>) return 'f' + size;
+    return (std::is_signed_v<T> ? 'i' : 'u') + size;
 }
 
 inline pybind11::dtype DtypeOf(std::uint32_t pixelType) {

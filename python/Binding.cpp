@@ -107,6 +107,7 @@ public:
     File(std::shared_ptr<OpenRaster> opened, std::shared_ptr<PythonSource> readBy)
         : raster(std::move(opened)), source(std::move(readBy)) {}
     // What was written is brought to the disk, and whether that went well nobody asks.
+    // NOLINTNEXTLINE(bugprone-exception-escape): to give a lock up throws nothing.
     ~File() {
         const py::gil_scoped_release others;
         const zmcgdal::ErrorCatcher quiet(CE_Failure);

@@ -59,23 +59,23 @@ OGRSpatialReference ReferenceOf(const std::string& text) {
     return reference;
 }
 
+template <class T>
+T As(const Number& number) {
+    return std::visit([](auto value) { return static_cast<T>(value); }, number);
+}
+
 void SetNoData(GDALRasterBand& band, const Number& value) {
-    const auto as = [&]<class T>(T) {
-        return std::visit([](auto number) { return static_cast<T>(number); }, value);
-    };
     if (band.GetRasterDataType() == GDT_Int64)
-        band.SetNoDataValueAsInt64(as(std::int64_t{}));
+        band.SetNoDataValueAsInt64(As<std::int64_t>(value));
     else if (band.GetRasterDataType() == GDT_UInt64)
-        band.SetNoDataValueAsUInt64(as(std::uint64_t{}));
+        band.SetNoDataValueAsUInt64(As<std::uint64_t>(value));
     else
-        band.SetNoDataValue(as(double{}));
+        band.SetNoDataValue(As<double>(value));
 }
 
 }  // namespace
 
-double AsDouble(const Number& number) {
-    return std::visit([](auto value) { return static_cast<double>(value); }, number);
-}
+double AsDouble(const Number& number) { return As<double>(number); }
 
 Facts FactsOf(GDALDataset& dataset) {
     Facts facts{WktOf(dataset), std::nullopt, ItemsOf(dataset), {}};

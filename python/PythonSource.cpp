@@ -35,6 +35,7 @@ private:
 PythonSource::PythonSource(py::object fileObject)
     : number(zmcgdal::NextSourceNumber()), file(std::move(fileObject)) {}
 
+// NOLINTNEXTLINE(bugprone-exception-escape): not while there is a Python.
 PythonSource::~PythonSource() {
     const py::gil_scoped_acquire python;
     file = py::object();

@@ -24,7 +24,7 @@ class PythonSource final : public zelm::files::ByteSource {
 public:
     // An object with `seek` and `read`, as binary files have them. Python's lock is held.
     explicit PythonSource(pybind11::object fileObject);
-    ~PythonSource() override;
+    ~PythonSource() override;  // NOLINT(bugprone-exception-escape): not while there is a Python.
 
     // With Python's lock held.
     PythonFailure& Failure() { return failure; }
