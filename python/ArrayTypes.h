@@ -22,7 +22,8 @@ std::string ArrayTypeName() {
     const std::string size = std::to_string(sizeof(T));
     if (zelm::kIsComplex<T>) return 'c' + size;
     if (std::is_floating_point_v<T>) return 'f' + size;
-    return (std::is_signed_v<T> ? 'i' : 'u') + size;
+    constexpr bool isSigned = std::is_signed_v<T>;
+    return (isSigned ? 'i' : 'u') + size;
 }
 
 inline pybind11::dtype DtypeOf(std::uint32_t pixelType) {
