@@ -37,7 +37,6 @@ if(TARGET zmcraster_cli)
 
     # Many workers: the program for Dask with its module, and the scripts for other clusters. The program finds
     # the module by its own place, since Python itself looks below /usr alone.
-    set(ZMC_INSTALL_PYTHONDIR "lib/python3/dist-packages")
     file(RELATIVE_PATH ZMC_PYTHON_FROM_BIN "/${CMAKE_INSTALL_BINDIR}" "/${ZMC_INSTALL_PYTHONDIR}")
     set(python ${PROJECT_SOURCE_DIR}/python)
     configure_file(${python}/zmcraster-dask ${CMAKE_BINARY_DIR}/python/zmcraster-dask @ONLY)

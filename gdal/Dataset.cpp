@@ -134,7 +134,7 @@ OpenFile::OpenFile(const std::string& fileName, std::shared_ptr<zelm::files::Byt
       pixels(fileName, raster.WithoutDocument(), info.header, false),
       tiles(raster.Remote() ? pixels : raster, info,
             {GdalTypeOf(info.header.pixelType, options.signedByteAs), options.missingAsZeros,
-             options.threads, options.shared}),
+             options.threads, options.shared, options.keepsTiles}),
       archive(raster, info.HasMetadataDocument(), limits),
       renewsStatistics(options.statistics) {
     if (raster.Remote()) raster.Remote()->SetDocument(info.MetaDocumentOffset());

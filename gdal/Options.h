@@ -29,6 +29,9 @@ struct OpenOptions {
     std::uint64_t remoteBytes = kRemoteBytes;
     std::uint32_t threads = 1;  // that read a large window
     bool shared = false;        // threads are to read one dataset at once (Dataset::Share)
+    // What a reader has of a tile serves its next window, as GDAL asks for one band or line after
+    // the other.
+    bool keepsTiles = true;
 };
 
 // Where NUM_THREADS is not among them, GDAL's configuration option GDAL_NUM_THREADS tells it. A

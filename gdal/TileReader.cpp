@@ -31,7 +31,7 @@ void Widen(const unsigned char* bytes, std::size_t count, unsigned char* out) {
 }  // namespace
 
 TileReader::TileReader(LazyRaster& pyramid, const zmchost::PyramidFileInfo& info, GDALDataType type,
-                       bool missingAsZeros)
+                       bool missingAsZeros, bool keepsTiles)
     : raster(pyramid),
       layout(info),
       sampleType(type),
@@ -41,6 +41,7 @@ TileReader::TileReader(LazyRaster& pyramid, const zmchost::PyramidFileInfo& info
       fileBands(static_cast<int>(info.header.bandCount)),
       allBands(info.header.bandCount),
       readsMissing(missingAsZeros),
+      keeps(keepsTiles),
       present(info.header) {
     std::iota(allBands.begin(), allBands.end(), 0);
 }
@@ -113,10 +114,14 @@ bool TileReader::LoadSamples(std::uint32_t level, const Rectangle& area, const i
                              int bandCount) {
     const std::size_t samples = area.Pixels() * static_cast<std::size_t>(bandCount);
     held = TileKey();
-    scratch.resize(samples * sampleSize);
-    if (sampleSize == rawSampleSize) return ReadRaw(level, area, bands, bandCount, scratch);
-    raw.resize(samples * rawSampleSize);
-    if (!ReadRaw(level, area, bands, bandCount, raw)) return false;
+    const auto room = [samples](std::vector<unsigned char>& buffer, std::size_t size) {
+        // What would be cut off now and made anew for the next part would be filled with zeros.
+        buffer.resize(std::max(buffer.size(), samples * size));
+        return std::span(buffer).first(samples * size);
+    };
+    const std::span<unsigned char> shown = room(scratch, sampleSize);
+    if (sampleSize == rawSampleSize) return ReadRaw(level, area, bands, bandCount, shown);
+    if (!ReadRaw(level, area, bands, bandCount, room(raw, rawSampleSize))) return false;
     Widen(raw.data(), samples, scratch.data());
     return true;
 }
@@ -196,9 +201,11 @@ bool TileReader::Read(std::uint32_t level, const Rectangle& window, const int* b
     const TileKey key{level, window.x, window.y, 0};
     if (IsPlainPlane(window, bandCount, target) && heldApart != key && IsHeld(window))
         return SplitTile(level, window, bands[0], target.data);
+    const bool byTiles = keeps || bandCount != fileBands;
     return zelm::VisitTiles(layout.header.Geometry(level), window, [&](const zelm::TilePart& part) {
-        return IsHeld(part.tile) ? CopyPart(level, part.tile, window, bands, bandCount, target)
-                                 : CopyPieces(level, part.part, window, bands, bandCount, target);
+        return byTiles && IsHeld(part.tile)
+                   ? CopyPart(level, part.tile, window, bands, bandCount, target)
+                   : CopyPieces(level, part.part, window, bands, bandCount, target);
     });
 }
 

@@ -38,9 +38,10 @@ struct Target {
 class TileReader {
 public:
     // Both outlive this object. `type` is what the samples are shown as. Tiles that the file does
-    // not have cannot be read, or are zeros.
+    // not have cannot be read, or are zeros. Without `keepsTiles`, of tiles whose bands are all
+    // asked for nothing is read that is not asked for, and nothing remembered.
     TileReader(LazyRaster& pyramid, const zmchost::PyramidFileInfo& info, GDALDataType type,
-               bool missingAsZeros);
+               bool missingAsZeros, bool keepsTiles = true);
 
     GDALDataType Type() const { return sampleType; }
     // The samples of all bands of a pixel lie together in the file.
@@ -75,6 +76,7 @@ private:
     int fileBands;
     std::vector<int> allBands;
     bool readsMissing;  // as zeros
+    bool keeps;
     zmchost::PresentTiles present;
     std::vector<unsigned char> scratch;  // one tile as GDAL sees its samples
     std::vector<unsigned char> planes;   // the same, band after band

@@ -61,7 +61,7 @@ WindowReader::WindowReader(LazyRaster& pyramid, const zmchost::PyramidFileInfo& 
 }
 
 TileReader WindowReader::Over(LazyRaster& pyramid) const {
-    return {pyramid, layout, how.type, how.missingAsZeros};
+    return {pyramid, layout, how.type, how.missingAsZeros, how.keepsTiles};
 }
 
 WindowReader::ReaderPtr WindowReader::MakeReader() const {

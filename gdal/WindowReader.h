@@ -30,6 +30,7 @@ public:
         std::uint32_t threads = 1;  // that may read one window, of a file behind no network
         // The raster is used by others while windows are read.
         bool leavesRaster = false;
+        bool keepsTiles = true;  // as TileReader has it
     };
 
     // Both outlive this object.
