@@ -112,9 +112,10 @@ class Packages(unittest.TestCase):
             done = subprocess.run([ROOT / "scripts" / script, "--nonsense"], capture_output=True, text=True)
             self.assertEqual((done.returncode, done.stdout), (2, ""), script)
             self.assertIn(f"scripts/{script}", done.stderr)
-        done = subprocess.run([ROOT / "scripts/check-abi", ROOT / "docs"], capture_output=True, text=True)
-        self.assertEqual(done.returncode, 1)
-        self.assertEqual(done.stderr.count("\n"), 1)
+        for script, folder in (("check-abi", "docs"), ("package", "docs"), ("package", "README.md/packages")):
+            done = subprocess.run([ROOT / "scripts" / script, ROOT / folder], capture_output=True, text=True)
+            self.assertEqual((done.returncode, done.stdout), (1, ""), script)
+            self.assertEqual(done.stderr.count("\n"), 1, done.stderr)
 
 
 if __name__ == "__main__":
