@@ -2,14 +2,16 @@
 # them. The build makes the viewer of web/ for it, with the tools that its lock file names: they are
 # got from the npm registry once for a build folder, and nothing is looked for there as long as the
 # lock file stays. Without the viewer the source holds none. The global property ZMC_HAS_VIEWER tells
-# tests which it is.
+# tests which it is, and ZMC_VIEWER_PAGES the folder that it came from.
 #
 # ZMC_BUILD_VIEWER decides: ON, OFF, or AUTO, which is ON where Node and npm are there and the build
-# is not one that looks for faults in C++ alone.
+# is not one that looks for faults in C++ alone. ZMC_VIEWER_FOLDER names a viewer that was made before,
+# for builds that reach no registry.
 
 set(ZMC_BUILD_VIEWER AUTO CACHE STRING
     "Put the viewer, which Node makes, into zmcraster serve: ON, OFF or AUTO")
 set_property(CACHE ZMC_BUILD_VIEWER PROPERTY STRINGS AUTO ON OFF)
+set(ZMC_VIEWER_FOLDER "" CACHE PATH "Folder of a viewer that was made before, instead of making it")
 
 # Sets `problem` to why the viewer cannot be made, or to nothing.
 function(zmc_find_node problem)
@@ -54,7 +56,18 @@ function(zmc_embed_viewer source)
     set(page "${CMAKE_BINARY_DIR}/viewer")
     set(write "${CMAKE_COMMAND}" -DZMC_SOURCE=${source} -DZMC_TEMPLATE=${ZMC_ROOT}/serve/Pages.cpp.in)
     set(writer "${ZMC_ROOT}/cmake/WritePages.cmake" "${ZMC_ROOT}/serve/Pages.cpp.in")
+    if(ZMC_VIEWER_FOLDER)
+        message(STATUS "zmcraster serve: with the viewer of ${ZMC_VIEWER_FOLDER}")
+        set_property(GLOBAL PROPERTY ZMC_HAS_VIEWER ON)
+        set_property(GLOBAL PROPERTY ZMC_VIEWER_PAGES "${ZMC_VIEWER_FOLDER}")
+        file(GLOB_RECURSE pages CONFIGURE_DEPENDS "${ZMC_VIEWER_FOLDER}/*")
+        add_custom_command(OUTPUT "${source}"
+            COMMAND ${write} "-DZMC_FOLDER=${ZMC_VIEWER_FOLDER}" -P "${ZMC_ROOT}/cmake/WritePages.cmake"
+            DEPENDS ${pages} ${writer} VERBATIM COMMENT "Taking the viewer as it was made")
+        return()
+    endif()
     zmc_decide_viewer(wanted)
+    set_property(GLOBAL PROPERTY ZMC_VIEWER_PAGES "${page}/viewer/served")
     set_property(GLOBAL PROPERTY ZMC_HAS_VIEWER ${wanted})
     if(NOT wanted)
         add_custom_command(OUTPUT "${source}" COMMAND ${write} -P "${ZMC_ROOT}/cmake/WritePages.cmake"

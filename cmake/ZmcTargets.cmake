@@ -97,6 +97,12 @@ function(zmc_add_library name kind)
     target_include_directories(${name} PUBLIC
         $<BUILD_INTERFACE:${ZMC_ROOT}> $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}>
         $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}/zmcraster>)
+    # Programs that were linked with one major version refuse to start with another. What is loaded by its
+    # path has a name alone.
+    if(kind STREQUAL "SHARED")
+        set_target_properties(${name} PROPERTIES VERSION ${PROJECT_VERSION}
+            SOVERSION ${PROJECT_VERSION_MAJOR})
+    endif()
     if(NOT ZMC_SANITIZE AND kind MATCHES "SHARED|MODULE" AND CMAKE_SYSTEM_NAME STREQUAL "Linux")
         target_link_options(${name} PRIVATE LINKER:-z,defs)
     endif()
@@ -109,8 +115,12 @@ endfunction()
 
 # zmc_set_run_path(path targets...): where binaries that are installed look for ours, from their own
 # place. One path serves the build and the install: CMake makes room for another by filling up the
-# first with colons, and an empty element means the working directory.
+# first with colons, and an empty element means the working directory. An install that shall have none,
+# since its libraries are where the loader looks anyway, is told CMAKE_SKIP_INSTALL_RPATH.
 function(zmc_set_run_path path)
+    if(CMAKE_SKIP_INSTALL_RPATH)
+        return()
+    endif()
     set_target_properties(${ARGN} PROPERTIES INSTALL_RPATH "${path}"
         INSTALL_RPATH_USE_LINK_PATH ON BUILD_WITH_INSTALL_RPATH ON)
 endfunction()

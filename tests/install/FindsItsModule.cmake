@@ -11,7 +11,8 @@ file(REMOVE_RECURSE ${ZMC_SCRATCH})
 
 # A working directory with the planted library wherever a relative look-up might go.
 set(work ${ZMC_SCRATCH}/elsewhere/work)
-set(names libzmcraster.so libzmcg.so libzmcloader.so libxerces-c-3.2.so libtbb.so.12)
+set(names libzmcraster.so libzmcg.so libzmcg.so.1 libzmcloader.so libzmcloader.so.1 libzmcfiles.so.1
+    libxerces-c-3.2.so libtbb.so.12)
 foreach(folder . zmcraster lib lib/zmcraster ${ZMC_LIBDIR}/zmcraster .. ../zmcraster ../lib
         ../lib/zmcraster)
     foreach(name ${names})
