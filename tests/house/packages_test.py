@@ -61,7 +61,7 @@ class Packages(unittest.TestCase):
         demo = setup("--list", "demo").stdout.split()
         self.assertIn("g++", demo)
         for name in demo:
-            self.assertNotRegex(name, "clang|llvm|lld|cppcheck|gtest|gmock|rapidcheck|benchmark|pytest|chromium")
+            self.assertNotRegex(name, "clang|llvm|lld|cppcheck|gtest|gmock|rapidcheck|benchmark|pytest")
         # The commands of the demo are those of packages that it installs.
         self.assertNotIn("gdal_translate", text("scripts/demo"))
 
