@@ -22,7 +22,7 @@ using Json = nlohmann::ordered_json;
 constexpr const char* kVersionKey = "zmcrasterRecords";
 constexpr int kNoteVersion = 1;
 constexpr char kBehindWords = '\n';  // which no word of the document has as it stands
-constexpr std::size_t kMostSceneBytes = std::size_t{128} << 20;
+constexpr std::size_t kMostSceneBytes = std::size_t{48} << 20;
 
 }  // namespace
 
@@ -71,8 +71,8 @@ void KeepRecords(const BuildWords& words, const GDALDataset& source,
                  zmcgdal::GdalRasterSource& pixels, zmchost::BuildOptions options) {
     options.progress = [](const zmchost::BuildProgress&) { return !platform::IsInterrupted(); };
     try {
-        zmchost::PyramidUpdate(zmcgdal::SharedModule(), pixels, words.target, std::move(options))
-            .KeepRecords(NoteOf(words, source));
+        zmchost::PyramidUpdate update(zmcgdal::SharedModule(), pixels, words.target, options);
+        update.KeepRecords(NoteOf(words, source));
     } catch (const zmchost::Cancelled&) {
         throw Interruption(words.target);
     }

@@ -20,8 +20,8 @@ using zelm::files::OpenMode;
 constexpr std::string_view kRecordsMagic = "ZMCRECS1";
 constexpr std::uint64_t kRecordsHead = 24;
 constexpr std::uint64_t kRecordsTail = 16;
-constexpr std::uint64_t kMaxRecordsIndex = std::uint64_t{256} << 20;
-constexpr std::uint64_t kMaxRecordsPiece = std::uint64_t{256} << 20;
+constexpr std::uint64_t kMaxRecordsIndex = std::uint64_t{64} << 20;
+constexpr std::uint64_t kMaxRecordsPiece = std::uint64_t{64} << 20;
 constexpr const char* kUseRecords = "use the records of its statistics";
 constexpr const char* kKeepRecords = "keep records of its statistics";
 
@@ -124,7 +124,7 @@ std::shared_ptr<FileSource> Created(const std::string& path, const std::string& 
 
 RecordsWriter::RecordsWriter(const std::string& path, const std::string& pyramid)
     : name(pyramid), file(Created(path, pyramid)) {
-    const std::string front = std::string(kRecordsMagic) + FixedNumber(0) + FixedNumber(0);
+    static const std::string front = std::string(kRecordsMagic) + FixedNumber(0) + FixedNumber(0);
     Write(front);
 }
 
