@@ -61,17 +61,13 @@ public:
         text = numbers.Rest().substr(0, static_cast<std::size_t>(size));
         numbers = NumberUnpacker(numbers.Rest().substr(static_cast<std::size_t>(size)));
     }
-    // Items take a byte at least, so what is claimed is bounded by what is there.
+    // An item in memory is many times what it is here, so there is room only for those that were
+    // there, and all lists together have no more than a mosaic of some companions a scene.
     template <class T, class Each>
     void List(std::vector<T>& list, const Each& each) {
         const std::uint64_t count = numbers.Take();
-        if (count > numbers.Rest().size()) numbers.Refuse();
-        if (!numbers.Good()) return;
-        list.resize(static_cast<std::size_t>(count));
-        for (T& item : list) {
-            if (!numbers.Good()) return;
-            each(item);
-        }
+        if (count > kMostScenes || (items += count) > kMostItems) numbers.Refuse();
+        for (std::uint64_t i = 0; i < count && numbers.Good(); ++i) each(list.emplace_back());
     }
     void Maybe(std::optional<double>& value) {
         double number = 0;
@@ -80,6 +76,10 @@ public:
         value = has ? std::optional(number) : std::nullopt;
     }
     NumberUnpacker numbers;
+
+private:
+    static constexpr std::uint64_t kMostItems = 4 * kMostScenes;
+    std::uint64_t items = 0;
 };
 
 template <class Walk, class Color>

@@ -2,6 +2,7 @@
 #include "gdal/Mosaic.h"
 
 #include <ogr_spatialref.h>
+#include <sys/resource.h>
 
 #include <algorithm>
 #include <cmath>
@@ -13,6 +14,7 @@
 #include "gdal/GeoKeys.h"
 #include "gdal/MosaicSurvey.h"
 #include "host/base/Error.h"
+#include "host/base/PackedNumbers.h"
 #include "tests/gdal/GdalTest.h"
 
 namespace {
@@ -232,6 +234,38 @@ TEST_F(MosaicTest, KeysOfTiffsTellSystemsApart) {
           std::string("MM\0+\0\x08\0\0\xff\xff\xff\xff\xff\xff\xff\xff", 16)}) {
         std::ofstream(file, std::ios::binary) << bytes;
         EXPECT_FALSE(zmcgdal::GeoKeysOf(file)) << bytes.size();
+    }
+}
+
+// Behind a good beginning, a list that claims as many items as there are bytes, of which the first
+// is none.
+TEST(MosaicLayoutBytes, CountsThatAreNotBorneOutTakeNoMemory) {
+    MosaicLayout layout;
+    layout.width = layout.height = 1;
+    layout.pixelType = 1;
+    layout.bands.resize(1);
+    layout.drivers = {"GTiff"};
+    layout.scenes.resize(1);
+    layout.scenes[0].place = {0, 0, 1, 1};
+    const std::string good = layout.Pack();
+    ASSERT_TRUE(MosaicLayout::Unpack(good));
+    layout.scenes.clear();
+    const std::string empty = layout.Pack();
+    constexpr std::size_t kBytes = std::size_t{32} << 20;
+    zmchost::NumberPacker claim;
+    claim.Put(std::uint64_t{kBytes});
+    // The last two numbers count the scenes and those that were left out.
+    const std::string front = empty.substr(0, empty.size() - 2) + claim.Bytes();
+    const auto largest = [] {
+        rusage usage{};
+        getrusage(RUSAGE_SELF, &usage);
+        return usage.ru_maxrss;  // in KiB
+    };
+    for (const char filler : {'\xff', '\x7f', '\0'}) {
+        const std::string bytes = front + std::string(kBytes, filler);
+        const long before = largest();
+        EXPECT_FALSE(MosaicLayout::Unpack(bytes));
+        EXPECT_LT(largest() - before, 512 << 10) << int{filler};
     }
 }
 
