@@ -1,6 +1,7 @@
 #include "gdal/Sidecar.h"
 
 #include <cpl_string.h>
+#include <gdal_utils.h>
 
 #include <algorithm>
 #include <memory>
@@ -153,6 +154,32 @@ void EmbedSidecar(std::unique_ptr<Dataset> dataset, const std::string& name) {
     dataset->ForgetChanges();
     if (!items.empty()) zmchost::EmbedItems(*dataset->File().source, name, items);
     SaveMask(std::move(dataset), name);
+}
+
+bool KeepSidecar(GDALDataset& source, const Built& built,
+                 const std::vector<zmchost::FullStatistics>& stored,
+                 std::shared_ptr<OpenFile> file) {
+    // A virtual raster selects the bands; only its metadata are looked at.
+    CPLStringList list;
+    for (const char* const word : {"-of", "VRT"}) list.AddString(word);
+    for (const std::uint32_t band : built.bands) {
+        list.AddString("-b");
+        list.AddString(std::to_string(band + 1).c_str());
+    }
+    if (!built.noData.empty()) {
+        list.AddString("-a_nodata");
+        list.AddString(built.noData.c_str());
+    }
+    const std::unique_ptr<GDALTranslateOptions, decltype(&GDALTranslateOptionsFree)> translate(
+        GDALTranslateOptionsNew(list.List(), nullptr), &GDALTranslateOptionsFree);
+    const std::unique_ptr<GDALDataset> selected(GDALDataset::FromHandle(
+        GDALTranslate("", GDALDataset::ToHandle(&source), translate.get(), nullptr)));
+    auto pyramid = Dataset::FromFile(std::move(file), GA_Update);
+    pyramid->LoadSidecar(built.base.c_str(), nullptr);
+    if (!selected || CopySidecar(*selected, *pyramid, true) != CE_None) return false;
+    KeepStatistics(stored, *pyramid, pyramid->File().archive);
+    (built.embed ? EmbedSidecar : SaveSidecar)(std::move(pyramid), built.name);
+    return true;
 }
 
 }  // namespace zmcgdal

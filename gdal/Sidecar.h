@@ -5,6 +5,7 @@
 #include <cpl_string.h>
 #include <gdal_priv.h>
 
+#include <cstdint>
 #include <memory>
 #include <string>
 #include <vector>
@@ -15,6 +16,7 @@ namespace zmcgdal {
 
 class Archive;
 class Dataset;
+class OpenFile;
 
 // What the names of companions of a raster end with, behind the raster's own name: GDAL's sidecar,
 // mask of the whole dataset, and levels that stand in no file of ours.
@@ -39,6 +41,21 @@ void SaveSidecar(std::unique_ptr<Dataset> dataset, const std::string& name);
 // The same, but what a sidecar would tell goes into the file, in front of its records; a mask still
 // stands beside it. The dataset is open for update and was built just now. Throws zmchost::Error.
 void EmbedSidecar(std::unique_ptr<Dataset> dataset, const std::string& name);
+
+// What was built of a raster, and where what a pyramid has no place for goes.
+struct Built {
+    std::vector<std::uint32_t> bands;  // from 0, in their order; empty: all
+    std::string noData;                // in place of that of the source: a number, "none", or empty
+    bool embed = false;                // into the file, a mask aside
+    std::string name;                  // of the pyramid, for messages
+    std::string base;                  // what stands beside it has names that begin with this
+};
+
+// Keeps what `source` tells besides pixels, and the digits of the statistics that were stored.
+// False where that failed, reported to GDAL or not; throws what SaveSidecar does.
+bool KeepSidecar(GDALDataset& source, const Built& built,
+                 const std::vector<zmchost::FullStatistics>& stored,
+                 std::shared_ptr<OpenFile> file);
 
 // Ends the use of the mask that a dataset has in `file`, and reads that once more: of a disk that
 // was full some versions of GDAL tell neither when they write nor when they close. The dataset can

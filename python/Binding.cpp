@@ -21,9 +21,12 @@
 #include <vector>
 
 #include "gdal/ErrorCatcher.h"
+#include "gdal/Fetcher.h"
 #include "gdal/GdalRasterSource.h"
+#include "gdal/VsiSource.h"
 #include "host/base/Error.h"
 #include "host/base/ScaledNumber.h"
+#include "host/file/Limits.h"
 #include "host/raster/NoData.h"
 #include "platform/FileSystem.h"
 #include "python/ArrayTypes.h"
@@ -191,7 +194,8 @@ std::uint32_t CheckedPixelType(const py::dtype& type) {
 // GDAL counts pixels and bands with a sign.
 void CheckShape(std::uint64_t width, std::uint64_t height, std::uint64_t bands) {
     if (width == 0 || height == 0 || bands == 0) throw BadArgument("a raster has pixels and bands");
-    if (width > INT_MAX || height > INT_MAX || bands > 65536)
+    if (width > INT_MAX || height > INT_MAX || bands > INT_MAX ||
+        bands > zmchost::Limits::Current().bands)
         throw BadArgument("the raster is too large");
 }
 
@@ -629,6 +633,10 @@ PYBIND11_MODULE(_zmcraster, module) {
                py::arg("resampling"), py::arg("threads"), py::arg("missing_as_zeros"));
     module.def("open_object", &OpenObject, py::arg("object"), py::arg("name"), py::arg("threads"),
                py::arg("missing_as_zeros"));
+    module.def(
+        "is_virtual",
+        [](const std::string& name) { return zmcgdal::IsVirtualName(zmcgdal::NameOfUrl(name)); },
+        py::arg("name"), "Whether GDAL reads it by a file system of its own, as it does URLs.");
     module.def("create", &CreateNamed, py::arg("name"), py::arg("width"), py::arg("height"),
                py::arg("bands"), py::arg("dtype"), py::arg("options"), py::arg("facts"));
 }

@@ -1,8 +1,5 @@
 #include "tools/BuildEnd.h"
 
-#include <cpl_string.h>
-#include <gdal_utils.h>
-
 #include <cstdio>
 #include <utility>
 
@@ -15,20 +12,6 @@
 
 namespace zmctools {
 namespace {
-
-std::vector<std::string> TranslateArguments(const std::vector<std::uint32_t>& bands,
-                                            const std::string& noData) {
-    std::vector<std::string> arguments = {"-of", "VRT"};
-    for (const std::uint32_t band : bands) {
-        arguments.push_back("-b");
-        arguments.push_back(std::to_string(band + 1));
-    }
-    if (!noData.empty()) {
-        arguments.push_back("-a_nodata");
-        arguments.push_back(noData);
-    }
-    return arguments;
-}
 
 std::string ReportText(const BuildWords& words, const zmchost::BuildReport& report,
                        std::uint32_t pixelType) {
@@ -55,30 +38,15 @@ BuildEnd::BuildEnd(GDALDataset& source, const BuildWords& buildWords,
     };
 }
 
-// A virtual raster selects the bands; only its metadata are looked at.
 void WriteSidecar(GDALDataset& dataset, const BuildWords& words,
                   const std::vector<std::uint32_t>& bands,
                   const std::vector<zmchost::FullStatistics>& statistics,
                   std::shared_ptr<zmcgdal::OpenFile> built, const std::string& base) {
-    CPLStringList list;
-    for (const std::string& word : TranslateArguments(bands, words.noData))
-        list.AddString(word.c_str());
-    const std::unique_ptr<GDALTranslateOptions, decltype(&GDALTranslateOptionsFree)> translate(
-        GDALTranslateOptionsNew(list.List(), nullptr), &GDALTranslateOptionsFree);
-    const DatasetPtr selected(GDALDataset::FromHandle(
-        GDALTranslate("", GDALDataset::ToHandle(&dataset), translate.get(), nullptr)));
-    auto pyramid = zmcgdal::Dataset::FromFile(std::move(built), GA_Update);
-    pyramid->LoadSidecar(base.c_str(), nullptr);
-    bool kept = selected && zmcgdal::CopySidecar(*selected, *pyramid, true) == CE_None;
-    if (kept) {
-        zmcgdal::KeepStatistics(statistics, *pyramid, pyramid->File().archive);
-        (words.embed ? zmcgdal::EmbedSidecar : zmcgdal::SaveSidecar)(std::move(pyramid),
-                                                                     words.target);
-    }
-    pyramid.reset();
+    const bool kept =
+        zmcgdal::KeepSidecar(dataset, {bands, words.noData, words.embed, words.target, base},
+                             statistics, std::move(built));
     const std::string reason = TakeGdalError(words.target);
-    kept = kept && reason.empty();
-    if (!kept)
+    if (!kept || !reason.empty())
         throw Failure(words.target, "its metadata cannot be kept in " + Visible(words.target) +
                                         (words.embed ? "" : zmcgdal::kSidecarEnding) + ": " +
                                         (reason.empty() ? "no reason given" : reason));

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cmath>
+#include <optional>
 #include <type_traits>
 #include <utility>
 
@@ -75,11 +76,11 @@ DatasetPtr SurveyScenes(const BuildWords& words, std::vector<std::string> scenes
     TakeGdalError(words.source);
     SetSubject(words.source);
     try {
-        if (auto before = zmcgdal::MosaicLayout::Unpack(known))
-            if (auto renewed = zmcgdal::RenewLayout(std::move(*before), scenes, wishes))
-                return OpenMosaic(words.source, std::move(*renewed));
+        std::optional<zmcgdal::MosaicLayout> renewed = zmcgdal::MosaicLayout::Unpack(known);
+        if (renewed) renewed = zmcgdal::RenewLayout(std::move(*renewed), scenes, wishes);
         zmcgdal::MosaicLayout layout =
-            zmcgdal::SurveyMosaic(words.source, std::move(scenes), wishes);
+            renewed ? std::move(*renewed)
+                    : zmcgdal::SurveyMosaic(words.source, std::move(scenes), wishes);
         if (FillsWithZeros(layout) && layout.HasGaps())
             Warn(words.source,
                  "there are gaps between its scenes, which are filled with 0; --nodata "

@@ -63,10 +63,6 @@ def plain_name(path: Path) -> str:
     return name
 
 
-def _is_url(name: str) -> bool:
-    return name.startswith(("http://", "https://", "/vsi"))
-
-
 def whole(number: Any, what: str) -> int:
     """An integer that may come as any kind of number without a fraction."""
     try:
@@ -204,32 +200,32 @@ class Raster:
     @property
     def nodatavals(self) -> Tuple[Any, ...]:
         """The same of all bands."""
-        return tuple(exact(band["nodata"], self.dtype) for band in self._facts()["bands"])
+        return tuple(exact(value, self.dtype) for value in self._of_bands("nodata"))
 
     @property
     def descriptions(self) -> Tuple[str, ...]:
         """Descriptions of the bands, empty where there are none."""
-        return tuple(band["description"] for band in self._facts()["bands"])
+        return self._of_bands("description")
 
     @property
     def units(self) -> Tuple[str, ...]:
         """Units of the bands' values, empty where there are none."""
-        return tuple(band["unit"] for band in self._facts()["bands"])
+        return self._of_bands("unit")
 
     @property
     def scales(self) -> Tuple[float, ...]:
         """By band, with which samples are multiplied to get values."""
-        return tuple(band["scale"] for band in self._facts()["bands"])
+        return self._of_bands("scale")
 
     @property
     def offsets(self) -> Tuple[float, ...]:
         """By band, what is added to scaled samples to get values."""
-        return tuple(band["offset"] for band in self._facts()["bands"])
+        return self._of_bands("offset")
 
     @property
     def interpretations(self) -> Tuple[str, ...]:
         """What the bands stand for: "Gray", "Red", "Alpha", "Palette" ..."""
-        return tuple(band["interpretation"] for band in self._facts()["bands"])
+        return self._of_bands("interpretation")
 
     @property
     def metadata(self) -> dict:
@@ -248,7 +244,7 @@ class Raster:
         (60.0, 0.0, 500000.0, 0.0, -60.0, 4000000.0)
         """
         told = self.transform
-        factor = 2.0 ** (self._level(level).number - self.levels[0].number)
+        factor = self._factor(self._level(level))
         if told is None:
             return None
         a, b, c, d, e, f = told
@@ -368,6 +364,13 @@ class Raster:
         raise ArgumentError(f"there is no level {number}: {self.name} has levels {self.levels[0].number} to "
                             f"{self.levels[-1].number}")
 
+    def _factor(self, level: Level) -> float:
+        """How many pixels of the finest level stand beside each other in one."""
+        return 2.0 ** (level.number - self.levels[0].number)
+
+    def _of_bands(self, what: str) -> Tuple[Any, ...]:
+        return tuple(band[what] for band in self._facts()["bands"])
+
     def _band(self, band: Any) -> int:
         number = whole(band, "a band")
         if not 1 <= number <= self.bands:
@@ -473,12 +476,12 @@ def open(source: Union[Path, IO[bytes]], mode: str = "r", *, threads: int = 1, m
             raise ArgumentError("a raster that is read from a file object cannot be written to")
         return Raster(_zmcraster.open_object(source, _name_of(source), count, zeros), mode)
     name = plain_name(source)  # type: ignore[arg-type]
-    if mode == "r+" and _is_url(name):
+    if mode == "r+" and _zmcraster.is_virtual(name):
         raise ArgumentError("rasters are written to in plain files alone")
     try:
         file = _zmcraster.open(name, mode == "r+", bool(refresh), resampling or "", count, zeros)
     except FileError as error:
-        if _is_url(name) or os.path.lexists(name):
+        if _zmcraster.is_virtual(name) or os.path.lexists(name):
             raise
         raise MissingFileError(str(error)) from None
     return Raster(file, mode, (name, count, missing) if mode == "r" else None)

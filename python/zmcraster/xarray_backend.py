@@ -57,11 +57,15 @@ class _Pixels(BackendArray):
         return pixels[tuple(slice(None) if isinstance(part, slice) else 0 for part in key)]
 
 
+def _place(raster: Raster, level: Level) -> Tuple[float, ...]:
+    """The transform of a level; by pixels of the finest one where the raster has none."""
+    factor = float(raster._factor(level))
+    return raster.transform_of(level.number) or (factor, 0.0, 0.0, 0.0, factor, 0.0)
+
+
 def _coordinates(raster: Raster, level: Level) -> dict:
     """Of the middles of pixels: by column and by row, or of each pixel where the raster is turned."""
-    told = raster.transform_of(level.number)
-    factor = 2.0 ** (level.number - raster.levels[0].number)
-    a, b, c, d, e, f = told or (factor, 0.0, 0.0, 0.0, factor, 0.0)
+    a, b, c, d, e, f = _place(raster, level)
     columns, rows = np.arange(level.width) + 0.5, np.arange(level.height) + 0.5
     if b == 0 and d == 0:
         return {"x": ("x", a * columns + c), "y": ("y", e * rows + f)}
@@ -87,8 +91,7 @@ def _reference(raster: Raster, level: Level) -> dict:
         except ImportError:
             pass
         attributes.update(crs_wkt=wkt, spatial_ref=wkt)
-    factor = 2.0 ** (level.number - raster.levels[0].number)
-    a, b, c, d, e, f = raster.transform_of(level.number) or (factor, 0.0, 0.0, 0.0, factor, 0.0)
+    a, b, c, d, e, f = _place(raster, level)
     attributes["GeoTransform"] = " ".join(str(float(number)) for number in (c, a, b, f, d, e))
     return attributes
 
