@@ -48,6 +48,26 @@ class Dask(ClusterTest):
         self.assertEqual(len([name for name in self.files() if name.startswith("ended-")]), 6)
         self.assertFinished(expected)
 
+    def test_what_libraries_complain_of_in_workers_is_not_told(self):
+        """Loops of events that end with something unsaid say so, in processes that are not the program's own."""
+        self.source("Byte")
+        os.mkdir(self.path("ahead"))
+        with open(self.path("ahead/sitecustomize.py"), "w", encoding="utf-8") as file:
+            file.write("import logging, sys, threading, time\n"
+                       "def complain():\n"
+                       "    while True:\n"
+                       "        time.sleep(0.1)\n"
+                       "        if 'distributed.worker' in sys.modules:\n"
+                       f"            open({self.path('complained')!r}, 'w').close()\n"
+                       "            logging.getLogger('asyncio').error('never retrieved')\n"
+                       "if 'spawn_main' in ' '.join(sys.orig_argv):\n"
+                       "    threading.Thread(target=complain, daemon=True).start()\n")
+        tool = self.wrapper("sleep 0.5")
+        done = self.dask("source.tif", "made.pyr", "--workers", "1", "--tool", tool, "--part-size", "512", "--quiet",
+                         env={**os.environ, "PYTHONPATH": self.path("ahead")})
+        self.assertTrue(os.path.exists(self.path("complained")))
+        self.assertEqual((done.returncode, done.stdout, done.stderr), (0, "", ""))
+
     def test_what_fails_is_told_in_one_line_and_gone_on_with(self):
         self.source("Double")
         expected = self.expected()
