@@ -1,4 +1,4 @@
-#!/usr/bin/env python3
+#!/usr/bin/python3 -B
 """Building pyramids side by side with GDAL's own COG builder, on the same source and disk.
 
 Source: 16,384 x 12,288 pixels of three bytes, from a true-colour picture enlarged, with

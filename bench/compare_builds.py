@@ -1,4 +1,4 @@
-#!/usr/bin/env python3
+#!/usr/bin/python3 -B
 """Compares the benchmark programs of two builds, for instance of two commits.
 
     bench/compare_builds.py BEFORE AFTER [--rounds N] [--seconds S] [--only PROGRAM...] [--filter TEXT]

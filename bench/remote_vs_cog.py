@@ -1,4 +1,4 @@
-#!/usr/bin/env python3
+#!/usr/bin/python3 -B
 """Reading over HTTP side by side with GDAL's own COG driver, uncompressed and DEFLATE.
 
 Two rasters, each as a pyramid and as both kinds of COG: 16,384 x 12,288 pixels of three bytes, and

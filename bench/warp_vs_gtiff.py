@@ -1,4 +1,4 @@
-#!/usr/bin/env python3
+#!/usr/bin/python3 -B
 """Writing pyramids by gdalwarp side by side with GDAL's GeoTIFF, on the same source and disk.
 
 Source: a GeoTIFF of 4096 x 4096 pixels of three bytes, in tiles. It is enlarged or copied to the
