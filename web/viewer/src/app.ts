@@ -256,7 +256,7 @@ export class App implements Gestures {
     this.show();
     this.remember(false);
     if (this.line) this.readLine();
-    void this.idle()
+    void this.idle(false)
       .then(shown)
       .then(() => this.warm());
   }
@@ -652,14 +652,17 @@ export class App implements Gestures {
 
   // --- for those who look at pictures
 
-  /** Once all that is in view is here, and drawn. */
-  async idle(): Promise<void> {
+  /** Once all that is in view is here, and drawn, with `sidecars` also by what these tell. */
+  async idle(sidecars = true): Promise<void> {
     const waits = (): boolean =>
       this.frameAsked ||
       this.viewport.moving ||
       this.first !== undefined ||
       this.pace.coarse ||
-      this.sides.some(({ raster, error, store }) => (!raster && !error) || (store?.state.pending ?? 0) > 0);
+      this.sides.some(
+        ({ raster, complete, error, store }) =>
+          (!(sidecars ? complete : raster) && !error) || (store?.state.pending ?? 0) > 0,
+      );
     do await new Promise((resolve) => setTimeout(resolve, 10));
     while (waits());
   }

@@ -289,7 +289,7 @@ test("a sidecar that comes late names bands, and values without data, when it is
   bench.put("late.pyr", pyramids.bytes("large"));
   bench.put("late.pyr.aux.xml", new TextEncoder().encode(sidecar));
   bench.site.judge = (path) => (path.endsWith(".aux.xml") ? "wait" : undefined);
-  await go(page, `file=late.pyr&${STYLE}&at=1024,512&zoom=1`);
+  await go(page, `file=late.pyr&${STYLE}&at=1024,512&zoom=1`, false);
   const { width, height, pixels } = await picture(page);
   const view = { x: 1024, y: 512, zoom: 1, level: 0 };
   assertSame({ width, height, pixels }, await draw(pyramid, { width, height }, view, style), "before it");

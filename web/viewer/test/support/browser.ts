@@ -90,17 +90,17 @@ export async function findings(on: Page): Promise<Finding[]> {
   });
 }
 
-/** Once all that is in view has come. */
-export async function idle(page: Page): Promise<void> {
+/** Once all that is in view has come; what sidecars tell as well, if they are waited for. */
+export async function idle(page: Page, sidecars = true): Promise<void> {
   await page.waitForFunction(() => "viewer" in globalThis);
-  await page.waitForFunction(() => viewer.idle().then(() => true));
+  await page.waitForFunction((sidecars) => viewer.idle(sidecars).then(() => true), sidecars);
 }
 
 /** Goes to another view by its link, without loading the page anew. */
-export async function go(page: Page, link: string): Promise<void> {
+export async function go(page: Page, link: string, sidecars = true): Promise<void> {
   await page.evaluate((hash) => (location.hash = hash), link);
   await page.waitForTimeout(20);
-  await idle(page);
+  await idle(page, sidecars);
 }
 
 /** The picture as the graphics processor made it; colours are multiplied by alpha. */
