@@ -415,7 +415,9 @@ void Dataset::RenewEdited() {
     for (int number = 1; number <= nBands; ++number)
         if (static_cast<Band*>(GetRasterBand(number))->IsEdited())
             bands.push_back(static_cast<std::uint32_t>(number - 1));
-    if (!bands.empty()) RenewRecords(*this, bands);
+    // Complex samples have no order, and so no statistics.
+    if (bands.empty() || GDALDataTypeIsComplex(GetRasterBand(1)->GetRasterDataType())) return;
+    RenewRecords(*this, bands);
 }
 
 // The bands have marks of their own by now.

@@ -136,6 +136,16 @@ class Closing(StoreTest):
         with open(self.name, "rb") as file:
             self.assertEqual(file.read(), before)
 
+    def test_of_complex_samples_there_are_none_to_renew(self):
+        array = samples(gdal.GDT_CFloat32, 30, 20, 1)
+        name = self.copy(memory_dataset(array, gdal.GDT_CFloat32), "complex.pyr")
+        dataset = self.update(name, "STATISTICS=YES")
+        dataset.GetRasterBand(1).WriteArray(np.full((2, 2), 3 + 1j, np.complex64))
+        gdal.ErrorReset()
+        del dataset
+        self.assertEqual(gdal.GetLastErrorMsg(), "")
+        self.assertEqual(self.band(1, name).ReadAsArray(1, 1, 1, 1)[0, 0], 3 + 1j)
+
     def test_bands_that_were_edited_before_stay_marked(self):
         self.edit(1)
         dataset = self.update(None, "STATISTICS=YES")
