@@ -417,7 +417,7 @@ void Dataset::RenewEdited() {
             bands.push_back(static_cast<std::uint32_t>(number - 1));
     // Complex samples have no order, and so no statistics.
     if (bands.empty() || GDALDataTypeIsComplex(GetRasterBand(1)->GetRasterDataType())) return;
-    RenewRecords(*this, bands);
+    RenewRecords(*this, bands, 1);
 }
 
 // The bands have marks of their own by now.

@@ -31,11 +31,12 @@ std::vector<Hidden> HiddenOf(Dataset& dataset) {
 
 }  // namespace
 
-void RenewRecords(Dataset& dataset, const std::vector<std::uint32_t>& bands,
+void RenewRecords(Dataset& dataset, const std::vector<std::uint32_t>& bands, std::uint32_t threads,
                   const std::function<bool(double share)>& progress) {
     OpenFile& file = dataset.File();
     zmchost::RenewalRequest request;
     request.bands = bands;
+    request.threads = threads;
     request.progress = progress;
     for (const std::uint32_t band : bands)
         if (const auto value = NoDataAsDouble(BandAt(dataset, band)))

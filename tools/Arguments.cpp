@@ -9,6 +9,7 @@
 #include <string_view>
 
 #include "host/base/ScaledNumber.h"
+#include "host/base/Threads.h"
 #include "tools/Message.h"
 
 namespace zmctools {
@@ -64,6 +65,10 @@ std::uint64_t ParseSize(const std::string& option, const std::string& text) {
     if (!value || (binary && kUnits.find(digits.back()) == kUnits.npos))
         throw UsageError(option, "\"" + text + "\" is no size: give bytes, or 512K, 256M, 2G");
     return *value;
+}
+
+std::uint32_t ParseThreads(const std::string& text) {
+    return static_cast<std::uint32_t>(ParseCount("--threads", text, zmchost::kMaxThreads));
 }
 
 std::vector<std::uint32_t> ParseBands(const std::string& text, std::uint32_t bands) {

@@ -23,6 +23,10 @@ double ParseNumber(const std::string& option, const std::string& text);
 // "B" alone.
 std::uint64_t ParseSize(const std::string& option, const std::string& text);
 
+// What --threads does, and its value: 0 where all processors are wanted.
+inline constexpr const char* kThreadsText = "Threads to work with (default: all processors)";
+std::uint32_t ParseThreads(const std::string& text);
+
 // What is said of a list of bands that is given and empty.
 inline constexpr const char* kNoBands = "an empty list names no band";
 

@@ -85,8 +85,7 @@ zmchost::BuildReport BuildCommand::Build(GDALDataset& dataset, zmcgdal::GdalRast
 zmchost::BuildReport BuildCommand::BuildBy(GDALDataset& dataset, zmcgdal::GdalRasterSource& pixels,
                                            zmchost::BuildOptions options) const {
     const auto count = static_cast<std::uint32_t>(ParseCount("--processes", processes, 256));
-    if (!threads.empty())
-        options.threads = static_cast<std::uint32_t>(ParseCount("--threads", threads, 1024));
+    if (!threads.empty()) options.threads = ParseThreads(threads);
     options.flush = !noFlush;
     try {
         if (count == 0) return Build(dataset, pixels, options);

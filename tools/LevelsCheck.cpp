@@ -1,8 +1,12 @@
 #include <algorithm>
-#include <cstring>
+#include <functional>
+#include <memory>
+#include <mutex>
+#include <vector>
 
-#include "format/TileWalk.h"
+#include "format/LevelGeometry.h"
 #include "host/build/LevelReduction.h"
+#include "host/raster/RasterLanes.h"
 #include "tools/Interrupt.h"
 #include "tools/Message.h"
 #include "tools/RasterView.h"
@@ -12,59 +16,111 @@
 namespace zmctools {
 namespace {
 
-// Bytes of samples and masks of the finer part of a block.
+// Bytes of samples and masks of the finer parts of the blocks of all threads.
 constexpr std::uint64_t kBlockBytes = std::uint64_t{64} << 20;
-// The same where a tile has so many that to read it once takes more.
+// The same of one where a tile has so many that to read it once takes more.
 constexpr std::uint64_t kMostBlockBytes = 4 * kBlockBytes;
 
 template <class T>
 class LevelsChecker {
 public:
     LevelsChecker(zmchost::Raster& pyramid, zmchost::Resampling method,
-                  zmchost::SampleWeights* weights)
-        : raster(pyramid), reduction(pyramid, method, weights), bands(pyramid.Bands()) {}
+                  zmchost::SampleWeights* weights, const CheckManner& checkManner)
+        : raster(pyramid),
+          manner(checkManner),
+          bands(pyramid.Bands()),
+          lanes(pyramid, ReadsMasks(weights) ? 1 : manner.threads, LaneBytes(), kBlockBytes) {
+        for (std::uint32_t lane = 0; lane < lanes.Count(); ++lane)
+            workers.push_back(std::make_unique<Worker>(lanes.At(lane), method, weights));
+    }
+
+    // Calls tell(level, differences) behind each.
+    void Check(const std::function<void(std::uint32_t, const SampleDifferences&)>& tell) {
+        std::uint64_t total = 0;
+        for (std::uint32_t level = raster.MinLevel() + 1; level <= raster.MaxLevel(); ++level)
+            total += std::uint64_t{raster.Width(level)} * raster.Height(level);
+        TerminalProgress bar("levels", !manner.quiet);
+        std::uint64_t done = 0;
+        std::mutex advancing;
+        for (std::uint32_t level = raster.MinLevel() + 1; level <= raster.MaxLevel(); ++level) {
+            // A file may claim a thousand levels that have no pixels, with many bands.
+            if (raster.Width(level) == 0 || raster.Height(level) == 0) continue;
+            for (const auto& worker : workers) worker->differences = NoDifferences();
+            const zelm::LevelGeometry blocks(raster.Width(level), raster.Height(level), BlockSide(),
+                                             0);
+            lanes.Run(std::uint64_t{blocks.tilesAcross} * blocks.tilesDown,
+                      [&](std::uint32_t lane, std::uint64_t index) {
+                          const zmchost::Window block =
+                              blocks.Tile(static_cast<std::uint32_t>(index % blocks.tilesAcross),
+                                          static_cast<std::uint32_t>(index / blocks.tilesAcross));
+                          workers[lane]->CheckBlock(level, block);
+                          const std::lock_guard lock(advancing);
+                          done += block.Pixels();
+                          if (!bar.Show(done, total)) throw Interruption(raster.Name());
+                      });
+            SampleDifferences all = NoDifferences();
+            for (const auto& worker : workers) all.Merge(worker->differences);
+            tell(level, all);
+        }
+    }
+
+private:
+    struct Worker {
+        Worker(zmchost::Raster& pyramid, zmchost::Resampling method,
+               zmchost::SampleWeights* weights)
+            : raster(pyramid), reduction(pyramid, method, weights) {}
+
+        void CheckBlock(std::uint32_t level, const zmchost::Window& block) {
+            const std::size_t samples = std::size_t{block.width} * raster.Bands();
+            stored.resize(samples * block.height);
+            raster.Read(level, block, raster.AllBands(), stored.data());
+            reduction.Load(level, block);
+            for (std::uint32_t row = 0; row < block.height; ++row)
+                differences.Take({block.x, block.y + row, block.width, 1},
+                                 stored.data() + row * samples, reduction.Row(row));
+        }
+
+        zmchost::Raster& raster;
+        zmchost::LevelReduction<T> reduction;
+        SampleDifferences differences{0, 0, 0, 0};
+        std::vector<T> stored;
+    };
+
+    zmchost::Raster& raster;
+    const CheckManner& manner;
+    std::uint32_t bands;
+    zmchost::RasterLanes lanes;
+    std::vector<std::unique_ptr<Worker>> workers;  // one for each lane
+
+    // Whoever tells of masks does so to one thread.
+    bool ReadsMasks(const zmchost::SampleWeights* weights) const {
+        for (std::uint32_t band = 0; weights && band < bands; ++band)
+            if (weights->HasMask(band)) return true;
+        return false;
+    }
+
+    SampleDifferences NoDifferences() const {
+        const std::uint32_t code = zelm::ElementTraits<T>::code;
+        return {code, code, bands, 0};
+    }
+
+    // Bytes of samples and masks of the finer part of a block of that side.
+    std::uint64_t BlockBytes(std::uint64_t side) const {
+        return side * side * 4 * bands * (sizeof(T) + 1);
+    }
+    // A lane holds a block of the least side that is worth it.
+    std::uint64_t LaneBytes() const {
+        return BlockBytes(std::max(std::uint32_t{kUsualTile}, raster.TileSide()));
+    }
 
     // A multiple of the tile's side: whole tiles are read once but for the margins. A part of a
     // tile where that is beyond what may be held.
     std::uint32_t BlockSide() const {
         std::uint32_t side = raster.TileSide();
-        const std::uint64_t most = BytesAtOnce(kBlockBytes, side);
-        const auto bytes = [&](std::uint64_t next) {
-            return next * next * 4 * bands * (sizeof(T) + 1);
-        };
-        while (side > 1 && bytes(side) > kMostBlockBytes) side /= 2;
-        while (side < 4096 && bytes(std::uint64_t{side} * 2) <= most) side *= 2;
+        const std::uint64_t most = BytesAtOnce(kBlockBytes / lanes.Count(), side);
+        while (side > 1 && BlockBytes(side) > kMostBlockBytes) side /= 2;
+        while (side < 4096 && BlockBytes(std::uint64_t{side} * 2) <= most) side *= 2;
         return side;
-    }
-
-    SampleDifferences Check(std::uint32_t level, TerminalProgress& bar, std::uint64_t& done,
-                            std::uint64_t total) {
-        const std::uint32_t code = zelm::ElementTraits<T>::code;
-        SampleDifferences differences(code, code, bands, 0);
-        const zelm::LevelGeometry blocks(raster.Width(level), raster.Height(level), BlockSide(), 0);
-        zelm::VisitTiles(blocks, blocks.Whole(), [&](const zelm::TilePart& block) {
-            CheckBlock(level, block.tile, differences);
-            done += block.tile.Pixels();
-            if (!bar.Show(done, total)) throw Interruption(raster.Name());
-        });
-        return differences;
-    }
-
-private:
-    zmchost::Raster& raster;
-    zmchost::LevelReduction<T> reduction;
-    std::uint32_t bands;
-    std::vector<T> stored;
-
-    void CheckBlock(std::uint32_t level, const zmchost::Window& block,
-                    SampleDifferences& differences) {
-        const std::size_t samples = std::size_t{block.width} * bands;
-        stored.resize(samples * block.height);
-        raster.Read(level, block, raster.AllBands(), stored.data());
-        reduction.Load(level, block);
-        for (std::uint32_t row = 0; row < block.height; ++row)
-            differences.Take({block.x, block.y + row, block.width, 1},
-                             stored.data() + row * samples, reduction.Row(row));
     }
 };
 
@@ -85,21 +141,17 @@ void Tell(const SampleDifferences& differences, std::uint32_t level, zmchost::Re
 }  // namespace
 
 CheckResult CheckLevels(zmchost::Raster& raster, zmchost::Resampling method,
-                        zmchost::SampleWeights* weights, bool quiet) {
+                        zmchost::SampleWeights* weights, const CheckManner& manner) {
     CheckResult result{"levels", {}, {}};
     if (!zmchost::SupportsElementType(method, raster.PixelType()))
         throw UsageError("--resampling", std::string(zmchost::ResamplingName(method)) +
                                              " is not defined for this pixel type");
     if (raster.MaxLevel() == raster.MinLevel()) result.skipped = "there is one level only";
-    std::uint64_t total = 0;
-    for (std::uint32_t level = raster.MinLevel() + 1; level <= raster.MaxLevel(); ++level)
-        total += std::uint64_t{raster.Width(level)} * raster.Height(level);
     zelm::VisitElementType(raster.PixelType(), [&]<class T>(std::type_identity<T>) {
-        LevelsChecker<T> checker(raster, method, weights);
-        TerminalProgress bar("levels", !quiet);
-        std::uint64_t done = 0;
-        for (std::uint32_t level = raster.MinLevel() + 1; level <= raster.MaxLevel(); ++level)
-            Tell(checker.Check(level, bar, done, total), level, method, result);
+        LevelsChecker<T>(raster, method, weights, manner)
+            .Check([&](std::uint32_t level, const SampleDifferences& differences) {
+                Tell(differences, level, method, result);
+            });
     });
     return result;
 }

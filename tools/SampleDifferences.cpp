@@ -5,6 +5,7 @@
 #include <cstring>
 #include <limits>
 #include <numeric>
+#include <tuple>
 
 #include "core/ElementTypes.h"
 #include "core/PixelVocabulary.h"
@@ -19,6 +20,12 @@ long double Part(long double a, long double b) {
     if (std::isnan(a) && std::isnan(b)) return 0;
     if (std::isnan(a) || std::isnan(b)) return std::numeric_limits<long double>::infinity();
     return a == b ? 0 : std::fabs(a - b);
+}
+
+// One more place, before its sample is counted.
+void MeetAt(BandDifference& band, std::uint32_t x, std::uint32_t y) {
+    if (band.samples == 0 || std::tie(y, x) < std::tie(band.y, band.x))
+        std::tie(band.x, band.y) = std::tie(x, y);
 }
 
 }  // namespace
@@ -65,9 +72,16 @@ void SampleDifferences::TakeSample(std::uint32_t x, std::uint32_t y, std::size_t
     BandDifference& band = bands[sample % bands.size()];
     band.greatest = std::max(band.greatest, distance);
     if (distance <= static_cast<long double>(tolerance)) return;
-    if (band.samples++ == 0) {
-        band.x = x + static_cast<std::uint32_t>(sample / bands.size());
-        band.y = y;
+    MeetAt(band, x + static_cast<std::uint32_t>(sample / bands.size()), y);
+    ++band.samples;
+}
+
+void SampleDifferences::Merge(const SampleDifferences& other) {
+    for (std::size_t i = 0; i < bands.size(); ++i) {
+        const BandDifference& from = other.bands[i];
+        bands[i].greatest = std::max(bands[i].greatest, from.greatest);
+        if (from.samples != 0) MeetAt(bands[i], from.x, from.y);
+        bands[i].samples += from.samples;
     }
 }
 

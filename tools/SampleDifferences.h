@@ -17,7 +17,7 @@ namespace zmctools {
 struct BandDifference {
     std::uint64_t samples = 0;  // that differ by more than the tolerance
     long double greatest = 0;   // difference, of all samples
-    std::uint32_t x = 0;        // the first sample that differs
+    std::uint32_t x = 0;        // the first sample that differs, line by line
     std::uint32_t y = 0;
 };
 
@@ -28,6 +28,9 @@ public:
 
     // Takes a window of both rasters, pixel-interleaved, without gaps.
     void Take(const zmchost::Window& window, const void* first, const void* second);
+
+    // Takes all that `other`, of the same types and bands, has found elsewhere.
+    void Merge(const SampleDifferences& other);
 
     const std::vector<BandDifference>& Bands() const { return bands; }
     std::uint64_t Samples() const;  // that differ, of all bands

@@ -1,13 +1,15 @@
 #include <algorithm>
 #include <cmath>
 #include <limits>
-#include <set>
+#include <map>
 #include <span>
 #include <utility>
 #include <vector>
 
+#include "host/build/SampleGathering.h"
 #include "host/statistics/BandStatistics.h"
 #include "host/statistics/Histogram.h"
+#include "host/statistics/ValueCounter.h"
 #include "tools/Interrupt.h"
 #include "tools/Message.h"
 #include "tools/RasterView.h"
@@ -33,35 +35,11 @@ bool Near(double stored, double computed, double error) {
                std::numeric_limits<double>::denorm_min();
 }
 
-// Samples and masks that are held at once.
-constexpr std::uint64_t kStripBytes = std::uint64_t{48} << 20;
-
-// Calls take(row, mask, width) for every line of level 0, or the parts of each, with those bands.
-template <class T, class Take>
-void WalkLines(zmchost::Raster& raster, std::span<const std::uint32_t> bands, const char* label,
-               bool quiet, Take&& take) {
-    const Strips strips{{0, 0, raster.Width(), raster.Height()},
-                        bands.size() * (sizeof(T) + 1),
-                        kStripBytes,
-                        raster.TileSide()};
-    TerminalProgress bar(label, !quiet);
-    std::vector<T> pixels;
-    std::vector<unsigned char> mask;
-    strips.Walk(raster.Name(), bar, [&](const zmchost::Window& strip) {
-        const std::size_t stride = std::size_t{strip.width} * bands.size();
-        pixels.resize(stride * strip.height);
-        mask.assign(stride * strip.height, 0);
-        raster.Read(0, strip, bands, pixels.data(), mask.data());
-        for (std::uint32_t row = 0; row < strip.height; ++row)
-            take(pixels.data() + row * stride, mask.data() + row * stride, strip.width);
-    });
-}
-
 template <class T>
 class StatisticsChecker {
 public:
-    StatisticsChecker(zmchost::Raster& pyramid, bool beQuiet, CheckResult& into)
-        : raster(pyramid), quiet(beQuiet), result(into) {}
+    StatisticsChecker(zmchost::Raster& pyramid, const CheckManner& how, CheckResult& into)
+        : raster(pyramid), manner(how), result(into) {}
 
     void Run() {
         const auto histograms = raster.Histograms<T>();
@@ -72,40 +50,79 @@ public:
             result.skipped = "the file has no statistics";
             return;
         }
-        CheckRecords();
-        if constexpr (!zelm::kIsComplex<T>) CheckHistograms(histograms);
+        if constexpr (zmchost::kCountsEveryValue<T>) {
+            CheckByValues(histograms);
+        } else {
+            CheckRecords();
+            if constexpr (!zelm::kIsComplex<T>) CheckHistograms(histograms);
+        }
     }
 
 private:
     zmchost::Raster& raster;
-    bool quiet;
+    const CheckManner& manner;
     CheckResult& result;
 
-    // Exact sums of reals take up to 200 kB for each band.
+    // Exact sums and tables of values are large.
     static constexpr std::size_t kBandsAtOnce = 128;
 
     template <class Check>
-    static void InGroups(std::span<const std::uint32_t> bands, Check&& check) {
-        for (std::size_t done = 0; done < bands.size(); done += kBandsAtOnce)
-            check(bands.subspan(done, std::min(kBandsAtOnce, bands.size() - done)));
+    static void InGroups(const std::vector<std::uint32_t>& bands, Check&& check) {
+        const std::span<const std::uint32_t> all(bands);
+        for (std::size_t done = 0; done < all.size(); done += kBandsAtOnce)
+            check(all.subspan(done, std::min(kBandsAtOnce, all.size() - done)));
     }
 
-    void CheckRecords() {
+    // Lets each of `gatherers`, which take so many bytes together, have its band of level 0.
+    template <class Gatherer>
+    void Gather(const char* label, std::span<const std::uint32_t> bands, std::uint64_t bytes,
+                std::vector<Gatherer>& gatherers) {
+        TerminalProgress bar(label, !manner.quiet);
+        const std::uint64_t total = std::uint64_t{raster.Width()} * raster.Height();
+        std::uint64_t done = 0;
+        zmchost::GatherSamples<T>(raster, manner.threads, bytes, bands, gatherers,
+                                  [&](std::uint64_t pixels) {
+                                      done += pixels;
+                                      if (!bar.Show(done, total)) throw Interruption(raster.Name());
+                                  });
+    }
+
+    std::vector<std::uint32_t> RecordedBands() const {
         std::vector<std::uint32_t> bands;
         for (std::uint32_t band = 0; band < raster.Bands(); ++band)
             if (raster.HasStatistics(band)) bands.push_back(band);
-        InGroups(bands, [this](std::span<const std::uint32_t> group) { CheckRecords(group); });
+        return bands;
+    }
+
+    // How often each value occurs tells both records and histograms.
+    void CheckByValues(const std::vector<zelm::RasterBandHistogram<T>>& stored) {
+        std::vector<Histogram> histograms = UsualOnes(stored);
+        ByBand byBand = ByBandOf(histograms);
+        for (const std::uint32_t band : RecordedBands()) byBand[band];
+        InGroups(BandsOf(byBand), [&](std::span<const std::uint32_t> group) {
+            using Counter = zmchost::ValueCounter<T>;
+            std::vector<Counter> counters(group.size());
+            Gather("statistics", group, group.size() * Counter::kBytes, counters);
+            for (std::size_t i = 0; i < group.size(); ++i) {
+                if (raster.HasStatistics(group[i]))
+                    Compare(raster.Statistics<T>(group[i]),
+                            counters[i].Statistics().Stats(group[i]));
+                for (Histogram* const each : byBand[group[i]]) counters[i].AddTo(each->computed);
+            }
+        });
+        for (const Histogram& each : histograms) Compare(*each.stored, each.computed);
+    }
+
+    void CheckRecords() {
+        InGroups(RecordedBands(),
+                 [this](std::span<const std::uint32_t> group) { CheckRecords(group); });
     }
 
     void CheckRecords(std::span<const std::uint32_t> bands) {
-        const auto count = static_cast<std::uint32_t>(bands.size());
-        std::vector<zmchost::BandAccumulator<T>> sums(count);
-        WalkLines<T>(raster, bands, "statistics", quiet,
-                     [&](const T* row, const unsigned char* mask, std::uint32_t width) {
-                         for (std::uint32_t i = 0; i < count; ++i)
-                             sums[i].AddRow(row, mask, i, count, width);
-                     });
-        for (std::uint32_t i = 0; i < count; ++i)
+        using Sums = zmchost::BandAccumulator<T>;
+        std::vector<Sums> sums(bands.size());
+        Gather("statistics", bands, bands.size() * Sums::kBytes, sums);
+        for (std::size_t i = 0; i < bands.size(); ++i)
             Compare(raster.Statistics<T>(bands[i]), sums[i].Stats(bands[i]));
     }
 
@@ -152,15 +169,21 @@ private:
         zmchost::HistogramAccumulator<T> computed;
     };
 
+    std::vector<Histogram> UsualOnes(
+        const std::vector<zelm::RasterBandHistogram<T>>& stored) const {
+        std::vector<Histogram> histograms;
+        for (const auto& record : stored)
+            if (IsUsual(record))
+                histograms.push_back({&record, zmchost::HistogramAccumulator<T>(Bins(record))});
+        return histograms;
+    }
+
     void CheckHistograms(const std::vector<zelm::RasterBandHistogram<T>>& stored) {
         if constexpr (kExactEnds) {
-            std::vector<Histogram> histograms;
-            for (const auto& record : stored)
-                if (IsUsual(record))
-                    histograms.push_back({&record, zmchost::HistogramAccumulator<T>(Bins(record))});
-            const std::vector<std::uint32_t> bands = BandsOf(histograms);
-            InGroups(bands,
-                     [&](std::span<const std::uint32_t> group) { Count(histograms, group); });
+            std::vector<Histogram> histograms = UsualOnes(stored);
+            const ByBand byBand = ByBandOf(histograms);
+            InGroups(BandsOf(byBand),
+                     [&](std::span<const std::uint32_t> group) { Count(byBand, group); });
             for (const Histogram& each : histograms) Compare(*each.stored, each.computed);
         } else {
             static_cast<void>(stored);
@@ -178,26 +201,47 @@ private:
         return {record.minimum, record.maximum, record.binCount};
     }
 
-    static std::vector<std::uint32_t> BandsOf(const std::vector<Histogram>& histograms) {
-        std::set<std::uint32_t> bands;
-        for (const Histogram& each : histograms) bands.insert(each.stored->band);
-        return {bands.begin(), bands.end()};
+    // A file may have several of one band.
+    using ByBand = std::map<std::uint32_t, std::vector<Histogram*>>;
+
+    static ByBand ByBandOf(std::vector<Histogram>& histograms) {
+        ByBand found;
+        for (Histogram& each : histograms) found[each.stored->band].push_back(&each);
+        return found;
     }
 
-    // Counts those of these bands, which are in order.
-    void Count(std::vector<Histogram>& histograms, std::span<const std::uint32_t> bands) {
-        std::vector<std::pair<Histogram*, std::uint32_t>> counted;
-        for (Histogram& each : histograms) {
-            const auto found = std::lower_bound(bands.begin(), bands.end(), each.stored->band);
-            if (found != bands.end() && *found == each.stored->band)
-                counted.emplace_back(&each, static_cast<std::uint32_t>(found - bands.begin()));
+    static std::vector<std::uint32_t> BandsOf(const ByBand& byBand) {
+        std::vector<std::uint32_t> bands;
+        for (const auto& entry : byBand) bands.push_back(entry.first);
+        return bands;
+    }
+
+    // What gathers the histograms of a band.
+    struct BandHistograms {
+        std::vector<zmchost::HistogramAccumulator<T>> counted;
+
+        void AddRow(const T* row, const unsigned char* mask, std::uint32_t band,
+                    std::uint32_t bands, std::uint32_t width) {
+            for (auto& each : counted) each.AddRow(row, mask, band, bands, width);
         }
-        const auto count = static_cast<std::uint32_t>(bands.size());
-        WalkLines<T>(raster, bands, "histograms", quiet,
-                     [&](const T* row, const unsigned char* mask, std::uint32_t width) {
-                         for (const auto& [histogram, place] : counted)
-                             histogram->computed.AddRow(row, mask, place, count, width);
-                     });
+        void Merge(const BandHistograms& other) {
+            for (std::size_t i = 0; i < counted.size(); ++i) counted[i].Merge(other.counted[i]);
+        }
+    };
+
+    // Counts those of these bands.
+    void Count(const ByBand& byBand, std::span<const std::uint32_t> bands) {
+        std::vector<BandHistograms> gatherers(bands.size());
+        std::uint64_t bytes = 0;
+        for (std::size_t i = 0; i < bands.size(); ++i)
+            for (const Histogram* const each : byBand.at(bands[i])) {
+                gatherers[i].counted.push_back(each->computed);
+                bytes += each->computed.Counts().size() * sizeof(std::uint64_t);
+            }
+        Gather("histograms", bands, bytes, gatherers);
+        for (std::size_t i = 0; i < bands.size(); ++i)
+            for (std::size_t k = 0; Histogram* const each : byBand.at(bands[i]))
+                each->computed = std::move(gatherers[i].counted[k++]);
     }
 
     void Compare(const zelm::RasterBandHistogram<T>& stored,
@@ -215,10 +259,10 @@ private:
 
 }  // namespace
 
-CheckResult CheckStatistics(zmchost::Raster& raster, bool quiet) {
+CheckResult CheckStatistics(zmchost::Raster& raster, const CheckManner& manner) {
     CheckResult result{"statistics", {}, {}};
     zelm::VisitElementType(raster.PixelType(), [&]<class T>(std::type_identity<T>) {
-        StatisticsChecker<T>(raster, quiet, result).Run();
+        StatisticsChecker<T>(raster, manner, result).Run();
     });
     return result;
 }

@@ -25,6 +25,7 @@ public:
 private:
     std::string file;
     std::string bands;
+    std::string threads = "0";
 
     std::vector<std::uint32_t> Renew() const;
     void Report(const std::vector<std::uint32_t>& renewed) const;
@@ -34,6 +35,7 @@ void StatsCommand::Describe(OptionTable& table) {
     table.Text("FILE", file, "Pyramid whose statistics to renew").Required();
     table.Text("--bands", bands, "Bands to renew them of, counted from 1 (default all)")
         .Named("3,2,1");
+    table.Text("--threads", threads, kThreadsText).Named("N");
     table.Footer(
         "Examples:\n"
         "  zmcraster stats scene.pyr\n"
@@ -63,7 +65,8 @@ std::vector<std::uint32_t> StatsCommand::Renew() const {
     TakeGdalError(file);
     try {
         TerminalProgress bar("stats", !quiet);
-        zmcgdal::RenewRecords(*dataset, list, [&](double share) { return bar.ShowShare(share); });
+        zmcgdal::RenewRecords(*dataset, list, ParseThreads(threads),
+                              [&](double share) { return bar.ShowShare(share); });
     } catch (const zmchost::Cancelled&) {
         throw Interruption(file);
     }

@@ -60,7 +60,7 @@ void UpdateCommand::Describe(OptionTable& table) {
         .Required()
         .Named("X,Y,WIDTH,HEIGHT|SCENE");
     words.DescribeMaking(table);
-    table.Text("--threads", threads, "Threads to work with (default: all processors)").Named("N");
+    table.Text("--threads", threads, kThreadsText).Named("N");
     table.Flag("--keep-records", keepRecords,
                "With SOURCE: leave TARGET.zmcrecords for the next update");
     table.Footer(
@@ -140,7 +140,7 @@ zmchost::UpdateReport UpdateCommand::Update(GDALDataset& dataset, zmcgdal::GdalR
                                             const zmchost::UpdateRecords& records) const {
     TerminalProgress bar(fs::path(words.target).filename().string(), !quiet);
     zmchost::BuildOptions options = words.Options(pixels.Props());
-    options.threads = static_cast<std::uint32_t>(ParseCount("--threads", threads, 1024));
+    options.threads = ParseThreads(threads);
     options.progress = [&](const zmchost::BuildProgress& state) {
         return bar.Show(state.done, state.total);
     };

@@ -7,6 +7,7 @@
 #ifndef ZMC_TOOLS_VERIFICATION_H
 #define ZMC_TOOLS_VERIFICATION_H
 
+#include <cstdint>
 #include <optional>
 #include <string>
 #include <vector>
@@ -24,16 +25,21 @@ struct CheckResult {
     std::vector<std::string> problems;
 };
 
+struct CheckManner {
+    bool quiet = false;         // without a bar
+    std::uint32_t threads = 0;  // 0: as many as the machine has processors
+};
+
 // Header against the module's reading of it, and the file's length.
 CheckResult CheckStructure(const zmchost::PyramidFileInfo& info, const zmchost::Raster& raster);
 CheckResult CheckCompleteness(const zmchost::PyramidFileInfo& info);
 // The metadata document is well-formed, and its records are of bands and levels that there are.
 CheckResult CheckDocuments(const zmchost::PyramidFileInfo& info, const zmchost::Raster& raster);
 // Stored statistics and histograms against those of level 0, as exact as a file keeps them.
-CheckResult CheckStatistics(zmchost::Raster& raster, bool quiet);
+CheckResult CheckStatistics(zmchost::Raster& raster, const CheckManner& manner);
 // Every coarser level against what the method makes of the level below it; `weights` may be null.
 CheckResult CheckLevels(zmchost::Raster& raster, zmchost::Resampling method,
-                        zmchost::SampleWeights* weights, bool quiet);
+                        zmchost::SampleWeights* weights, const CheckManner& manner);
 // Level 0 against bands of another raster.
 CheckResult CheckSource(zmchost::Raster& raster, RasterView& source,
                         const std::vector<std::uint32_t>& sourceBands, bool quiet);

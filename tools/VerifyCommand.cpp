@@ -28,6 +28,7 @@ private:
     std::string weights = "auto";
     std::string source;
     std::string bands;
+    std::string threads = "0";
     std::vector<CheckResult> results;
 
     void CheckPixels(zmchost::Raster& raster, bool documentIsGood);
@@ -55,6 +56,7 @@ void VerifyCommand::Describe(OptionTable& table) {
               "Bands of SOURCE that the file was built from, counted from 1 (default all)")
         .Named("3,2,1")
         .Filled(kNoBands);
+    table.Text("--threads", threads, kThreadsText).Named("N");
     table.Footer(
         "Examples:\n"
         "  zmcraster verify scene.pyr\n"
@@ -87,13 +89,14 @@ void VerifyCommand::CheckPixels(zmchost::Raster& raster, bool documentIsGood) {
     const DatasetPtr dataset = OpenDataset(raster.Name());
     TakeNoDataValues(raster, *dataset);
     zmcgdal::GdalRasterSource shown(*dataset);
+    const CheckManner manner{quiet, ParseThreads(threads)};
     results.push_back(documentIsGood
-                          ? CheckStatistics(raster, quiet)
+                          ? CheckStatistics(raster, manner)
                           : CheckResult{"statistics", "the document cannot be read", {}});
     const auto usual = documentIsGood && HasPalette(raster) ? zmchost::Resampling::Mode
                                                             : zmchost::Resampling::Average;
     results.push_back(CheckLevels(raster, zmchost::ParseResampling(resampling).value_or(usual),
-                                  weights == "auto" ? &shown : nullptr, quiet));
+                                  weights == "auto" ? &shown : nullptr, manner));
     if (source.empty()) return;
     const auto view = OpenView(source);
     results.push_back(CheckSource(raster, *view, ParseBands(bands, view->Bands()), quiet));

@@ -10,8 +10,8 @@
 #include "core/PixelVocabulary.h"
 #include "files/FileSource.h"
 #include "format/DocumentLimits.h"
-#include "format/TileWalk.h"
 #include "host/base/Error.h"
+#include "host/build/SampleGathering.h"
 #include "host/file/MetadataDocument.h"
 #include "host/file/StoredRecords.h"
 #include "host/journal/MetadataJournal.h"
@@ -27,11 +27,8 @@ namespace {
 
 constexpr const char* kRenew = "renew its statistics";
 
-// Exact sums of reals take up to 200 kB for each band, tables of 16-bit values 512.
+// Exact sums and tables of values are large.
 constexpr std::size_t kBandsAtOnce = 128;
-
-// Bytes of samples and masks that are held at once.
-constexpr std::uint64_t kPieceBytes = std::uint64_t{16} << 20;
 
 template <class T>
 class Renewal {
@@ -96,14 +93,14 @@ private:
     void ComputeGroup(std::span<const std::uint32_t> bands) {
         if constexpr (kCountsEveryValue<T>) {
             std::vector<ValueCounter<T>> counters(bands.size());
-            Walk(bands, counters);
+            Walk(bands, ValueCounter<T>::kBytes, counters);
             for (std::size_t i = 0; i < bands.size(); ++i) {
                 statistics.push_back(counters[i].Statistics().Stats(bands[i]));
                 histograms.push_back(counters[i].Histogram(request.bins).Histogram(bands[i]));
             }
         } else {
             std::vector<BandAccumulator<T>> sums(bands.size());
-            Walk(bands, sums);
+            Walk(bands, BandAccumulator<T>::kBytes, sums);
             std::vector<HistogramAccumulator<T>> counts;
             for (std::size_t i = 0; i < bands.size(); ++i) {
                 statistics.push_back(sums[i].Stats(bands[i]));
@@ -111,56 +108,30 @@ private:
                 counts.emplace_back(
                     HistogramBins<T>::ForBand(found.minimum, found.maximum, request.bins));
             }
-            Walk(bands, counts);
+            Walk(bands, request.bins * sizeof(std::uint64_t), counts);
             for (std::size_t i = 0; i < bands.size(); ++i)
                 histograms.push_back(counts[i].Histogram(bands[i]));
         }
     }
 
-    // Lets each of `gatherers` take its band of level 0.
+    // Lets each of `gatherers`, which take so many bytes each, have its band of level 0.
     template <class Gatherer>
-    void Walk(std::span<const std::uint32_t> bands, std::vector<Gatherer>& gatherers) {
-        const auto count = static_cast<std::uint32_t>(bands.size());
+    void Walk(std::span<const std::uint32_t> bands, std::size_t bytes,
+              std::vector<Gatherer>& gatherers) {
         const std::uint32_t level = raster.MinLevel();
         const double pixels = static_cast<double>(raster.Width(level)) * raster.Height(level);
         double done = 0;
-        std::vector<T> samples;
-        std::vector<unsigned char> mask;
-        const zelm::LevelGeometry grid = raster.Header().Geometry(level);
-        zelm::VisitTiles(grid, grid.Whole(), [&](const zelm::TilePart& part) {
-            for (const Window& piece : PiecesOf(part.tile, count)) {
-                const std::size_t stride = std::size_t{piece.width} * count;
-                samples.resize(stride * piece.height);
-                mask.assign(samples.size(), 0);
-                raster.Read(level, piece, bands, samples.data(), mask.data());
-                for (std::uint32_t i = 0; i < count; ++i)
-                    for (std::uint32_t row = 0; row < piece.height; ++row)
-                        gatherers[i].AddRow(samples.data() + row * stride,
-                                            mask.data() + row * stride, i, count, piece.width);
-                done += static_cast<double>(piece.Pixels());
+        GatherSamples<T>(
+            raster, request.threads, bands.size() * bytes, bands, gatherers,
+            [&](std::uint64_t further) {
+                done += static_cast<double>(further);
                 Advance((static_cast<double>(walk) + done / pixels) / static_cast<double>(walks));
-            }
-        });
+            });
         ++walk;
     }
 
     void Advance(double share) const {
         if (request.progress && !request.progress(share)) throw Cancelled(raster.Name(), kRenew);
-    }
-
-    // A tile in runs of rows, or of parts of a row, of no more bytes than are held.
-    static std::vector<Window> PiecesOf(const Window& tile, std::uint32_t count) {
-        const std::uint64_t most =
-            std::max<std::uint64_t>(kPieceBytes / (std::uint64_t{count} * (sizeof(T) + 1)), 1);
-        const auto width = static_cast<std::uint32_t>(std::min<std::uint64_t>(tile.width, most));
-        const auto height =
-            static_cast<std::uint32_t>(std::clamp<std::uint64_t>(most / width, 1, tile.height));
-        std::vector<Window> pieces;
-        for (std::uint32_t y = 0; y < tile.height; y += height)
-            for (std::uint32_t x = 0; x < tile.width; x += width)
-                pieces.push_back({tile.x + x, tile.y + y, std::min(width, tile.width - x),
-                                  std::min(height, tile.height - y)});
-        return pieces;
     }
 };
 

@@ -26,7 +26,9 @@ struct RenewalRequest {
     std::vector<std::uint32_t> bands;              // from 0; empty: all of them
     std::map<std::uint32_t, double> noDataValues;  // by band
     std::uint32_t bins = 256;                      // of a histogram; one per value for 8-bit types
-    // Called now and then with the share of the work that is done; false cancels.
+    std::uint32_t threads = 0;                     // 0: as many as the machine has processors
+    // Called now and then with the share of the work that is done, one call at a time, on any of
+    // the threads; false cancels.
     std::function<bool(double share)> progress;
 };
 

@@ -44,6 +44,8 @@ public:
     PyramidHeader ReadHeader() const { return PyramidHeader::Read(*recording, file); }
     // For reading it without the module; what fails there is told by TakeFailure as well.
     zelm::files::ByteSource& Source() const { return *recording; }
+    // What was lent, for whoever lends it once more; what fails through that is not told here.
+    const std::shared_ptr<zelm::files::ByteSource>& Lent() const { return recording->Source(); }
     // The name in the file system; empty for a source of another kind.
     std::string PlainName() const;
 

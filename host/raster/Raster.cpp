@@ -54,12 +54,20 @@ template <class T>
 void MarkSamples(const zelm::RasterProps& props, std::span<const std::uint32_t> bands,
                  std::uint64_t pixels, const T* samples, unsigned char* mask) {
     const auto rules = RulesOf<T>(props, bands);
+    const auto mark = [](const zelm::NoDataRule<T>& rule, const T& sample, unsigned char& byte) {
+        byte = static_cast<unsigned char>((byte & 0xFE) | (rule.Marks(sample) ? 1 : 0));
+    };
+    const zelm::NoDataRule<T> rule = rules.front();
+    const bool alike = std::all_of(rules.begin(), rules.end(), [&](const auto& other) {
+        return other.hasValue == rule.hasValue && (!rule.hasValue || other.value == rule.value);
+    });
+    if (alike) {  // as a rule; a loop that becomes vector code
+        const std::uint64_t count = pixels * rules.size();
+        for (std::uint64_t i = 0; i < count; ++i) mark(rule, samples[i], mask[i]);
+        return;
+    }
     for (std::uint64_t i = 0; i < pixels; ++i)
-        for (const auto& rule : rules) {
-            const unsigned char bit = rule.Marks(*samples++) ? 1 : 0;
-            *mask = static_cast<unsigned char>((*mask & 0xFE) | bit);
-            ++mask;
-        }
+        for (const auto& each : rules) mark(each, *samples++, *mask++);
 }
 
 template <class T>
@@ -135,6 +143,13 @@ Raster Raster::Open(ModulePtr module, std::shared_ptr<zelm::files::ByteSource> s
                     const std::string& name) {
     if (!source) throw Error(name, "open the raster", "there is no source");
     return OpenLent(std::move(module), name, std::make_shared<LentFile>(std::move(source), name));
+}
+
+Raster Raster::Another() const {
+    if (!file) throw Error(name, "open the raster", "it has no file");
+    Raster other = Open(module, file->Lent(), name);
+    other.SetNoDataValues(props.noDataValues);
+    return other;
 }
 
 Raster Raster::OpenLent(ModulePtr module, const std::string& name, std::shared_ptr<LentFile> file) {
@@ -332,8 +347,15 @@ void Raster::ReadTile(std::uint32_t level, const Window& window,
                            window.width, window.height, list, static_cast<std::int32_t>(level),
                            static_cast<T*>(pixels), nullptr);
     });
-    CheckDisk("read " + Describe(window));
-    if (!read) throw Error(name, "read " + Describe(window), "the module refuses");
+    CheckMoved("read", window, read);
+}
+
+// The words for an error are made where there is one.
+void Raster::CheckMoved(const char* verb, const Window& window, bool taken) const {
+    const std::string failure = TakeFailure();
+    if (taken && failure.empty()) return;
+    throw Error(name, std::string(verb) + " " + Describe(window),
+                failure.empty() ? "the module refuses" : failure);
 }
 
 // Tile by tile, so that the module's 32-bit sizes and its work memory stay small.
@@ -409,8 +431,7 @@ void Raster::WriteTile(std::uint32_t level, const Window& window,
                                   list, static_cast<std::int32_t>(level),
                                   static_cast<T*>(const_cast<void*>(pixels)), cleanMask.data());
     });
-    CheckDisk("write " + Describe(window));
-    if (!written) throw Error(name, "write " + Describe(window), "the module refuses");
+    CheckMoved("write", window, written);
 }
 
 // Whether samples of these bands fill all that a tile has in the file, or whole planes of it.

@@ -58,6 +58,10 @@ public:
     static Raster Open(ModulePtr module, std::shared_ptr<zelm::files::ByteSource> source,
                        const std::string& name);
 
+    // Another raster on the open file of this one, with the same no-data values: for a thread of
+    // its own. Neither knows what the other changes. Throws Error for a memory raster.
+    Raster Another() const;
+
     // Lays out a new pyramid with the levels from 0 to maxLevel, replacing a file of that name. Of
     // `props` the size, bands, pixel type, tileLines (above 1: ordering Blocked) and no-data values
     // count; the file is always pixel-interleaved. Nothing protects the old file: to replace one
@@ -214,6 +218,7 @@ private:
                   void* pixels) const;
     void WriteTile(std::uint32_t level, const Window& window, std::span<const std::uint32_t> bands,
                    const void* pixels);
+    void CheckMoved(const char* verb, const Window& window, bool taken) const;
     bool FillsTiles(std::span<const std::uint32_t> bands) const;
     void ReadTiles(std::uint32_t level, const Window& window, std::span<const std::uint32_t> bands,
                    unsigned char* pixels) const;

@@ -7,7 +7,9 @@
 #ifndef ZMC_HOST_STATISTICS_BANDSTATISTICS_H
 #define ZMC_HOST_STATISTICS_BANDSTATISTICS_H
 
+#include <cstddef>
 #include <cstdint>
+#include <type_traits>
 
 #include "core/ElementTypes.h"
 #include "dispatch/NoDataRule.h"
@@ -42,6 +44,9 @@ public:
     // the population. Without a valid sample, and for complex types, whose values have no order
     // and no single sum, no flag is set; nor for a value that a double cannot hold.
     zelm::RasterBandStats<T> Stats(std::uint32_t band) const;
+
+    // What one takes at the most, about: sums of reals have a place for every exponent.
+    static constexpr std::size_t kBytes = std::is_floating_point_v<T> ? 25000 * sizeof(T) : 100;
 
 private:
     std::uint64_t count = 0;

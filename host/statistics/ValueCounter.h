@@ -96,13 +96,14 @@ public:
         return histogram;
     }
 
-private:
+    // Lets an accumulator of T take all that was seen.
     template <class Accumulator>
     void AddTo(Accumulator& accumulator) const {
         for (std::size_t i = 0; i < kValues; ++i)
             accumulator.AddRepeated(static_cast<T>(static_cast<Index>(i)), CountAt(i));
     }
 
+private:
     std::uint64_t CountAt(std::size_t place) const {
         return kTables == 1 ? counts[place] : counts[place] + counts[place + kValues];
     }

@@ -65,6 +65,22 @@ class Verify(ToolTest):
         self.assertEqual(self.differing("picture.pyr", "--against", "picture.tif"),
                          ["statistics", "levels", "source"])
 
+    def test_threads_find_the_same(self):
+        geotiff(self.path("source.tif"), samples("Byte", 1500, 1400, 3), nodata=9)
+        self.good("build", "source.tif", "made.pyr")
+        file = Pyramid(self.path("made.pyr"))
+        good = self.document("verify", "made.pyr", "--threads", "1")
+        self.assertEqual(self.document("verify", "made.pyr", "--threads", "3"), good)
+        for pixel in (600 * 256 + 40, 7, 500000, 1200000):  # of level 0, in several blocks
+            self.poke("made.pyr", file.offset(0) + 3 * pixel + 1)
+        self.poke("made.pyr", file.offset(1) + 3 * 300000)
+        alone = self.run_tool("verify", "made.pyr", "--threads", "1")
+        self.assertEqual(alone.returncode, 3)
+        self.assertIn("level 1, band 2: 4 samples are not what average", alone.stdout)
+        for threads in ("2", "5"):
+            together = self.run_tool("verify", "made.pyr", "--threads", threads)
+            self.assertEqual(together.stdout, alone.stdout)
+
     def test_statistics(self):
         self.pyramid()
         file = Pyramid(self.path("picture.pyr"))
