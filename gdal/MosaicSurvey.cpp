@@ -302,7 +302,10 @@ Bounds BoundsOf(const Finding& finding, OGRCoordinateTransformation* way) {
     std::vector<int> known(xs.size(), TRUE);
     if (way) {
         const ErrorCatcher errors(CE_Failure);
-        way->Transform(static_cast<int>(xs.size()), xs.data(), ys.data(), nullptr, known.data());
+        // The number of points has another type in the class from version to version, and the same
+        // one here.
+        OCTTransformEx(OGRCoordinateTransformation::ToHandle(way), static_cast<int>(xs.size()),
+                       xs.data(), ys.data(), nullptr, known.data());
     }
     Bounds bounds;
     for (std::size_t i = 0; i < xs.size(); ++i) {
