@@ -1,7 +1,6 @@
 #include "host/raster/RasterLanes.h"
 
 #include <oneapi/tbb/parallel_for.h>
-#include <oneapi/tbb/partitioner.h>
 
 #include <algorithm>
 #include <atomic>

@@ -36,7 +36,7 @@ protected:
     std::optional<MemorySource<short>> source;
 
     Raster Built(Ordering ordering = Ordering::Auto, std::uint32_t bands = 3) {
-        source.emplace(700u, 600u, bands);
+        source.emplace(400u, 300u, bands);
         source->FillWithNoise(1);
         BuildOptions options;
         options.ordering = ordering;
@@ -89,11 +89,11 @@ TEST_F(Lanes, WhatOneThrowsEndsAllAndComesOut) {
 TEST_F(Lanes, ReadTheOpenFileWhateverHasItsName) {
     Raster raster = Built();
     raster.SetNoDataValues({{1, 3.0}});
-    const std::vector<short> before = raster.Read<short>(0, {0, 0, 700, 600});
+    const std::vector<short> before = raster.Read<short>(0, {0, 0, 400, 300});
     std::filesystem::rename(folder / "a.zmc", folder / "gone.zmc");
     zmctest::WriteText(folder / "a.zmc", "no pyramid");
     Raster other = raster.Another();
-    EXPECT_EQ(other.Read<short>(0, {0, 0, 700, 600}), before);
+    EXPECT_EQ(other.Read<short>(0, {0, 0, 400, 300}), before);
     EXPECT_EQ(other.NoDataValue(1), 3.0);
     EXPECT_EQ(other.NoDataValue(0), std::nullopt);
 }
@@ -124,7 +124,7 @@ TEST_F(Lanes, GatherWhatAPlainLoopFinds) {
             std::uint64_t pixels = 0;
             GatherSamples<short>(raster, threads, 100, bands, found,
                                  [&](std::uint64_t further) { pixels += further; });
-            EXPECT_EQ(pixels, 700u * 600u);
+            EXPECT_EQ(pixels, 400u * 300u);
             for (std::size_t i = 0; i < 2; ++i) {
                 const auto a = found[i].Stats(bands[i]), b = expected[i].Stats(bands[i]);
                 EXPECT_EQ(found[i].Count(), expected[i].Count());
