@@ -147,13 +147,16 @@ Raster Raster::Open(ModulePtr module, std::shared_ptr<zelm::files::ByteSource> s
 
 Raster Raster::Another() const {
     if (!file) throw Error(name, "open the raster", "it has no file");
-    Raster other = Open(module, file->Lent(), name);
+    Raster other = OpenLent(module, name, std::make_shared<LentFile>(file->Lent(), name), header);
     other.SetNoDataValues(props.noDataValues);
+    other.records = records;
+    other.recordsExpire = recordsExpire;
     return other;
 }
 
-Raster Raster::OpenLent(ModulePtr module, const std::string& name, std::shared_ptr<LentFile> file) {
-    const PyramidHeader header = file->ReadHeader();
+Raster Raster::OpenLent(ModulePtr module, const std::string& name, std::shared_ptr<LentFile> file,
+                        const std::optional<PyramidHeader>& known) {
+    const PyramidHeader header = known ? *known : file->ReadHeader();
     const zelm::RasterDataConnectionPtr connection = module->OpenPyramid(file->Name());
     const std::string failure = file->TakeFailure();
     if (!connection || !failure.empty())

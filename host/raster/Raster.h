@@ -58,8 +58,9 @@ public:
     static Raster Open(ModulePtr module, std::shared_ptr<zelm::files::ByteSource> source,
                        const std::string& name);
 
-    // Another raster on the open file of this one, with the same no-data values: for a thread of
-    // its own. Neither knows what the other changes. Throws Error for a memory raster.
+    // Another raster on the open file of this one, with the same no-data values and what is known
+    // of its header and records: for a thread of its own. Neither knows what the other changes.
+    // Throws Error for a memory raster.
     Raster Another() const;
 
     // Lays out a new pyramid with the levels from 0 to maxLevel, replacing a file of that name. Of
@@ -204,7 +205,8 @@ public:
 private:
     Raster(ModulePtr holder, std::string rasterName, zelm::RasterDataConnectionPtr opened);
     static Raster OpenLent(ModulePtr module, const std::string& name,
-                           std::shared_ptr<LentFile> file);
+                           std::shared_ptr<LentFile> file,
+                           const std::optional<PyramidHeader>& known = std::nullopt);
     void TakeReader();
     zelm::LevelGeometry Geometry(std::uint32_t level) const;
     void CheckType(std::uint32_t pixelType) const;

@@ -296,12 +296,18 @@ def test_python_runs_while_pixels_are_read(folder):
                 done.wait(0.0001)
         counter = threading.Thread(target=count)
         counter.start()
-        before = len(counted)
-        raster.read(out=out)
-        during = len(counted) - before
+        # On a machine that is busy with other things the counter may get no processor for a while; of a read
+        # that kept Python to itself it would see the end alone.
+        during = 0
+        for _ in range(50):
+            before = len(counted)
+            raster.read(out=out)
+            during = max(during, len(counted) - before)
+            if during > 2:
+                break
         done.set()
         counter.join()
-    assert during > 1
+    assert during > 2
 
 
 def test_rasters_travel_to_other_processes(scene_file, scene_array):
