@@ -2,6 +2,7 @@
 #include <functional>
 #include <memory>
 #include <mutex>
+#include <optional>
 #include <vector>
 
 #include "format/LevelGeometry.h"
@@ -45,7 +46,7 @@ public:
         for (std::uint32_t level = raster.MinLevel() + 1; level <= raster.MaxLevel(); ++level) {
             // A file may claim a thousand levels that have no pixels, with many bands.
             if (raster.Width(level) == 0 || raster.Height(level) == 0) continue;
-            for (const auto& worker : workers) worker->differences = NoDifferences();
+            for (const auto& worker : workers) worker->differences.emplace(kCode, kCode, bands, 0);
             const zelm::LevelGeometry blocks(raster.Width(level), raster.Height(level), BlockSide(),
                                              0);
             lanes.Run(std::uint64_t{blocks.tilesAcross} * blocks.tilesDown,
@@ -58,13 +59,15 @@ public:
                           done += block.Pixels();
                           if (!bar.Show(done, total)) throw Interruption(raster.Name());
                       });
-            SampleDifferences all = NoDifferences();
-            for (const auto& worker : workers) all.Merge(worker->differences);
+            SampleDifferences all(kCode, kCode, bands, 0);
+            for (const auto& worker : workers) all.Merge(*worker->differences);
             tell(level, all);
         }
     }
 
 private:
+    static constexpr std::uint32_t kCode = zelm::ElementTraits<T>::code;
+
     struct Worker {
         Worker(zmchost::Raster& pyramid, zmchost::Resampling method,
                zmchost::SampleWeights* weights)
@@ -76,13 +79,13 @@ private:
             raster.Read(level, block, raster.AllBands(), stored.data());
             reduction.Load(level, block);
             for (std::uint32_t row = 0; row < block.height; ++row)
-                differences.Take({block.x, block.y + row, block.width, 1},
-                                 stored.data() + row * samples, reduction.Row(row));
+                differences->Take({block.x, block.y + row, block.width, 1},
+                                  stored.data() + row * samples, reduction.Row(row));
         }
 
         zmchost::Raster& raster;
         zmchost::LevelReduction<T> reduction;
-        SampleDifferences differences{0, 0, 0, 0};
+        std::optional<SampleDifferences> differences;  // of the level that is looked at
         std::vector<T> stored;
     };
 
@@ -97,11 +100,6 @@ private:
         for (std::uint32_t band = 0; weights && band < bands; ++band)
             if (weights->HasMask(band)) return true;
         return false;
-    }
-
-    SampleDifferences NoDifferences() const {
-        const std::uint32_t code = zelm::ElementTraits<T>::code;
-        return {code, code, bands, 0};
     }
 
     // Bytes of samples and masks of the finer part of a block of that side.
