@@ -5,7 +5,6 @@
 #include <optional>
 #include <vector>
 
-#include "format/LevelGeometry.h"
 #include "host/build/LevelReduction.h"
 #include "host/raster/RasterLanes.h"
 #include "tools/Interrupt.h"
@@ -30,8 +29,10 @@ public:
         : raster(pyramid),
           manner(checkManner),
           bands(pyramid.Bands()),
-          lanes(pyramid, ReadsMasks(weights) ? 1 : manner.threads, LaneBytes(), kBlockBytes) {
-        for (std::uint32_t lane = 0; lane < lanes.Count(); ++lane)
+          workers(FirstOf(pyramid, method, weights)),
+          lanes(pyramid, workers.front()->reduction.ReadsMasks() ? 1 : manner.threads, LaneBytes(),
+                kBlockBytes) {
+        for (std::uint32_t lane = 1; lane < lanes.Count(); ++lane)
             workers.push_back(std::make_unique<Worker>(lanes.At(lane), method, weights));
     }
 
@@ -47,18 +48,13 @@ public:
             // A file may claim a thousand levels that have no pixels, with many bands.
             if (raster.Width(level) == 0 || raster.Height(level) == 0) continue;
             for (const auto& worker : workers) worker->differences.emplace(kCode, kCode, bands, 0);
-            const zelm::LevelGeometry blocks(raster.Width(level), raster.Height(level), BlockSide(),
-                                             0);
-            lanes.Run(std::uint64_t{blocks.tilesAcross} * blocks.tilesDown,
-                      [&](std::uint32_t lane, std::uint64_t index) {
-                          const zmchost::Window block =
-                              blocks.Tile(static_cast<std::uint32_t>(index % blocks.tilesAcross),
-                                          static_cast<std::uint32_t>(index / blocks.tilesAcross));
-                          workers[lane]->CheckBlock(level, block);
-                          const std::lock_guard lock(advancing);
-                          done += block.Pixels();
-                          if (!bar.Show(done, total)) throw Interruption(raster.Name());
-                      });
+            lanes.RunBlocks(level, BlockSide(),
+                            [&](std::uint32_t lane, const zmchost::Window& block) {
+                                workers[lane]->CheckBlock(level, block);
+                                const std::lock_guard lock(advancing);
+                                done += block.Pixels();
+                                if (!bar.Show(done, total)) throw Interruption(raster.Name());
+                            });
             SampleDifferences all(kCode, kCode, bands, 0);
             for (const auto& worker : workers) all.Merge(*worker->differences);
             tell(level, all);
@@ -88,18 +84,19 @@ private:
         std::optional<SampleDifferences> differences;  // of the level that is looked at
         std::vector<T> stored;
     };
+    using Workers = std::vector<std::unique_ptr<Worker>>;
 
     zmchost::Raster& raster;
     const CheckManner& manner;
     std::uint32_t bands;
+    Workers workers;  // one for each lane
     zmchost::RasterLanes lanes;
-    std::vector<std::unique_ptr<Worker>> workers;  // one for each lane
 
-    // Whoever tells of masks does so to one thread.
-    bool ReadsMasks(const zmchost::SampleWeights* weights) const {
-        for (std::uint32_t band = 0; weights && band < bands; ++band)
-            if (weights->HasMask(band)) return true;
-        return false;
+    static Workers FirstOf(zmchost::Raster& pyramid, zmchost::Resampling method,
+                           zmchost::SampleWeights* weights) {
+        Workers first;
+        first.push_back(std::make_unique<Worker>(pyramid, method, weights));
+        return first;
     }
 
     // Bytes of samples and masks of the finer part of a block of that side.

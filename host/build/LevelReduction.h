@@ -49,6 +49,9 @@ public:
     LevelReduction(const LevelReduction&) = delete;
     LevelReduction& operator=(const LevelReduction&) = delete;
 
+    // Whether Load asks the weights for masks, which tell one thread at a time.
+    bool ReadsMasks() const { return hidden.has_value(); }
+
     // Reads what `wanted`, a window inside `level`, is made of; `level` is not the finest.
     void Load(std::uint32_t level, const Window& wanted) {
         const auto [x, width] = Reach(wanted.x, wanted.width, raster.Width(level - 1));

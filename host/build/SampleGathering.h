@@ -11,17 +11,16 @@
 #include <span>
 #include <vector>
 
-#include "format/LevelGeometry.h"
 #include "host/raster/NoData.h"
 #include "host/raster/RasterLanes.h"
 
 namespace zmchost {
 
 // Gatherer: has AddRow and Merge as BandAccumulator, is empty at first, and copied for each thread.
-// `bytes` is what one of all bands takes; threads are as many as `threads`, 0 for all processors,
-// but for what their copies would take. Samples with the no-data value of their band are marked as
-// such for AddRow. `advance` is called now and then with the pixels that are done, on any thread,
-// one call at a time; what it throws ends the walk. Throws as Raster::Read.
+// `bytes` is what the gatherers of all bands take together; threads are as many as `threads`, 0 for
+// all processors, but for what their copies would take. Samples with the no-data value of their
+// band are marked as such for AddRow. `advance` is called now and then with the pixels that are
+// done, on any thread, one call at a time; what it throws ends the walk. Throws as Raster::Read.
 template <class T, class Gatherer>
 void GatherSamples(Raster& raster, std::uint32_t threads, std::uint64_t bytes,
                    std::span<const std::uint32_t> bands, std::vector<Gatherer>& gatherers,
@@ -42,8 +41,7 @@ void GatherSamples(Raster& raster, std::uint32_t threads, std::uint64_t bytes,
         kMostPixelBytes / lanes.Count() / (std::uint64_t{count} * (sizeof(T) + 1)), 1);
 
     const std::uint32_t tile = std::max(raster.TileSide(), 1u);
-    const zelm::LevelGeometry grid(raster.Width(level), raster.Height(level),
-                                   tile < kSide ? tile * (kSide / tile) : tile, 0);
+    const std::uint32_t side = tile < kSide ? tile * (kSide / tile) : tile;
     struct Lane {
         std::vector<T> samples;
         std::vector<unsigned char> mask;
@@ -68,10 +66,7 @@ void GatherSamples(Raster& raster, std::uint32_t threads, std::uint64_t bytes,
         const std::lock_guard lock(advancing);
         advance(piece.Pixels());
     };
-    lanes.Run(std::uint64_t{grid.tilesAcross} * grid.tilesDown, [&](std::uint32_t lane,
-                                                                    std::uint64_t index) {
-        const Window block = grid.Tile(static_cast<std::uint32_t>(index % grid.tilesAcross),
-                                       static_cast<std::uint32_t>(index / grid.tilesAcross));
+    lanes.RunBlocks(level, side, [&](std::uint32_t lane, const Window& block) {
         // In runs of rows, or of parts of a row, of no more bytes than are held.
         const auto width = static_cast<std::uint32_t>(std::min<std::uint64_t>(block.width, most));
         const auto height =

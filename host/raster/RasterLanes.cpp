@@ -37,4 +37,19 @@ void RasterLanes::Run(std::uint64_t pieces,
     });
 }
 
+void RasterLanes::RunBlocks(
+    std::uint32_t level, std::uint32_t side,
+    const std::function<void(std::uint32_t lane, const Window& block)>& work) {
+    const std::uint64_t width = first.Width(level), height = first.Height(level);
+    const std::uint64_t across = (width + side - 1) / side, down = (height + side - 1) / side;
+    Run(across * down, [&](std::uint32_t lane, std::uint64_t index) {
+        const std::uint64_t x = index % across * side, y = index / across * side;
+        const auto extent = [side](std::uint64_t rest) {
+            return static_cast<std::uint32_t>(std::min<std::uint64_t>(side, rest));
+        };
+        work(lane, {static_cast<std::uint32_t>(x), static_cast<std::uint32_t>(y), extent(width - x),
+                    extent(height - y)});
+    });
+}
+
 }  // namespace zmchost

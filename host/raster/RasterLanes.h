@@ -30,6 +30,10 @@ public:
     // call throws ends the work of all and comes out, of several the first.
     void Run(std::uint64_t pieces,
              const std::function<void(std::uint32_t lane, std::uint64_t piece)>& work);
+    // The same for the squares of `side` pixels, at least 1, that a level is made of: rows of them
+    // from the top, each from the left, smaller at the right and at the bottom.
+    void RunBlocks(std::uint32_t level, std::uint32_t side,
+                   const std::function<void(std::uint32_t lane, const Window& block)>& work);
 
 private:
     Raster& first;

@@ -176,7 +176,7 @@ class KnownFiles(AttackTest):
 
     def test_palettes_within_palettes(self):
         """Each has the colours of all inside it."""
-        colors = "<PALETTE_RGBA>1|2|3|4</PALETTE_RGBA>" * many(30000)
+        colors = "<PALETTE_RGBA>1|2|3|4</PALETTE_RGBA>" * many(100000)
         ends = (f"<PALETTE_BAND>{band}</PALETTE_BAND></PALETTE>" for band in range(60))
         text = "<PALETTE>" * 60 + colors + "".join(ends)
         for place in ("behind", "records"):

@@ -10,6 +10,7 @@
 #include <filesystem>
 #include <limits>
 #include <map>
+#include <mutex>
 #include <optional>
 #include <set>
 #include <stdexcept>
@@ -84,6 +85,26 @@ TEST_F(Lanes, WhatOneThrowsEndsAllAndComesOut) {
     };
     EXPECT_THROW(lanes.Run(1000000000, work), std::runtime_error);
     EXPECT_LT(calls, 1000000000);
+}
+
+TEST_F(Lanes, BlocksCoverALevelOnce) {
+    Raster raster = Built();
+    for (const std::uint32_t side : {1u, 7u, 256u, 400u, 4294967295u}) {
+        RasterLanes lanes(raster, 2, 0, 0);
+        std::mutex mutex;
+        std::vector<int> seen(std::size_t{400} * 300);
+        lanes.RunBlocks(0, side, [&](std::uint32_t, const Window& block) {
+            EXPECT_EQ(block.x % side, 0u);
+            EXPECT_EQ(block.y % side, 0u);
+            EXPECT_EQ(block.width, std::min(side, 400 - block.x));
+            EXPECT_EQ(block.height, std::min(side, 300 - block.y));
+            const std::lock_guard lock(mutex);
+            for (std::uint32_t y = 0; y < block.height; ++y)
+                for (std::uint32_t x = 0; x < block.width; ++x)
+                    ++seen[(std::size_t{block.y} + y) * 400 + block.x + x];
+        });
+        EXPECT_EQ(std::count(seen.begin(), seen.end(), 1), 400 * 300) << side;
+    }
 }
 
 TEST_F(Lanes, ReadTheOpenFileWhateverHasItsName) {
