@@ -44,7 +44,8 @@ public:
         const BandWeights weights = BandWeights::Of(sampleWeights, finer.Name(), bands, allBands,
                                                     method, std::move(palettes));
         weighing = WeighingOf<T>(weights, method, rules);
-        if (weights.IsMasked()) hidden.emplace(*sampleWeights, allBands, weights.masked);
+        if (sampleWeights != nullptr && weights.IsMasked())
+            hidden.emplace(*sampleWeights, allBands, weights.masked);
     }
     LevelReduction(const LevelReduction&) = delete;
     LevelReduction& operator=(const LevelReduction&) = delete;
