@@ -178,7 +178,9 @@ std::string DeclaringUtf8(const std::string& declaration, std::string_view encod
 }
 
 Utf8Document Finish(const std::vector<unsigned char>& bytes) {
-    Utf8Document document{std::make_unique<unsigned char[]>(bytes.size()), bytes.size()};
+    Utf8Document document;
+    document.bytes = std::make_unique<unsigned char[]>(bytes.size());
+    document.size = bytes.size();
     std::copy(bytes.begin(), bytes.end(), document.bytes.get());
     return document;
 }
