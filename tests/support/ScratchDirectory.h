@@ -21,6 +21,7 @@ inline std::filesystem::path MemoryFolder() {
     std::error_code error;
     const auto space = std::filesystem::space(memory, error);
     const bool fits = !error && space.available >= std::uintmax_t{1} << 30;
+    // NOLINTNEXTLINE(concurrency-mt-unsafe): nobody changes the environment at the same time.
     const bool chosen = std::getenv("TMPDIR") != nullptr;
     if (chosen || !fits || access(memory.c_str(), W_OK) != 0)
         return std::filesystem::temp_directory_path();
