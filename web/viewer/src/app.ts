@@ -588,7 +588,7 @@ export class App implements Gestures {
       c: () => this.compare(this.sides.length < 2),
       l: () => this.drawLine(!(this.profile.drawing || this.line)),
       b: () => this.togglePanel(),
-      v: () => this.notices.say(this.readout.text),
+      v: () => this.tellSoon(0),
       "?": () => byId<HTMLDialogElement>("help-dialog").showModal(),
       Enter: () => this.mark(),
       Escape: () => this.drawLine(false),
@@ -602,10 +602,13 @@ export class App implements Gestures {
     return true;
   }
 
-  // What is under the cross, once it has come to rest.
-  private tellSoon(): void {
+  // What is under the cross, once it has come to rest, is drawn there, and its samples are here.
+  private tellSoon(milliseconds = 600): void {
     clearTimeout(this.saidTimer);
-    this.saidTimer = window.setTimeout(() => this.notices.say(this.readout.text), 600);
+    this.saidTimer = window.setTimeout(() => {
+      if (this.frameAsked || this.viewport.moving || this.readout.pending) this.tellSoon(50);
+      else this.notices.say(this.readout.text);
+    }, milliseconds);
   }
 
   // The start of a line at the cross, then its end.

@@ -35,6 +35,8 @@ export class Readout {
   private abort = new AbortController();
   private timer = 0;
   private at = "";
+  /** Whether the samples of the place that is shown are still on their way. */
+  pending = false;
 
   /** Shows a place in pixels of level 0, with the samples of the level that is on the screen. */
   show(raster: Raster | undefined, point: Point | undefined, level: Level | undefined): void {
@@ -49,6 +51,7 @@ export class Readout {
     this.abort = new AbortController();
     clearTimeout(this.timer);
     if (x < 0 || y < 0 || x >= level.width || y >= level.height) return this.fill(undefined, "outside");
+    this.pending = true;
     const { signal } = this.abort;
     const read = (): void => void this.read(raster, level.level, x, y, signal);
     // Where the bands of a tile lie apart, each would be a request of its own.
@@ -88,6 +91,7 @@ export class Readout {
   }
 
   private fill(texts: string[] | undefined, otherwise: string): void {
+    this.pending = false;
     this.rows.forEach((row, i) => (row.textContent = texts?.[i] ?? otherwise));
   }
 
