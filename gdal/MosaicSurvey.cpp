@@ -30,6 +30,7 @@ namespace zmcgdal {
 namespace {
 
 constexpr double kTolerance = 0.01;  // of a pixel
+constexpr const char* kMake = "make a mosaic of it";
 constexpr double kLongestSide = std::numeric_limits<std::int32_t>::max();
 
 std::string LowerCase(std::string text) {
@@ -498,18 +499,12 @@ private:
     MosaicLayout layout;
 };
 
-}  // namespace
-
-MosaicLayout SurveyMosaic(const std::string& name, std::vector<std::string> scenes,
-                          const MosaicWishes& wishes) {
-    constexpr const char* kMake = "make a mosaic of it";
-    if (scenes.empty()) throw zmchost::Error(name, kMake, "it names no scene");
-    if (scenes.size() > kMostScenes)
-        throw zmchost::Error(name, kMake,
-                             "it names more than " + std::to_string(kMostScenes) + " scenes");
+// What is seen of scenes, in their order. One that cannot be read is told in what was found where
+// such are left out, and refused otherwise.
+std::vector<Finding> LookAtAll(Surveyor& surveyor, const std::string& name,
+                               std::vector<std::string> scenes, const MosaicWishes& wishes) {
     std::vector<Finding> findings(scenes.size());
     for (std::size_t i = 0; i < scenes.size(); ++i) findings[i].scene.name = std::move(scenes[i]);
-    Surveyor surveyor(wishes.skipBroken);
     const auto look = [&](std::uint64_t job) {
         Finding& finding = findings[static_cast<std::size_t>(job)];
         surveyor.LookAt(finding);
@@ -527,6 +522,67 @@ MosaicLayout SurveyMosaic(const std::string& name, std::vector<std::string> scen
     if (!wishes.skipBroken)
         for (const Finding& each : findings)
             if (!each.failure.empty()) FailScene(each.scene.name, each.failure);
+    return findings;
+}
+
+// The numbers of scenes whose files are not as they were. Of many scenes that takes most of an
+// update's time, so that threads share it.
+std::vector<std::size_t> ChangedScenes(const std::vector<MosaicScene>& scenes,
+                                       std::uint32_t threads) {
+    constexpr std::size_t kAtOnce = 256;
+    std::vector<char> isChanged(scenes.size());
+    const auto look = [&](std::uint64_t job) {
+        const std::size_t from = static_cast<std::size_t>(job) * kAtOnce;
+        for (std::size_t i = from; i < std::min(from + kAtOnce, scenes.size()); ++i)
+            isChanged[i] = scenes[i].StateNow() != scenes[i].state;
+        return true;
+    };
+    if (!RunJobs((scenes.size() + kAtOnce - 1) / kAtOnce, std::max(threads, 1u),
+                 [&] { return Worker(look); }, {}))
+        throw std::bad_alloc();
+    std::vector<std::size_t> changed;
+    for (std::size_t i = 0; i < isChanged.size(); ++i)
+        if (isChanged[i]) changed.push_back(i);
+    return changed;
+}
+
+// Whether a scene that has changed surely is what it was to the mosaic, so that the first scene,
+// which made the grid, need not be seen again. Half of the tolerance is left to the rounding of the
+// corners.
+bool IsSurelyAlike(const Finding& now, const MosaicScene& before, const MosaicLayout& layout,
+                   const MosaicWishes& wishes) {
+    if (wishes.finest || before.warped || !now.isPlaced || !IsUpright(now.transform) ||
+        *now.system != layout.system || *now.driver != layout.drivers[before.driver] ||
+        now.width != before.place.width || now.height != before.place.height ||
+        now.kind->bands.size() != layout.bands.size())
+        return false;
+    std::vector<MosaicBand> bands = now.kind->bands;
+    for (std::size_t i = 0; i < bands.size(); ++i) {
+        bands[i].unit = layout.bands[i].unit;  // that of the first scene, whatever others have
+        if (wishes.noNoData || wishes.noData) bands[i].noData = layout.bands[i].noData;
+    }
+    if (PackBands(now.kind->pixelType, bands) != PackBands(layout.pixelType, layout.bands))
+        return false;
+    const GeoTransform &t = now.transform, &grid = layout.transform;
+    const auto near = [](double place, double wanted) {
+        return std::fabs(place - wanted) < kTolerance / 2;
+    };
+    const zelm::Rectangle& place = before.place;
+    return near((t[0] - grid[0]) / grid[1], place.x) && near((t[3] - grid[3]) / grid[5], place.y) &&
+           near((t[0] + t[1] * now.width - grid[0]) / grid[1], place.x + place.width) &&
+           near((t[3] + t[5] * now.height - grid[3]) / grid[5], place.y + place.height);
+}
+
+}  // namespace
+
+MosaicLayout SurveyMosaic(const std::string& name, std::vector<std::string> scenes,
+                          const MosaicWishes& wishes) {
+    if (scenes.empty()) throw zmchost::Error(name, kMake, "it names no scene");
+    if (scenes.size() > kMostScenes)
+        throw zmchost::Error(name, kMake,
+                             "it names more than " + std::to_string(kMostScenes) + " scenes");
+    Surveyor surveyor(wishes.skipBroken);
+    std::vector<Finding> findings = LookAtAll(surveyor, name, std::move(scenes), wishes);
     const auto first = std::find_if(findings.begin(), findings.end(),
                                     [](const Finding& each) { return each.kind != nullptr; });
     if (first == findings.end())
@@ -555,15 +611,27 @@ std::optional<MosaicLayout> RenewLayout(MosaicLayout known, const std::vector<st
     if (wishes.skipBroken || !known.leftOut.empty() ||
         !std::equal(known.scenes.begin(), known.scenes.end(), scenes.begin(), scenes.end(), isOf))
         return std::nullopt;
-    std::vector<std::size_t> changed{0};
-    for (std::size_t i = 0; i < scenes.size(); ++i) {
-        if (known.scenes[i].StateNow() == known.scenes[i].state) continue;
-        if (i == 0) return std::nullopt;
-        changed.push_back(i);
-    }
-    if (changed.size() == 1) return known;
+    const std::vector<std::size_t> changed = ChangedScenes(known.scenes, wishes.threads);
+    if (changed.empty()) return known;
+    if (changed.front() == 0) return std::nullopt;
     std::vector<std::string> names;
     for (const std::size_t i : changed) names.push_back(scenes[i]);
+    Surveyor surveyor(wishes.skipBroken);
+    std::vector<Finding> findings = LookAtAll(surveyor, scenes.front(), names, wishes);
+    if (std::equal(findings.begin(), findings.end(), changed.begin(),
+                   [&](const Finding& now, std::size_t i) {
+                       return IsSurelyAlike(now, known.scenes[i], known, wishes);
+                   })) {
+        for (std::size_t k = 0; k < changed.size(); ++k) {
+            MosaicScene& old = known.scenes[changed[k]];
+            MosaicScene& now = findings[k].scene;
+            now.place = old.place;
+            now.driver = old.driver;
+            old = std::move(now);
+        }
+        return known;
+    }
+    names.insert(names.begin(), scenes.front());
     // The first scene makes the grid of both.
     const MosaicLayout seen = SurveyMosaic(scenes.front(), std::move(names), wishes);
     if (seen.system != known.system || seen.transform[1] != known.transform[1] ||
@@ -572,8 +640,8 @@ std::optional<MosaicLayout> RenewLayout(MosaicLayout known, const std::vector<st
         return std::nullopt;
     const zelm::Rectangle& before = known.scenes.front().place;
     const zelm::Rectangle& now = seen.scenes.front().place;
-    for (std::size_t k = 1; k < changed.size(); ++k) {
-        MosaicScene scene = seen.scenes[k];
+    for (std::size_t k = 0; k < changed.size(); ++k) {
+        MosaicScene scene = seen.scenes[k + 1];
         MosaicScene& old = known.scenes[changed[k]];
         // Differences of places, as both count from corners of their own.
         const bool lies = scene.place.x - now.x == old.place.x - before.x &&

@@ -38,9 +38,9 @@ MosaicLayout SurveyMosaic(const std::string& name, std::vector<std::string> scen
                           const MosaicWishes& wishes);
 
 // The layout that a survey would find, of what was found before: opens the scenes whose files have
-// changed since, and the first one, and no other. Nothing where that does not do, and all are to be
-// surveyed: names are added or gone, the first scene has changed, or one that has changed has
-// another place. Throws what SurveyMosaic does.
+// changed since, the first one if these may not be to the mosaic what they were, and no other.
+// Nothing where that does not do, and all are to be surveyed: names are added or gone, the first
+// scene has changed, or one that has changed has another place. Throws what SurveyMosaic does.
 std::optional<MosaicLayout> RenewLayout(MosaicLayout known, const std::vector<std::string>& scenes,
                                         const MosaicWishes& wishes);
 

@@ -517,23 +517,61 @@ class Updates(MosaicTest):
         self.assertIn(words, done.stderr)
 
     def test_scenes_far_from_what_changed_are_not_opened(self):
-        far = self.path("in/005-005.tif")
-        with open(far, "rb") as file:
-            kept = file.read()
-        times = os.stat(far)
+        # The first one neither, though it made the grid.
+        far = [self.path("in/000-000.tif"), self.path("in/005-005.tif")]
+        kept = []
+        for name in far:
+            with open(name, "rb") as file:
+                kept.append((name, file.read(), os.stat(name)))
 
-        def put(content):
-            with open(far, "wb") as file:
+        def put(name, content, times):
+            with open(name, "wb") as file:
                 file.write(content)
-            os.utime(far, ns=(times.st_atime_ns, times.st_mtime_ns))
-        put(b"\0" * len(kept))
-        for row, column in ((1, 2), (2, 1)):
+            os.utime(name, ns=(times.st_atime_ns, times.st_mtime_ns))
+        for name, content, times in kept:
+            put(name, b"\0" * len(content), times)
+        for row, column in ((1, 3), (3, 1)):
             self.change(row, column)
             self.good("update", "made.pyr", "--changed", f"in/{row:03d}-{column:03d}.tif")
         # Without what the records know of it all are surveyed.
-        self.expect_refusal("005-005.tif: ", "in/*.tif", "--changed", "0,0,1,1")
-        put(kept)
+        self.expect_refusal("000-000.tif: ", "in/*.tif", "--changed", "0,0,1,1")
+        for each in kept:
+            put(*each)
         self.expect_full()
+
+    def test_scenes_that_tell_something_else_make_what_a_survey_makes(self):
+        def lies(offset, scale=1):
+            return LEFT + (800 + offset) * SIDE, SIDE * scale, 0, TOP - 800 * SIDE, 0, -SIDE * scale
+        grid, records = "its size or georeference is not that of made.pyr", "cannot use the records"
+        # With what the update is refused, where the whole would be another: by the first's resolution, by the finest.
+        cases = {
+            "a value that stands for none": ({"nodata": 7}, records, records),
+            "a little beside the grid": ({"transform": lies(.003)}, None, None),
+            "just near enough to the grid": ({"transform": lies(.008)}, None, None),
+            "too far from the grid": ({"transform": lies(.3)}, None, None),
+            "pixels a little smaller": ({"transform": lies(0, 1 - 1e-5)}, None, grid),
+            "pixels of half the side": ({"transform": lies(0, .5), "size": 800}, None, grid),
+            "the rows upwards": ({"transform": (LEFT + 8000, SIDE, 0, TOP - 12000, 0, SIDE)}, None, None),
+            "another system": ({"code": 32632}, grid, grid),
+        }
+        for which, options in ((1, []), (2, ["--resolution", "finest"])):
+            for name, case in cases.items():
+                change, refusal = dict(case[0]), case[which]
+                with self.subTest(name, options=options):
+                    self.scene("in/002-002.tif", 800, 800, self.noise(400, 400))
+                    self.good("build", "in/*.tif", "made.pyr", "--keep-records", "--overwrite", *options)
+                    os.remove(self.path("in/002-002.tif"))
+                    size = change.pop("size", 400)
+                    self.scene("in/002-002.tif", 800, 800, self.noise(size, size), **change)
+                    if refusal:
+                        done = self.run_tool("update", "made.pyr", "--changed", "700,700,600,600")
+                        self.assertEqual((done.returncode, done.stdout), (1, ""), done)
+                        self.assertIn(refusal, done.stderr)
+                        continue
+                    self.good("update", "made.pyr", "--changed", "700,700,600,600")
+                    self.good("build", "in/*.tif", "full.pyr", "--overwrite", *options)
+                    with open(self.path("made.pyr"), "rb") as made, open(self.path("full.pyr"), "rb") as full:
+                        self.assertTrue(made.read() == full.read())
 
     def test_scenes_that_moved_came_or_are_the_first_are_surveyed_anew(self):
         whole = "0,0,2400,2400"
