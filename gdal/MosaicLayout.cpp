@@ -16,7 +16,7 @@ namespace {
 using zmchost::NumberPacker;
 using zmchost::NumberUnpacker;
 
-constexpr std::string_view kMagic = "ZMCMOSA1";
+constexpr std::string_view kMagic = "ZMCMOSA2";
 constexpr std::uint32_t kMostSide = std::numeric_limits<std::int32_t>::max();
 
 // One walk for both ways: a Packer puts what a Taker takes.
@@ -123,6 +123,7 @@ void WalkLayout(Walk& walk, Layout& layout) {
     walk.Number(layout.height);
     for (auto& number : layout.transform) walk.Real(number);
     walk.Text(layout.system);
+    walk.Text(layout.systemKeys);
     walk.Number(layout.pixelType);
     walk.Number(layout.overlap);
     walk.Text(layout.resampling);

@@ -62,6 +62,7 @@ struct MosaicLayout {
     std::uint32_t height = 0;
     GeoTransform transform{};
     std::string system;           // as WKT; empty: unknown
+    std::string systemKeys;       // by which GeoTIFFs tell it; empty: the first scene is none
     std::uint32_t pixelType = 0;  // code, of all bands
     Overlap overlap = Overlap::Last;
     std::string resampling;            // of scenes that are warped, as GDAL calls it

@@ -93,6 +93,7 @@ struct Finding {
     const Kind* kind = nullptr;
     const std::string* driver = nullptr;
     const std::string* system = nullptr;
+    std::string keys;     // by which a GeoTIFF tells its system
     std::string failure;  // why it cannot be read
 };
 
@@ -122,6 +123,11 @@ MosaicBand TellBand(GDALRasterBand& band) {
 class Surveyor {
 public:
     explicit Surveyor(bool readsAll) : readAll(readsAll) {}
+
+    // What GeoTIFFs with these keys tell, which is not looked up then.
+    void Know(const std::string& keys, const std::string& system) {
+        systems[keys] = &*texts.insert(system).first;
+    }
 
     void LookAt(Finding& finding) {
         try {
@@ -175,7 +181,7 @@ private:
         for (int number = 1; number <= dataset.GetRasterCount(); ++number)
             kind.bands.push_back(TellBand(*dataset.GetRasterBand(number)));
         std::string packed = PackBands(pixelType, kind.bands);
-        const std::string* const system = SystemOf(dataset, finding.scene);
+        const std::string* const system = SystemOf(dataset, finding.scene, finding.keys);
         const GDALDriver* const driver = dataset.GetDriver();
         const std::lock_guard lock(mutex);
         finding.kind = &kinds.try_emplace(std::move(packed), std::move(kind)).first->second;
@@ -183,9 +189,11 @@ private:
         finding.driver = &*texts.insert(driver ? driver->GetDescription() : "").first;
     }
 
-    const std::string* SystemOf(GDALDataset& dataset, const MosaicScene& scene) {
+    const std::string* SystemOf(GDALDataset& dataset, const MosaicScene& scene,
+                                std::string& scenesKeys) {
         const auto keys = scene.alone ? GeoKeysOf(scene.name) : std::nullopt;
         if (keys) {
+            scenesKeys = *keys;
             const std::lock_guard lock(mutex);
             const auto known = systems.find(*keys);
             if (known != systems.end()) return known->second;
@@ -328,6 +336,7 @@ public:
         layout.resampling = wishes.resampling;
         layout.hidden = wishes.noData;
         layout.system = *first.system;
+        layout.systemKeys = first.keys;
         layout.pixelType = first.kind->pixelType;
         TakeBands();
         TakeUnits();
@@ -617,6 +626,7 @@ std::optional<MosaicLayout> RenewLayout(MosaicLayout known, const std::vector<st
     std::vector<std::string> names;
     for (const std::size_t i : changed) names.push_back(scenes[i]);
     Surveyor surveyor(wishes.skipBroken);
+    if (!known.systemKeys.empty()) surveyor.Know(known.systemKeys, known.system);
     std::vector<Finding> findings = LookAtAll(surveyor, scenes.front(), names, wishes);
     if (std::equal(findings.begin(), findings.end(), changed.begin(),
                    [&](const Finding& now, std::size_t i) {

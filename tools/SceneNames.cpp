@@ -20,12 +20,6 @@ using zelm::files::FileSource;
 
 constexpr std::uint64_t kMostListBytes = std::uint64_t{256} << 20;
 
-std::string Absolute(const std::string& path) {
-    std::error_code error;
-    const fs::path whole = fs::absolute(path, error);
-    return error ? path : whole.lexically_normal().string();
-}
-
 bool IsList(const std::string& source) { return source.starts_with('@'); }
 
 // Names of databases and services have a colon in front of any slash, and stars of their own.
@@ -118,6 +112,12 @@ std::vector<std::string> NamesThatFit(const std::string& source) {
 }
 
 }  // namespace
+
+std::string Absolute(const std::string& path) {
+    std::error_code error;
+    const fs::path whole = fs::absolute(path, error);
+    return error ? path : whole.lexically_normal().string();
+}
 
 std::optional<std::vector<std::string>> SceneNames(const std::string& source) {
     if (platform::StatusOf(source).exists) return std::nullopt;

@@ -19,6 +19,9 @@ namespace zmctools {
 // no file system. Throws Failure for a list that cannot be read, is too long or names nothing.
 std::optional<std::vector<std::string>> SceneNames(const std::string& source);
 
+// The path from the root, without "." and ".."; as it is where there is no current folder.
+std::string Absolute(const std::string& path);
+
 // The word itself, absolute where it leads to a list or a folder.
 std::string FromAnywhere(const std::string& source);
 

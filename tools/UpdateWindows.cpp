@@ -8,10 +8,14 @@
 #include <iterator>
 #include <limits>
 #include <memory>
+#include <string_view>
+#include <unordered_map>
 
+#include "gdal/Mosaic.h"
 #include "tools/Arguments.h"
 #include "tools/GdalWorld.h"
 #include "tools/Message.h"
+#include "tools/SceneNames.h"
 
 namespace zmctools {
 namespace {
@@ -120,18 +124,49 @@ zmchost::Window WindowOfScene(const std::string& name, GDALDataset& source,
     return window;
 }
 
+// The windows of the scenes of a mosaic, by their names.
+class SceneWindows {
+public:
+    explicit SceneWindows(GDALDataset& source) {
+        const auto* const mosaic = dynamic_cast<const zmcgdal::Mosaic*>(&source);
+        if (!mosaic) return;
+        for (const zmcgdal::MosaicScene& scene : mosaic->Layout().scenes) {
+            Bounds bounds;
+            bounds.Take(scene.place.x, scene.place.y);
+            bounds.Take(static_cast<double>(scene.place.Right()),
+                        static_cast<double>(scene.place.Bottom()));
+            zmchost::Window window;
+            bounds.Cover(source.GetRasterXSize(), source.GetRasterYSize(), window);
+            windows.emplace(scene.name, window);
+        }
+    }
+
+    // False where no scene has that name.
+    bool Take(const std::string& name, std::vector<zmchost::Window>& taken) const {
+        if (windows.empty()) return false;
+        const auto [first, last] = windows.equal_range(Absolute(name));
+        for (auto each = first; each != last; ++each) taken.push_back(each->second);
+        return first != last;
+    }
+
+private:
+    std::unordered_multimap<std::string_view, zmchost::Window> windows;
+};
+
 }  // namespace
 
 std::vector<zmchost::Window> ChangedWindows(const std::vector<std::string>& texts,
                                             GDALDataset& source, const std::string& sourceName) {
+    const SceneWindows scenes(source);
     std::vector<zmchost::Window> windows;
     for (const std::string& text : texts) {
         if (text.empty()) throw UsageError(kOption, "\"\" is not X,Y,WIDTH,HEIGHT");
-        windows.push_back(
-            LooksLikeWindow(text)
-                ? ParseWindow(text, static_cast<std::uint32_t>(source.GetRasterXSize()),
-                              static_cast<std::uint32_t>(source.GetRasterYSize()), kOption)
-                : WindowOfScene(text, source, sourceName));
+        if (LooksLikeWindow(text))
+            windows.push_back(ParseWindow(text, static_cast<std::uint32_t>(source.GetRasterXSize()),
+                                          static_cast<std::uint32_t>(source.GetRasterYSize()),
+                                          kOption));
+        else if (!scenes.Take(text, windows))
+            windows.push_back(WindowOfScene(text, source, sourceName));
     }
     return windows;
 }
