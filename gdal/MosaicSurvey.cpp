@@ -93,8 +93,8 @@ struct Finding {
     const Kind* kind = nullptr;
     const std::string* driver = nullptr;
     const std::string* system = nullptr;
-    std::string keys;     // by which a GeoTIFF tells its system
-    std::string failure;  // why it cannot be read
+    const std::string* keys = nullptr;  // by which a GeoTIFF tells its system; may be null
+    std::string failure;                // why it cannot be read
 };
 
 bool IsPlace(const GeoTransform& t) {
@@ -181,22 +181,23 @@ private:
         for (int number = 1; number <= dataset.GetRasterCount(); ++number)
             kind.bands.push_back(TellBand(*dataset.GetRasterBand(number)));
         std::string packed = PackBands(pixelType, kind.bands);
-        const std::string* const system = SystemOf(dataset, finding.scene, finding.keys);
         const GDALDriver* const driver = dataset.GetDriver();
+        FindSystem(dataset, finding);
         const std::lock_guard lock(mutex);
         finding.kind = &kinds.try_emplace(std::move(packed), std::move(kind)).first->second;
-        finding.system = system;
         finding.driver = &*texts.insert(driver ? driver->GetDescription() : "").first;
     }
 
-    const std::string* SystemOf(GDALDataset& dataset, const MosaicScene& scene,
-                                std::string& scenesKeys) {
-        const auto keys = scene.alone ? GeoKeysOf(scene.name) : std::nullopt;
+    void FindSystem(GDALDataset& dataset, Finding& finding) {
+        const auto keys = finding.scene.alone ? GeoKeysOf(finding.scene.name) : std::nullopt;
         if (keys) {
-            scenesKeys = *keys;
             const std::lock_guard lock(mutex);
             const auto known = systems.find(*keys);
-            if (known != systems.end()) return known->second;
+            if (known != systems.end()) {
+                finding.keys = &known->first;
+                finding.system = known->second;
+                return;
+            }
         }
         std::string system;
         if (const OGRSpatialReference* const reference = dataset.GetSpatialRef()) {
@@ -205,9 +206,8 @@ private:
             CPLFree(text);
         }
         const std::lock_guard lock(mutex);
-        const std::string* const kept = &*texts.insert(std::move(system)).first;
-        if (keys) systems[*keys] = kept;
-        return kept;
+        finding.system = &*texts.insert(std::move(system)).first;
+        if (keys) finding.keys = &systems.try_emplace(*keys, finding.system).first->first;
     }
 
     static void ReadAll(GdalRasterSource& source, const zelm::RasterProps& props) {
@@ -336,7 +336,7 @@ public:
         layout.resampling = wishes.resampling;
         layout.hidden = wishes.noData;
         layout.system = *first.system;
-        layout.systemKeys = first.keys;
+        if (first.keys) layout.systemKeys = *first.keys;
         layout.pixelType = first.kind->pixelType;
         TakeBands();
         TakeUnits();
