@@ -543,7 +543,7 @@ std::vector<std::size_t> ChangedScenes(const std::vector<MosaicScene>& scenes,
     const auto look = [&](std::uint64_t job) {
         const std::size_t from = static_cast<std::size_t>(job) * kAtOnce;
         for (std::size_t i = from; i < std::min(from + kAtOnce, scenes.size()); ++i)
-            isChanged[i] = scenes[i].StateNow() != scenes[i].state;
+            isChanged[i] = scenes[i].StateNow() == scenes[i].state ? '\0' : '\1';
         return true;
     };
     if (!RunJobs((scenes.size() + kAtOnce - 1) / kAtOnce, std::max(threads, 1u),
@@ -551,7 +551,7 @@ std::vector<std::size_t> ChangedScenes(const std::vector<MosaicScene>& scenes,
         throw std::bad_alloc();
     std::vector<std::size_t> changed;
     for (std::size_t i = 0; i < isChanged.size(); ++i)
-        if (isChanged[i]) changed.push_back(i);
+        if (isChanged[i] != '\0') changed.push_back(i);
     return changed;
 }
 
