@@ -189,7 +189,8 @@ private:
 
 bool Crew::Run(std::uint32_t threads) {
     // No more than there are jobs, and the caller.
-    threads = static_cast<std::uint32_t>(std::clamp<std::uint64_t>(jobs, 1, threads));
+    threads = static_cast<std::uint32_t>(
+        std::min<std::uint64_t>(threads, std::max<std::uint64_t>(jobs, 1)));
     left.reserve(threads);
     const Worker own = makeWorker();
     {

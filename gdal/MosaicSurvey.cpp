@@ -534,8 +534,8 @@ std::vector<Finding> LookAtAll(Surveyor& surveyor, const std::string& name,
     return findings;
 }
 
-// The numbers of scenes whose files are not as they were. Of many scenes that takes most of an
-// update's time, so that threads share it.
+// The numbers of scenes whose files are not as they were. All scenes are looked at, few or many of
+// them changed, so that threads share it.
 std::vector<std::size_t> ChangedScenes(const std::vector<MosaicScene>& scenes,
                                        std::uint32_t threads) {
     constexpr std::size_t kAtOnce = 256;
@@ -578,8 +578,10 @@ bool IsSurelyAlike(const Finding& now, const MosaicScene& before, const MosaicLa
     };
     const zelm::Rectangle& place = before.place;
     return near((t[0] - grid[0]) / grid[1], place.x) && near((t[3] - grid[3]) / grid[5], place.y) &&
-           near((t[0] + t[1] * now.width - grid[0]) / grid[1], place.x + place.width) &&
-           near((t[3] + t[5] * now.height - grid[3]) / grid[5], place.y + place.height);
+           near((t[0] + t[1] * now.width - grid[0]) / grid[1],
+                static_cast<double>(place.Right())) &&
+           near((t[3] + t[5] * now.height - grid[3]) / grid[5],
+                static_cast<double>(place.Bottom()));
 }
 
 }  // namespace

@@ -8,6 +8,7 @@
 #include <iterator>
 #include <limits>
 #include <memory>
+#include <optional>
 #include <string_view>
 #include <unordered_map>
 
@@ -124,49 +125,45 @@ zmchost::Window WindowOfScene(const std::string& name, GDALDataset& source,
     return window;
 }
 
-// The windows of the scenes of a mosaic, by their names.
-class SceneWindows {
-public:
-    explicit SceneWindows(GDALDataset& source) {
-        const auto* const mosaic = dynamic_cast<const zmcgdal::Mosaic*>(&source);
-        if (!mosaic) return;
-        for (const zmcgdal::MosaicScene& scene : mosaic->Layout().scenes) {
-            Bounds bounds;
-            bounds.Take(scene.place.x, scene.place.y);
-            bounds.Take(static_cast<double>(scene.place.Right()),
-                        static_cast<double>(scene.place.Bottom()));
-            zmchost::Window window;
-            bounds.Cover(source.GetRasterXSize(), source.GetRasterYSize(), window);
-            windows.emplace(scene.name, window);
-        }
-    }
+// The scenes of a mosaic by their names, none of another raster.
+using ScenesByName = std::unordered_map<std::string_view, const zmcgdal::MosaicScene*>;
 
-    // False where no scene has that name.
-    bool Take(const std::string& name, std::vector<zmchost::Window>& taken) const {
-        if (windows.empty()) return false;
-        const auto [first, last] = windows.equal_range(Absolute(name));
-        for (auto each = first; each != last; ++each) taken.push_back(each->second);
-        return first != last;
-    }
+ScenesByName ScenesOf(const GDALDataset& source) {
+    ScenesByName scenes;
+    if (const auto* const mosaic = dynamic_cast<const zmcgdal::Mosaic*>(&source))
+        for (const zmcgdal::MosaicScene& scene : mosaic->Layout().scenes)
+            scenes.emplace(scene.name, &scene);
+    return scenes;
+}
 
-private:
-    std::unordered_multimap<std::string_view, zmchost::Window> windows;
-};
+zmchost::Window WindowOfKnown(const zmcgdal::MosaicScene& scene, GDALDataset& source) {
+    Bounds bounds;
+    bounds.Take(scene.place.x, scene.place.y);
+    bounds.Take(static_cast<double>(scene.place.Right()),
+                static_cast<double>(scene.place.Bottom()));
+    zmchost::Window window;
+    bounds.Cover(source.GetRasterXSize(), source.GetRasterYSize(), window);
+    return window;
+}
 
 }  // namespace
 
 std::vector<zmchost::Window> ChangedWindows(const std::vector<std::string>& texts,
                                             GDALDataset& source, const std::string& sourceName) {
-    const SceneWindows scenes(source);
+    std::optional<ScenesByName> scenes;
     std::vector<zmchost::Window> windows;
     for (const std::string& text : texts) {
         if (text.empty()) throw UsageError(kOption, "\"\" is not X,Y,WIDTH,HEIGHT");
-        if (LooksLikeWindow(text))
+        if (LooksLikeWindow(text)) {
             windows.push_back(ParseWindow(text, static_cast<std::uint32_t>(source.GetRasterXSize()),
                                           static_cast<std::uint32_t>(source.GetRasterYSize()),
                                           kOption));
-        else if (!scenes.Take(text, windows))
-            windows.push_back(WindowOfScene(text, source, sourceName));
+            continue;
+        }
+        if (!scenes) scenes = ScenesOf(source);
+        const auto known = scenes->find(Absolute(text));
+        windows.push_back(known == scenes->end() ? WindowOfScene(text, source, sourceName)
+                                                 : WindowOfKnown(*known->second, source));
     }
     return windows;
 }
