@@ -79,7 +79,9 @@ std::uint64_t TileRequest::RunBytes() const {
         rect.x % geometry.tileSize == 0 && rect.width == geometry.TileWidth(FirstTileX());
     if (LiesAlike() && (block || oneColumn)) return 0;
     const std::uint64_t row = std::uint64_t{block ? rect.width : geometry.tileSize} * sampleBytes;
-    return planar ? std::max(kRunBytes, row * std::min(planes, planesTogether)) : kRunBytes;
+    if (!planar) return kRunBytes;
+    const std::uint64_t together = std::min(planes, planesTogether);
+    return std::max(kPlanesRunBytes, row * together) + together * kPlaneGap;
 }
 
 }  // namespace zelm

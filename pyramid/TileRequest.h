@@ -39,8 +39,13 @@ struct TileRequest {
     // Longest run that is not straight, small enough for the second-level cache. A run of rows has
     // one row at least.
     static constexpr std::uint64_t kRunBytes = std::uint64_t{128} << 10;
+    // The same of several planes together. Longer, as each plane's share is a call of its own.
+    static constexpr std::uint64_t kPlanesRunBytes = std::uint64_t{384} << 10;
     // Planes that move together: more of them would make their runs too short to read.
     static constexpr std::uint32_t kPlanesTogether = 16;
+    // Behind each plane's share of a run. Shares of a power of two of bytes would lie in the same
+    // few places of the nearest cache otherwise, where they push each other out.
+    static constexpr std::uint64_t kPlaneGap = 64;
 
     LevelGeometry geometry;
     Rectangle rect;
@@ -140,7 +145,8 @@ private:
     void VisitRows(const TilePart& piece, std::uint64_t rowBytes, Visit& visit) const {
         for (std::uint32_t first = 0; first < planes; first += planesTogether) {
             const std::uint32_t count = std::min(planes - first, planesTogether);
-            const std::uint64_t fit = std::max<std::uint64_t>(kRunBytes / (rowBytes * count), 1);
+            const std::uint64_t limit = planar ? kPlanesRunBytes : kRunBytes;
+            const std::uint64_t fit = std::max<std::uint64_t>(limit / (rowBytes * count), 1);
             const auto step =
                 static_cast<std::uint32_t>(std::min<std::uint64_t>(fit, piece.part.height));
             for (std::uint32_t row = 0; row < piece.part.height; row += step) {

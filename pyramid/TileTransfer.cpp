@@ -47,6 +47,11 @@ protected:
         return PlaneStart(segment.plane + i, piece.column, piece.row) + segment.offset;
     }
 
+    // From plane to plane of a segment in the work space.
+    static std::uint64_t PlaneStep(const TileSegment& segment) {
+        return segment.bytes + TileRequest::kPlaneGap;
+    }
+
     // Moves the samples of a segment between the work space, where its planes lie one after the
     // other, and the buffer.
     void MoveToBuffer(const TileSegment& segment, const unsigned char* work,
@@ -84,7 +89,7 @@ private:
     SampleBlock<Byte> WorkSide(Byte* work, const TileSegment& segment) const {
         const bool asTheyLie = request.planar || request.allInOrder;
         return {work + segment.firstPixel, segment.rowBytes, request.tilePixelBytes,
-                request.planar ? segment.bytes : request.sampleBytes,
+                request.planar ? PlaneStep(segment) : request.sampleBytes,
                 asTheyLie ? nullptr : request.list};
     }
     template <class Byte>
@@ -134,7 +139,7 @@ private:
         if (segment.straight)
             return ReadOrZero(RunStart(piece, segment), buffer + segment.inBuffer, segment.bytes);
         for (std::uint32_t i = 0; i < segment.planes; ++i)
-            ReadOrZero(RunStart(piece, segment, i), work + i * segment.bytes, segment.bytes);
+            ReadOrZero(RunStart(piece, segment, i), work + i * PlaneStep(segment), segment.bytes);
         MoveToBuffer(segment, work, buffer);
     }
 
@@ -208,10 +213,11 @@ private:
 
     bool ReadOld(unsigned char* old) const {
         bool read = true;
+        std::uint64_t done = 0;
         plan.VisitSegments([&](const TilePart& piece, const TileSegment& segment) {
             if (!read || !NeedsOld(segment)) return;
-            read = ReadExisting(RunStart(piece, segment), old, segment.bytes);
-            old += segment.bytes;
+            read = ReadExisting(RunStart(piece, segment), old + done, segment.bytes);
+            done += segment.bytes;
         });
         return read;
     }
@@ -246,7 +252,7 @@ private:
         }
         MoveToWork(segment, buffer, run);
         for (std::uint32_t i = 0; i < segment.planes; ++i)
-            file.WriteAt(RunStart(piece, segment, i) + shift, run + i * segment.bytes,
+            file.WriteAt(RunStart(piece, segment, i) + shift, run + i * PlaneStep(segment),
                          segment.bytes);
     }
 

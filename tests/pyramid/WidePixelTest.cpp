@@ -169,7 +169,7 @@ TEST_F(WidePixelTest, WritingALargeTileByPlanesTakesLittle) {
                   wrote =
                       dataset->WriteTileMorton(1024, 0, 1024, 1024, list.View(), 0, pixels.data());
               }),
-              std::int64_t{256} << 10);
+              std::int64_t{512} << 10);
     EXPECT_TRUE(wrote);
     EXPECT_TRUE(ReadRect(*dataset, 1024, 0, 1024, 1024, list, 0) == pixels);
 }
