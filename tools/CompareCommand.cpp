@@ -58,15 +58,20 @@ void CompareSamples(RasterView& a, RasterView& b, bool quiet, SampleDifferences&
     Selection selection{a.MinLevel(),
                         {0, 0, a.Width(a.MinLevel()), a.Height(a.MinLevel())},
                         ParseBands("", a.Bands())};
-    std::vector<unsigned char> samples[2];
     TerminalProgress bar("compare", !quiet);
-    WalkStrips(a, selection, bar, [&](const zmchost::Window& strip) {
-        samples[0].resize(StripBytes(a, selection, strip));
-        samples[1].resize(StripBytes(b, selection, strip));
-        a.Read(a.MinLevel(), strip, selection.bands, samples[0].data());
-        b.Read(b.MinLevel(), strip, selection.bands, samples[1].data());
-        result.Take(strip, samples[0].data(), samples[1].data());
-    });
+    WalkStrips(
+        a, selection, bar,
+        [&](const zmchost::Window& strip, StripSamples& samples) {
+            samples.first.resize(StripBytes(a, selection, strip));
+            samples.second.resize(StripBytes(b, selection, strip));
+            std::future<void> other = RunBeside(
+                [&] { b.Read(b.MinLevel(), strip, selection.bands, samples.second.data()); });
+            a.Read(a.MinLevel(), strip, selection.bands, samples.first.data());
+            other.get();
+        },
+        [&](const zmchost::Window& strip, const StripSamples& samples) {
+            result.Take(strip, samples.first.data(), samples.second.data());
+        });
 }
 
 ExitStatus CompareCommand::Report(const std::vector<std::string>& shape,

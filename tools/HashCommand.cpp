@@ -56,15 +56,18 @@ Json HashCommand::Hash(const std::string& file) const {
 
     zmcstore::Sha256 sha;
     std::uint64_t bytes = 0;
-    std::vector<unsigned char> samples;
     {
         TerminalProgress bar("hash", !quiet);
-        WalkStrips(*view, selection, bar, [&](const zmchost::Window& strip) {
-            samples.resize(StripBytes(*view, selection, strip));
-            view->Read(selection.level, strip, selection.bands, samples.data());
-            sha.Add(samples.data(), samples.size());
-            bytes += samples.size();
-        });
+        WalkStrips(
+            *view, selection, bar,
+            [&](const zmchost::Window& strip, StripSamples& samples) {
+                samples.first.resize(StripBytes(*view, selection, strip));
+                view->Read(selection.level, strip, selection.bands, samples.first.data());
+            },
+            [&](const zmchost::Window&, const StripSamples& samples) {
+                sha.Add(samples.first.data(), samples.first.size());
+                bytes += samples.first.size();
+            });
     }
     view->CheckUnchanged();
     Json numbers = Json::array();

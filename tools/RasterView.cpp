@@ -4,6 +4,7 @@
 
 #include <algorithm>
 #include <chrono>
+#include <system_error>
 #include <thread>
 #include <utility>
 
@@ -295,11 +296,33 @@ void Strips::Walk(const std::string& name, TerminalProgress& progress,
     }
 }
 
+std::future<void> RunBeside(const std::function<void()>& task) {
+    try {
+        return std::async(std::launch::async, task);
+    } catch (const std::system_error&) {
+        std::packaged_task<void()> now(task);
+        now();
+        return now.get_future();
+    }
+}
+
 void WalkStrips(RasterView& view, const Selection& selection, TerminalProgress& progress,
-                const std::function<void(const zmchost::Window& strip)>& take) {
-    Strips{selection.window, selection.bands.size() * zelm::PixelSize(view.PixelType()),
-           kStripBudget, view.TileSide()}
-        .Walk(view.Name(), progress, take);
+                const std::function<void(const zmchost::Window& strip, StripSamples&)>& read,
+                const std::function<void(const zmchost::Window& strip, const StripSamples&)>& use) {
+    // Those that are read and those that are used, in turns. They outlive the thread.
+    StripSamples samples[2];
+    std::size_t turn = 0;
+    std::future<void> used;
+    const std::uint64_t pixelBytes = selection.bands.size() * zelm::PixelSize(view.PixelType());
+    Strips{selection.window, pixelBytes, kStripBudget / 2, view.TileSide()}.Walk(
+        view.Name(), progress, [&](const zmchost::Window& strip) {
+            StripSamples& here = samples[turn];
+            turn = 1 - turn;
+            read(strip, here);
+            if (used.valid()) used.get();
+            used = RunBeside([&use, &here, strip] { use(strip, here); });
+        });
+    if (used.valid()) used.get();
     view.WarnOfMissing();
 }
 

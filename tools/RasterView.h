@@ -9,6 +9,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <functional>
+#include <future>
 #include <memory>
 #include <span>
 #include <string>
@@ -95,13 +96,25 @@ struct Strips {
               const std::function<void(const zmchost::Window& strip)>& take) const;
 };
 
-// The same for a part of a view, of which some 32 MiB are held. Throws too where the view lacks
-// some of it.
-void WalkStrips(RasterView& view, const Selection& selection, TerminalProgress& progress,
-                const std::function<void(const zmchost::Window& strip)>& take);
+// Runs `task` in a thread of its own or, where there can be none, before it returns. What it throws
+// comes out of the future, which waits for its end.
+std::future<void> RunBeside(const std::function<void()>& task);
 
 std::size_t StripBytes(const RasterView& view, const Selection& selection,
                        const zmchost::Window& strip);
+
+// What is read of a strip, of one raster or of two.
+struct StripSamples {
+    std::vector<unsigned char> first, second;
+};
+
+// The same for a part of a view, of which some 32 MiB are held: `read` fills the samples of a
+// strip, and in another thread `use` goes through them while the next strip is read. Both are
+// called for one strip after the other; what either throws comes out, once no thread is at work any
+// more. Throws too where the view lacks some of it.
+void WalkStrips(RasterView& view, const Selection& selection, TerminalProgress& progress,
+                const std::function<void(const zmchost::Window& strip, StripSamples&)>& read,
+                const std::function<void(const zmchost::Window& strip, const StripSamples&)>& use);
 
 }  // namespace zmctools
 

@@ -91,15 +91,19 @@ CheckResult CheckSource(zmchost::Raster& raster, RasterView& source,
     }
     SampleDifferences differences(raster.PixelType(), source.PixelType(), raster.Bands(), 0);
     const Selection selection{level, {0, 0, raster.Width(), raster.Height()}, sourceBands};
-    std::vector<unsigned char> ours, theirs;
     TerminalProgress bar("level 0 against " + source.Name(), !quiet);
-    WalkStrips(source, selection, bar, [&](const zmchost::Window& strip) {
-        theirs.resize(StripBytes(source, selection, strip));
-        ours.resize(std::size_t{strip.width} * strip.height * raster.Bands() * raster.SampleSize());
-        source.Read(level, strip, sourceBands, theirs.data());
-        raster.Read(0, strip, raster.AllBands(), ours.data());
-        differences.Take(strip, ours.data(), theirs.data());
-    });
+    WalkStrips(
+        source, selection, bar,
+        [&](const zmchost::Window& strip, StripSamples& samples) {
+            samples.first.resize(std::size_t{strip.width} * strip.height * raster.Bands() *
+                                 raster.SampleSize());
+            samples.second.resize(StripBytes(source, selection, strip));
+            source.Read(level, strip, sourceBands, samples.second.data());
+            raster.Read(0, strip, raster.AllBands(), samples.first.data());
+        },
+        [&](const zmchost::Window& strip, const StripSamples& samples) {
+            differences.Take(strip, samples.first.data(), samples.second.data());
+        });
     for (std::uint32_t band = 0; band < raster.Bands(); ++band) {
         const BandDifference& found = differences.Bands()[band];
         if (found.samples != 0)

@@ -32,6 +32,18 @@ class Compare(ToolTest):
                          (3, "band 2: 1 samples differ, by up to 1, first at 17,301\n", ""))
         self.assertTrue(self.document("compare", "a.tif", "b.pyr", "--tolerance", 1)["equal"])
 
+    def test_rasters_beyond_one_strip(self):
+        pixels = np.arange(1500 * 2000 * 2, dtype=np.float64).reshape(1500, 2000, 2)
+        geotiff(self.path("a.tif"), pixels, "Double")
+        pixels[1499, 1999, 0] -= 2
+        for line in (3, 700, 701, 1400):
+            pixels[line, line, 1] += line
+        geotiff(self.path("b.tif"), pixels, "Double")
+        bands = self.document("compare", "a.tif", "b.tif", status=3)["bands"]
+        self.assertEqual(bands, [
+            {"band": 1, "samplesDiffering": 1, "greatestDifference": 2, "first": [1999, 1499]},
+            {"band": 2, "samplesDiffering": 4, "greatestDifference": 1400, "first": [3, 3]}])
+
     def test_types_are_compared_as_numbers(self):
         pixels = samples("Byte", 20, 30, 1)
         geotiff(self.path("a.tif"), pixels)
