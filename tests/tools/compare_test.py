@@ -1,7 +1,7 @@
 """Comparing rasters of all kinds."""
 import numpy as np
 
-from frame import COUNT, REAL, ToolTest, geotiff, samples
+from frame import COUNT, REAL, ToolTest, geotiff, no_new_threads, samples
 
 
 class Compare(ToolTest):
@@ -43,6 +43,11 @@ class Compare(ToolTest):
         self.assertEqual(bands, [
             {"band": 1, "samplesDiffering": 1, "greatestDifference": 2, "first": [1999, 1499]},
             {"band": 2, "samplesDiffering": 4, "greatestDifference": 1400, "first": [3, 3]}])
+
+    def test_where_no_thread_can_be_had(self):
+        self.pyramid()
+        said = self.good("compare", "picture.tif", "picture.pyr", preexec_fn=no_new_threads)
+        self.assertEqual(said, "picture.tif and picture.pyr are equal\n")
 
     def test_types_are_compared_as_numbers(self):
         pixels = samples("Byte", 20, 30, 1)

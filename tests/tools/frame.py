@@ -1,6 +1,7 @@
 """What the tests of the command line share: running it, rasters to run it on, documents."""
 import json
 import os
+import resource
 import shutil
 import subprocess
 import tempfile
@@ -39,6 +40,11 @@ def samples(type_name, height, width, bands, seed=1):
     pixels = random.integers(limits.min, limits.max, shape, dtype=kind, endpoint=True)
     pixels[0, 0], pixels[-1, -1] = limits.min, limits.max
     return pixels
+
+
+def no_new_threads():
+    """For preexec_fn: the program can start none, as their stacks would be larger than any memory."""
+    resource.setrlimit(resource.RLIMIT_STACK, (1 << 50, resource.RLIM_INFINITY))
 
 
 def geotiff(path, pixels, type_name="Byte", options=(), nodata=None, colors=None):
@@ -103,9 +109,9 @@ class ToolTest(unittest.TestCase):
         return subprocess.run([TOOL, *map(str, arguments)], cwd=self.folder, capture_output=True,
                               text=True, timeout=300, stdin=subprocess.DEVNULL, **more)
 
-    def good(self, *arguments):
+    def good(self, *arguments, **more):
         """Runs the program, which must succeed without a message, and gives its output."""
-        done = self.run_tool(*arguments)
+        done = self.run_tool(*arguments, **more)
         self.assertEqual((done.returncode, done.stderr), (0, ""), done)
         return done.stdout
 

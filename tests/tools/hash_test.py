@@ -2,7 +2,7 @@
 import hashlib
 import json
 
-from frame import COUNT, TYPES, ToolTest, geotiff, samples
+from frame import COUNT, TYPES, ToolTest, geotiff, no_new_threads, samples
 from pyramid import Pyramid
 
 
@@ -39,6 +39,13 @@ class Hash(ToolTest):
         digest = hashlib.sha256(part.tobytes()).hexdigest()
         self.assertEqual(
             self.document("hash", "made.pyr", "--window", "7,100,1992,901")["sha256"], digest)
+
+    def test_where_no_thread_can_be_had(self):
+        pixels = samples("Double", 1100, 2000, 3)
+        geotiff(self.path("source.tif"), pixels, "Double")
+        digest = hashlib.sha256(pixels.tobytes()).hexdigest()
+        self.assertEqual(self.good("hash", "source.tif", preexec_fn=no_new_threads),
+                         f"{digest}  source.tif\n")
 
     def test_lines_beyond_one_strip(self):
         pixels = samples("Double", 2, 2200000, 2)
