@@ -11,6 +11,7 @@
 #include "host/base/Text.h"
 #include "host/build/BuildFile.h"
 #include "host/build/BuildPlan.h"
+#include "host/file/SideFile.h"
 #include "platform/FileSystem.h"
 #include "store/UploadRanges.h"
 #include "tools/Message.h"
@@ -232,8 +233,15 @@ DatasetPtr PyramidPlan::OpenSource() const {
     return OpenMosaic(words.source, std::move(*layout));
 }
 
+std::string PyramidPlan::ScratchBase(const std::string& folder) const {
+    return platform::JoinPath(folder.empty() ? platform::FolderOf(PyramidPath()) : folder,
+                              platform::NameOf(path));
+}
+
 void PyramidPlan::Discard() const {
     Records().Remove();
+    // Of workers that were killed; those at work have theirs locked.
+    if (IsInStore()) zmchost::SideFile::RemoveStale(ScratchBase(""), kScratchKind);
     if (HasFile()) platform::RemoveEntry(PyramidPath());
     if (!platform::RemoveEntry(path))
         throw Failure(path, "it cannot be removed: " + platform::LastErrorText());

@@ -65,7 +65,13 @@ struct PyramidPlan {
     // without a look at them. Throws Failure.
     DatasetPtr OpenSource() const;
 
-    // Removes records and plan, and the file if it was not finished.
+    // What scratch files of workers into a store are called by, in that folder, or in the plan's if
+    // it is empty (SideFile).
+    std::string ScratchBase(const std::string& folder) const;
+    static constexpr const char* kScratchKind = "zmcscratch";
+
+    // Removes records and plan, the file if it was not finished, and what killed workers left in
+    // the plan's folder.
     void Discard() const;
 };
 

@@ -25,7 +25,6 @@ using zmchost::Extent;
 using zmcstore::UploadedPart;
 using Kind = zmchost::PartFolder::Kind;
 
-const std::string kScratchKind = "zmcscratch";
 constexpr std::size_t kBlock = std::size_t{256} << 10;
 
 std::shared_ptr<FileSource> Open(const std::string& path, OpenMode mode) {
@@ -111,11 +110,10 @@ StoreParts::~StoreParts() {
 }
 
 void StoreParts::UseScratch(const std::string& folder) {
-    const std::string base =
-        platform::JoinPath(folder.empty() ? platform::FolderOf(plan.PyramidPath()) : folder,
-                           platform::NameOf(plan.path));
-    zmchost::SideFile::RemoveStale(base, kScratchKind);
-    const std::string made = zmchost::SideFile::MakeTemporary(base, kScratchKind, lock);
+    const std::string base = plan.ScratchBase(folder);
+    zmchost::SideFile::RemoveStale(base, PyramidPlan::kScratchKind);
+    const std::string made =
+        zmchost::SideFile::MakeTemporary(base, PyramidPlan::kScratchKind, lock);
     if (made.empty())
         throw Failure(platform::FolderOf(base),
                       "no file can be made there: " + platform::LastErrorText());

@@ -128,6 +128,19 @@ class Workers(StoreTest):
         self.assertStored(expected)
         self.assertEqual(self.store.uploads, {})
 
+    def test_scratch_of_a_killed_worker_goes_with_the_plan(self):
+        self.source("Byte")
+        expected = self.expected()
+        for discarded in (False, True):
+            with self.subTest(discarded=discarded):
+                parts = self.plan_store("--overwrite")
+                self.good("part", PLAN, f"0-{parts - 1}")
+                # As one leaves it that was killed while others were at work, who no longer look.
+                with open(self.path(f".{PLAN}.zmcscratch-99-12345.tmp"), "wb") as left:
+                    left.write(b"tiles")
+                self.good("finish", PLAN, *(["--discard"] if discarded else []))
+                self.assertStored(expected)
+
     def test_counts_that_workers_make_are_that_of_build(self):
         for bands in (1, 9):
             with self.subTest(bands):
