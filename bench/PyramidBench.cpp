@@ -21,6 +21,8 @@
 
 #include "format/TileTable.h"
 #include "pyramid/PyramidDataset.h"
+#include "pyramid/TileGather.h"
+#include "pyramid/TileRequest.h"
 
 namespace {
 
@@ -373,6 +375,51 @@ BENCHMARK(WriteWholeTiles)
     ->Args({2, 12})
     ->UseManualTime()
     ->Unit(benchmark::kMillisecond);
+
+// The limit of whole tiles in the ordering Morton: the runs of all planes are read into work space,
+// where they would be woven. The bound is that of ReadWholeTiles.
+void ReadPlanesUnwoven(benchmark::State& state) {
+    constexpr std::uint32_t kBands = 12;
+    auto made = Create("planes.pyr", 2048, 2048, kBands, 0, 2);
+    Fill(*made);
+    made.reset();
+    const PlainFile plain(PathOf("planes.pyr"), O_RDONLY);
+    const std::uint64_t start = Open("planes.pyr")->TileDataStart;
+    constexpr std::size_t kPlane = std::size_t{kTile} * kTile, kTiles = 64;
+    constexpr std::size_t kRun = zelm::TileRequest::kPlanesRunBytes / (kTile * kBands) * kTile;
+    Bytes buffer(kPlane * kBands);
+    Compare(
+        state,
+        [&] {
+            for (std::uint64_t tile = 0; tile < kTiles; ++tile)
+                for (std::size_t done = 0; done < kPlane; done += kRun)
+                    for (std::uint64_t band = 0; band < kBands; ++band)
+                        plain.Read(start + (band * kTiles + tile) * kPlane + done,
+                                   buffer.data() + band * kRun, std::min(kRun, kPlane - done));
+        },
+        [&] {
+            for (std::uint64_t tile = 0; tile < kTiles; ++tile)
+                plain.Read(start + tile * buffer.size(), buffer.data(), buffer.size());
+        });
+}
+BENCHMARK(ReadPlanesUnwoven)->UseManualTime()->Unit(benchmark::kMillisecond);
+
+// Eight rows of a tile's planes become pixels, from cache to cache.
+void WeavePlanes(benchmark::State& state) {
+    const auto bands = static_cast<std::uint32_t>(state.range(0));
+    constexpr std::uint32_t kRows = 8;
+    const std::size_t planeStep = std::size_t{kRows} * kTile + zelm::TileRequest::kPlaneGap;
+    const Bytes planes(planeStep * bands, 7);
+    Bytes pixels(std::size_t{kRows} * kTile * bands);
+    for (auto _ : state) {
+        zelm::MoveSamples({planes.data(), kTile, 1, planeStep},
+                          {pixels.data(), std::size_t{kTile} * bands, bands, 1}, kRows, kTile,
+                          bands, 1);
+        benchmark::ClobberMemory();
+    }
+    state.SetBytesProcessed(state.iterations() * static_cast<std::int64_t>(pixels.size()));
+}
+BENCHMARK(WeavePlanes)->Arg(3)->Arg(12)->Arg(16);
 
 // Initialised before GDAL's drivers, which would otherwise take its memory manager down with them.
 const bool kReady = [] {

@@ -43,7 +43,7 @@ def samples(type_name, height, width, bands, seed=1):
 
 
 def no_new_threads():
-    """For preexec_fn: the program can start none, as their stacks would be larger than any memory."""
+    """For preexec_fn: the program can start none, as stacks would be larger than any memory."""
     resource.setrlimit(resource.RLIMIT_STACK, (1 << 50, resource.RLIM_INFINITY))
 
 
