@@ -39,20 +39,25 @@ std::int64_t ReadWhole(std::string_view text) {
     return negative ? -static_cast<std::int64_t>(magnitude) : static_cast<std::int64_t>(magnitude);
 }
 
+// from_chars would take a second sign in a binary exponent: half of "0x2p+-1", which is 2.
+double ReadHexadecimal(std::string_view text) {
+    return platform::ParseReal(
+        std::string(text.substr(0, text.find_first_not_of("0123456789abcdefABCDEFxXpP+-.")))
+            .c_str());
+}
+
 // False if the text does not begin with a number.
 bool ReadMagnitude(std::string_view text, double& value) {
     // The numbers that from_chars reads have a sign of their own.
     if (text.empty() || text[0] == '-') return false;
-    const bool hexadecimal = StartsHexadecimal(text);
-    if (hexadecimal) text.remove_prefix(2);
-    const auto end =
-        std::from_chars(text.data(), text.data() + text.size(), value,
-                        hexadecimal ? std::chars_format::hex : std::chars_format::general);
-    if (end.ec == std::errc::result_out_of_range) {
-        // Infinity, or the nearest to nothing, which from_chars does not tell.
-        const std::string number(text.data(), end.ptr);
-        value = platform::ParseReal(((hexadecimal ? "0x" : "") + number).c_str());
+    if (StartsHexadecimal(text)) {
+        value = ReadHexadecimal(text);
+        return true;
     }
+    const auto end = std::from_chars(text.data(), text.data() + text.size(), value);
+    if (end.ec == std::errc::result_out_of_range)
+        // Infinity, or the nearest to nothing, which from_chars does not tell.
+        value = platform::ParseReal(std::string(text.data(), end.ptr).c_str());
     return end.ec != std::errc::invalid_argument;
 }
 

@@ -18,7 +18,7 @@ inline std::vector<std::string> RealTexts() {
         "- 1",
         "\xC2\xA0"
         "1",
-        "1x", "1e", "1e+", "1.5.5", "12 7",
+        "1x", "1e", "1e+", "1e+-1", "2e-+1", "1e--1", "1.5.5", "12 7",
         // Decimals, and the ends of their range, which neither the first digit nor the sign of the
         // exponent tells.
         "255|7", "12x", "12e1", "12E1", "12.5", "999999999", "4294967296", "-000000000000000012",
@@ -30,7 +30,8 @@ inline std::vector<std::string> RealTexts() {
         "2.2250738585072011e-308", "4.9e-324", "5e-324", "2.4e-324", "2.5e-324", "1e-310",
         // Hexadecimals: a fraction alone, a binary exponent, and values that no double holds.
         "0x10", "0x.8", "0X.8p1", "0x1.8", "0x1.", "0x.", "0x", "-0x", "0xg", "0x.g", "0x-1",
-        "0x+1", "0x 1", "0xp1", "0x1p", "0x1p+", "0x1p-", "0x1px", "0x1p4", "0x1P-4", "0x1p0x1",
+        "0x+1", "0x 1", "0xp1", "0x1p", "0x1p+", "0x1p-", "0x1px", "0x2p+-1", "0X2P-+1",
+        "-0x1.8p++4", "0x2p--1", "0x1p4", "0x1P-4", "0x1p0x1",
         "-0x1", "-0x0", " -0X1.8P+1z", "-0X1p-3z", "0x0p99999", "0x1p-2000", "-0x1p-2000",
         "0x1p2000", "-0x1p2000", "0x1p-1074", "0x1p-1075", "0x1.8p-1075", "0x1.8p-1074",
         "0x1.00000000000008p0", "0x1.000000000000080000001p0", "0x1.fffffffffffff8p1023",
