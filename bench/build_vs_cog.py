@@ -57,9 +57,9 @@ def warm(path):
             pass
 
 
-def cog(source, target):
+def cog(source, target, resampling="AVERAGE"):
     return ["gdal_translate", "-q", "-of", "COG", "-co", "COMPRESS=NONE", "-co",
-            "OVERVIEW_RESAMPLING=AVERAGE", "-co", f"NUM_THREADS={THREADS}", "-co", "BIGTIFF=YES",
+            f"OVERVIEW_RESAMPLING={resampling}", "-co", f"NUM_THREADS={THREADS}", "-co", "BIGTIFF=YES",
             "--config", "GDAL_NUM_THREADS", THREADS, source, target]
 
 
